@@ -1,0 +1,153 @@
+// The agent itself: life of the daemon, its main loop, the actions of the main thread, the way of a finished
+// recording.
+#pragma once
+#include <sys/types.h>
+
+#include <atomic>
+#include <cstdint>
+#include <map>
+#include <memory>
+#include <optional>
+#include <string>
+#include <vector>
+
+#include "agent/context/agent_actions.h"
+#include "agent/context/agent_context.h"
+#include "control/agent_control_unix.h"
+#include "platform/child_process.h"
+#include "platform/run_loop.h"
+#include "platform/service_manager.h"
+#include "platform/signals.h"
+#include "postprocess/scheduler.h"
+#include "prefs/agent_preferences.h"
+#include "record/agent_record.h"
+#include "record/capture_framework.h"
+
+namespace lmx {
+
+inline constexpr double kVersion = 100;
+
+/// What the agent is given from outside; scripted in tests.
+struct AgentEnvironment {
+  std::shared_ptr<CaptureFramework> framework;
+  std::shared_ptr<ServiceManager> serviceManager;
+  ChildRunner* children = nullptr;  ///< lives until the process ends
+};
+
+/// One a process, made by the main thread and never destroyed while other threads run. "Main thread" below is
+/// the one that made it.
+class AgentMain : public AgentActions {
+ public:
+  AgentMain(std::shared_ptr<AgentContext> context, AgentEnvironment environment);
+  ~AgentMain() override;
+
+  [[nodiscard]] const std::shared_ptr<AgentContext>& agentContext() const { return context_; }
+
+  // ---- command line (command_line.cpp)
+  /// Reads the options into the context. @return YES when the program is to go on to startup; NO when it is
+  /// to exit with `*exitCode`.
+  bool parseArgs(char* const* argv, int count, int* exitCode);
+  static void usageForTool(const std::string& tool);
+  static std::string toolNameFromPathArg(const char* argument);
+
+  // ---- life of the daemon (daemon.cpp, daemon_files.cpp, service_disable.cpp)
+  /// Runs the agent to its end. @return the exit status of the process.
+  int startup();
+  int startupDaemon();
+  bool setupLoggingContext();
+  void setupSignalHandlers();
+  void shutdown();
+  /// @return 0, or 1 when the file can't be made (access denied is only logged).
+  int createPIDFile();
+  void removePIDFile();
+  /// True when the directory exists afterwards.
+  bool setupRecordingRepository();
+  /// Has the service manager never start this agent again, and ends the process: 78, or 71 when that failed.
+  [[noreturn]] void disableService();
+
+  // ---- main loop (main_loop.cpp)
+  /// @return 0 for an orderly end, 1 when the capture device was lost.
+  int appLoop();
+  void signal(int number);
+  /// Whether the loop must end because the capture device is gone.
+  bool deviceDisconnected();
+  std::shared_ptr<LMRRecordingContext> recordingContext();
+
+  // ---- AgentActions (capture_actions.cpp, submission.cpp)
+  bool perform(Action action, Wait wait) override;
+  void prepareCapture() override;
+  void startPreview() override;
+  void stopPreview() override;
+  void pauseCapture() override;
+  void resumeCapture() override;
+  void stopCapture() override;
+  void cancelCapture() override;
+  void stopRecording() override;
+  void setRecorderStatusToIdle() override;
+  void shutDownControl() override;
+  void shutDownControlBecauseDeviceFailed() override;
+  void submitStoppedRecording() override;
+  void captureDidComplete(const void* controller) override;
+  void captureDidCancel(const void* controller) override;
+  void recordDidStartWithFile(const std::string& file, const SharedDictionary& metadata,
+                              std::optional<TimeValue> atTime) override;
+  void recordDidPauseWithFile(const std::string& file, const SharedDictionary& metadata,
+                              std::int64_t elapsedSeconds) override;
+  void recordDidResumeWithFile(const std::string& file, const SharedDictionary& metadata) override;
+  void recordRuntimeErrorCallback(int code) override;
+  void recordDidStopWithFile(const std::shared_ptr<AgentRecord>& session, const std::string& file,
+                             const SharedDictionary& metadata, std::optional<TimeValue> atTime,
+                             std::int64_t elapsedSeconds, std::optional<TimeValue> stoppedTime,
+                             bool canceled) override;
+
+  /// Puts recovered movies' documents beside them and logs one line each; nothing is submitted. Any thread.
+  void keepRecovered(const std::vector<RecoveredRecording>& recordings);
+
+  [[nodiscard]] RunLoop& mainRunLoop() { return loop_; }
+  [[nodiscard]] bool runLoopRunning() const { return runLoopRunning_; }
+
+ private:
+  // Steps of startupDaemon, in order.
+  enum class Start { ok, fatal, fatalAndDisable };
+  Start loadSettings();
+  Start prepareGround();
+  void probeDevice(const LMRRecordingContext& settings);
+  Start startServices();
+  int stopSequence(Start result, int status);
+
+  // Steps of a turn of the main loop.
+  void retryDevice(std::int64_t now);
+  void stopForgottenPreview(std::int64_t now);
+  void readTimeShift();
+  void reloadChangedPreferences();
+  void checkServerRefusal(std::int64_t now);
+
+  void stopOrCancelCapture(bool cancel);
+  void rememberStopped(const std::shared_ptr<LMRCaptureController>& controller);
+  std::shared_ptr<AgentRecord> takeStopped(const void* controller);
+  void submit(const std::shared_ptr<AgentRecord>& stopped);
+  void handOff(const std::shared_ptr<AgentRecord>& stopped, const std::string& path, double elapsed);
+  void recoverUnfinishedRecordings();
+  [[nodiscard]] std::shared_ptr<AgentRecord> session() const { return context_->record_context(); }
+  [[nodiscard]] std::shared_ptr<LMRCaptureController> captureController() const;
+  [[nodiscard]] bool postProcessingIsIdle() const;
+
+  const std::shared_ptr<AgentContext> context_;
+  const AgentEnvironment environment_;
+  RunLoop loop_;
+  bool runLoopRunning_ = false;
+  bool shouldDisplayOfflineMessage_ = false;
+  bool device_offline_ = false;
+  std::unique_ptr<SignalSource> signals_;
+  std::shared_ptr<LMRRecordingContext> start_settings_;
+  std::unique_ptr<AgentPreferences> agentPrefs_;
+  PostProcessScheduler scheduler_;
+  std::unique_ptr<AgentControlUnix> agentControlLocal_;
+  /// Sessions as they were when their capture was stopped or cancelled, until the capture reports: by then
+  /// the session may have gone on to the next recording. Main thread.
+  std::map<const void*, std::shared_ptr<AgentRecord>> stopped_;
+  /// Captures that have ended and whose job is not in the list yet.
+  std::atomic<int> hand_offs_{0};
+};
+
+}  // namespace lmx

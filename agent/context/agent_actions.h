@@ -1,0 +1,64 @@
+// What the lower folders may ask of the agent: the actions of the main thread and the recording callbacks.
+#pragma once
+#include <cstdint>
+#include <memory>
+#include <optional>
+#include <string>
+
+#include "platform/run_loop.h"
+#include "support/dictionary.h"
+#include "support/time_value.h"
+
+namespace lmx {
+
+class AgentRecord;
+
+/// Implemented by AgentMain. The actions of the capture run on the main thread only: other threads hand them
+/// over with perform(); the callbacks may come from any thread.
+class AgentActions {
+ public:
+  using Action = void (AgentActions::*)();
+
+  virtual ~AgentActions() = default;
+
+  /// Runs `action` on the main thread. Waiting on the main thread itself runs it at once.
+  /// @return false when the main loop has ended and the action will not run.
+  virtual bool perform(Action action, Wait wait) = 0;
+
+  // Actions, main thread only. Those that have a result leave it in the context's `status`.
+  virtual void prepareCapture() = 0;
+  virtual void startPreview() = 0;
+  virtual void stopPreview() = 0;
+  virtual void pauseCapture() = 0;
+  virtual void resumeCapture() = 0;
+  virtual void stopCapture() = 0;
+  virtual void cancelCapture() = 0;
+  virtual void stopRecording() = 0;
+  virtual void setRecorderStatusToIdle() = 0;
+  virtual void submitStoppedRecording() = 0;
+  virtual void shutDownControl() = 0;
+  virtual void shutDownControlBecauseDeviceFailed() = 0;
+
+  /// A capture came to its end (delegate report, any thread): the main thread is asked to submit what it
+  /// recorded.
+  /// @param controller  identifies the capture; the session may have gone on to another one meanwhile
+  virtual void captureDidComplete(const void* controller) = 0;
+  /// A capture was cancelled (delegate report, any thread): the session becomes idle unless it has gone on.
+  virtual void captureDidCancel(const void* controller) = 0;
+
+  // Callbacks of the engine, any thread. They do nothing once the context's `running` is NO.
+  virtual void recordDidStartWithFile(const std::string& file, const SharedDictionary& metadata,
+                                      std::optional<TimeValue> atTime) = 0;
+  virtual void recordDidPauseWithFile(const std::string& file, const SharedDictionary& metadata,
+                                      std::int64_t elapsedSeconds) = 0;
+  virtual void recordDidResumeWithFile(const std::string& file, const SharedDictionary& metadata) = 0;
+  virtual void recordRuntimeErrorCallback(int code) = 0;
+  /// @param session  the session that recorded, or a copy of it (its type and request are read)
+  /// @param elapsedSeconds  whole seconds of media
+  virtual void recordDidStopWithFile(const std::shared_ptr<AgentRecord>& session, const std::string& file,
+                                     const SharedDictionary& metadata, std::optional<TimeValue> atTime,
+                                     std::int64_t elapsedSeconds, std::optional<TimeValue> stoppedTime,
+                                     bool canceled) = 0;
+};
+
+}  // namespace lmx

@@ -1,0 +1,129 @@
+// Start-up and shut-down of the daemon.
+#include <syslog.h>
+#include <csignal>
+#include <cstdio>
+#include <ctime>
+
+#include "agent/agent_main.h"
+#include "platform/log.h"
+#include "platform/notifications.h"
+#include "platform/paths.h"
+#include "platform/work_queue.h"
+#include "record/engine.h"
+#include "record/preview_controller.h"
+
+namespace lmx {
+
+using namespace std::chrono_literals;
+
+AgentMain::AgentMain(std::shared_ptr<AgentContext> context, AgentEnvironment environment)
+    : context_(std::move(context)), environment_(std::move(environment)) {
+  loop_.adoptThread();
+  setEngineEnvironment({context_, this, environment_.framework});
+}
+
+AgentMain::~AgentMain() {
+  agentControlLocal_.reset();
+  scheduler_.cancel();
+  setEngineEnvironment({});
+}
+
+int AgentMain::startup() { return startupDaemon(); }
+
+bool AgentMain::setupLoggingContext() {
+  LMPLogContext log = LMPLogCreateContext("lmxagentd", "com.zandor.lumex");
+  context_->setLog_context(log);
+  if (log != nullptr) return true;
+  syslog(LOG_ALERT, "LMPLogCreateContext failed, ZSL uninitialized.");
+  std::fputs("LMPLogCreateContext failed, ZSL uninitialized.\n", stderr);
+  return false;
+}
+
+void AgentMain::setupSignalHandlers() {
+  signals_ = std::make_unique<SignalSource>(
+      loop_, std::vector<int>{SIGHUP, SIGINT, SIGPIPE, SIGTERM, SIGUSR1, SIGUSR2},
+      [this](int n) { signal(n); });
+}
+
+int AgentMain::startupDaemon() {
+  if (!setupLoggingContext()) return stopSequence(Start::fatal, 1);
+  setupSignalHandlers();
+  LMPLogMessage(context_->log_context(), kLogInfo, "lmxagentd (version %.0f) starting...", kVersion);
+  Start result = loadSettings();
+  if (result == Start::ok) result = prepareGround();
+  if (result == Start::ok) result = startServices();
+  if (result != Start::ok) return stopSequence(result, 1);
+  if (appLoop() == 1) return stopSequence(Start::fatal, 1);
+  return stopSequence(Start::ok, 0);
+}
+
+AgentMain::Start AgentMain::loadSettings() {
+  context_->setPreview_directory(std::string(kStateDirectory));
+  start_settings_ = recordingContext();
+  if (!start_settings_) return Start::fatalAndDisable;
+  agentPrefs_ = std::make_unique<AgentPreferences>(environment_.framework);
+  return agentPrefs_->setAgentPreferencesInContext(*context_) ? Start::ok : Start::fatalAndDisable;
+}
+
+AgentMain::Start AgentMain::prepareGround() {
+  if (!setupRecordingRepository() || createPIDFile() != 0) return Start::fatal;
+  recoverUnfinishedRecordings();
+  probeDevice(*start_settings_);
+  return Start::ok;
+}
+
+void AgentMain::probeDevice(const LMRRecordingContext& settings) {
+  if (!settings.videoDeviceID) return;
+  if (LXAgentRecordCreatePreviewController(settings.videoDeviceID, settings.audioDeviceID,
+                                           settings.audioEnabled, settings.previewIntervalInMilliseconds,
+                                           nullptr)) {
+    return;
+  }
+  LMPLogMessage(
+      context_->log_context(), kLogAlert,
+      "Unable to acquire the specified video device. The agent will remain offline until the device becomes "
+      "available.");
+  context_->setLast_device_check(std::time(nullptr));
+  device_offline_ = true;
+}
+
+AgentMain::Start AgentMain::startServices() {
+  if (!scheduler_.start(context_, *environment_.children)) {
+    LMPLogMessage(context_->log_context(), kLogCritical,
+                  "Internal error occurred creating post-process scheduler thread");
+    return Start::fatal;
+  }
+  agentControlLocal_ = newControlChannel<AgentControlUnix>(context_, this);
+  if (!agentControlLocal_) {
+    LMPLogMessage(context_->log_context(), kLogAlert, "Unable to start listener on named pipe");
+  }
+  if (context_->tcp_listener_port() != 0) {
+    LMPLogMessage(context_->log_context(), kLogAlert, "Unable to start TCP listener");
+  }
+  // Off this thread: a first recording should find the plug-ins loaded, but nobody should wait for them now.
+  dispatchAsync(WorkPriority::background, [framework = environment_.framework] { framework->warmUp(); });
+  notify_post("com.zandor.lmxagentd.started");
+  postDistributedNotification("com.zandor.lmxagentd.started");
+  start_settings_ = nullptr;
+  return Start::ok;
+}
+
+int AgentMain::stopSequence(Start result, int status) {
+  if (status == 1)
+    LMPLogMessage(context_->log_context(), kLogCritical, "Internal error caused application to stop");
+  LMPLogMessage(context_->log_context(), kLogInfo, "lmxagentd is stopping...");
+  shutdown();
+  removePIDFile();
+  if (result == Start::fatalAndDisable) disableService();
+  return status;
+}
+
+void AgentMain::shutdown() {
+  context_->setRunning(false);
+  const auto controller = captureController();
+  while (controller && !controller->hasShutDown()) loop_.run(250ms);
+  scheduler_.cancel();
+  loop_.stop();
+}
+
+}  // namespace lmx

@@ -1,0 +1,44 @@
+// From main to the exit status.
+#include "agent/process.h"
+
+#include <malloc.h>
+
+#include <clocale>
+
+#include "agent/agent_main.h"
+#include "platform/log.h"
+#include "platform/notifications.h"
+#include "support/heap_ptr.h"
+
+namespace lmx {
+namespace {
+
+constexpr int kExitOperatingSystem = 71;
+
+int runAgent(int argc, char** argv, std::shared_ptr<CaptureFramework> framework) {
+  // The character type alone: numbers in replies must keep their decimal point.
+  if (std::setlocale(LC_CTYPE, "C.UTF-8") == nullptr) return kExitOperatingSystem;
+  auto* agent = new AgentMain(newAgentContext(),  // NOLINT: lives until the process ends
+                              {std::move(framework), newSystemServiceManager(), &systemChildRunner()});
+  const heap_ptr<TimeValue> launched(lmp_gettimeofday());
+  if (!launched) return kExitOperatingSystem;
+  agent->agentContext()->setLaunch_time(*launched);
+  agent->agentContext()->setRunning(true);
+  int exitCode = 0;
+  return agent->parseArgs(argv, argc, &exitCode) ? agent->startup() : exitCode;
+}
+
+}  // namespace
+
+int runAgentProcess(int argc, char** argv, std::shared_ptr<CaptureFramework> framework) {
+  // Many short-lived threads touch the heap: with an arena each, memory would grow from recording to
+  // recording.
+  mallopt(M_ARENA_MAX, 2);
+  const int status = runAgent(argc, argv, std::move(framework));
+  notify_post("com.zandor.lmxagentd.stopped");
+  postDistributedNotification("com.zandor.lmxagentd.stopped");
+  LMPLogMessage(nullptr, kLogInfo, "lmxagentd stopped");
+  return status;
+}
+
+}  // namespace lmx

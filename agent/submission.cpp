@@ -1,0 +1,192 @@
+// The way of a stopped recording: movie, properties document, job.
+#include <unistd.h>
+
+#include "agent/agent_main.h"
+#include "platform/log.h"
+#include "platform/work_queue.h"
+#include "postprocess/agent_submit.h"
+#include "record/capture_delegate.h"
+#include "record/engine.h"
+
+namespace lmx {
+namespace {
+
+constexpr const char* kUuidKey = "RecordingMetadata_RECORDING_UUID";
+
+SharedDictionary withUuid(const SharedDictionary& metadata, const std::optional<std::string>& uuid) {
+  Dictionary all = metadata ? *metadata : Dictionary{};
+  if (uuid) all[kUuidKey] = *uuid;
+  return std::make_shared<const Dictionary>(std::move(all));
+}
+
+/// The START parameters of what `stopped` recorded.
+SharedDictionary propertiesOf(const AgentContext& context, const AgentRecord& stopped) {
+  const SharedDictionary own = stopped.request_properties();
+  return own ? own : context.properties();
+}
+
+/// When the recording began. The capture thread may not have set its time yet when a recording is stopped at
+/// once.
+std::optional<TimeValue> startOf(const AgentRecord& stopped) {
+  const auto start = stopped.startTime();
+  const auto launch = stopped.launchTime();
+  if (!start || (launch && lmp_diff_timeval(&*start, &*launch) < 0)) return launch;
+  return start;
+}
+
+TimeValue timeValueFrom(double secondsSinceReference) {
+  const double seconds = secondsSinceReference + kReferenceDateOffset;
+  const auto whole = static_cast<time_t>(seconds);
+  return {whole, static_cast<suseconds_t>((seconds - static_cast<double>(whole)) * 1e6)};
+}
+
+}  // namespace
+
+void AgentMain::rememberStopped(const std::shared_ptr<LMRCaptureController>& controller) {
+  if (controller->hasShutDown()) return;  // it has reported already
+  stopped_.try_emplace(controller.get(), session()->copy());
+}
+
+std::shared_ptr<AgentRecord> AgentMain::takeStopped(const void* controller) {
+  const auto found = stopped_.find(controller);
+  if (found != stopped_.end()) {
+    auto record = std::move(found->second);
+    stopped_.erase(found);
+    return record;
+  }
+  const auto record = session();
+  return record && record->captureController().get() == controller ? record->copy() : nullptr;
+}
+
+void AgentMain::captureDidComplete(const void* controller) {
+  ++hand_offs_;
+  const bool posted = loop_.post(
+      [this, controller] {
+        if (const auto stopped = takeStopped(controller)) {
+          submit(stopped);
+        } else {
+          --hand_offs_;
+        }
+      },
+      Wait::no);
+  if (!posted) --hand_offs_;
+}
+
+void AgentMain::captureDidCancel(const void* controller) {
+  loop_.post(
+      [this, controller] {
+        const auto stopped = takeStopped(controller);
+        const auto record = session();
+        if (record && record->captureController().get() == controller) setRecorderStatusToIdle();
+        if (!stopped) return;
+        dispatchAsync(WorkPriority::background, [this, capture = stopped->captureController()] {
+          if (capture) keepRecovered(capture->recoverAbandonedRequests());
+        });
+      },
+      Wait::no);
+}
+
+void AgentMain::submitStoppedRecording() {
+  ++hand_offs_;
+  if (const auto record = session()) {
+    submit(record->copy());
+  } else {
+    --hand_offs_;
+  }
+}
+
+void AgentMain::submit(const std::shared_ptr<AgentRecord>& stopped) {
+  context_->logDebug("Submitting Stopped Recording");
+  const auto controller = stopped->captureController();
+  const double elapsed = controller ? controller->elapsedTimeForRequestWithUUID(stopped->request_uuid()) : 0;
+  const SharedDictionary properties = propertiesOf(*context_, *stopped);
+  const auto uuid = lookUp(properties, kUuidKey);
+  const std::string path =
+      lookUp(properties, "RecordingMetadata_ADHOC_FILE_PATH")
+          .value_or(context_->recording_repository_path().value_or("") + "/" + uuid.value_or("") + ".mov");
+  stopped->setMetadata(withUuid(stopped->metadata(), uuid));
+  stopped->setStartTime(startOf(*stopped));
+  dispatchAsync(WorkPriority::background, [this, stopped, path, elapsed] {
+    handOff(stopped, path, elapsed);
+    --hand_offs_;
+  });
+}
+
+void AgentMain::handOff(const std::shared_ptr<AgentRecord>& stopped, const std::string& path,
+                        double elapsed) {
+  const auto controller = stopped->captureController();
+  if (!controller) return;
+  // An agent that is ending leaves the recording to the next start, which makes movie and document together.
+  if (!context_->running()) return;
+  const std::string request = stopped->request_uuid();
+  const auto error = controller->processRequestWithUUID(request, path);
+  if (const auto cause = controller->lastError()) {
+    LMPLogMessage(context_->log_context(), kLogError, "The capture of \"%s\" ended early: %s", path.c_str(),
+                  cause->message.c_str());
+  }
+  if (!error) {
+    stopped->setStopTime(shiftedNow(*context_));
+    recordDidStopWithFile(stopped, path, stopped->metadata(), stopped->startTime(),
+                          static_cast<std::int64_t>(elapsed), stopped->stopTime(), false);
+  } else {
+    LMPLogMessage(context_->log_context(), kLogCritical, "The recording could not be finished: %s",
+                  error->message.c_str());
+    recordRuntimeErrorCallback(kRecordCannotWrite);
+    if (const auto record = session()) record->setError(kRecordCannotWrite);
+  }
+  if (context_->running()) {
+    // A movie that could not be written stays in the capture's folder: the next start tries again.
+    if (!error || error->code == kNoMedia) {
+      controller->requestHandedOver(request);
+      keepRecovered(controller->recoverAbandonedRequests());
+    }
+    const auto record = session();
+    if (record && record->captureController() == controller) setRecorderStatusToIdle();
+  }
+}
+
+void AgentMain::recordDidStopWithFile(const std::shared_ptr<AgentRecord>& session, const std::string& file,
+                                      const SharedDictionary& metadata, std::optional<TimeValue> atTime,
+                                      std::int64_t elapsedSeconds, std::optional<TimeValue> stoppedTime,
+                                      bool canceled) {
+  if (!context_->running()) return;
+  LMPLogMessage(context_->log_context(), kLogNotice, "\"%s\" recording stopped (duration: %ds)", file.c_str(),
+                static_cast<int>(elapsedSeconds));
+  const SharedDictionary properties = propertiesOf(*context_, *session);
+  if (context_->adhoc() || context_->submit_disabled() ||
+      lookUp(properties, "RecordingMetadata_ADHOC_SUBMIT_DISABLED") == "1") {
+    return;
+  }
+  auto job = std::make_shared<AgentSubmit>();
+  job->setRecord(session->copy());
+  if (const auto workflow = lookUp(properties, "RecordingMetadata_ADHOC_WORKFLOW_UUID")) {
+    job->setAdhoc_workflow_uuid(workflow);
+  }
+  job->setPropertyValuesWithContext(context_, file, atTime, stoppedTime, elapsedSeconds, metadata, canceled);
+  if (job->writeProperties() == 0) {
+    context_->postProcessListAddJob(std::move(job));
+  } else {
+    LMPLogMessage(context_->log_context(), kLogCritical,
+                  "Internal error occurred in did stop with success callback");
+    context_->setRunning(false);
+  }
+}
+
+void AgentMain::keepRecovered(const std::vector<RecoveredRecording>& recordings) {
+  for (const RecoveredRecording& recording : recordings) {
+    AgentSubmit document;
+    auto record = std::make_shared<AgentRecord>();
+    record->setRecordingType(recording.recordingType);
+    document.setRecord(record);
+    document.setPropertyValuesWithContext(
+        context_, recording.path, timeValueFrom(recording.startTime), timeValueFrom(recording.stopTime),
+        static_cast<std::int64_t>(recording.duration), withUuid(recording.parameters, std::nullopt), false);
+    document.writeProperties();
+    recording.forget();
+    LMPLogMessage(context_->log_context(), kLogNotice,
+                  "Recovered unfinished recording \"%s\" (duration: %ds); it was not submitted",
+                  recording.path.c_str(), static_cast<int>(recording.duration));
+  }
+}
+
+}  // namespace lmx

@@ -1,0 +1,40 @@
+// Unique identifiers of capture devices and the options of the synthetic ones. Pure.
+#pragma once
+#include <map>
+#include <optional>
+#include <string>
+
+namespace lmx {
+
+enum class DeviceKind { hardware, file, network, test, unknown };
+
+/// "test://video?size=640x360&fps=25" and the like, taken apart.
+struct DeviceID {
+  DeviceKind kind = DeviceKind::unknown;
+  std::string text;                            ///< as given
+  std::string name;                            ///< without scheme and options: "video", "/path/a.mov"
+  std::map<std::string, std::string> options;  ///< test devices only
+
+  [[nodiscard]] std::optional<double> seconds(const std::string& option) const;
+  /// The synthetic devices' "speed=max": as fast as the machine can, for tests of hours of media.
+  [[nodiscard]] bool asFastAsPossible() const;
+};
+DeviceID parseDeviceID(const std::string& text);
+
+struct PictureSize {
+  int width = 1280;
+  int height = 720;
+};
+/// The "size" option of a synthetic camera, forced to even numbers between 64 and 4096; 1280x720 without one.
+PictureSize pictureSize(const DeviceID& id);
+
+/// A frame rate as a fraction: 29.97 is 30000/1001, whole numbers n/1, others in thousandths.
+struct FrameRate {
+  int numerator = 30;
+  int denominator = 1;
+  [[nodiscard]] double frameSeconds() const { return static_cast<double>(denominator) / numerator; }
+  bool operator==(const FrameRate&) const = default;
+};
+FrameRate frameRateFrom(double framesPerSecond);
+
+}  // namespace lmx

@@ -1,0 +1,201 @@
+// Movies out of a closed capture.
+#include "capture/finished_capture.h"
+
+#include <dirent.h>
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <cmath>
+#include <cstring>
+#include <fstream>
+#include <sstream>
+
+#include "platform/log.h"
+#include "platform/paths.h"
+#include "support/directories.h"
+
+namespace lmx {
+namespace {
+
+bool exists(const std::string& path) { return access(path.c_str(), F_OK) == 0; }
+
+CaptureError diskError(int error, const std::string& what) {
+  return {CaptureError::kDomain, error == ENOSPC ? kNoSpace : kWriteFailed,
+          what + ": " + std::strerror(error)};
+}
+
+/// `stem` + first free of "", "-1", "-2" … + ".mov".
+std::string freeName(const std::string& stem) {
+  std::string path = stem + ".mov";
+  for (int i = 1; exists(path); ++i) path = stem + "-" + std::to_string(i) + ".mov";
+  return path;
+}
+
+/// An earlier movie of the same name may still wait for its submission: it gets another name, it is not
+/// overwritten.
+void setAside(const std::string& path) {
+  if (!exists(path)) return;
+  const std::string stem = path.size() > 4 && path.ends_with(".mov") ? path.substr(0, path.size() - 4) : path;
+  const std::string aside = freeName(stem + "-replaced");
+  if (rename(path.c_str(), aside.c_str()) == 0) {
+    LMPLogMessage(nullptr, kLogWarning, "%s was there already, it is now %s", path.c_str(), aside.c_str());
+  }
+}
+
+int moveFile(const std::string& from, const std::string& to) {
+  if (rename(from.c_str(), to.c_str()) != 0) return errno;
+  return syncDirectory(directoryOf(to));
+}
+
+std::string readAll(const std::string& path) {
+  std::ifstream in(path, std::ios::binary);
+  std::ostringstream out;
+  out << in.rdbuf();
+  return out.str();
+}
+
+std::string fileNameFor(const Request& request) {
+  std::string name = lookUp(request.parameters, "RecordingMetadata_RECORDING_UUID").value_or("test");
+  std::replace(name.begin(), name.end(), '/', '_');
+  return name.empty() ? "test" : name;
+}
+
+}  // namespace
+
+std::string captureFolderOf(const std::string& repository) { return repository + "/.lmxagentd"; }
+
+FinishedCapture::FinishedCapture(std::string folder, std::shared_ptr<Journal> journal, CaptureRecord record,
+                                 std::uint32_t totalFrames)
+    : folder_(std::move(folder)),
+      journal_(std::move(journal)),
+      record_(std::move(record)),
+      total_frames_(totalFrames) {}
+
+std::shared_ptr<FinishedCapture> FinishedCapture::openAbandoned(const std::string& folder) {
+  const std::string journalPath = folder + "/" + kJournalName;
+  std::shared_ptr<Journal> journal = Journal::open(journalPath, true);
+  if (!journal) return nullptr;
+  CaptureRecord record = parseJournal(readAll(journalPath));
+  const std::string media = folder + "/" + kMediaName;
+  std::uint32_t frames = 0;
+  if (const auto index = readMovieIndex(media); index && !index->tracks.empty() && record.frameSeconds > 0) {
+    frames =
+        static_cast<std::uint32_t>(std::floor(index->tracks.front().seconds() / record.frameSeconds + 1e-3));
+    if (const int error = finishMovieInPlace(media, *index)) {
+      LMPLogMessage(nullptr, kLogWarning, "%s stays fragmented: %s", media.c_str(), std::strerror(error));
+    }
+  }
+  return std::make_shared<FinishedCapture>(folder, std::move(journal), std::move(record), frames);
+}
+
+std::optional<CaptureError> FinishedCapture::makeMovie(const std::string& uuid, const std::string& path) {
+  const std::lock_guard lock(mutex_);
+  const Request* request = record_.marks.find(uuid);
+  if (request == nullptr)
+    return CaptureError{CaptureError::kDomain, kNoMedia, "no recording of request " + uuid};
+  return makeMovieLocked(*request, path);
+}
+
+std::optional<CaptureError> FinishedCapture::makeMovieLocked(const Request& request,
+                                                             const std::string& path) {
+  const auto ranges = framesOf(request, record_.runs, record_.frameSeconds, total_frames_);
+  if (ranges.empty())
+    return CaptureError{CaptureError::kDomain, kNoMedia, "nothing was captured for " + path};
+  journal_->movie(request.uuid, path);
+  journal_->sync();
+  setAside(path);
+  if (coversAll(ranges, total_frames_) && !record_.marks.othersPending(request.uuid)) {
+    const int error = moveFile(media(), path);
+    if (error == 0) return std::nullopt;
+    if (error != EXDEV) return diskError(error, "could not move the movie to " + path);
+  }
+  return copyFrames(ranges, path);
+}
+
+std::optional<CaptureError> FinishedCapture::copyFrames(const std::vector<FrameRange>& ranges,
+                                                        const std::string& path) {
+  const auto index = readMovieIndex(media());
+  if (!index) return CaptureError{CaptureError::kDomain, kWriteFailed, media() + " can't be read"};
+  const std::string temporary = directoryOf(path) + "/.lmxagentd-" + std::to_string(getpid()) + ".part";
+  int error = copyMovieRanges(media(), *index, ranges, record_.frameSeconds, temporary);
+  if (error == 0) error = moveFile(temporary, path);
+  if (error == 0) return std::nullopt;
+  unlink(temporary.c_str());
+  return diskError(error, "could not write " + path);
+}
+
+RecoveredRecording FinishedCapture::describe(const Request& request, const std::string& path) {
+  RecoveredRecording recording;
+  recording.path = path;
+  recording.parameters = request.parameters;
+  recording.recordingType = record_.recordingType;
+  recording.forget = [self = shared_from_this(), uuid = request.uuid] { self->handedOver(uuid); };
+  std::uint32_t frames = 0;
+  for (const FrameRange& range : framesOf(request, record_.runs, record_.frameSeconds, total_frames_)) {
+    frames += range.end - range.first;
+    for (const MovieRun& run : record_.runs) {
+      if (run.firstFrame > range.first) break;
+      const double at = run.sessionTime + record_.wallOffset;
+      if (recording.startTime == 0)
+        recording.startTime = at + (range.first - run.firstFrame) * record_.frameSeconds;
+      recording.stopTime = at + (range.end - run.firstFrame) * record_.frameSeconds;
+    }
+  }
+  recording.duration = frames * record_.frameSeconds;
+  return recording;
+}
+
+std::vector<RecoveredRecording> FinishedCapture::recoverPending(const std::string& repository) {
+  const std::lock_guard lock(mutex_);
+  std::vector<RecoveredRecording> recovered;
+  const std::vector<Request> requests = record_.marks.requests();
+  for (const Request& request : requests) {
+    if (!request.pending()) continue;
+    const auto made = record_.movies.find(request.uuid);
+    if (made != record_.movies.end() && exists(made->second) && !exists(media())) {
+      recovered.push_back(
+          describe(request, made->second));  // it had its movie, only the document was missing
+      continue;
+    }
+    const std::string stem = repository + "/" + fileNameFor(request);
+    const std::string path = exists(stem + ".mov") ? freeName(stem + "-recovered") : stem + ".mov";
+    if (const auto error = makeMovieLocked(request, path)) {
+      const bool nothing = error->code == kNoMedia;
+      LMPLogMessage(nullptr, nothing ? kLogWarning : kLogError, "Unfinished recording in %s: %s%s",
+                    folder_.c_str(), error->message.c_str(),
+                    nothing ? "" : "; its media stay there for another try at the next start");
+      if (!nothing) continue;
+      record_.marks.markDone(request.uuid);
+      journal_->done(request.uuid);
+      continue;
+    }
+    recovered.push_back(describe(request, path));
+  }
+  removeIfResolvedLocked();
+  return recovered;
+}
+
+void FinishedCapture::handedOver(const std::string& uuid) {
+  const std::lock_guard lock(mutex_);
+  record_.marks.markDone(uuid);
+  journal_->done(uuid);
+  removeIfResolvedLocked();
+}
+
+void FinishedCapture::removeIfResolved() {
+  const std::lock_guard lock(mutex_);
+  removeIfResolvedLocked();
+}
+
+void FinishedCapture::removeIfResolvedLocked() {
+  if (record_.marks.othersPending({})) return;
+  unlink(media().c_str());
+  unlink((folder_ + "/" + kJournalName).c_str());
+  rmdir(folder_.c_str());
+  rmdir(directoryOf(folder_).c_str());  // only succeeds for the last capture
+}
+
+}  // namespace lmx

@@ -1,0 +1,72 @@
+// What a movie holds: its tracks, every sample's size, place and time. Built while writing or by reading a
+// file back.
+#pragma once
+#include <cstdint>
+#include <optional>
+#include <vector>
+
+namespace lmx {
+
+using Bytes = std::vector<std::uint8_t>;
+
+/// What of a track does not change while it grows.
+struct TrackFormat {
+  bool isVideo = false;
+  std::uint32_t timescale = 0;  ///< units a second
+  std::uint16_t width = 0;      ///< pixels, video
+  std::uint16_t height = 0;
+  Bytes sampleDescription;  ///< the whole "stsd" box
+};
+
+/// One contiguous run of samples in the file.
+struct Chunk {
+  std::uint64_t offset = 0;  ///< bytes from the start of the file
+  std::uint32_t samples = 0;
+};
+
+/// `count` samples of `duration` each.
+struct DurationRun {
+  std::uint32_t count = 0;
+  std::uint32_t duration = 0;
+};
+
+/// The samples of one track, in decoding order (which is also presentation order: nothing here reorders).
+struct TrackIndex {
+  TrackFormat format;
+  std::vector<std::uint32_t> sizes;        ///< bytes, one a sample
+  std::vector<std::uint32_t> syncSamples;  ///< zero-based numbers of key frames; video only
+  std::vector<Chunk> chunks;
+  std::vector<DurationRun> durations;
+  std::uint64_t totalDuration = 0;  ///< timescale units
+
+  /// Appends a sample of the newest chunk.
+  void addSample(std::uint32_t size, std::uint32_t duration, bool sync);
+  [[nodiscard]] double seconds() const {
+    return format.timescale == 0 ? 0 : static_cast<double>(totalDuration) / format.timescale;
+  }
+};
+
+struct MovieIndex {
+  std::vector<TrackIndex> tracks;
+  std::uint64_t mediaEnd = 0;  ///< file offset behind the last whole fragment
+
+  [[nodiscard]] const TrackIndex* video() const;
+  [[nodiscard]] const TrackIndex* audio() const;
+  /// Length of the longest track, seconds.
+  [[nodiscard]] double seconds() const;
+};
+
+/// A sample as it goes into a fragment.
+struct FragmentSample {
+  std::uint32_t size = 0;
+  std::uint32_t duration = 0;
+  bool sync = true;
+};
+struct TrackFragment {
+  std::uint32_t trackNumber = 0;  ///< from 1
+  bool isVideo = false;
+  std::uint64_t baseTime = 0;  ///< decode time of the first sample, timescale units
+  std::vector<FragmentSample> samples;
+};
+
+}  // namespace lmx

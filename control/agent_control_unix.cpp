@@ -1,0 +1,75 @@
+// The local control socket: commands of local tools, in plain text, from one peer at a time.
+#include "control/agent_control_unix.h"
+
+#include <sys/socket.h>
+#include <sys/un.h>
+#include <unistd.h>
+
+#include <cstddef>
+
+#include "control/plain_text.h"
+#include "platform/paths.h"
+#include "support/format.h"
+
+namespace lmx {
+namespace {
+
+constexpr int kBacklog = 1024;
+
+std::optional<sockaddr_un> socketAddress(const std::string& path) {
+  sockaddr_un address{};
+  address.sun_family = AF_UNIX;
+  if (path.size() >= sizeof address.sun_path) return std::nullopt;  // cut off it would name another file
+  path.copy(address.sun_path, path.size());
+  return address;
+}
+
+}  // namespace
+
+AgentControlUnix::~AgentControlUnix() {
+  cleanup();
+  stop();
+  cleanup();  // the thread may have made the file only now
+}
+
+void AgentControlUnix::cleanup() {
+  const std::string path = socket_path_.exchange({});
+  if (!path.empty()) ::unlink(path.c_str());
+}
+
+int AgentControlUnix::run() {
+  const int result = localConnect() == 0 ? AgentControlBase::run() : -1;
+  localDomainSocket_.reset();
+  return result;
+}
+
+/// Sets up the listener and waits for the first peer. @return 0, or -1.
+int AgentControlUnix::localConnect() {
+  logInfo("Connecting local pipe");
+  const std::string path = systemPath(kLocalSocket);
+  const auto address = socketAddress(path);
+  if (!address) return -1;
+  localDomainSocket_.reset(::socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC | SOCK_NONBLOCK, 0));
+  if (!localDomainSocket_.valid()) return -1;
+  const int on = 1;
+  ::setsockopt(localDomainSocket_.get(), SOL_SOCKET, SO_REUSEADDR, &on, sizeof on);
+  ::setsockopt(localDomainSocket_.get(), SOL_SOCKET, SO_REUSEPORT, &on, sizeof on);
+
+  ::unlink(path.c_str());  // left by an agent that was killed
+  if (::bind(localDomainSocket_.get(), reinterpret_cast<const sockaddr*>(&*address), sizeof *address) != 0)
+    return -1;
+  socket_path_.set(path);
+  if (::listen(localDomainSocket_.get(), kBacklog) != 0) return -1;
+  return localAccept();
+}
+
+std::optional<std::string> AgentControlUnix::commandFromReceivedData(const std::string& line) {
+  return plainCommand(line, logContext());
+}
+
+void AgentControlUnix::sendReply(const std::string& reply) {
+  const int error = sendPlainReply(serverSocket(), reply, wakeDescriptor());
+  if (error != 0) logDebug(formatted("Could not answer to tunnel (errno = %d)", error));
+}
+
+}  // namespace lmx

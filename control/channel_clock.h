@@ -1,0 +1,23 @@
+// The time as the channels see it, so that trials can turn it by hand.
+#pragma once
+#include <chrono>
+#include <optional>
+
+#include "support/time_value.h"
+
+namespace lmx {
+
+/// Thread-safe.
+class ChannelClock {
+ public:
+  virtual ~ChannelClock() = default;
+  /// Wall clock; absent when it can't be read.
+  virtual std::optional<TimeValue> now() = 0;
+  /// Sleeps for `span`, less when descriptor `wake` becomes readable (negative: none).
+  virtual void sleep(std::chrono::milliseconds span, int wake) = 0;
+};
+
+/// The real one. Lives as long as the process.
+ChannelClock& systemChannelClock();
+
+}  // namespace lmx

@@ -1,0 +1,180 @@
+// Starting children and waiting for them.
+#include "platform/child_process.h"
+
+#include <fcntl.h>
+#include <poll.h>
+#include <spawn.h>
+#include <sys/syscall.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <csignal>
+
+#include "support/unique_fd.h"
+
+extern char** environ;
+
+namespace lmx {
+namespace {
+
+using Clock = std::chrono::steady_clock;
+using std::chrono::milliseconds;
+
+class SpawnSettings {
+ public:
+  explicit SpawnSettings(int outputEnd) {
+    posix_spawn_file_actions_init(&actions_);
+    posix_spawnattr_init(&attributes_);
+    if (outputEnd >= 0) posix_spawn_file_actions_adddup2(&actions_, outputEnd, STDOUT_FILENO);
+    posix_spawn_file_actions_addclosefrom_np(&actions_, 3);
+    sigset_t none;
+    sigset_t all;
+    sigemptyset(&none);
+    sigfillset(&all);
+    posix_spawnattr_setsigmask(&attributes_, &none);
+    posix_spawnattr_setsigdefault(&attributes_, &all);
+    posix_spawnattr_setflags(&attributes_, POSIX_SPAWN_SETSIGMASK | POSIX_SPAWN_SETSIGDEF);
+  }
+  SpawnSettings(const SpawnSettings&) = delete;
+  SpawnSettings& operator=(const SpawnSettings&) = delete;
+  ~SpawnSettings() {
+    posix_spawn_file_actions_destroy(&actions_);
+    posix_spawnattr_destroy(&attributes_);
+  }
+  int spawn(pid_t* child, const std::vector<std::string>& argv) const {
+    std::vector<char*> words;
+    for (const std::string& word : argv)
+      words.push_back(const_cast<char*>(word.c_str()));  // NOLINT: exec's type
+    words.push_back(nullptr);
+    return posix_spawn(child, words[0], &actions_, &attributes_, words.data(), environ);
+  }
+
+ private:
+  posix_spawn_file_actions_t actions_;
+  posix_spawnattr_t attributes_;
+};
+
+/// Reads what is there. @return false at the end of the output.
+bool readOutput(int fd, std::string& output, std::size_t limit) {
+  char buffer[16384];
+  const ssize_t n = read(fd, buffer, sizeof buffer);
+  if (n < 0) return errno == EINTR || errno == EAGAIN;
+  if (n == 0) return false;
+  output.append(buffer, std::min(static_cast<std::size_t>(n), limit - std::min(limit, output.size())));
+  return true;
+}
+
+/// Waits for the end of a child, reading its output meanwhile.
+class ChildWait {
+ public:
+  ChildWait(pid_t child, UniqueFd output, const ChildOptions& options)
+      : child_(child),
+        output_(std::move(output)),
+        options_(options),
+        handle_(static_cast<int>(syscall(SYS_pidfd_open, child, 0))) {}
+
+  ChildResult run() {
+    ChildResult result;
+    bool killed = false;
+    while (!ended_) {
+      const milliseconds left = nextWait();
+      if (left.count() == 0 && limitReached() && !killed) {
+        killed = true;
+        kill(child_, SIGKILL);
+      }
+      waitOnce(left, killed, result.output);
+      reportIfDue();
+    }
+    drain(result.output);
+    int status = 0;
+    while (waitpid(child_, &status, 0) < 0 && errno == EINTR) {
+    }
+    result.end = killed                ? ChildResult::End::timedOut
+                 : WIFSIGNALED(status) ? ChildResult::End::signalled
+                                       : ChildResult::End::exited;
+    result.status = WIFSIGNALED(status) ? WTERMSIG(status) : WEXITSTATUS(status);
+    return result;
+  }
+
+ private:
+  [[nodiscard]] bool limitReached() const {
+    return options_.limit && Clock::now() - started_ >= *options_.limit;
+  }
+
+  [[nodiscard]] milliseconds nextWait() const {
+    const auto elapsed = std::chrono::duration_cast<milliseconds>(Clock::now() - started_);
+    milliseconds wait{std::chrono::hours(1)};
+    if (options_.limit) wait = std::min(wait, std::max(milliseconds(0), *options_.limit - elapsed));
+    if (options_.reportEvery.count() > 0) {
+      wait = std::min(wait, std::max(milliseconds(0), options_.reportEvery * (reports_ + 1) - elapsed));
+    }
+    return wait;
+  }
+
+  void waitOnce(milliseconds wait, bool killed, std::string& output) {
+    pollfd polled[2] = {{handle_.get(), POLLIN, 0}, {output_.get(), POLLIN, 0}};
+    const int ready = poll(polled, 2, killed ? -1 : static_cast<int>(wait.count()) + 1);
+    if (ready <= 0) return;
+    if (polled[1].revents != 0 && !readOutput(output_.get(), output, options_.maximumOutput)) output_.reset();
+    if (polled[0].revents != 0) ended_ = true;
+  }
+
+  void reportIfDue() {
+    if (ended_ || options_.reportEvery.count() <= 0) return;
+    const auto elapsed = std::chrono::duration_cast<milliseconds>(Clock::now() - started_);
+    if (elapsed < options_.reportEvery * (reports_ + 1)) return;
+    ++reports_;
+    if (options_.stillRunning) options_.stillRunning(elapsed);
+  }
+
+  /// The rest of the output. A grandchild may hold the pipe open for ever: it gets a tenth of a second.
+  void drain(std::string& output) {
+    const auto deadline = Clock::now() + milliseconds(100);
+    while (output_.valid() && Clock::now() < deadline) {
+      pollfd polled{output_.get(), POLLIN, 0};
+      if (poll(&polled, 1, 100) <= 0 || !readOutput(output_.get(), output, options_.maximumOutput)) return;
+    }
+  }
+
+  const pid_t child_;
+  UniqueFd output_;
+  const ChildOptions& options_;
+  UniqueFd handle_;
+  const Clock::time_point started_ = Clock::now();
+  std::int64_t reports_ = 0;
+  bool ended_ = false;
+};
+
+class SystemChildRunner : public ChildRunner {
+ public:
+  ChildResult run(const std::vector<std::string>& argv, const ChildOptions& options) override {
+    ChildResult result;
+    UniqueFd reading;
+    UniqueFd writing;
+    if (options.captureOutput) {
+      int ends[2];
+      if (pipe2(ends, O_CLOEXEC) != 0) {
+        result.status = errno;
+        return result;
+      }
+      reading.reset(ends[0]);
+      writing.reset(ends[1]);
+    }
+    pid_t child = 0;
+    result.status = SpawnSettings(writing.get()).spawn(&child, argv);
+    if (result.status != 0) return result;
+    writing.reset();
+    return ChildWait(child, std::move(reading), options).run();
+  }
+};
+
+}  // namespace
+
+ChildRunner& systemChildRunner() {
+  static auto* runner = new SystemChildRunner;  // used by threads that outlive main
+  return *runner;
+}
+
+}  // namespace lmx

@@ -1,0 +1,26 @@
+// The fixed paths of the system, and the one directory that trials put in front of them.
+#pragma once
+#include <string>
+#include <string_view>
+
+namespace lmx {
+
+inline constexpr std::string_view kPreferencesFile = "/Library/Preferences/com.zandor.lmxagentd.plist";
+inline constexpr std::string_view kStateDirectory = "/var/lmx/agent";
+inline constexpr std::string_view kSecretsDirectory = "/var/lmx/agent/secrets";
+inline constexpr std::string_view kPreviewImage = "/var/lmx/agent/preview.jpg";
+inline constexpr std::string_view kTimeShiftFile = "/var/lmx/agent/timeshift";
+inline constexpr std::string_view kPidFile = "/var/run/lmxagentd.pid";
+inline constexpr std::string_view kLocalSocket = "/var/run/lmxagentd.comm";
+inline constexpr std::string_view kLumexTool = "/usr/bin/lumex";
+inline constexpr std::string_view kLogSocket = "/dev/log";
+
+/// `fixedPath` behind the directory named by LMXAGENTD_ROOT (read once); as it stands when that is
+/// unset or empty. Only for the system's own paths: what a user names (-f, preferences values) is never
+/// prefixed.
+std::string systemPath(std::string_view fixedPath);
+
+/// The directory of `path`: everything before its last "/", "/" for a file in the root, "." without any "/".
+std::string directoryOf(std::string_view path);
+
+}  // namespace lmx

@@ -1,0 +1,26 @@
+// Signals turned into run-loop work.
+#pragma once
+#include <functional>
+#include <memory>
+#include <vector>
+
+#include "platform/run_loop.h"
+
+namespace lmx {
+
+/// Installs one handler for `signals` (every signal blocked while it runs, SA_RESTART) that writes the number
+/// to a pipe; `action` then gets it on the loop's owner thread. One instance at a time; destruction restores
+/// the old handlers.
+class SignalSource {
+ public:
+  SignalSource(RunLoop& loop, const std::vector<int>& signals, std::function<void(int)> action);
+  ~SignalSource();
+  SignalSource(const SignalSource&) = delete;
+  SignalSource& operator=(const SignalSource&) = delete;
+
+ private:
+  struct Impl;
+  std::unique_ptr<Impl> impl_;
+};
+
+}  // namespace lmx

@@ -1,0 +1,67 @@
+// The capture thread's body.
+#include "record/capture_thread.h"
+
+#include <atomic>
+#include <chrono>
+#include <system_error>
+#include <thread>
+
+#include "platform/log.h"
+#include "platform/run_loop.h"
+#include "record/agent_record.h"
+#include "record/engine.h"
+
+namespace lmx {
+
+using namespace std::chrono_literals;
+
+struct CaptureThread::State {
+  std::atomic<bool> cancelled{false};
+};
+
+namespace {
+
+/// The capture thread's body: starts the capture, then checks the stop times every 15 seconds until the
+/// controller has shut down. `cancelled` ends it earlier.
+void videoRunLoop(const std::shared_ptr<AgentRecord>& session, const std::atomic<bool>& cancelled) {
+  const auto controller = session->captureController();
+  if (session->recordingType() != kRecordingTypeFile) {
+    if (!controller || !controller->startRecording()) {
+      LMPLogMessage(nullptr, kLogCritical, "The recording failed to start");
+      LXAgentRecordStopCapture(session);
+      return;
+    }
+  }
+  session->setStartTime(currentTime());
+
+  RunLoop loop;
+  loop.adoptThread();
+  const auto check = [&] { session->checkForAutoShutoffConditions(); };
+  const auto timer = loop.addRepeatingTimer(15s, check);
+  session->setAutoShutoffCheckTimer(true);
+  check();
+  while (!cancelled && controller && session->captureController() == controller &&
+         !controller->hasShutDown()) {
+    loop.run(250ms);
+  }
+  session->setAutoShutoffCheckTimer(false);
+}
+
+}  // namespace
+
+CaptureThread::CaptureThread(std::shared_ptr<State> state) : state_(std::move(state)) {}
+
+std::shared_ptr<CaptureThread> CaptureThread::start(std::shared_ptr<AgentRecord> session) {
+  auto state = std::make_shared<State>();
+  try {
+    std::thread([session = std::move(session), state] { videoRunLoop(session, state->cancelled); }).detach();
+  } catch (const std::system_error& error) {
+    LMPLogMessage(nullptr, kLogCritical, "The capture thread could not be started: %s", error.what());
+    return nullptr;
+  }
+  return std::shared_ptr<CaptureThread>(new CaptureThread(std::move(state)));
+}
+
+void CaptureThread::cancel() { state_->cancelled = true; }
+
+}  // namespace lmx

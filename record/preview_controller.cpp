@@ -1,0 +1,40 @@
+// Keeping and handing out preview frames.
+#include "record/preview_controller.h"
+
+#include <ctime>
+#include <mutex>
+
+#include "support/base64.h"
+
+namespace lmx {
+
+void MyLMRPreviewControllerDelegate::handleJPEGData(std::vector<std::uint8_t> jpeg) {
+  auto frame = std::make_shared<const std::vector<std::uint8_t>>(std::move(jpeg));
+  const std::lock_guard lock(mLock_);
+  mLastJPEGData_.swap(frame);
+}
+
+heap_ptr<char> MyLMRPreviewControllerDelegate::base64PreviewFrameCopy() {
+  std::shared_ptr<const std::vector<std::uint8_t>> frame;
+  {
+    const std::lock_guard lock(mLock_);
+    frame = mLastJPEGData_;
+  }
+  if (!frame) return nullptr;
+  return heap_ptr<char>(lmp_encode_base64(frame->data(), frame->size(), nullptr));
+}
+
+MyLMRPreviewController::MyLMRPreviewController(std::unique_ptr<LMRPreviewController> controller)
+    : controller_(std::move(controller)) {}
+
+void MyLMRPreviewController::setDelegate(std::shared_ptr<MyLMRPreviewControllerDelegate> delegate) {
+  delegate_ = std::move(delegate);
+  controller_->setDelegate(delegate_);
+}
+
+heap_ptr<char> MyLMRPreviewController::base64PreviewFrameCopy() {
+  last_request_ = std::time(nullptr);
+  return delegate_ ? delegate_->base64PreviewFrameCopy() : nullptr;
+}
+
+}  // namespace lmx

@@ -1,0 +1,98 @@
+// The deadlines that end what nobody ended: hard stop and soft stop.
+#include <cinttypes>
+
+#include "agent/context/agent_actions.h"
+#include "agent/context/agent_context.h"
+#include "platform/log.h"
+#include "record/agent_record.h"
+#include "record/engine.h"
+#include "support/heap_ptr.h"
+
+namespace lmx {
+namespace {
+
+void logTime(const char* format, const TimeValue& time) {
+  const heap_ptr<char> text(lmp_timeval_to_ctime(&time));
+  const std::string line = std::string(format) + (text ? text.get() : "?");
+  LMPLogMessage(nullptr, kLogInfo, "%s", line.c_str());
+}
+
+/// Now plus `seconds`; absent (logged) when the clock fails.
+AgentRecord::Time deadlineIn(std::int32_t seconds) {
+  auto time = currentTime();
+  if (!time) {
+    LMPLogMessage(nullptr, kLogError, "lmp_gettimeofday returned NULL");
+    return std::nullopt;
+  }
+  time->tv_sec += seconds;
+  return time;
+}
+
+}  // namespace
+
+void AgentRecord::updateLastContact() {
+  setLastContact(currentTime());
+  if (status() != kRecorderIdle) updateSoftStopTime();
+}
+
+void AgentRecord::updateSoftStopTime() {
+  setSoftStopTime(std::nullopt);
+  const std::int32_t minutes = maxUnattendedRecordingMinutes();
+  if (minutes <= 0) return;
+  // 32 bits wrap: a limit of more than 68 years is as good as any other.
+  const auto seconds = static_cast<std::int32_t>(static_cast<std::uint32_t>(minutes) * 60U);
+  const Time deadline = deadlineIn(seconds);
+  if (!deadline) return;
+  setSoftStopTime(deadline);
+  logTime("unattended stop time set to: ", *deadline);
+}
+
+void AgentRecord::setRecordHardStopTimeSeconds(std::int32_t seconds) {
+  setHardStopTime(std::nullopt);
+  if (seconds <= 0) return;
+  const Time deadline = deadlineIn(seconds);
+  if (!deadline) return;
+  setHardStopTime(deadline);
+  logTime("hardStopTime set to: ", *deadline);
+}
+
+bool AgentRecord::shouldStopRecording() {
+  const auto now = currentTime();
+  if (!now) return false;
+  bool stop = false;
+  if (const Time hard = hardStopTime(); hard && lmp_diff_timeval(&*hard, &*now) <= 0) {
+    LMPLogMessage(nullptr, kLogNotice, "Agent recording hit hard stop time");
+    stop = true;
+  }
+  if (const Time soft = softStopTime()) {
+    const std::int64_t diff = static_cast<std::int64_t>(soft->tv_sec) - now->tv_sec;
+    if (diff < 1) {
+      const heap_ptr<char> text(lmp_timeval_to_ctime(&*soft));
+      LMPLogMessage(nullptr, kLogNotice, "Agent recording hit soft stop time: %s, diff: %lld",
+                    text ? text.get() : "?", static_cast<long long>(diff));
+      stop = true;
+    }
+  }
+  return stop;
+}
+
+void AgentRecord::checkForAutoShutoffConditions() {
+  if (!shouldStopRecording()) return;
+  LMPLogMessage(nullptr, kLogNotice, "Doing Auto-Shutoff: Video");
+  doAutoShutoff();
+}
+
+int AgentRecord::doAutoShutoff() {
+  const EngineEnvironment environment = engineEnvironment();
+  if (environment.context && environment.context->adhoc()) std::_Exit(0);
+  if (const auto controller = captureController()) {
+    controller->setStopWithUUID(request_uuid(), secondsSinceReferenceDate());
+  }
+  if (environment.actions != nullptr)
+    environment.actions->perform(&AgentActions::stopRecording, Wait::untilDone);
+  setHardStopTime(std::nullopt);
+  setSoftStopTime(std::nullopt);
+  return 0;
+}
+
+}  // namespace lmx

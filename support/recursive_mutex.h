@@ -1,0 +1,27 @@
+// The agent's one kind of mutex: recursive, and fatal when it can't be made.
+#pragma once
+#include <pthread.h>
+
+namespace lmx {
+
+/// Initialises `mutex` as a recursive mutex. When that fails the process exits at once with
+/// status 71, without a message: an agent without its locks must not record.
+void agent_init_recursive_mutex(pthread_mutex_t* mutex);
+
+/// A recursive mutex made by agent_init_recursive_mutex; meets BasicLockable for std::lock_guard.
+class RecursiveMutex {
+ public:
+  RecursiveMutex() { agent_init_recursive_mutex(&mutex_); }
+  RecursiveMutex(const RecursiveMutex&) = delete;
+  RecursiveMutex& operator=(const RecursiveMutex&) = delete;
+  ~RecursiveMutex() { pthread_mutex_destroy(&mutex_); }
+
+  /// @return the pthread result, 0 when locked.
+  int lock() noexcept { return pthread_mutex_lock(&mutex_); }
+  int unlock() noexcept { return pthread_mutex_unlock(&mutex_); }
+
+ private:
+  pthread_mutex_t mutex_;
+};
+
+}  // namespace lmx

@@ -1,0 +1,35 @@
+// Owner of a file descriptor.
+#pragma once
+#include <unistd.h>
+
+#include <utility>
+
+namespace lmx {
+
+/// Move-only; closes on destruction. -1 means none.
+class UniqueFd {
+ public:
+  UniqueFd() = default;
+  explicit UniqueFd(int fd) noexcept : fd_(fd) {}
+  UniqueFd(UniqueFd&& other) noexcept : fd_(other.release()) {}
+  UniqueFd& operator=(UniqueFd&& other) noexcept {
+    reset(other.release());
+    return *this;
+  }
+  UniqueFd(const UniqueFd&) = delete;
+  UniqueFd& operator=(const UniqueFd&) = delete;
+  ~UniqueFd() { reset(); }
+
+  [[nodiscard]] int get() const noexcept { return fd_; }
+  [[nodiscard]] bool valid() const noexcept { return fd_ >= 0; }
+  int release() noexcept { return std::exchange(fd_, -1); }
+  void reset(int fd = -1) noexcept {
+    const int old = std::exchange(fd_, fd);
+    if (old >= 0) ::close(old);
+  }
+
+ private:
+  int fd_ = -1;
+};
+
+}  // namespace lmx

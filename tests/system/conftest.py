@@ -1,0 +1,81 @@
+"""Fixtures of the system tests: an agent in a sandbox, a watchdog, and a look at what is left behind."""
+import faulthandler
+import os
+import re
+import signal
+import subprocess
+import sys
+from pathlib import Path
+
+import pytest
+
+sys.path.insert(0, str(Path(__file__).resolve().parent))
+
+from harness.agent import Agent  # noqa: E402
+
+ROOT = Path(__file__).resolve().parents[2]
+BINARY = Path(os.environ.get("LMX_BINARY", ROOT / "build/release/lmxagentd"))
+SANITIZER = re.compile(r"ERROR: (Address|Leak)Sanitizer|WARNING: ThreadSanitizer|runtime error:")
+LIMIT = 120  # seconds a test may take; a test says otherwise with @pytest.mark.limit(seconds)
+
+
+def pytest_configure(config):
+    config.addinivalue_line("markers", "limit(seconds): how long the test may take")
+
+
+@pytest.hookimpl(hookwrapper=True)
+def pytest_runtest_makereport(item, call):
+    outcome = yield
+    setattr(item, "result_of_" + call.when, outcome.get_result())
+
+
+class Hung(Exception):
+    """A test has exceeded its limit."""
+
+
+@pytest.fixture(autouse=True)
+def watchdog(request):
+    """Ends a test that hangs: first with an exception in it, and if that does not help with the whole run."""
+    mark = request.node.get_closest_marker("limit")
+    limit = mark.args[0] if mark else LIMIT
+
+    def hung(_number, _frame):
+        raise Hung(f"no end after {limit} s")
+
+    previous = signal.signal(signal.SIGALRM, hung)
+    signal.alarm(limit)
+    faulthandler.dump_traceback_later(limit + 60, exit=True, file=sys.__stderr__)
+    yield
+    faulthandler.cancel_dump_traceback_later()
+    signal.alarm(0)
+    signal.signal(signal.SIGALRM, previous)
+
+
+@pytest.fixture(scope="session")
+def registry(tmp_path_factory):
+    """GStreamer's catalogue of plugins, made once: without it every daemon would search them anew."""
+    path = tmp_path_factory.mktemp("gstreamer") / "registry.bin"
+    subprocess.run(["gst-inspect-1.0", "fakesink"], env={**os.environ, "GST_REGISTRY": str(path)}, check=True,
+                   stdout=subprocess.DEVNULL, timeout=120)
+    return path
+
+
+@pytest.fixture
+def agent(request, registry):
+    """A daemon's sandbox, not yet started."""
+    assert BINARY.exists(), f"{BINARY} is not built"
+    one = Agent(BINARY, registry)
+    yield one
+    report, errors = one.report(), one.errors()
+    one.close()
+    failed = any(getattr(request.node, "result_of_" + when, None) is not None
+                 and getattr(request.node, "result_of_" + when).failed for when in ("setup", "call"))
+    if failed:
+        print(report)
+    assert not SANITIZER.search(errors), errors
+
+
+@pytest.fixture
+def running(agent):
+    """A daemon that answers on its local socket, with the synthetic camera and microphone."""
+    return agent.start()

@@ -1,0 +1,230 @@
+"""The daemon as a test sees it: preferences in, commands over the local socket, log, movies and tool calls out."""
+import base64
+import json
+import os
+import plistlib
+import re
+import signal
+import socket
+import time
+import xml.etree.ElementTree as ElementTree
+from dataclasses import dataclass, field
+from pathlib import Path
+
+from .log_reader import LogReader
+from .sandbox import HARNESS, Sandbox
+from .waiting import wait_until
+
+REPOSITORY = "/var/lmx/agent/recordings"
+PREFERENCES = "/Library/Preferences/com.zandor.lmxagentd.plist"
+SERVER_UUID = "5E1F0A52-6B1D-4E8C-9A52-0F6C4C1B7E11"
+SECRET = bytes(range(16))
+DEFAULTS = {
+    "CameraName": "Hall 3",
+    "CameraUUID": "0B7C9E54-22A1-4C57-8E57-3D1F2B6A9C01",
+    "ServerUUID": SERVER_UUID,
+    "LumexURL": "lumex.example.test",
+    "TunnelHost": "127.0.0.1",
+    "TunnelPort": "8175",
+    "RecordingRepositoryPath": REPOSITORY,
+    "RecordingType": "Audio+Video",
+    "RecordingVideoInput": "test://video?size=640x360&fps=30",
+    "RecordingAudioInput": "test://audio",
+    "RecordingCapturePreset": "Video:Good",
+    "RecordingVideoMaximumFrameRate": "30",
+    "RecordingDiskSpaceCutoffInMB": "1",
+    "PreviewIntervalInMilliseconds": "400",
+}
+
+
+@dataclass
+class Reply:
+    """One reply, with the harness's clocks around it: a mark set by the command lies between the two."""
+
+    text: str
+    sent: float
+    received: float
+    fields: dict = field(default_factory=dict)
+
+    def __post_init__(self):
+        self.fields = dict(pair.split("=", 1) for pair in self.text.split(",") if "=" in pair)
+
+
+class Agent:
+    """One daemon in one sandbox. close() ends and removes everything."""
+
+    def __init__(self, binary, registry=None):
+        self.sandbox = Sandbox(binary)
+        self.log = LogReader(self.sandbox.root / "dev/log")
+        self.registry = registry
+        self.set_tool()
+        self.secret(base64.b64encode(SECRET).decode())
+        self.preferences()
+
+    # What the daemon reads -------------------------------------------------------------------------------------
+
+    def preferences(self, **changes):
+        """Replaces the preferences file atomically: the defaults with `changes`; None leaves a key out."""
+        content = {key: value for key, value in {**DEFAULTS, **changes}.items() if value is not None}
+        self.preferences_bytes(plistlib.dumps(content))
+
+    def preferences_bytes(self, data):
+        path = self.path(PREFERENCES)
+        temporary = path.with_suffix(".tmp")
+        temporary.write_bytes(data)
+        temporary.rename(path)
+
+    def secret(self, text):
+        """Writes the shared secret's file; None removes it."""
+        path = self.path(f"/var/lmx/agent/secrets/{SERVER_UUID}.plist")
+        if text is None:
+            path.unlink()
+        else:
+            path.write_bytes(plistlib.dumps({"lmx_secret": text}))
+
+    def set_tool(self, *rules, present=True):
+        """Puts the stand-in tool in place with `rules` (see lumex_stand_in.py), or takes it away."""
+        tool = self.path("/usr/bin/lumex")
+        tool.unlink(missing_ok=True)
+        if present:
+            tool.write_bytes((HARNESS / "lumex_stand_in.py").read_bytes())
+            tool.chmod(0o755)
+        script = self.path("/var/tool/script.json")
+        script.with_suffix(".tmp").write_text(json.dumps(rules))
+        script.with_suffix(".tmp").rename(script)
+
+    def release_tool(self):
+        """Lets hanging tools go on."""
+        self.path("/var/tool/release").touch()
+
+    # Its life --------------------------------------------------------------------------------------------------
+
+    def start(self, wait=True, env=None, **sandbox_options):
+        environment = dict(env or {})
+        if self.registry:
+            inside = self.sandbox.root / "var/cache/gstreamer.registry"
+            inside.write_bytes(Path(self.registry).read_bytes())
+            environment |= {"GST_REGISTRY": "/var/cache/gstreamer.registry", "GST_REGISTRY_UPDATE": "no"}
+        self.sandbox.start(env=environment, **sandbox_options)
+        if wait:
+            self.wait_started()
+        return self
+
+    def wait_started(self, timeout=20.0):
+        """Waits until the local socket answers."""
+        def answers():
+            assert self.sandbox.process.poll() is None, "the daemon has ended:\n" + self.report()
+            try:
+                return self.command("STATUS", timeout=timeout)
+            except (FileNotFoundError, ConnectionRefusedError):
+                return None
+        return wait_until(answers, timeout, "the local socket")
+
+    def stop(self, number=signal.SIGTERM, timeout=20.0):
+        """Ends the daemon with a signal. @return its exit status"""
+        self.sandbox.signal(number)
+        return self.sandbox.wait(timeout)
+
+    def kill9(self):
+        return self.stop(signal.SIGKILL)
+
+    def wait_exit(self, timeout=20.0):
+        return self.sandbox.wait(timeout)
+
+    def alive(self):
+        return self.sandbox.process is not None and self.sandbox.process.poll() is None
+
+    def close(self):
+        self.sandbox.kill()
+        self.log.close()
+        self.sandbox.remove()
+
+    def errors(self):
+        return self.sandbox.errors.read_text(errors="replace") if self.sandbox.errors.exists() else ""
+
+    def report(self):
+        return f"--- log\n{self.log.tail()}\n--- standard error\n{self.errors()}"
+
+    # Talking to it ---------------------------------------------------------------------------------------------
+
+    def connect(self, timeout=20.0):
+        peer = socket.socket(socket.AF_UNIX, socket.SOCK_STREAM)
+        peer.settimeout(timeout)
+        try:
+            peer.connect(str(self.sandbox.root / "var/run/lmxagentd.comm"))
+        except OSError:
+            peer.close()
+            raise
+        return peer
+
+    def command(self, line, timeout=20.0):
+        """Sends one line on a connection of its own. @return the reply"""
+        with self.connect(timeout) as peer:
+            return exchange(peer, line)
+
+    def send(self, line):
+        """Sends one line that gets no reply; a STATUS behind it proves that none came."""
+        before = self.log.mark()
+        with self.connect() as peer:
+            peer.sendall(line.encode() + b"\n")
+            self.log.wait(r"^Command: \S+ took", after=before, timeout=5)
+            return exchange(peer, "STATUS").text
+
+    def start_recording(self, uuid, minutes="60", unattended="60", **parameters):
+        parameters = {"RecordingMetadata_RECORDING_UUID": uuid,
+                      "RecordingMetadata_MAX_RECORDING_MINUTES": minutes,
+                      "RecordingMetadata_UNATTENDED_RECORDING_MINUTES": unattended, **parameters}
+        return self.command("START " + ",".join(f"{k}={v}" for k, v in parameters.items()))
+
+    # What it leaves behind -------------------------------------------------------------------------------------
+
+    def path(self, inside):
+        return self.sandbox.path(inside)
+
+    def movie(self, uuid):
+        return self.path(f"{REPOSITORY}/{uuid}.mov")
+
+    def repository(self):
+        """Every file and directory below the repository, hidden ones too."""
+        top = self.path(REPOSITORY)
+        return sorted(str(entry.relative_to(top)) for entry in top.rglob("*"))
+
+    def document(self, uuid, directory=REPOSITORY):
+        """The properties document of a recording."""
+        return read_document(self.path(f"{directory}/{uuid}.xml"))
+
+    def tool_calls(self, event="begin", having="--submit"):
+        path = self.path("/var/tool/calls.jsonl")
+        lines = path.read_text().splitlines() if path.exists() else []
+        calls = [json.loads(line) for line in lines]
+        return [c for c in calls if c["event"] == event and having in c["arguments"]]
+
+    def wait_tool_call(self, uuid, timeout=30.0, event="begin"):
+        """The call of the tool that submits recording `uuid`."""
+        def called():
+            return [c for c in self.tool_calls(event) if uuid in c["arguments"]]
+        return wait_until(called, timeout, f"submission of {uuid}; {self.log.tail(40)}")[0]
+
+    def wait_recorded(self, uuid, timeout=30.0, after=0):
+        """The line that tells that the movie is in place. @return the seconds that it gives"""
+        path = re.escape(f"{REPOSITORY}/{uuid}.mov")
+        line = self.log.wait(rf'^"{path}" recording stopped \(duration: \d+s\)$', timeout, after, level=5)
+        return int(re.search(r"(\d+)s\)$", line.text)[1])
+
+
+def exchange(peer, line):
+    sent = time.time()
+    peer.sendall(line.encode() + b"\n")
+    data = peer.recv(1 << 20)
+    return Reply(data.decode(), sent, time.time())
+
+
+def read_document(path):
+    """The properties of a document, after checking the shape that every document has."""
+    tree = ElementTree.fromstring(Path(path).read_bytes())
+    assert tree.tag == "LumexServerAgentRecordingProperties" and not tree.attrib
+    (properties,) = tree
+    assert properties.tag == "RecordingProperties" and not properties.attrib
+    for item in properties:
+        assert item.tag == "RecordingProperty" and list(item.attrib) == ["key", "value"] and len(item) == 0
+    return {item.get("key"): item.get("value") for item in properties}

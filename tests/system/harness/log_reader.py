@@ -1,0 +1,89 @@
+"""The system log of a sandbox: a datagram socket at its /dev/log, read by a thread of the harness."""
+import re
+import socket
+import threading
+import time
+from dataclasses import dataclass
+
+LINE = re.compile(r"^<(\d+)>.*?\blmxagentd\[(\d+)\]: (.*)$", re.DOTALL)
+
+
+@dataclass(frozen=True)
+class LogLine:
+    """One message; `at` is the harness's monotonic clock at its arrival."""
+
+    level: int
+    facility: int
+    pid: int
+    text: str
+    at: float
+    raw: str
+
+
+class LogReader:
+    """Collects every message sent to the socket at `path` until close()."""
+
+    def __init__(self, path):
+        self._lines = []
+        self._arrived = threading.Condition()
+        self._socket = socket.socket(socket.AF_UNIX, socket.SOCK_DGRAM)
+        self._socket.setsockopt(socket.SOL_SOCKET, socket.SO_RCVBUF, 4 << 20)
+        self._socket.bind(str(path))
+        self._thread = threading.Thread(target=self._read, daemon=True)
+        self._thread.start()
+
+    def _read(self):
+        while True:
+            data = self._socket.recv(65536)
+            if data == b"end":
+                return
+            line = self._parse(data.decode("utf-8", "replace"))
+            with self._arrived:
+                self._lines.append(line)
+                self._arrived.notify_all()
+
+    @staticmethod
+    def _parse(raw):
+        match = LINE.match(raw)
+        if not match:
+            return LogLine(-1, -1, 0, raw, time.monotonic(), raw)
+        priority = int(match[1])
+        return LogLine(priority & 7, priority >> 3, int(match[2]), match[3].rstrip("\n"), time.monotonic(), raw)
+
+    def close(self):
+        address = self._socket.getsockname()
+        with socket.socket(socket.AF_UNIX, socket.SOCK_DGRAM) as sender:
+            sender.sendto(b"end", address)
+        self._thread.join(5)
+        self._socket.close()
+
+    def mark(self):
+        """A place in the log, for `after`."""
+        with self._arrived:
+            return len(self._lines)
+
+    def lines(self, pattern=".", after=0, level=None):
+        """The messages so far that match `pattern` (and have `level`)."""
+        with self._arrived:
+            return [l for l in self._lines[after:] if self._fits(l, pattern, level)]
+
+    @staticmethod
+    def _fits(line, pattern, level):
+        return re.search(pattern, line.text) is not None and level in (None, line.level)
+
+    def wait(self, pattern, timeout=15.0, after=0, level=None, count=1):
+        """The `count`th message that matches; AssertionError with the end of the log when it does not come."""
+        end = time.monotonic() + timeout
+        with self._arrived:
+            while True:
+                found = [l for l in self._lines[after:] if self._fits(l, pattern, level)]
+                if len(found) >= count:
+                    return found[count - 1]
+                if not self._arrived.wait(max(0.0, end - time.monotonic())) and time.monotonic() >= end:
+                    break
+            raise AssertionError(f"no {count}. log line {pattern!r} (level {level}) in {timeout} s; the log:\n"
+                                 + self.tail(60))
+
+    def tail(self, count=1000):
+        with self._arrived:
+            return "\n".join(f"{l.at:.3f} <{l.level}> {l.text}" for l in self._lines[-count:])

@@ -1,0 +1,133 @@
+"""A private machine for one daemon: own mount, network and process namespaces over a directory of ordinary files.
+
+The files live outside the namespaces, so that tests read and write them, and reach the daemon's sockets, by their
+paths in the host; the mounts exist only while a daemon runs and vanish with it.
+"""
+import os
+import shutil
+import signal
+import subprocess
+import tempfile
+from pathlib import Path
+
+from .waiting import wait_until
+
+HARNESS = Path(__file__).resolve().parent
+DIRECTORIES = (
+    "Library/Preferences", "dev/shm", "etc", "opt", "proc", "root", "tmp", "sys", ".hostbin", "usr/bin", "var/run",
+    "var/cache", "var/lmx/agent/secrets", "var/lmx/agent/recordings", "var/tool",
+)
+HOST_COMMANDS = ("sh", "dash", "env", "python3", "sleep", "cat", "true", "false", "setpriv", "kill")
+
+
+class Sandbox:
+    """The directory and the process tree. One tree at a time; the directory outlives it until remove()."""
+
+    def __init__(self, binary):
+        self.binary = Path(binary)
+        self.base = Path(tempfile.mkdtemp(prefix="lmx-", dir="/tmp"))
+        self.root = self.base / "root"
+        self.errors = self.base / "stderr.txt"
+        self.process = None
+        self._daemon = None
+        self._lay_out()
+
+    def _lay_out(self):
+        for name in DIRECTORIES:
+            (self.root / name).mkdir(parents=True, exist_ok=True)
+        for device in ("null", "zero", "full", "random", "urandom"):
+            (self.root / "dev" / device).touch()
+        (self.root / "opt/lmxagentd").touch()
+        for entry in Path("/usr").iterdir():
+            target = self.root / "usr" / entry.name
+            if entry.is_symlink():
+                target.symlink_to(os.readlink(entry))
+            elif entry.is_dir():
+                target.mkdir(exist_ok=True)
+            else:
+                target.touch()
+        for name in ("bin", "sbin", "lib", "lib32", "lib64", "libx32"):
+            if os.path.islink("/" + name):
+                (self.root / name).symlink_to(os.readlink("/" + name))
+        for name in HOST_COMMANDS:
+            (self.root / "usr/bin" / name).symlink_to("/.hostbin/" + name)
+
+    def start(self, arguments=(), env=None, mounts=(), prefix=()):
+        """Starts the daemon: `mounts` as sandbox_init.sh reads them, `prefix` a command in front of the daemon's."""
+        assert self.process is None, "a daemon runs already"
+        self._daemon = None
+        environment = {"PATH": "/usr/bin:/usr/sbin", "HOME": "/root", "LANG": "C.UTF-8", "TMPDIR": "/tmp",
+                       "LMX_MOUNTS": "\n".join(mounts), **(env or {})}
+        user = [] if os.geteuid() == 0 else ["-U", "-r"]
+        command = ["setpriv", "--pdeathsig", "KILL", "--", "unshare", *user, "-m", "-n", "-p", "-f", "--kill-child",
+                   "sh", str(HARNESS / "sandbox_init.sh"), str(self.root), str(self.binary),
+                   *prefix, "/opt/lmxagentd", *arguments]
+        with open(self.errors, "ab") as errors:
+            self.process = subprocess.Popen(command, env=environment, stdin=subprocess.DEVNULL, stdout=errors,
+                                            stderr=errors, start_new_session=True)
+        wait_until(lambda: self.daemon_pid or self.process.poll() is not None, what="the daemon's process")
+
+    @property
+    def daemon_pid(self):
+        """The daemon's process as the host numbers it, None when there is none (any more)."""
+        if self._daemon is None and self.process is not None:
+            for init in _children(self.process.pid):
+                for child in _children(init):
+                    if _name(child) == "lmxagentd":
+                        self._daemon = child
+        return self._daemon
+
+    def pid_inside(self):
+        """The daemon's process as the sandbox numbers it."""
+        status = Path(f"/proc/{self.daemon_pid}/status").read_text()
+        return int(next(l for l in status.splitlines() if l.startswith("NSpid:")).split()[-1])
+
+    def path(self, inside):
+        """Where the host sees what the sandbox calls `inside`. Through the daemon while it runs, since a file
+        system mounted in there is not to be seen elsewhere."""
+        view = Path(f"/proc/{self.daemon_pid}/root") if self.daemon_pid else self.root
+        if not view.exists():
+            view = self.root
+        return view / inside.lstrip("/")
+
+    def signal(self, number):
+        os.kill(self.daemon_pid, number)
+
+    def wait(self, timeout=20.0):
+        """The daemon's exit status, 128 + n when signal n ended it. The process tree is gone afterwards."""
+        try:
+            status = self.process.wait(timeout)
+        except subprocess.TimeoutExpired:
+            raise AssertionError(f"the daemon has not ended within {timeout} s") from None
+        self.process = None
+        self._daemon = None
+        return status
+
+    def kill(self):
+        """Ends the whole process tree at once, whatever it does."""
+        if self.process is None:
+            return
+        for init in _children(self.process.pid):
+            os.kill(init, signal.SIGKILL)
+        self.process.kill()
+        self.process.wait(10)
+        self.process = None
+        self._daemon = None
+
+    def remove(self):
+        self.kill()
+        shutil.rmtree(self.base)
+
+
+def _children(pid):
+    try:
+        return [int(word) for word in Path(f"/proc/{pid}/task/{pid}/children").read_text().split()]
+    except (FileNotFoundError, ProcessLookupError):
+        return []
+
+
+def _name(pid):
+    try:
+        return Path(f"/proc/{pid}/comm").read_text().strip()
+    except (FileNotFoundError, ProcessLookupError):
+        return ""

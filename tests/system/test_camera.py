@@ -1,0 +1,125 @@
+"""Cameras that are missing, late, or lost in the middle; a movie file as a camera."""
+import subprocess
+import time
+
+import numpy
+import pytest
+from harness import movie
+from harness.waiting import wait_until
+
+OFFLINE = "^Unable to acquire the specified video device. The agent will remain offline until the device becomes available.$"
+SPEECH = ("Good morning, and welcome to the second lecture on waves. Today we look at water, at light and at sound, "
+          "and at what the three of them have in common. Seven boxes of yellow chalk are on the desk.")
+
+
+@pytest.fixture(scope="session")
+def lecture(tmp_path_factory):
+    """A movie with moving pictures and speech."""
+    place = tmp_path_factory.mktemp("lecture")
+    subprocess.run(["espeak-ng", "-w", str(place / "speech.wav"), SPEECH], check=True, timeout=60)
+    subprocess.run(["ffmpeg", "-v", "error", "-f", "lavfi", "-i", "testsrc2=size=640x360:rate=30", "-i",
+                    str(place / "speech.wav"), "-shortest", "-c:v", "libx264", "-preset", "superfast", "-pix_fmt",
+                    "yuv420p", "-c:a", "aac", "-ar", "48000", "-ac", "2", str(place / "lecture.mov")],
+                   check=True, timeout=120)
+    return place / "lecture.mov"
+
+
+def test_without_a_camera_the_daemon_waits_and_gives_up(agent):
+    agent.preferences(RecordingVideoInput="file:///nowhere.mov")
+    began = time.monotonic()
+    agent.start()
+    agent.log.wait(OFFLINE, level=1)
+    assert agent.command("STATUS").fields["recordStatus"] == "0"
+    assert agent.wait_exit(30) == 0
+    assert 10 <= time.monotonic() - began < 14
+    agent.log.wait("^lmxagentd is stopping...$", level=6)
+    assert not agent.log.lines("Internal error")
+    assert not agent.path("/var/run/lmxagentd.pid").exists()
+
+
+def test_a_camera_that_comes_in_time(agent, lecture):
+    agent.preferences(RecordingVideoInput="file:///var/lmx/lecture.mov")
+    agent.start()
+    agent.log.wait(OFFLINE, level=1)
+    late = agent.path("/var/lmx/lecture.tmp")
+    late.write_bytes(lecture.read_bytes())
+    late.rename(late.with_suffix(".mov"))
+    time.sleep(14)
+    assert agent.alive(), agent.report()
+    assert agent.start_recording("LATE").text == "cmdStatus=0"
+    time.sleep(2)
+    agent.command("STOP")
+    agent.wait_recorded("LATE")
+    movie.decodes(agent.movie("LATE"))
+
+
+@pytest.mark.parametrize("fault", ["lost-after", "silent-after", "eos-after"])
+def test_a_camera_lost_in_the_middle(agent, fault):
+    agent.preferences(RecordingVideoInput=f"test://video?size=640x360&fps=30&{fault}=4")
+    agent.start()
+    start = agent.start_recording("LOST")
+    assert start.text == "cmdStatus=0"
+    agent.log.wait(r"^The capture device has been disconnected\.$", timeout=30, level=2)
+    assert agent.wait_exit(30) == 1
+    agent.log.wait("^Internal error caused application to stop$", level=2)
+    assert [call["arguments"][4] for call in agent.tool_calls("end")] == ["LOST"]
+    movie.decodes(agent.movie("LOST"))
+    (span,) = movie.runs(movie.counters(agent.movie("LOST")))
+    assert 3.0 < (span[1] - span[0] + 1) / 30 < 4.2
+    assert agent.document("LOST")["RecordingMetadata_RECORDING_UUID"] == "LOST"
+
+
+def test_a_microphone_lost_in_the_middle(agent):
+    agent.preferences(RecordingAudioInput="test://audio?silent-after=3")
+    agent.start()
+    assert agent.start_recording("MUTE").text == "cmdStatus=0"
+    agent.log.wait(r"^The capture device has been disconnected\.$", timeout=30, level=2)
+    assert agent.wait_exit(30) == 1
+    assert [call["arguments"][4] for call in agent.tool_calls("end")] == ["MUTE"]
+    movie.decodes(agent.movie("MUTE"))
+
+
+def test_a_lost_camera_waits_for_the_submission(agent):
+    agent.preferences(RecordingVideoInput="test://video?size=640x360&fps=30&lost-after=3")
+    agent.set_tool({"when": "--submit", "hang": True})
+    agent.start()
+    agent.start_recording("FIRST")
+    time.sleep(1)
+    agent.command("STOP")
+    agent.wait_tool_call("FIRST")
+    agent.start_recording("LOST")
+    agent.wait_recorded("LOST", timeout=20)
+    time.sleep(4)
+    assert agent.alive(), "a job is still queued"
+    agent.release_tool()
+    assert agent.wait_exit(30) == 1
+    assert [call["arguments"][4] for call in agent.tool_calls("end")] == ["FIRST", "LOST"]
+
+
+def test_a_movie_file_as_the_camera_with_its_sound(agent, lecture):
+    agent.path("/var/lmx/lecture.mov").write_bytes(lecture.read_bytes())
+    agent.preferences(RecordingVideoInput="file:///var/lmx/lecture.mov", RecordingAudioInput="file:///var/lmx/lecture.mov")
+    agent.start()
+    start = agent.start_recording("SPEECH")
+    assert start.text == "cmdStatus=0"
+    time.sleep(6)
+    stop = agent.command("STOP")
+    agent.wait_recorded("SPEECH")
+    path = agent.movie("SPEECH")
+    streams = movie.streams(path)
+    wanted = stop.sent - start.received
+    assert all(abs(stream.duration - wanted) < 0.15 for stream in streams.values()), (streams, wanted)
+    movie.decodes(path)
+
+    heard, source = movie.sound(path), movie.sound(lecture)
+    looped = numpy.tile(source, 3)
+    offset, likeness = movie.best_match(heard[800:-800], looped)
+    assert likeness > 0.9, f"at {offset / 8000:.2f} s only {likeness:.2f} alike"
+    for second in range(5):  # no drift and no gap: each second fits at the same place
+        piece = heard[800 + second * 8000: 800 + (second + 1) * 8000]
+        if numpy.sqrt(numpy.mean(piece**2)) < 0.01:
+            continue
+        around = looped[offset + second * 8000 - 400: offset + (second + 1) * 8000 + 400] if offset >= 400 else None
+        if around is not None and len(around) == 8800:
+            shift, alike = movie.best_match(piece, around)
+            assert abs(shift - 400) <= 24 and alike > 0.85, (second, (shift - 400) / 8000, alike)

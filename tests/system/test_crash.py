@@ -1,0 +1,123 @@
+"""Recordings that the daemon could not end itself: killed, or ended in the middle of one."""
+import re
+import signal
+import time
+
+import pytest
+from harness import movie
+from harness.agent import REPOSITORY
+from harness.waiting import wait_until
+
+FPS = 30
+
+
+def recovered(agent, uuid, mark):
+    """Waits for the recovered recording. @return its document"""
+    wait_until(lambda: agent.path(f"{REPOSITORY}/{uuid}.xml").exists(), 20, f"the document of {uuid}")
+    agent.log.wait(re.escape(f"{REPOSITORY}/{uuid}.mov"), after=mark)
+    time.sleep(1)  # time for a second line that must not come
+    assert len(agent.log.lines(re.escape(f"{uuid}.mov"), after=mark)) == 1
+    return agent.document(uuid)
+
+
+def test_a_killed_daemon_loses_at_most_a_second(running):
+    start = running.start_recording("CRASH", RecordingMetadata_TITLE="Half a talk")
+    time.sleep(5)
+    killed = time.time()
+    running.kill9()
+    left = running.repository()
+    assert "CRASH.mov" not in left, "what bears its final name must be whole"
+    mark = running.log.mark()
+    running.start()
+    document = recovered(running, "CRASH", mark)
+
+    path = running.movie("CRASH")
+    streams = movie.streams(path)
+    assert set(streams) == {"video", "audio"}
+    movie.decodes(path)
+    movie.discover(path)
+    (span,) = movie.runs(movie.counters(path))
+    assert (span[1] - span[0] + 1) / FPS > killed - start.received - 1.0
+    assert abs(streams["audio"].duration - streams["video"].duration) < 0.2
+    assert document["RecordingMetadata_RECORDING_UUID"] == "CRASH"
+    assert document["RecordingMetadata_TITLE"] == "Half a talk"
+    assert document["RecordingMetadata_TYPE"] == "Audio+Video"
+    assert abs(int(document["RecordingMetadata_START_DATE"]) - start.received) <= 2
+    assert abs(int(document["RecordingMetadata_DURATION"]) - (killed - start.received)) <= 2
+    time.sleep(6)  # the scheduler looks for jobs every five seconds
+    assert running.tool_calls() == []
+    assert running.repository() == ["CRASH.mov", "CRASH.xml"], "nothing else stays"
+
+
+def test_a_recovered_recording_is_left_alone_by_the_next_start(running):
+    running.start_recording("CRASH")
+    time.sleep(2)
+    running.kill9()
+    mark = running.log.mark()
+    running.start()
+    recovered(running, "CRASH", mark)
+    before = running.movie("CRASH").stat()
+    running.kill9()
+    mark = running.log.mark()
+    running.start()
+    running.log.wait("Post-Process Scheduler starts", after=mark)
+    time.sleep(1)
+    after = running.movie("CRASH").stat()
+    assert (before.st_ino, before.st_mtime_ns) == (after.st_ino, after.st_mtime_ns)
+    assert not running.log.lines("CRASH", after=mark)
+
+
+def test_a_kill_keeps_the_pauses_out(running):
+    running.start_recording("CRASH")
+    time.sleep(2)
+    running.command("PAUSE")
+    time.sleep(1)
+    running.command("RESUME")
+    time.sleep(2)
+    running.kill9()
+    mark = running.log.mark()
+    running.start()
+    recovered(running, "CRASH", mark)
+    spans = movie.runs(movie.counters(running.movie("CRASH")))
+    assert len(spans) == 2
+    assert 0.9 * FPS < spans[1][0] - spans[0][1] < 1.5 * FPS
+
+
+def test_a_cancelled_recording_does_not_come_back(running):
+    running.start_recording("GONE")
+    time.sleep(1)
+    running.command("CANCEL")
+    running.log.wait("Process cancelCapture", level=7)
+    assert running.command("STATUS").fields["recordStatus"] == "0"
+    running.kill9()
+    running.start()
+    time.sleep(1)
+    assert running.repository() == []
+
+
+@pytest.mark.parametrize("number", [signal.SIGTERM, signal.SIGINT])
+def test_an_orderly_end_in_the_middle_of_a_recording(running, number):
+    running.start_recording("TERM")
+    time.sleep(3)
+    ended = time.monotonic()
+    assert running.stop(number) == 0
+    assert time.monotonic() - ended < 10
+    mark = running.log.mark()
+    running.start()
+    recovered(running, "TERM", mark)
+    (span,) = movie.runs(movie.counters(running.movie("TERM")))
+    assert span[1] - span[0] + 1 > 2.8 * FPS
+    assert running.tool_calls() == []
+
+
+def test_two_kills_in_one_recording_each(running):
+    for uuid in ("A", "B"):
+        assert running.start_recording(uuid).text == "cmdStatus=0"
+        time.sleep(2)
+        running.kill9()
+        mark = running.log.mark()
+        running.start()
+        recovered(running, uuid, mark)
+    assert running.repository() == ["A.mov", "A.xml", "B.mov", "B.xml"]
+    for uuid in ("A", "B"):
+        movie.decodes(running.movie(uuid))

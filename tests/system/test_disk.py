@@ -1,0 +1,92 @@
+"""A repository that can't take a recording: missing, read-only, full, or full in the middle."""
+import os
+import time
+
+from harness import movie
+from harness.agent import REPOSITORY
+
+
+def fill(agent, leave=0):
+    """Fills the repository's file system but for `leave` bytes."""
+    path = agent.path(f"{REPOSITORY}/filler")
+    stat = os.statvfs(path.parent)
+    path.write_bytes(bytes(stat.f_bavail * stat.f_frsize - leave))
+    return path
+
+
+def works(agent, uuid):
+    assert agent.start_recording(uuid).text == "cmdStatus=0"
+    time.sleep(2)
+    assert agent.command("STOP").text == "cmdStatus=0"
+    agent.wait_recorded(uuid)
+    movie.decodes(agent.movie(uuid))
+
+
+def test_a_missing_repository_is_made(agent):
+    agent.preferences(RecordingRepositoryPath="/var/lmx/elsewhere/recordings")
+    agent.start()
+    agent.log.wait("^Recording Repository does not exist, creating /var/lmx/elsewhere/recordings\\.$", level=6)
+    made = agent.path("/var/lmx/elsewhere/recordings")
+    assert made.is_dir() and made.stat().st_mode & 0o777 == 0o755
+
+
+def test_a_repository_that_cannot_be_made_ends_the_daemon(agent):
+    agent.path("/var/lmx/blocked").write_text("a file")
+    agent.preferences(RecordingRepositoryPath="/var/lmx/blocked/recordings")
+    agent.start(wait=False)
+    assert agent.wait_exit() == 1
+    agent.log.wait("^Internal error caused application to stop$", level=2)
+    assert not agent.log.lines("Disabling"), "a full disk is no reason to stay away after the next boot"
+
+
+def test_a_read_only_repository(agent):
+    agent.start(mounts=[f"ro {REPOSITORY}"])
+    assert agent.start_recording("A").text == "cmdStatus=3"
+    assert agent.command("STATUS").fields["recordStatus"] == "0"
+    assert agent.command("STATUS").fields["lastError"] == "3"
+    assert agent.command("STOP").text == "cmdStatus=0"
+    assert agent.start_recording("B").text == "cmdStatus=3"
+    assert agent.alive() and agent.repository() == []
+
+
+def test_a_full_repository(agent):
+    agent.start(mounts=[f"tmpfs 16m {REPOSITORY}"])
+    filler = fill(agent, leave=500_000)
+    assert agent.start_recording("A").text == "cmdStatus=30"
+    agent.log.wait(r"^\d+ MB is below threshold 1 MB$", level=4)
+    assert agent.command("STATUS").fields["recordStatus"] == "0"
+    filler.unlink()
+    works(agent, "B")
+
+
+def test_a_repository_that_fills_up_in_the_middle(agent):
+    agent.preferences(RecordingDiskSpaceCutoffInMB="0")
+    agent.start(mounts=[f"tmpfs 24m {REPOSITORY}"])
+    assert agent.start_recording("A").text == "cmdStatus=0"
+    time.sleep(3)
+    mark = agent.log.mark()
+    filler = fill(agent)
+    line = agent.log.wait(r"(?i)space", timeout=30, after=mark)
+    assert line.level <= 4
+    assert agent.command("STATUS").fields["cmdStatus"] == "0"
+    filler.unlink()
+    agent.command("STOP")
+    time.sleep(1)
+    works(agent, "B")
+    recorded = agent.movie("A")
+    assert recorded.exists(), "what was recorded before the disk was full"
+    movie.decodes(recorded)
+    assert movie.streams(recorded)["video"].duration > 2
+
+
+def test_falling_below_the_cutoff_ends_the_recording(agent):
+    agent.preferences(RecordingDiskSpaceCutoffInMB="8")
+    agent.start(mounts=[f"tmpfs 32m {REPOSITORY}"])
+    assert agent.start_recording("A").text == "cmdStatus=0"
+    time.sleep(2)
+    fill(agent, leave=6 << 20)
+    agent.log.wait(r"^\d+ MB is below threshold 8 MB, unable to free space, recording disabled$", timeout=25, level=4)
+    agent.wait_recorded("A")
+    agent.wait_tool_call("A")
+    movie.decodes(agent.movie("A"))
+    assert agent.start_recording("B").text == "cmdStatus=30"

@@ -1,0 +1,66 @@
+"""The readers of the harness, against material that is known: a reader that sees nothing would prove nothing."""
+import subprocess
+
+import numpy
+import pytest
+from harness import movie
+
+
+def picture(counter, width=320, height=180):
+    frame = numpy.full((height, width), 90, dtype=numpy.uint8)
+    for cell in range(movie.CELLS):
+        bit = counter >> (movie.CELLS - 1 - cell) & 1
+        left, right = cell * width // movie.CELLS, (cell + 1) * width // movie.CELLS
+        frame[: height // movie.ROWS, left:right] = 255 if bit else 0
+    return frame.tobytes()
+
+
+def make_movie(path, numbers):
+    frames = b"".join(picture(number) for number in numbers)
+    subprocess.run(["ffmpeg", "-v", "error", "-f", "rawvideo", "-pix_fmt", "gray", "-s", "320x180", "-r", "30", "-i", "-",
+                    "-c:v", "libx264", "-preset", "superfast", "-pix_fmt", "yuv420p", str(path)], input=frames, check=True)
+
+
+def test_counters_are_read_back(tmp_path):
+    numbers = [0, 1, 2, 30, 31, 32, 65535, 65536, 2**31 + 5]
+    make_movie(tmp_path / "a.mov", numbers)
+    assert movie.counters(tmp_path / "a.mov") == numbers
+
+
+@pytest.mark.parametrize("doubled", [[4, 5, 5, 6], [4, 5, 4]])
+def test_a_doubled_or_reversed_frame_is_a_failure(doubled):
+    with pytest.raises(AssertionError, match="frame"):
+        movie.runs(doubled)
+
+
+def test_a_missing_frame_splits_a_run():
+    assert movie.runs([3, 4, 5, 7, 8]) == [(3, 5), (7, 8)]
+
+
+def test_boundaries_must_fit_one_camera_clock():
+    # Camera opened at 100 s, 30 frames a second: recorded from 101 to 102 and from 103 to 104.
+    marks = [(30, "start", 101.0, 101.001), (59, "stop", 102.0, 102.001),
+             (90, "start", 103.0, 103.001), (119, "stop", 104.0, 104.001)]
+    low, high = movie.camera_clock(marks, 30)
+    assert low < 100 < high
+    late = [*marks[:3], (119 + 5, "stop", 104.0, 104.001)]
+    with pytest.raises(AssertionError, match="camera opened"):
+        movie.camera_clock(late, 30)
+
+
+def test_sound_is_found_where_it_is():
+    noise = numpy.random.default_rng(7).normal(size=20000)
+    offset, likeness = movie.best_match(noise[5000:9000] * 0.3, noise)
+    assert offset == 5000 and likeness > 0.999
+    _, stranger = movie.best_match(numpy.random.default_rng(8).normal(size=4000), noise)
+    assert stranger < 0.3
+
+
+def test_a_broken_movie_is_a_failure(tmp_path):
+    make_movie(tmp_path / "a.mov", range(30))
+    whole = (tmp_path / "a.mov").read_bytes()
+    (tmp_path / "a.mov").write_bytes(whole[: len(whole) // 2])
+    with pytest.raises(AssertionError):
+        movie.streams(tmp_path / "a.mov")
+    with pytest.raises(AssertionError):
+        movie.discover(tmp_path / "a.mov")

@@ -1,0 +1,175 @@
+"""The preferences: each failure's message and level, and changes while the daemon runs."""
+import base64
+import plistlib
+
+import pytest
+from harness.agent import DEFAULTS, PREFERENCES, SERVER_UUID
+from harness.waiting import wait_until
+
+UNBOUND = (3, "lmxagentd cannot run in agent mode without being bound to a Lumex server.")
+INVALID_CONTINUOUS = (2, "Continuous capture is enabled, but the preferences are invalid.")
+NO_SECRET = (3, f"Failed to read shared secret from plist: /var/lmx/agent/secrets/{SERVER_UUID}.plist")
+
+
+def required(name):
+    return (2, f'"{name}" tag was not found or value is empty, this field is required')
+
+
+def no_context(reason):
+    return (2, f"Unable to load the recording context, exception = {reason}")
+
+
+BROKEN = {
+    "no CameraName": ({"CameraName": None}, [UNBOUND]),
+    "no CameraUUID": ({"CameraUUID": None}, [UNBOUND]),
+    "no ServerUUID": ({"ServerUUID": None}, [UNBOUND]),
+    "no LumexURL": ({"LumexURL": None}, [required("ServerURL")]),
+    "empty LumexURL": ({"LumexURL": ""}, [required("ServerURL")]),
+    "no TunnelHost": ({"TunnelHost": None}, [required("TunnelHost")]),
+    "empty TunnelHost": ({"TunnelHost": ""}, [required("TunnelHost")]),
+    "no TunnelPort": ({"TunnelPort": None}, [required("TunnelPort")]),
+    "empty TunnelPort": ({"TunnelPort": ""}, [required("TunnelPort")]),
+    "no repository": ({"RecordingRepositoryPath": None},
+                      [no_context("Missing required preference: RecordingRepositoryPath")]),
+    "empty repository": ({"RecordingRepositoryPath": ""}, [required("RecordingRepositoryPath")]),
+    "no type": ({"RecordingType": None}, [no_context("Missing required preference: RecordingType")]),
+    "type in lower case": ({"RecordingType": "audio"},
+                           [no_context("Invalid value: audio for preference: RecordingType")]),
+    "no microphone of that name": ({"RecordingAudioInput": "alsa:nowhere"},
+                                   [no_context("Unknown device ID: alsa:nowhere for preference: RecordingAudioInput")]),
+    "File without a path": ({"RecordingType": "File"},
+                            [(2, '"RecordingPath" tag was not found or value is empty, this field is required for the '
+                                 '"File" recording type')]),
+    "no cutoff": ({"RecordingDiskSpaceCutoffInMB": None}, [required("RecordingDiskSpaceCutoffInMB")]),
+    "empty cutoff": ({"RecordingDiskSpaceCutoffInMB": ""}, [required("RecordingDiskSpaceCutoffInMB")]),
+    "no frame rate": ({"RecordingVideoMaximumFrameRate": None}, [required("RecordingVideoMaximumFrameRate")]),
+    "no frame rate, video only": ({"RecordingType": "Video", "RecordingVideoMaximumFrameRate": ""},
+                                  [required("RecordingVideoMaximumFrameRate")]),
+    "continuous without length": ({"ContinuousRecording": {
+        "Enabled": True, "RecordingSegmentLength": 0, "ContinuousUpload": False,
+        "RecordingDiskSpaceCutoffPercentLeft": 5.0}}, [INVALID_CONTINUOUS]),
+    "continuous without floor": ({"ContinuousRecording": {
+        "Enabled": True, "RecordingSegmentLength": 60, "ContinuousUpload": False,
+        "RecordingDiskSpaceCutoffPercentLeft": 0.0}}, [INVALID_CONTINUOUS]),
+}
+
+
+def disabled(agent):
+    """The daemon disables its own service, which it can't in here, and ends."""
+    status = agent.wait_exit()
+    agent.log.wait(r"^Disabling lmxagentd with keeperd\.\.\.$", level=5)
+    assert status in (78, 71)
+    if status == 71:
+        agent.log.wait(r"^Removing job from keeperd\.$", level=2)
+    assert not agent.path("/var/run/lmxagentd.pid").exists()
+
+
+@pytest.mark.parametrize("case", BROKEN)
+def test_broken_preferences(agent, case):
+    changes, lines = BROKEN[case]
+    agent.preferences(**changes)
+    agent.start(wait=False)
+    disabled(agent)
+    agent.log.wait("^Internal error caused application to stop$", level=2)
+    for level, text in lines:
+        assert [l for l in agent.log.lines(level=level) if text in l.text], (text, agent.report())
+
+
+@pytest.mark.parametrize("size", [15, 17, 0])
+def test_a_secret_of_the_wrong_size_fails_in_silence(agent, size):
+    agent.secret(base64.b64encode(bytes(size)).decode())
+    agent.start(wait=False)
+    disabled(agent)
+    assert not agent.log.lines("secret|bound")
+
+
+def test_a_secret_that_is_no_base64_fails_in_silence(agent):
+    agent.secret("*** no base64 ***")
+    agent.start(wait=False)
+    disabled(agent)
+    assert not agent.log.lines("secret|bound")
+
+
+def test_a_missing_secret(agent):
+    agent.secret(None)
+    agent.start(wait=False)
+    disabled(agent)
+    for level, text in (NO_SECRET, UNBOUND):
+        assert [l for l in agent.log.lines(level=level) if l.text == text], agent.report()
+
+
+def test_the_secret_is_never_logged(running):
+    secret = base64.b64encode(bytes(range(16))).decode()
+    assert not [l for l in running.log.lines() if secret in l.text]
+
+
+def test_no_preferences_at_all(agent):
+    agent.path(PREFERENCES).unlink()
+    agent.start(wait=False)
+    disabled(agent)
+
+
+@pytest.mark.parametrize("data", [b"", b"no property list", plistlib.dumps(DEFAULTS)[:-60], b"bplist00" + bytes(40),
+                                  plistlib.dumps(["a", "list"])], ids=["empty", "text", "cut", "binary", "list"])
+def test_a_malformed_property_list_is_named(agent, data):
+    agent.preferences_bytes(data)
+    agent.start(wait=False)
+    disabled(agent)
+    assert [l for l in agent.log.lines(PREFERENCES) if l.level <= 3], agent.report()
+
+
+def test_a_binary_property_list_is_read(agent):
+    agent.preferences_bytes(plistlib.dumps(DEFAULTS, fmt=plistlib.FMT_BINARY))
+    agent.start()
+    assert "CameraName=Hall 3," in agent.command("STATUS include_profile=true").text
+
+
+def profile(agent):
+    return agent.command("STATUS include_profile=true").fields["CameraName"]
+
+
+def test_a_replaced_file_is_noticed(running):
+    running.preferences(CameraName="Hall 4")
+    wait_until(lambda: profile(running) == "Hall 4", 5, "the new name")
+    running.preferences(CameraName="Hall 5")
+    wait_until(lambda: profile(running) == "Hall 5", 5, "the next name")
+
+
+def test_an_edit_in_place_is_noticed_but_not_read(running):
+    before = running.log.mark()
+    path = running.path(PREFERENCES)
+    path.write_bytes(path.read_bytes().replace(b"Hall 3", b"Hall 9"))
+    running.log.wait(r"^Reading preferences\.\.\.$", after=before, level=6)
+    assert profile(running) == "Hall 3"
+
+
+def test_a_file_replaced_by_a_broken_one_disables_the_service(running):
+    running.preferences(TunnelHost=None)
+    disabled_after_change(running)
+    assert [l for l in running.log.lines(level=2) if l.text == required("TunnelHost")[1]]
+
+
+def test_a_deleted_file_disables_the_service(running):
+    running.path(PREFERENCES).unlink()
+    disabled_after_change(running)
+    assert len(running.log.lines("^The agent preferences file has been deleted$", level=2)) == 1
+    assert [l for l in running.log.lines(level=3) if l.text == UNBOUND[1]]
+
+
+def disabled_after_change(agent):
+    assert agent.wait_exit() in (78, 71)
+    agent.log.wait(r"^Disabling lmxagentd with keeperd\.\.\.$", level=5)
+
+
+def test_an_old_preview_interval_is_converted(agent):
+    agent.preferences(RecordingPreviewIntervalInSeconds="2", PreviewIntervalInMilliseconds=None)
+    agent.start()
+    content = plistlib.loads(agent.path(PREFERENCES).read_bytes())
+    assert content["PreviewIntervalInMilliseconds"] == "2000"
+    assert "RecordingPreviewIntervalInSeconds" not in content
+
+
+def test_the_listener_port_is_told(agent):
+    agent.preferences(TCPListenerPort="8170")
+    agent.start()
+    agent.log.wait("^TCP listener port: 8170$", level=5)

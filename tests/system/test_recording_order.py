@@ -1,0 +1,112 @@
+"""START, STOP and CANCEL in orders that a careful operator would not choose."""
+import time
+
+from harness import movie
+from harness.agent import REPOSITORY
+from harness.waiting import wait_until
+
+FPS = 30
+
+
+def test_stop_at_once_after_start(running):
+    for round_ in range(3):
+        assert running.start_recording(f"SHORT-{round_}").text == "cmdStatus=0"
+        assert running.command("STOP").text == "cmdStatus=0"
+    for round_ in range(3):
+        running.wait_recorded(f"SHORT-{round_}")
+        path = running.movie(f"SHORT-{round_}")
+        if path.exists():  # a movie without a single frame is none
+            movie.decodes(path)
+            assert len(movie.counters(path)) < FPS
+    assert running.start_recording("AFTER").text == "cmdStatus=0"
+    time.sleep(2)
+    running.command("STOP")
+    running.wait_recorded("AFTER")
+    assert 1.9 < movie.streams(running.movie("AFTER"))["video"].duration < 2.3
+
+
+def test_stop_without_start(running):
+    assert running.command("STOP").text == "cmdStatus=0"
+    running.log.wait(r"^Recording canceled, missing RecordingMetadata_RECORDING_UUID\.$", level=1)
+    assert running.command("STATUS").fields["recordStatus"] == "0"
+    assert running.repository() == [] and running.tool_calls() == []
+
+
+def test_pause_resume_and_cancel_without_start(running):
+    for command in ("PAUSE", "RESUME", "CANCEL"):
+        assert running.command(command).text == "cmdStatus=0"
+    assert running.start_recording("NEXT").text == "cmdStatus=0"
+    time.sleep(1)
+    running.command("STOP")
+    running.wait_recorded("NEXT")
+    movie.decodes(running.movie("NEXT"))
+
+
+def test_start_during_a_recording(running):
+    first = running.start_recording("FIRST", RecordingMetadata_TITLE="one")
+    time.sleep(3)
+    second = running.start_recording("SECOND", RecordingMetadata_TITLE="two")
+    assert (first.text, second.text) == ("cmdStatus=0", "cmdStatus=4")
+    running.log.wait("^Unable to start, capture not idle$", level=3)
+    running.log.wait(r"^An error occurred during recording \(4\)$", level=3)
+    assert running.command("STATUS").fields["recordStatus"] == "2"
+    time.sleep(2)
+    stop = running.command("STOP")
+    running.wait_tool_call("SECOND")
+
+    submitted = movie.runs(movie.counters(running.movie("SECOND")))
+    assert len(submitted) == 1
+    document = running.document("SECOND")
+    assert document["RecordingMetadata_RECORDING_UUID"] == "SECOND"
+    assert document["RecordingMetadata_TITLE"] == "two"
+
+    kept = running.movie("FIRST")
+    wait_until(lambda: running.path(f"{REPOSITORY}/FIRST.xml").exists(), 20, "the first recording's document")
+    movie.decodes(kept)
+    (whole,) = movie.runs(movie.counters(kept))
+    assert running.document("FIRST")["RecordingMetadata_TITLE"] == "one"
+    movie.camera_clock([(whole[0], "start", first.sent, first.received + 0.3), (whole[1], "stop", stop.sent, stop.received),
+                        (submitted[0][0], "start", second.sent, second.received),
+                        (submitted[0][1], "stop", stop.sent, stop.received)], FPS)
+    assert len(running.log.lines(r"FIRST\.mov", level=5)) == 2, "recording started, and one line of its fate"
+    assert [call["arguments"][4] for call in running.tool_calls()] == ["SECOND"]
+
+
+def test_two_recordings_in_quick_succession(running):
+    running.set_tool({"when": "--submit", "delay": 2})
+    spans = {}
+    for uuid in ("ONE", "TWO"):
+        start = running.start_recording(uuid)
+        assert start.text == "cmdStatus=0"
+        time.sleep(3)
+        spans[uuid] = (start, running.command("STOP"))
+    for uuid in ("ONE", "TWO"):
+        running.wait_tool_call(uuid, event="end")
+        start, stop = spans[uuid]
+        (span,) = movie.runs(movie.counters(running.movie(uuid)))
+        frames = span[1] - span[0] + 1
+        assert (stop.sent - start.received) * FPS - 3 <= frames <= (stop.received - start.sent) * FPS + 3
+        assert running.document(uuid)["RecordingMetadata_RECORDING_UUID"] == uuid
+    begins, ends = running.tool_calls(), running.tool_calls("end")
+    assert [call["arguments"][4] for call in begins] == ["ONE", "TWO"]
+    assert ends[0]["time"] <= begins[1]["time"], "one submission at a time"
+
+
+def test_the_same_identifier_twice(running):
+    for _ in range(2):
+        assert running.start_recording("AGAIN").text == "cmdStatus=0"
+        time.sleep(1)
+        mark = running.log.mark()
+        running.command("STOP")
+        running.wait_recorded("AGAIN", after=mark)
+    movie.decodes(running.movie("AGAIN"))
+    wait_until(lambda: len(running.tool_calls("end")) == 2, 20, "two submissions")
+
+
+def test_commands_that_lack_parameters(running):
+    complete = "RecordingMetadata_RECORDING_UUID=A,RecordingMetadata_MAX_RECORDING_MINUTES=1"
+    for line in ("START", "START " + complete, "START RecordingMetadata_MAX_RECORDING_MINUTES=1",
+                 "SERVER", "SERVER version=2"):
+        assert running.command(line).text == "cmdStatus=31", line
+    assert running.command("STATUS").fields["recordStatus"] == "0"
+    assert running.repository() == []

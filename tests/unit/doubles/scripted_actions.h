@@ -1,0 +1,74 @@
+// The agent's actions as a script: what was performed, in which order, with which wait.
+#pragma once
+#include <functional>
+#include <memory>
+#include <optional>
+#include <string>
+#include <utility>
+
+#include "agent/context/agent_actions.h"
+#include "tests/unit/doubles/journal.h"
+
+namespace lmx::testing {
+
+/// Runs every action at once on the caller's thread and writes "prepareCapture, waiting" or "stopRecording"
+/// into the journal. The script of an action is what the test puts into its hook.
+class ScriptedActions : public AgentActions {
+ public:
+  explicit ScriptedActions(Journal& journal) : journal_(journal) {}
+
+  bool loop_runs = true;  ///< false: the main loop has ended, nothing is performed
+  std::function<void()> on_prepare_capture;
+  std::function<void()> on_stop_recording;
+
+  bool perform(Action action, Wait wait) override {
+    if (!loop_runs) return false;
+    waiting_ = wait == Wait::untilDone;
+    (this->*action)();
+    waiting_ = false;
+    return true;
+  }
+
+  void prepareCapture() override { note("prepareCapture", on_prepare_capture); }
+  void startPreview() override { note("startPreview"); }
+  void stopPreview() override { note("stopPreview"); }
+  void pauseCapture() override { note("pauseCapture"); }
+  void resumeCapture() override { note("resumeCapture"); }
+  void stopCapture() override { note("stopCapture"); }
+  void cancelCapture() override { note("cancelCapture"); }
+  void stopRecording() override { note("stopRecording", on_stop_recording); }
+  void setRecorderStatusToIdle() override { note("setRecorderStatusToIdle"); }
+  void submitStoppedRecording() override { note("submitStoppedRecording"); }
+  void shutDownControl() override { note("shutDownControl"); }
+  void shutDownControlBecauseDeviceFailed() override { note("shutDownControlBecauseDeviceFailed"); }
+  void captureDidComplete(const void*) override { note("captureDidComplete"); }
+  void captureDidCancel(const void*) override { note("captureDidCancel"); }
+
+  void recordDidStartWithFile(const std::string& file, const SharedDictionary&,
+                              std::optional<TimeValue>) override {
+    note("recordDidStart " + file);
+  }
+  void recordDidPauseWithFile(const std::string& file, const SharedDictionary&, std::int64_t) override {
+    note("recordDidPause " + file);
+  }
+  void recordDidResumeWithFile(const std::string& file, const SharedDictionary&) override {
+    note("recordDidResume " + file);
+  }
+  void recordRuntimeErrorCallback(int code) override { note("recordRuntimeError " + std::to_string(code)); }
+  void recordDidStopWithFile(const std::shared_ptr<AgentRecord>&, const std::string& file,
+                             const SharedDictionary&, std::optional<TimeValue>, std::int64_t elapsedSeconds,
+                             std::optional<TimeValue>, bool canceled) override {
+    note("recordDidStop " + file + " " + std::to_string(elapsedSeconds) + (canceled ? " canceled" : ""));
+  }
+
+ private:
+  void note(const std::string& what, const std::function<void()>& script = {}) {
+    journal_.add(waiting_ ? what + ", waiting" : what);
+    if (script) script();
+  }
+
+  Journal& journal_;
+  static inline thread_local bool waiting_ = false;
+};
+
+}  // namespace lmx::testing
