@@ -1,4 +1,5 @@
 // The STATUS command: exact reply texts, profile, audio levels and preview.
+#include <gmock/gmock.h>
 #include <gtest/gtest.h>
 #include <stdlib.h>
 #include <unistd.h>
@@ -6,7 +7,6 @@
 #include <filesystem>
 #include <fstream>
 #include <limits>
-#include <regex>
 
 #include "control/audio_levels.h"
 #include "control/status_reply.h"
@@ -126,7 +126,7 @@ TEST_F(StatusCommand, WithoutSessionAnswersTwoAndZeroes) {
 }
 
 TEST_F(StatusCommand, IdleSession) {
-  EXPECT_TRUE(std::regex_match(reply("STATUS"), std::regex(plain_))) << channel_.replies().back();
+  EXPECT_THAT(reply("STATUS"), ::testing::MatchesRegex(plain_)) << channel_.replies().back();
 }
 
 TEST_F(StatusCommand, RunningRecordingIsReported) {
@@ -152,7 +152,7 @@ TEST_F(StatusCommand, ProfileFollowsOnlyTheExactTextTrue) {
   EXPECT_TRUE(reply("STATUS include_profile=true").ends_with(profile));
   for (const char* other :
        {"STATUS include_profile=TRUE", "STATUS include_profile=1", "STATUS include_profile"}) {
-    EXPECT_TRUE(std::regex_match(reply(other), std::regex(plain_))) << other;
+    EXPECT_THAT(reply(other), ::testing::MatchesRegex(plain_)) << other;
   }
 }
 
@@ -181,7 +181,7 @@ TEST_F(StatusCommand, PreviewFileThatHoldsNothingGivesNoPreview) {
   for (const std::string& path :
        {empty.path(), std::string("/tmp/unit_control/absent.jpg"), std::string("/tmp")}) {
     context_->setPreview_file(path);
-    EXPECT_TRUE(std::regex_match(reply("STATUS include_preview=true"), std::regex(plain_))) << path;
+    EXPECT_THAT(reply("STATUS include_preview=true"), ::testing::MatchesRegex(plain_)) << path;
   }
   EXPECT_EQ(log_.count(7, "preview buffer is NULL"), 3);
 }
@@ -190,7 +190,7 @@ TEST_F(StatusCommand, PreviewFileTooLargeForAStillGivesNoPreview) {
   const TemporaryFile movie("JPEG!");
   std::filesystem::resize_file(movie.path(), (16U << 20) + 1);
   context_->setPreview_file(movie.path());
-  EXPECT_TRUE(std::regex_match(reply("STATUS include_preview=true"), std::regex(plain_)));
+  EXPECT_THAT(reply("STATUS include_preview=true"), ::testing::MatchesRegex(plain_));
 }
 
 TEST_F(StatusCommand, PreviewFileOfAnAudioOnlySessionIsStillSent) {
@@ -202,13 +202,13 @@ TEST_F(StatusCommand, PreviewFileOfAnAudioOnlySessionIsStillSent) {
 
 TEST_F(StatusCommand, AudioOnlySessionHasNoPreviewAndNoLineAboutIt) {
   session_->setRecordingType(kRecordingTypeAudio);
-  EXPECT_TRUE(std::regex_match(reply("STATUS include_preview=true"), std::regex(plain_)));
+  EXPECT_THAT(reply("STATUS include_preview=true"), ::testing::MatchesRegex(plain_));
   EXPECT_FALSE(log_.mentions("preview buffer is NULL"));
 }
 
 TEST_F(StatusCommand, VideoSessionWithoutPreviewSaysSoInTheLog) {
   session_->setRecordingType(kRecordingTypeVideo);
-  EXPECT_TRUE(std::regex_match(reply("STATUS include_preview=true"), std::regex(plain_)));
+  EXPECT_THAT(reply("STATUS include_preview=true"), ::testing::MatchesRegex(plain_));
   EXPECT_TRUE(log_.contains(7, "preview buffer is NULL"));
 }
 
