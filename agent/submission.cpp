@@ -104,7 +104,8 @@ void AgentMain::submit(const std::shared_ptr<AgentRecord>& stopped) {
   const std::string path =
       lookUp(properties, "RecordingMetadata_ADHOC_FILE_PATH")
           .value_or(context_->recording_repository_path().value_or("") + "/" + uuid.value_or("") + ".mov");
-  stopped->setMetadata(withUuid(stopped->metadata(), uuid));
+  // A START that was refused meanwhile has cleared the metadata: its parameters then describe what is submitted.
+  stopped->setMetadata(withUuid(stopped->metadata() ? stopped->metadata() : properties, uuid));
   stopped->setStartTime(startOf(*stopped));
   dispatchAsync(WorkPriority::background, [this, stopped, path, elapsed] {
     handOff(stopped, path, elapsed);

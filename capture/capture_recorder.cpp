@@ -109,7 +109,7 @@ bool CaptureController::reachedEnd() const {
   if (ending_ == Ending::no) return false;
   if (ending_ == Ending::cancel && !marks_.othersPending({})) return true;
   if (std::chrono::steady_clock::now() >= end_deadline_) return true;
-  const bool pictureDone = frames_->horizon() > end_time_ + frame_seconds_ * 0.5 && frames_->horizon() > 0;
+  const bool pictureDone = last_frame_time_ >= end_time_;
   if (!pictureDone) return false;
   if (!has_audio_ || frames_->runs().empty()) return true;
   const MovieRun& last = frames_->runs().back();

@@ -26,7 +26,7 @@ std::string videoDescription(const VideoEncoding& video) {
       "caps=video/x-raw,format=I420,width=%d,height=%d,framerate=%d/%d,pixel-aspect-ratio=1/1 ! "
       "x264enc tune=zerolatency speed-preset=%s bitrate=%d key-int-max=%d byte-stream=false aud=false "
       "option-string=scenecut=0 ! video/x-h264,stream-format=avc,alignment=au ! "
-      "appsink name=vout sync=false max-buffers=0 enable-last-sample=false ",
+      "appsink name=vout sync=false async=false max-buffers=0 enable-last-sample=false ",
       video.size.width, video.size.height, rate.numerator, rate.denominator, speedPreset(video),
       videoBitRate(video), keyInterval);
 }
@@ -35,7 +35,8 @@ std::string audioDescription(const AudioEncoding& audio) {
   return formatted(
       "appsrc name=asrc format=time block=true max-buffers=64 max-bytes=0 max-time=0 stream-type=stream "
       "caps=audio/x-raw,format=F32LE,layout=interleaved,rate=%d,channels=%d%s ! "
-      "avenc_aac bitrate=%d ! appsink name=aout sync=false max-buffers=0 enable-last-sample=false ",
+      "avenc_aac bitrate=%d ! appsink name=aout sync=false async=false max-buffers=0 "
+      "enable-last-sample=false ",
       audio.sampleRate, audio.channels, audio.channels == 2 ? ",channel-mask=(bitmask)0x3" : "",
       audio.bitRate);
 }

@@ -3,6 +3,7 @@
 
 #include <gst/video/video.h>
 
+#include <cstring>
 #include <memory>
 
 #include "capture/gst_handles.h"
@@ -50,6 +51,17 @@ void draw(GstBuffer* buffer, const Probe& probe) {
   const auto number = static_cast<std::uint32_t>(GST_BUFFER_OFFSET(buffer));
   drawFrameNumber(plane, number);
   drawClock(plane, clockText(number * probe.frameSeconds));
+  for (const guint component : {1U, 2U}) {
+    // No colour behind the bit row and the clock: people read them too.
+    const int width = size.width / 2;
+    const int height = size.height / 2;
+    const int step = GST_VIDEO_FRAME_PLANE_STRIDE(&frame, component);
+    auto* chroma = static_cast<std::uint8_t*>(GST_VIDEO_FRAME_PLANE_DATA(&frame, component));
+    for (int row = 0; row < height; ++row) {
+      const bool grey = row < height / 18 || row > height - height / 6;
+      if (grey) std::memset(chroma + row * step, 128, static_cast<std::size_t>(width));
+    }
+  }
   gst_video_frame_unmap(&frame);
 }
 

@@ -77,16 +77,3 @@ def test_a_repository_that_fills_up_in_the_middle(agent):
     assert recorded.exists(), "what was recorded before the disk was full"
     movie.decodes(recorded)
     assert movie.streams(recorded)["video"].duration > 2
-
-
-def test_falling_below_the_cutoff_ends_the_recording(agent):
-    agent.preferences(RecordingDiskSpaceCutoffInMB="8")
-    agent.start(mounts=[f"tmpfs 32m {REPOSITORY}"])
-    assert agent.start_recording("A").text == "cmdStatus=0"
-    time.sleep(2)
-    fill(agent, leave=6 << 20)
-    agent.log.wait(r"^\d+ MB is below threshold 8 MB, unable to free space, recording disabled$", timeout=25, level=4)
-    agent.wait_recorded("A")
-    agent.wait_tool_call("A")
-    movie.decodes(agent.movie("A"))
-    assert agent.start_recording("B").text == "cmdStatus=30"

@@ -1,0 +1,322 @@
+// Recordings with the synthetic devices, from the marks to the movie.
+#include <gtest/gtest.h>
+
+#include <cmath>
+#include <filesystem>
+#include <thread>
+
+#include "capture_harness.h"
+#include "movie_check.h"
+#include "support/time_value.h"
+
+namespace lmx {
+namespace {
+
+using namespace std::chrono_literals;
+using testing::Capture;
+using testing::decodeMovie;
+using testing::Folder;
+using testing::numberRuns;
+using testing::parametersFor;
+using Kind = testing::Reports::Kind;
+
+constexpr const char* kFastVideo = "test://video?size=160x90&speed=max";
+constexpr const char* kFastAudio = "test://audio?speed=max";
+
+/// The microphone's tick fills the last 479 samples before each full second.
+constexpr double kTickLead = 479.0 / 48000.0;
+
+/// Records `spans` (seconds of media) as fast as the machine can. @return the movie's path.
+std::string recordFast(const Folder& folder, Capture& capture, const std::vector<Span>& spans) {
+  EXPECT_TRUE(capture.prepare());
+  const double zero = capture.controller->pipeline()->wallOffset();
+  for (const Span& span : spans) {
+    capture.controller->setStartWithUUID("R", zero + span.start, parametersFor("R"));
+    capture.controller->setStopWithUUID("R", zero + span.stop);
+  }
+  EXPECT_TRUE(capture.controller->startRecording());
+  capture.controller->stopRecording();
+  EXPECT_EQ(capture.reports->wait(600s), Kind::complete);
+  EXPECT_FALSE(capture.reports->error());
+  const auto error = capture.controller->processRequestWithUUID("R", folder.file("R.mov"));
+  EXPECT_FALSE(error) << error->message;
+  capture.controller->requestHandedOver("R");
+  return folder.file("R.mov");
+}
+
+TEST(Recording, HoldsExactlyItsSpans) {
+  const Folder folder;
+  Capture capture(folder, kFastVideo, kFastAudio);
+  const auto movie = decodeMovie(recordFast(folder, capture, {{1.0, 3.0}, {5.5, 6.25}, {9.0, 10.0}}));
+  EXPECT_EQ(movie.problem, "");
+  const auto runs = numberRuns(movie.frameNumbers);
+  ASSERT_EQ(runs.size(), 3U);
+  EXPECT_EQ(runs[0].first, 30U);
+  EXPECT_EQ(runs[0].last, 89U);
+  EXPECT_EQ(runs[1].first, 165U);
+  EXPECT_EQ(runs[1].last, 187U);
+  EXPECT_EQ(runs[2].first, 270U);
+  EXPECT_EQ(runs[2].last, 299U);
+}
+
+TEST(Recording, FrameRateIsConstantOverCuts) {
+  const Folder folder;
+  Capture capture(folder, kFastVideo, kFastAudio);
+  capture.settings.maximumFrameRate = 29.97;
+  const auto movie = decodeMovie(recordFast(folder, capture, {{0.5, 1.7}, {2.1, 3.3}}));
+  ASSERT_GT(movie.frameTimes.size(), 60U);
+  for (std::size_t i = 0; i < movie.frameTimes.size(); ++i) {
+    EXPECT_NEAR(movie.frameTimes[i], static_cast<double>(i) * 1001.0 / 30000.0, 1e-6);
+  }
+}
+
+TEST(Recording, SoundStaysWithThePictureOverCuts) {
+  const Folder folder;
+  Capture capture(folder, kFastVideo, kFastAudio);
+  const auto movie = decodeMovie(recordFast(folder, capture, {{0.5, 3.5}, {10.25, 14.25}, {20.9, 23.1}}));
+  EXPECT_NEAR(movie.soundStart, 0.0, 1e-6);
+  // The microphone ticks just before the camera's frame number becomes a multiple of 30.
+  std::vector<double> expected;
+  for (std::size_t i = 0; i < movie.frameNumbers.size(); ++i) {
+    if (movie.frameNumbers[i] % 30 == 0) expected.push_back(movie.frameTimes[i]);
+  }
+  const auto ticks = testing::tickTimes(movie);
+  ASSERT_EQ(ticks.size(), expected.size());
+  for (std::size_t i = 0; i < ticks.size(); ++i) EXPECT_NEAR(ticks[i], expected[i] - kTickLead, 0.001) << i;
+}
+
+/// Under a sanitizer everything is many times slower: the same drift in less media.
+#if defined(__SANITIZE_ADDRESS__) || defined(__SANITIZE_THREAD__)
+constexpr double kDriftSeconds = 60;
+#else
+constexpr double kDriftSeconds = 1800;
+#endif
+
+TEST(Recording, DoesNotDriftInThirtyMinutes) {
+  const Folder folder;
+  Capture capture(folder, "test://video?size=64x64&speed=max", kFastAudio);
+  const auto movie = decodeMovie(recordFast(folder, capture, {{0.0, kDriftSeconds}}));
+  ASSERT_EQ(movie.frameTimes.size(), static_cast<std::size_t>(kDriftSeconds * 30));
+  const auto ticks = testing::tickTimes(movie);
+  ASSERT_EQ(ticks.size(), static_cast<std::size_t>(kDriftSeconds));
+  for (std::size_t i = 0; i < ticks.size(); ++i)
+    ASSERT_NEAR(ticks[i], static_cast<double>(i + 1) - kTickLead, 0.001) << i;
+}
+
+TEST(Recording, SoundOnly) {
+  const Folder folder;
+  Capture capture(folder, "", kFastAudio);
+  const auto movie =
+      decodeMovie(recordFast(folder, capture, {{0.5, 2.5}, {4.5, 6.0}}), testing::Streams::sound);
+  EXPECT_EQ(movie.problem, "");
+  EXPECT_TRUE(movie.frameNumbers.empty());
+  EXPECT_NEAR(static_cast<double>(movie.sound.size()) / movie.sampleRate, 3.5, 0.03);
+  const auto ticks = testing::tickTimes(movie);  // of seconds 1, 2, 5 and 6 of the session
+  const std::vector<double> expected{0.5, 1.5, 2.5, 3.5};
+  ASSERT_EQ(ticks.size(), expected.size());
+  for (std::size_t i = 0; i < ticks.size(); ++i) EXPECT_NEAR(ticks[i], expected[i] - kTickLead, 0.001) << i;
+}
+
+TEST(Recording, PictureOnly) {
+  const Folder folder;
+  Capture capture(folder, kFastVideo, "");
+  const auto movie = decodeMovie(recordFast(folder, capture, {{0.0, 2.0}}), testing::Streams::picture);
+  EXPECT_EQ(movie.problem, "");
+  EXPECT_TRUE(movie.sound.empty());
+  EXPECT_EQ(movie.frameNumbers.size(), 60U);
+}
+
+TEST(Recording, LeavesNothingButTheMovie) {
+  const Folder folder;
+  Capture capture(folder, kFastVideo, kFastAudio);
+  recordFast(folder, capture, {{0.0, 1.0}});
+  std::vector<std::string> names;
+  for (const auto& entry : std::filesystem::directory_iterator(folder.path()))
+    names.push_back(entry.path().filename());
+  EXPECT_EQ(names, std::vector<std::string>{"R.mov"});
+}
+
+TEST(Recording, ElapsedTimesCountMarkedSpansOnly) {
+  const Folder folder;
+  Capture capture(folder, kFastVideo, kFastAudio);
+  recordFast(folder, capture, {{1.0, 3.0}, {5.0, 6.5}});
+  EXPECT_NEAR(capture.controller->elapsedTimeForRequestWithUUID("R"), 3.5, 1e-6);
+  EXPECT_EQ(capture.controller->elapsedTimeInMilliseconds(), 3500);
+  EXPECT_EQ(capture.controller->elapsedTimeForRequestWithUUID("unknown"), 0);
+}
+
+TEST(Recording, AFileThatBearsTheNameIsSetAside) {
+  const Folder folder;
+  for (int i = 0; i < 2; ++i) {
+    Capture capture(folder, kFastVideo, kFastAudio);
+    recordFast(folder, capture, {{0.0, 1.0}});
+  }
+  EXPECT_EQ(decodeMovie(folder.file("R-replaced.mov")).frameNumbers.size(), 30U);
+  EXPECT_EQ(decodeMovie(folder.file("R.mov")).frameNumbers.size(), 30U);
+}
+
+// ---- live
+
+TEST(LiveRecording, StoppedAtOnceStillHoldsAFrame) {
+  const Folder folder;
+  for (int i = 0; i < 5; ++i) {
+    Capture capture(folder);
+    ASSERT_TRUE(capture.prepare());
+    capture.controller->setStartWithUUID("R", secondsSinceReferenceDate(), parametersFor("R"));
+    capture.controller->setStopWithUUID("R", secondsSinceReferenceDate());
+    capture.controller->stopRecording();
+    ASSERT_EQ(capture.reports->wait(), Kind::complete);
+    ASSERT_FALSE(capture.controller->processRequestWithUUID("R", folder.file("R.mov")));
+    EXPECT_EQ(decodeMovie(folder.file("R.mov")).frameNumbers.size(), 1U);
+    capture.controller->requestHandedOver("R");
+  }
+}
+
+TEST(LiveRecording, TwoRequestsOfOneCaptureEachGetTheirSpan) {
+  const Folder folder;
+  Capture capture(folder);
+  ASSERT_TRUE(capture.prepare());
+  capture.controller->setStartWithUUID("A", secondsSinceReferenceDate(), parametersFor("A"));
+  std::this_thread::sleep_for(700ms);  // media must pass
+  capture.controller->setStartWithUUID("B", secondsSinceReferenceDate(), parametersFor("B"));
+  std::this_thread::sleep_for(700ms);
+  capture.controller->setStopWithUUID("B", secondsSinceReferenceDate());
+  capture.controller->stopRecording();
+  ASSERT_EQ(capture.reports->wait(), Kind::complete);
+  ASSERT_FALSE(capture.controller->processRequestWithUUID("B", folder.file("B.mov")));
+  capture.controller->requestHandedOver("B");
+  const auto kept = capture.controller->recoverAbandonedRequests();
+  ASSERT_EQ(kept.size(), 1U);
+  EXPECT_EQ(kept[0].path, folder.file("A.mov"));
+  kept[0].forget();
+  const auto second = decodeMovie(folder.file("B.mov")).frameNumbers;
+  const auto first = decodeMovie(folder.file("A.mov")).frameNumbers;
+  EXPECT_NEAR(static_cast<double>(second.size()), 21, 2);
+  ASSERT_GT(first.size(), second.size());
+  EXPECT_EQ(numberRuns(first).size(), 1U);
+  EXPECT_EQ(first.back(), second.back());
+  EXPECT_FALSE(std::filesystem::exists(folder.file(".lmxagentd")));
+}
+
+TEST(LiveRecording, CancelledLeavesNothing) {
+  const Folder folder;
+  Capture capture(folder);
+  ASSERT_TRUE(capture.prepare());
+  capture.controller->setStartWithUUID("R", secondsSinceReferenceDate(), parametersFor("R"));
+  std::this_thread::sleep_for(300ms);
+  capture.controller->cancelRequestWithUUID("R");
+  capture.controller->cancelRecording();
+  EXPECT_EQ(capture.reports->wait(), Kind::cancel);
+  EXPECT_TRUE(capture.controller->recoverAbandonedRequests().empty());
+  EXPECT_TRUE(std::filesystem::is_empty(folder.path()));
+}
+
+TEST(LiveRecording, CancelKeepsTheRequestThatNobodyCancelled) {
+  const Folder folder;
+  Capture capture(folder);
+  ASSERT_TRUE(capture.prepare());
+  capture.controller->setStartWithUUID("A", secondsSinceReferenceDate(), parametersFor("A"));
+  std::this_thread::sleep_for(300ms);
+  capture.controller->setStartWithUUID("B", secondsSinceReferenceDate(), parametersFor("B"));
+  capture.controller->cancelRequestWithUUID("B");
+  capture.controller->cancelRecording();
+  ASSERT_EQ(capture.reports->wait(), Kind::cancel);
+  const auto kept = capture.controller->recoverAbandonedRequests();
+  ASSERT_EQ(kept.size(), 1U);
+  EXPECT_GE(decodeMovie(kept[0].path).frameNumbers.size(), 6U);
+}
+
+TEST(LiveRecording, PauseWithoutMarksLeavesTheMediaOut) {
+  const Folder folder;
+  Capture capture(folder);
+  ASSERT_TRUE(capture.prepare());
+  capture.controller->setStartWithUUID("R", secondsSinceReferenceDate(), parametersFor("R"));
+  capture.controller->startRecording();
+  std::this_thread::sleep_for(400ms);
+  capture.controller->pauseRecording();
+  EXPECT_EQ(capture.controller->recordingState(), 4);
+  std::this_thread::sleep_for(500ms);
+  capture.controller->resumeRecording();
+  EXPECT_EQ(capture.controller->recordingState(), 3);
+  std::this_thread::sleep_for(400ms);
+  capture.controller->stopRecording();
+  ASSERT_EQ(capture.reports->wait(), Kind::complete);
+  EXPECT_EQ(capture.controller->recordingState(), 0);
+  ASSERT_FALSE(capture.controller->processRequestWithUUID("R", folder.file("R.mov")));
+  const auto runs = numberRuns(decodeMovie(folder.file("R.mov")).frameNumbers);
+  ASSERT_EQ(runs.size(), 2U);
+  EXPECT_NEAR(static_cast<double>(runs[1].first - runs[0].last), 15, 2);
+}
+
+TEST(LiveRecording, MaximalDurationEndsIt) {
+  const Folder folder;
+  Capture capture(folder, kFastVideo, kFastAudio);
+  capture.settings.maxDurationMinutes = 1;
+  ASSERT_TRUE(capture.prepare());
+  const double zero = capture.controller->pipeline()->wallOffset();
+  capture.controller->setStartWithUUID("R", zero, parametersFor("R"));
+  capture.controller->setStopWithUUID("R", zero + 61);
+  capture.controller->startRecording();
+  EXPECT_EQ(capture.reports->wait(), Kind::complete);
+}
+
+struct Fault {
+  const char* video;
+  const char* audio;
+  int code;
+};
+class LostDevice : public ::testing::TestWithParam<Fault> {};
+
+TEST_P(LostDevice, EndsTheRecordingWithWhatThereIs) {
+  const Folder folder;
+  Capture capture(folder, GetParam().video, GetParam().audio);
+  ASSERT_TRUE(capture.prepare());
+  capture.controller->setStartWithUUID("R", secondsSinceReferenceDate(), parametersFor("R"));
+  capture.controller->startRecording();
+  ASSERT_EQ(capture.reports->wait(), Kind::complete);
+  ASSERT_TRUE(capture.reports->error());
+  EXPECT_EQ(capture.reports->error()->code, GetParam().code);
+  EXPECT_TRUE(capture.controller->hasShutDown());
+  ASSERT_FALSE(capture.controller->processRequestWithUUID("R", folder.file("R.mov")));
+  const auto movie = decodeMovie(folder.file("R.mov"));
+  EXPECT_EQ(movie.problem, "");
+  EXPECT_GE(movie.frameNumbers.size(), 27U);
+  EXPECT_EQ(numberRuns(movie.frameNumbers).size(), 1U);
+}
+
+INSTANTIATE_TEST_SUITE_P(
+    Faults, LostDevice,
+    ::testing::Values(Fault{"test://video?size=320x180&lost-after=1", "test://audio", 1002},
+                      Fault{"test://video?size=320x180&eos-after=1", "test://audio?eos-after=1", 1203},
+                      Fault{"test://video?size=320x180&silent-after=1", "test://audio", 1300},
+                      Fault{"test://video?size=320x180", "test://audio?silent-after=1", 1302}));
+
+TEST(Preparing, AMissingDeviceIsNamed) {
+  const Folder folder;
+  Capture capture(folder, "file:///nowhere.mov", "test://audio");
+  EXPECT_FALSE(capture.prepare());
+  ASSERT_TRUE(capture.controller->lastError());
+  EXPECT_EQ(capture.controller->lastError()->code, kDeviceNotFound);
+  EXPECT_NE(capture.controller->lastError()->message.find("file:///nowhere.mov"), std::string::npos);
+  EXPECT_TRUE(capture.controller->hasShutDown());
+  EXPECT_FALSE(capture.controller->startRecording());
+  EXPECT_TRUE(std::filesystem::is_empty(folder.path()));
+}
+
+TEST(Preparing, AnIdentifierOfNoKindIsNamed) {
+  const Folder folder;
+  Capture capture(folder, "/dev/video0", "test://audio");
+  EXPECT_FALSE(capture.prepare());
+  EXPECT_NE(capture.controller->lastError()->message.find("zq-device-list"), std::string::npos);
+}
+
+TEST(Preparing, ARepositoryThatCannotBeWrittenIsNamed) {
+  const Folder folder;
+  Capture capture(folder);
+  capture.settings.captureTempDir = "/proc/nowhere";
+  EXPECT_FALSE(capture.prepare());
+  EXPECT_EQ(capture.controller->lastError()->code, kWriteFailed);
+}
+
+}  // namespace
+}  // namespace lmx
