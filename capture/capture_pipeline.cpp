@@ -234,6 +234,8 @@ void CapturePipeline::start() {
   if (running_.exchange(true)) return;
   last_video_ms_ = last_audio_ms_ = steadyMs();
   gst_element_set_state(pipeline_.get(), GST_STATE_PLAYING);
+  // A file prerolls again after its seek: until then there is no base time, and running time means nothing.
+  gst_element_get_state(pipeline_.get(), nullptr, nullptr, 2 * GST_SECOND);
 }
 
 void CapturePipeline::close() {

@@ -167,7 +167,8 @@ class Agent:
         before = self.log.mark()
         with self.connect() as peer:
             peer.sendall(line.encode() + b"\n")
-            self.log.wait(r"^Command: \S+ took", after=before, timeout=5)
+            # Sent before the line is done, the STATUS might join its chunk and wait with it.
+            self.log.wait(rf"^Command: {re.escape(line.split(' ')[0])} took", after=before, timeout=5)
             return exchange(peer, "STATUS").text
 
     def start_recording(self, uuid, minutes="60", unattended="60", **parameters):
