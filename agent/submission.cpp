@@ -104,7 +104,7 @@ void AgentMain::submit(const std::shared_ptr<AgentRecord>& stopped) {
   const std::string path =
       lookUp(properties, "RecordingMetadata_ADHOC_FILE_PATH")
           .value_or(context_->recording_repository_path().value_or("") + "/" + uuid.value_or("") + ".mov");
-  // A START that was refused meanwhile has cleared the metadata: its parameters then describe what is submitted.
+  // A START refused meanwhile has cleared the metadata: its parameters then describe what is submitted.
   stopped->setMetadata(withUuid(stopped->metadata() ? stopped->metadata() : properties, uuid));
   stopped->setStartTime(startOf(*stopped));
   dispatchAsync(WorkPriority::background, [this, stopped, path, elapsed] {
@@ -181,8 +181,9 @@ void AgentMain::keepRecovered(const std::vector<RecoveredRecording>& recordings)
     document.setRecord(record);
     document.setPropertyValuesWithContext(
         context_, recording.path, timeValueFrom(recording.startTime), timeValueFrom(recording.stopTime),
-        static_cast<std::int64_t>(recording.duration), withUuid(recording.parameters, std::nullopt), false);
-    document.writeProperties();
+        static_cast<std::int64_t>(recording.duration), recording.parameters, false);
+    // Without its document the movie stays in the journal, and the next start tries again.
+    if (!document.tryWriteProperties()) continue;
     recording.forget();
     LMPLogMessage(context_->log_context(), kLogNotice,
                   "Recovered unfinished recording \"%s\" (duration: %ds); it was not submitted",

@@ -11,6 +11,8 @@
 #include <algorithm>
 #include <cerrno>
 #include <csignal>
+#include <cstdint>
+#include <memory>
 
 #include "support/unique_fd.h"
 
@@ -44,6 +46,7 @@ class SpawnSettings {
     posix_spawnattr_destroy(&attributes_);
   }
   int spawn(pid_t* child, const std::vector<std::string>& argv) const {
+    if (argv.empty()) return EINVAL;
     std::vector<char*> words;
     for (const std::string& word : argv)
       words.push_back(const_cast<char*>(word.c_str()));  // NOLINT: exec's type
@@ -78,7 +81,7 @@ class ChildWait {
   ChildResult run() {
     ChildResult result;
     bool killed = false;
-    while (!ended_) {
+    while (!hasEnded()) {
       const milliseconds left = nextWait();
       if (left.count() == 0 && limitReached() && !killed) {
         killed = true;
@@ -88,17 +91,39 @@ class ChildWait {
       reportIfDue();
     }
     drain(result.output);
+    return collect(killed, std::move(result));
+  }
+
+ private:
+  /// Whether there is a status to collect. Without a descriptor for the child (an old kernel, none free)
+  /// waitOnce sleeps briefly and this asks.
+  bool hasEnded() {
+    if (handle_.valid() || ended_) return ended_;
+    siginfo_t info{};
+    const int asked = waitid(P_PID, static_cast<id_t>(child_), &info, WEXITED | WNOHANG | WNOWAIT);
+    ended_ = asked != 0 ? errno != EINTR : info.si_pid == child_;
+    return ended_;
+  }
+
+  ChildResult collect(bool killed, ChildResult result) const {
     int status = 0;
-    while (waitpid(child_, &status, 0) < 0 && errno == EINTR) {
+    pid_t reaped = 0;
+    do {
+      reaped = waitpid(child_, &status, 0);
+    } while (reaped < 0 && errno == EINTR);
+    if (reaped < 0) {
+      result.status = errno;  // somebody else took the status (SIGCHLD ignored): never call that a success
+      return result;
     }
-    result.end = killed                ? ChildResult::End::timedOut
+    // A child that ended by itself just before our signal has done its work.
+    const bool by_us = killed && WIFSIGNALED(status) && WTERMSIG(status) == SIGKILL;
+    result.end = by_us                 ? ChildResult::End::timedOut
                  : WIFSIGNALED(status) ? ChildResult::End::signalled
                                        : ChildResult::End::exited;
     result.status = WIFSIGNALED(status) ? WTERMSIG(status) : WEXITSTATUS(status);
     return result;
   }
 
- private:
   [[nodiscard]] bool limitReached() const {
     return options_.limit && Clock::now() - started_ >= *options_.limit;
   }
@@ -114,8 +139,10 @@ class ChildWait {
   }
 
   void waitOnce(milliseconds wait, bool killed, std::string& output) {
+    if (killed) wait = std::chrono::hours(1);
+    if (!handle_.valid()) wait = std::min(wait, milliseconds(20));
     pollfd polled[2] = {{handle_.get(), POLLIN, 0}, {output_.get(), POLLIN, 0}};
-    const int ready = poll(polled, 2, killed ? -1 : static_cast<int>(wait.count()) + 1);
+    const int ready = poll(polled, 2, static_cast<int>(wait.count()) + 1);
     if (ready <= 0) return;
     if (polled[1].revents != 0 && !readOutput(output_.get(), output, options_.maximumOutput)) output_.reset();
     if (polled[0].revents != 0) ended_ = true;
@@ -132,9 +159,12 @@ class ChildWait {
   /// The rest of the output. A grandchild may hold the pipe open for ever: it gets a tenth of a second.
   void drain(std::string& output) {
     const auto deadline = Clock::now() + milliseconds(100);
-    while (output_.valid() && Clock::now() < deadline) {
+    while (output_.valid()) {
+      const auto left = std::chrono::ceil<milliseconds>(deadline - Clock::now()).count();
       pollfd polled{output_.get(), POLLIN, 0};
-      if (poll(&polled, 1, 100) <= 0 || !readOutput(output_.get(), output, options_.maximumOutput)) return;
+      if (left <= 0 || poll(&polled, 1, static_cast<int>(left)) <= 0 ||
+          !readOutput(output_.get(), output, options_.maximumOutput))
+        return;
     }
   }
 
@@ -173,8 +203,9 @@ class SystemChildRunner : public ChildRunner {
 }  // namespace
 
 ChildRunner& systemChildRunner() {
-  static auto* runner = new SystemChildRunner;  // used by threads that outlive main
-  return *runner;
+  // Never destroyed: threads that outlive main use it.
+  static SystemChildRunner& runner = *std::make_unique<SystemChildRunner>().release();
+  return runner;
 }
 
 }  // namespace lmx

@@ -6,35 +6,49 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
-#include <cerrno>
+#include <cstdint>
+
+#include "platform/paths.h"
 
 namespace lmx {
 namespace {
 
+constexpr std::uint32_t kFileHints = IN_MODIFY | IN_ATTRIB | IN_DELETE_SELF | IN_MOVE_SELF;
+constexpr std::uint32_t kDirectoryHints = IN_CREATE | IN_DELETE | IN_MOVED_FROM | IN_MOVED_TO | IN_ONLYDIR;
+
 long long nanoseconds(const timespec& time) { return time.tv_sec * 1000000000LL + time.tv_nsec; }
+
+/// Reads all pending events. @return whether there were any; `modified` is set when one is a write.
+bool readHints(int inotify, bool& modified) {
+  alignas(inotify_event) char buffer[4096];
+  bool any = false;
+  for (;;) {
+    const ssize_t size = read(inotify, buffer, sizeof buffer);
+    if (size <= 0) return any;
+    any = true;
+    for (const char* at = buffer; at < buffer + size;) {
+      const auto* event = reinterpret_cast<const inotify_event*>(at);
+      if ((event->mask & IN_MODIFY) != 0) modified = true;
+      at += sizeof *event + event->len;
+    }
+  }
+}
 
 }  // namespace
 
 FileWatcher::FileWatcher() = default;
 
 bool FileWatcher::open(const std::string& path) {
-  close();
   path_ = path;
-  file_.reset(::open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK));
-  if (!file_.valid()) return false;
-  inotify_.reset(inotify_init1(IN_NONBLOCK | IN_CLOEXEC));
-  // By the descriptor's own name: the path may name another file by now.
-  const std::string self = "/proc/self/fd/" + std::to_string(file_.get());
-  const std::uint32_t mask = IN_MODIFY | IN_ATTRIB | IN_DELETE_SELF | IN_MOVE_SELF | IN_CLOSE_WRITE;
-  if (inotify_.valid() && inotify_add_watch(inotify_.get(), self.c_str(), mask) < 0 &&
-      inotify_add_watch(inotify_.get(), path.c_str(), mask) < 0) {
-    inotify_.reset();  // without hints every poll looks at the state itself
+  // Replaced between the open and the watch, the file would give no hint any more: then once again.
+  for (int attempt = 0; attempt < 3; ++attempt) {
+    close();
+    file_.reset(::open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK));
+    if (!file_.valid()) return false;
+    watch();
+    if (!classify(false).deleted) return true;
   }
-  struct stat now {};
-  fstat(file_.get(), &now);
-  size_ = now.st_size;
-  modified_ns_ = nanoseconds(now.st_mtim);
-  changed_ns_ = nanoseconds(now.st_ctim);
+  inotify_.reset();  // it never stands still: look at the state itself at every poll
   return true;
 }
 
@@ -43,35 +57,42 @@ void FileWatcher::close() {
   inotify_.reset();
 }
 
-FileEvents FileWatcher::poll() {
-  if (!file_.valid()) return {};
-  if (inotify_.valid()) {
-    alignas(inotify_event) char buffer[4096];
-    bool hint = false;
-    while (read(inotify_.get(), buffer, sizeof buffer) > 0) hint = true;
-    if (!hint) return {};
-  }
-  return classify();
+void FileWatcher::watch() {
+  inotify_.reset(inotify_init1(IN_NONBLOCK | IN_CLOEXEC));
+  if (!inotify_.valid()) return;
+  // By the descriptor's own name: the path may name another file by now.
+  const std::string self = "/proc/self/fd/" + std::to_string(file_.get());
+  const int watched = inotify_add_watch(inotify_.get(), self.c_str(), kFileHints);
+  // A symbolic link is replaced without any event on the file it pointed to: its directory tells.
+  const int directory = inotify_add_watch(inotify_.get(), directoryOf(path_).c_str(), kDirectoryHints);
+  if (watched < 0 || directory < 0) inotify_.reset();  // without hints every poll looks at the state itself
 }
 
-FileEvents FileWatcher::classify() {
+FileEvents FileWatcher::poll() {
+  if (!file_.valid()) return {};
+  bool modified = false;
+  if (inotify_.valid() && !readHints(inotify_.get(), modified)) return {};
+  return classify(modified);
+}
+
+FileEvents FileWatcher::classify(bool modified) {
   FileEvents events;
   struct stat held {};
   struct stat named {};
-  fstat(file_.get(), &held);
-  const bool there = stat(path_.c_str(), &named) == 0;
-  if (held.st_nlink == 0 || !there || named.st_ino != held.st_ino || named.st_dev != held.st_dev) {
+  const bool there = fstat(file_.get(), &held) == 0 && stat(path_.c_str(), &named) == 0;
+  if (!there || held.st_nlink == 0 || named.st_ino != held.st_ino || named.st_dev != held.st_dev) {
     events.deleted = true;
     return events;
   }
-  const long long modified = nanoseconds(held.st_mtim);
-  const long long changed = nanoseconds(held.st_ctim);
+  const long long written_ns = nanoseconds(held.st_mtim);
+  const long long changed_ns = nanoseconds(held.st_ctim);
   events.extended = held.st_size > size_;
-  events.written = held.st_size != size_ || modified != modified_ns_;
-  events.attributes = !events.written && changed != changed_ns_;
+  // The clock of files ticks in milliseconds: of two writes within one tick only the hint tells.
+  events.written = modified || held.st_size != size_ || written_ns != modified_ns_;
+  events.attributes = !events.written && changed_ns != changed_ns_;
   size_ = held.st_size;
-  modified_ns_ = modified;
-  changed_ns_ = changed;
+  modified_ns_ = written_ns;
+  changed_ns_ = changed_ns;
   return events;
 }
 

@@ -32,8 +32,9 @@ class FileWatcher {
   FileEvents poll();
 
  private:
-  struct State;
-  FileEvents classify();
+  void watch();
+  /// Compares with the last look; `modified`: a hint of a write was among the events.
+  FileEvents classify(bool modified);
   std::string path_;
   UniqueFd file_;
   UniqueFd inotify_;

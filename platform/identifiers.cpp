@@ -1,15 +1,15 @@
-// UUIDs from libuuid.
+// Unique identifiers from libuuid.
 #include "platform/identifiers.h"
 
-#include <uuid/uuid.h>
+#include <uuid.h>
 
 namespace lmx {
 
 std::string newUUIDString() {
-  uuid_t uuid;
-  uuid_generate_random(uuid);
-  char text[37];
-  uuid_unparse_upper(uuid, text);
+  uuid_t id;
+  uuid_generate_random(id);
+  char text[UUID_STR_LEN];
+  uuid_unparse_upper(id, text);
   return text;
 }
 

@@ -1,211 +1,334 @@
-// The log transport.
+// The system log: messages formatted, made safe for one line, and sent as datagrams without ever blocking.
 #include "platform/log.h"
 
+#include <fcntl.h>
+#include <poll.h>
 #include <sys/socket.h>
 #include <sys/un.h>
 #include <syslog.h>
 #include <unistd.h>
 
 #include <algorithm>
-#include <array>
+#include <atomic>
 #include <cerrno>
 #include <chrono>
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
 #include <ctime>
+#include <exception>
+#include <memory>
 #include <mutex>
-#include <new>
+#include <string_view>
 
 #include "platform/paths.h"
 #include "support/unique_fd.h"
 
 namespace lmx {
 
+struct LogContext {
+  LogContext(std::string name, int syslogFacility) : program(std::move(name)), facility(syslogFacility) {}
+
+  const std::string program;
+  const int facility;
+  std::mutex mutex;  ///< guards what follows, and keeps messages in order
+  UniqueFd socket;
+  unsigned long lost = 0;
+  std::chrono::steady_clock::time_point next_attempt{};
+};
+
 namespace {
 
-using Clock = std::chrono::steady_clock;
-constexpr std::size_t kMessageLimit = 8192;
+constexpr std::size_t kMessageLimit = 8U << 10;
 constexpr std::chrono::seconds kReconnectInterval{1};
+constexpr const char* kLevelNames[] = {"emergency", "alert",  "critical", "error",
+                                       "warning",   "notice", "info",     "debug"};
 
-int facilityCode(const std::string& name) {
-  static constexpr std::array<std::pair<const char*, int>, 6> kNames{{{"com.zandor.lumex", LOG_DAEMON},
-                                                                      {"daemon", LOG_DAEMON},
-                                                                      {"user", LOG_USER},
-                                                                      {"auth", LOG_AUTH},
-                                                                      {"local0", LOG_LOCAL0},
-                                                                      {"syslog", LOG_SYSLOG}}};
-  for (const auto& [text, code] : kNames) {
-    if (name == text) return code;
+class ErrnoKeeper {
+ public:
+  ErrnoKeeper() = default;
+  ErrnoKeeper(const ErrnoKeeper&) = delete;
+  ErrnoKeeper& operator=(const ErrnoKeeper&) = delete;
+  ~ErrnoKeeper() { errno = saved_; }
+
+ private:
+  const int saved_ = errno;
+};
+
+struct TestSink {
+  std::atomic<bool> active{false};  ///< lets ordinary messages pass without the lock
+  std::mutex mutex;                 ///< guards the two below and every call of the sink
+  LogSink sink = nullptr;
+  void* user = nullptr;
+};
+
+TestSink& testSink() {
+  static TestSink& sink = *std::make_unique<TestSink>().release();
+  return sink;
+}
+
+/// Never destroyed: threads log until the process has gone.
+LogContext& defaultContext() {
+  static LogContext& context = *std::make_unique<LogContext>("lmxagentd", LOG_DAEMON).release();
+  return context;
+}
+
+int facilityNamed(std::string_view name) {
+  struct Entry {
+    std::string_view name;
+    int facility;
+  };
+  static constexpr Entry kFacilities[] = {
+      {"com.zandor.lumex", LOG_DAEMON},
+      {"auth", LOG_AUTH},
+      {"authpriv", LOG_AUTHPRIV},
+      {"cron", LOG_CRON},
+      {"daemon", LOG_DAEMON},
+      {"ftp", LOG_FTP},
+      {"kern", LOG_KERN},
+      {"lpr", LOG_LPR},
+      {"mail", LOG_MAIL},
+      {"news", LOG_NEWS},
+      {"syslog", LOG_SYSLOG},
+      {"user", LOG_USER},
+      {"uucp", LOG_UUCP},
+      {"local0", LOG_LOCAL0},
+      {"local1", LOG_LOCAL1},
+      {"local2", LOG_LOCAL2},
+      {"local3", LOG_LOCAL3},
+      {"local4", LOG_LOCAL4},
+      {"local5", LOG_LOCAL5},
+      {"local6", LOG_LOCAL6},
+      {"local7", LOG_LOCAL7},
+  };
+  for (const Entry& entry : kFacilities) {
+    if (entry.name == name) return entry.facility;
   }
   return LOG_USER;
 }
 
-const char* levelName(int level) {
-  static constexpr const char* kLevels[] = {"emergency", "alert",  "critical", "error",
-                                            "warning",   "notice", "info",     "debug"};
-  return kLevels[level < 0 || level > 7 ? 7 : level];
+__attribute__((format(printf, 1, 0))) std::string formatMessage(const char* format, va_list arguments) {
+  char buffer[kMessageLimit + 1];
+  const int length = vsnprintf(buffer, sizeof buffer, format, arguments);
+  if (length < 0) return std::string("message that can't be formatted: ") + format;
+  return {buffer, std::min(static_cast<std::size_t>(length), kMessageLimit)};
 }
 
-/// A peer's bytes must not forge a log line: what controls a terminal or ends a line is shown instead.
-std::string escapedText(const char* text, std::size_t length) {
+void appendEscaped(std::string& out, unsigned char byte) {
+  switch (byte) {
+    case '\n':
+      out += "\\n";
+      return;
+    case '\r':
+      out += "\\r";
+      return;
+    case '\t':
+      out += "\\t";
+      return;
+    default:
+      break;
+  }
+  char text[5];
+  snprintf(text, sizeof text, "\\x%02X", static_cast<unsigned>(byte));
+  out += text;
+}
+
+/// Makes the text safe for one line: a peer's bytes must forge neither log lines nor terminal commands
+/// (the C1 controls, encoded as C2 80 … C2 9F, are such commands too). One newline at the end stays.
+std::string escapeControls(std::string_view text) {
+  const bool newline = !text.empty() && text.back() == '\n';
+  if (newline) text.remove_suffix(1);
   std::string out;
-  out.reserve(length + 8);
-  for (std::size_t i = 0; i < length; ++i) {
-    const auto c = static_cast<unsigned char>(text[i]);
-    const bool trailingNewline = c == '\n' && i + 1 == length;
-    if ((c >= ' ' && c != 0x7F) || trailingNewline) {
-      out += static_cast<char>(c);
+  out.reserve(text.size() + 1);
+  for (std::size_t i = 0; i < text.size() && out.size() < kMessageLimit; ++i) {
+    const auto byte = static_cast<unsigned char>(text[i]);
+    const auto next = static_cast<unsigned char>(i + 1 < text.size() ? text[i + 1] : 0);
+    if (byte == 0xC2 && next >= 0x80 && next < 0xA0) {
+      appendEscaped(out, byte);
+      appendEscaped(out, next);
+      ++i;
+    } else if (byte < 0x20 || byte == 0x7F) {
+      appendEscaped(out, byte);
     } else {
-      char escape[5];
-      std::snprintf(escape, sizeof escape, "\\x%02X", c);
-      out += c == '\n' ? "\\n" : c == '\r' ? "\\r" : c == '\t' ? "\\t" : escape;
+      out += text[i];
     }
   }
+  const std::size_t limit = kMessageLimit - (newline ? 1 : 0);
+  if (out.size() > limit) {
+    std::size_t end = limit;
+    while (end > 0 && (static_cast<unsigned char>(out[end]) & 0xC0) == 0x80) --end;  // whole characters only
+    out.resize(end);
+  }
+  if (newline) out += '\n';
   return out;
 }
 
-struct StandardError {
-  bool enabled = false;
+std::string datagramOf(const LogContext& context, int level, std::string_view text) {
+  static constexpr const char* kMonths[] = {"Jan", "Feb", "Mar", "Apr", "May", "Jun",
+                                            "Jul", "Aug", "Sep", "Oct", "Nov", "Dec"};
+  const std::time_t now = std::time(nullptr);
+  std::tm local{};
+  localtime_r(&now, &local);
+  char head[64];
+  snprintf(head, sizeof head, "<%d>%s %2d %02d:%02d:%02d ", context.facility | level, kMonths[local.tm_mon],
+           local.tm_mday, local.tm_hour, local.tm_min, local.tm_sec);
+  std::string datagram = head;
+  datagram += context.program;
+  datagram += '[' + std::to_string(getpid()) + "]: ";
+  datagram += text;
+  return datagram;
+}
+
+UniqueFd connectToLog() {
+  const std::string path = systemPath(kLogSocket);
+  sockaddr_un address{};
+  address.sun_family = AF_UNIX;
+  if (path.size() >= sizeof address.sun_path) return {};
+  std::memcpy(address.sun_path, path.c_str(), path.size() + 1);
+  UniqueFd fd(::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC | SOCK_NONBLOCK, 0));
+  if (!fd.valid()) return {};
+  if (connect(fd.get(), reinterpret_cast<const sockaddr*>(&address), sizeof address) != 0) return {};
+  return fd;
+}
+
+/// Connects unless the last failure was less than a second ago. Call with the context's lock held.
+bool ensureConnected(LogContext& context) {
+  if (context.socket.valid()) return true;
+  const auto now = std::chrono::steady_clock::now();
+  if (now < context.next_attempt) return false;
+  context.socket = connectToLog();
+  if (!context.socket.valid()) context.next_attempt = now + kReconnectInterval;
+  return context.socket.valid();
+}
+
+enum class Sent { yes, full, gone };
+
+Sent sendOnce(int socket, std::string_view datagram) {
+  for (;;) {
+    if (send(socket, datagram.data(), datagram.size(), MSG_DONTWAIT | MSG_NOSIGNAL) >= 0) return Sent::yes;
+    switch (errno) {
+      case EINTR:
+        continue;
+      case EAGAIN:
+      case ENOBUFS:
+      case ENOMEM:
+      case EMSGSIZE:
+        return Sent::full;
+      default:
+        return Sent::gone;
+    }
+  }
+}
+
+/// Sends, connecting anew once when the log daemon has been restarted. Call with the context's lock held.
+bool deliver(LogContext& context, std::string_view datagram) {
+  for (int attempt = 0; attempt < 2; ++attempt) {
+    if (!ensureConnected(context)) return false;
+    switch (sendOnce(context.socket.get(), datagram)) {
+      case Sent::yes:
+        return true;
+      case Sent::full:
+        return false;
+      case Sent::gone:
+        context.socket.reset();
+        break;
+    }
+  }
+  context.next_attempt = std::chrono::steady_clock::now() + kReconnectInterval;
+  return false;
+}
+
+void sendToLog(LogContext& context, int level, std::string_view text) {
+  if (context.lost > 0) {
+    const std::string notice = std::to_string(context.lost) + " messages lost";
+    if (deliver(context, datagramOf(context, kLogWarning, notice))) context.lost = 0;
+  }
+  // A message that goes out behind lost ones that could not be told would hide the gap.
+  if (context.lost > 0 || !deliver(context, datagramOf(context, level, text))) ++context.lost;
+}
+
+struct Mirror {
+  bool always = false;
   int level = kLogDebug;
 };
 
-const StandardError& standardError() {
-  static const StandardError settings = [] {
-    StandardError s;
-    const char* target = std::getenv("LMXAGENTD_LOG");
-    s.enabled = (target != nullptr && std::strcmp(target, "stderr") == 0) || isatty(STDERR_FILENO) == 1;
-    if (const char* level = std::getenv("LMXAGENTD_LOG_LEVEL")) s.level = std::atoi(level);
-    return s;
-  }();
-  return settings;
+Mirror readMirror() {
+  Mirror mirror;
+  const char* target = std::getenv("LMXAGENTD_LOG");
+  mirror.always = target != nullptr && std::strcmp(target, "stderr") == 0;
+  const char* level = std::getenv("LMXAGENTD_LOG_LEVEL");
+  if (level != nullptr && *level >= '0' && *level <= '9') mirror.level = std::atoi(level);
+  return mirror;
 }
 
-struct Sink {
-  std::mutex mutex;
-  LogSink function = nullptr;  // guarded by mutex
-  void* user = nullptr;        // guarded by mutex
-};
-Sink& sink() {
-  static auto* instance = new Sink;
-  return *instance;
+/// Whether a write to standard error will not block and not raise SIGPIPE.
+bool canWriteToStandardError() {
+  pollfd fd{STDERR_FILENO, POLLOUT, 0};
+  return poll(&fd, 1, 0) == 1 && (fd.revents & (POLLERR | POLLHUP | POLLNVAL)) == 0;
 }
 
-bool givenToSink(int level, const std::string& text) {
-  const std::lock_guard lock(sink().mutex);
-  if (sink().function == nullptr) return false;
-  sink().function(sink().user, level, text);
+void mirrorToStandardError(const LogContext& context, int level, std::string_view text) {
+  static const Mirror mirror = readMirror();
+  // Asked each time: the descriptor may have been replaced since, by something that isn't ours to write to.
+  if (level > mirror.level || !(mirror.always || isatty(STDERR_FILENO) == 1)) return;
+  if (!canWriteToStandardError()) return;
+  std::string line = context.program + '[' + std::to_string(getpid()) + "] " + kLevelNames[level] + ": ";
+  line += text;
+  if (line.back() != '\n') line += '\n';
+  [[maybe_unused]] const ssize_t written = write(STDERR_FILENO, line.data(), line.size());
+}
+
+bool giveToTestSink(int level, const std::string& text) {
+  TestSink& sink = testSink();
+  if (!sink.active.load(std::memory_order_acquire)) return false;
+  const std::lock_guard lock(sink.mutex);
+  if (sink.sink == nullptr) return false;
+  sink.sink(sink.user, level, text);
   return true;
 }
 
-}  // namespace
-
-struct LogContext {
-  std::string program;
-  int facility = LOG_DAEMON;
-
-  void write(int level, const std::string& text) {
-    const std::lock_guard lock(mutex_);
-    if (lost_ > 0 && send(kLogWarning, std::to_string(lost_) + " messages lost")) lost_ = 0;
-    if (lost_ > 0 || !send(level, text)) ++lost_;
-  }
-
- private:
-  bool send(int level, const std::string& text) {
-    if (!socket_.valid() && !open()) return false;
-    char stamp[32];
-    const time_t now = std::time(nullptr);
-    tm local{};
-    localtime_r(&now, &local);
-    // Month names in English whatever the locale: the form every log daemon reads.
-    static constexpr const char* kMonths[] = {"Jan", "Feb", "Mar", "Apr", "May", "Jun",
-                                              "Jul", "Aug", "Sep", "Oct", "Nov", "Dec"};
-    std::snprintf(stamp, sizeof stamp, "%s %2d %02d:%02d:%02d", kMonths[local.tm_mon % 12], local.tm_mday,
-                  local.tm_hour, local.tm_min, local.tm_sec);
-    const std::string datagram = "<" + std::to_string(facility | level) + ">" + stamp + " " + program + "[" +
-                                 std::to_string(getpid()) + "]: " + text;
-    if (sendDatagram(datagram)) return true;
-    if (errno != ECONNREFUSED && errno != ENOTCONN && errno != ENOENT && errno != ECONNRESET) return false;
-    socket_.reset();  // the log daemon was restarted
-    last_attempt_ = {};
-    return open() && sendDatagram(datagram);
-  }
-
-  bool sendDatagram(const std::string& datagram) {
-    return ::send(socket_.get(), datagram.data(), datagram.size(), MSG_DONTWAIT | MSG_NOSIGNAL) >= 0;
-  }
-
-  bool open() {
-    const auto now = Clock::now();
-    if (now - last_attempt_ < kReconnectInterval) return false;
-    last_attempt_ = now;
-    UniqueFd fd(::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0));
-    sockaddr_un address{};
-    address.sun_family = AF_UNIX;
-    const std::string path = systemPath(kLogSocket);
-    if (!fd.valid() || path.size() >= sizeof address.sun_path) return false;
-    std::memcpy(address.sun_path, path.c_str(), path.size() + 1);
-    if (connect(fd.get(), reinterpret_cast<const sockaddr*>(&address), sizeof address) != 0) return false;
-    socket_ = std::move(fd);
-    return true;
-  }
-
-  std::mutex mutex_;
-  UniqueFd socket_;                   // guarded by mutex_
-  std::uint64_t lost_ = 0;            // guarded by mutex_
-  Clock::time_point last_attempt_{};  // guarded by mutex_
-};
-
-namespace {
-
-LogContext& defaultContext() {
-  static auto* context = [] {  // never destroyed: threads log until the process ends
-    auto* made = new LogContext;
-    made->program = "lmxagentd";
-    return made;
-  }();
-  return *context;
+void writeMessage(LogContext& context, int level, const std::string& text) {
+  if (giveToTestSink(level, text)) return;
+  const std::lock_guard lock(context.mutex);
+  sendToLog(context, level, text);
+  mirrorToStandardError(context, level, text);
 }
 
 }  // namespace
 
 LMPLogContext LMPLogCreateContext(const char* program, const char* facility) {
   if (program == nullptr || facility == nullptr) return nullptr;
-  auto* context = new (std::nothrow) LogContext;
-  if (context == nullptr) return nullptr;
-  context->program = program;
-  context->facility = facilityCode(facility);
-  return context;
+  try {
+    auto context = std::make_unique<LogContext>(program, facilityNamed(facility));
+    context->socket = connectToLog();
+    return context.release();
+  } catch (const std::exception&) {
+    return nullptr;
+  }
 }
 
-void LMPLogDestroyContext(LMPLogContext context) { delete context; }
+void LMPLogDestroyContext(LMPLogContext context) { const std::unique_ptr<LogContext> owner(context); }
 
 void LMPLogMessage(LMPLogContext context, int level, const char* format, ...) {
-  const int saved = errno;
-  char buffer[kMessageLimit];
+  const ErrnoKeeper errno_keeper;
+  LogContext& target = context != nullptr ? *context : defaultContext();
   va_list arguments;
   va_start(arguments, format);
-  const int length = std::vsnprintf(buffer, sizeof buffer, format, arguments);
-  va_end(arguments);
-  if (length >= 0) {
-    const std::string text =
-        escapedText(buffer, std::min<std::size_t>(static_cast<std::size_t>(length), kMessageLimit - 1));
-    if (!givenToSink(level, text)) {
-      (context != nullptr ? *context : defaultContext()).write(level, text);
-      if (standardError().enabled && level <= standardError().level) {
-        std::string line = std::string("lmxagentd ") + levelName(level) + ": " + text;
-        if (line.back() != '\n') line += '\n';
-        [[maybe_unused]] const ssize_t n = ::write(STDERR_FILENO, line.data(), line.size());
-      }
-    }
+  try {
+    const std::string text = escapeControls(formatMessage(format, arguments));
+    writeMessage(target, std::clamp(level, 0, static_cast<int>(kLogDebug)), text);
+  } catch (const std::exception&) {
+    // No memory for the message: there is nobody left to tell.
   }
-  errno = saved;
+  va_end(arguments);
 }
 
-void setLogSinkForTesting(LogSink function, void* user) {
-  const std::lock_guard lock(sink().mutex);
-  sink().function = function;
-  sink().user = user;
+void setLogSinkForTesting(LogSink sink, void* user) {
+  TestSink& target = testSink();
+  const std::lock_guard lock(target.mutex);
+  target.sink = sink;
+  target.user = user;
+  target.active.store(sink != nullptr, std::memory_order_release);
 }
 
 }  // namespace lmx

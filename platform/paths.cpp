@@ -1,22 +1,29 @@
-// Fixed paths behind the trial directory.
+// The root directory in front of the system's fixed paths.
 #include "platform/paths.h"
 
 #include <cstdlib>
+#include <memory>
 
 namespace lmx {
+namespace {
+
+std::string readRoot() {
+  const char* value = std::getenv("LMXAGENTD_ROOT");
+  std::string root = value != nullptr ? value : "";
+  while (!root.empty() && root.back() == '/') root.pop_back();
+  return root;
+}
+
+}  // namespace
 
 std::string systemPath(std::string_view fixedPath) {
-  static const auto* root = new std::string([] {
-    const char* value = std::getenv("LMXAGENTD_ROOT");
-    std::string text = value == nullptr ? "" : value;
-    while (!text.empty() && text.back() == '/') text.pop_back();
-    return text;
-  }());
-  return *root + std::string(fixedPath);
+  // Never destroyed: threads that outlive main's statics still log, and so still ask for paths.
+  static const std::string& root = *std::make_unique<std::string>(readRoot()).release();
+  return root + std::string(fixedPath);
 }
 
 std::string directoryOf(std::string_view path) {
-  const std::size_t slash = path.rfind('/');
+  const auto slash = path.rfind('/');
   if (slash == std::string_view::npos) return ".";
   return slash == 0 ? "/" : std::string(path.substr(0, slash));
 }

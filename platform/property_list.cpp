@@ -6,11 +6,16 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <cctype>
 #include <cerrno>
+#include <cmath>
 #include <cstdlib>
 #include <cstring>
+#include <limits>
 #include <memory>
+#include <string_view>
+#include <utility>
 
 #include "platform/property_list_guard.h"
 #include "support/directories.h"
@@ -112,15 +117,19 @@ struct Overloaded : Ts... {
 template <class... Ts>
 Overloaded(Ts...) -> Overloaded<Ts...>;
 
+/// The library's seconds are 32 bits wide; what lies outside of 1932 … 2069 becomes their end.
+std::int32_t dateSeconds(const PlistDate& date) {
+  if (std::isnan(date.secondsSinceReferenceDate)) return 0;
+  constexpr double kLimit = std::numeric_limits<std::int32_t>::max();
+  return static_cast<std::int32_t>(std::clamp(std::floor(date.secondsSinceReferenceDate), -kLimit, kLimit));
+}
+
 plist_t newNode(const PlistValue& value) {
-  return std::visit(Overloaded{[](const std::string& v) { return plist_new_string(v.c_str()); },
+  return std::visit(Overloaded{[](const std::string& v) { return plist_new_string(xmlText(v).c_str()); },
                                [](bool v) { return plist_new_bool(v ? 1 : 0); },
                                [](std::int64_t v) { return plist_new_uint(static_cast<std::uint64_t>(v)); },
                                [](double v) { return plist_new_real(v); },
-                               [](const PlistDate& v) {
-                                 return plist_new_date(static_cast<std::int32_t>(v.secondsSinceReferenceDate),
-                                                       0);
-                               },
+                               [](const PlistDate& v) { return plist_new_date(dateSeconds(v), 0); },
                                [](const PlistValue::Data& v) {
                                  return plist_new_data(reinterpret_cast<const char*>(v.data()), v.size());
                                },
@@ -133,11 +142,24 @@ plist_t newNode(const PlistValue& value) {
                                [](const PlistDictionary& v) {
                                  plist_t dictionary = plist_new_dict();
                                  for (const auto& [key, item] : v)
-                                   plist_dict_set_item(dictionary, key.c_str(), newNode(item));
+                                   plist_dict_set_item(dictionary, xmlText(key).c_str(), newNode(item));
                                  return dictionary;
                                }},
                     value.value);
 }
+
+constexpr std::string_view kByteOrderMark = "\xEF\xBB\xBF";
+/// Far above every limit on files: lengths given to the library are 32 bits wide.
+constexpr std::size_t kParseLimit = 64U << 20;
+
+PlistResult refusal(std::string problem, int systemError = 0) {
+  PlistResult result;
+  result.systemError = systemError;
+  result.problem = std::move(problem);
+  return result;
+}
+
+PlistResult systemFailure(int error) { return refusal(std::strerror(error), error); }
 
 std::string lowered(std::string text) {
   for (char& c : text) c = static_cast<char>(std::tolower(static_cast<unsigned char>(c)));
@@ -170,63 +192,43 @@ bool PlistValue::asBool() const {
 }
 
 PlistResult parsePropertyList(const std::string& bytes) {
-  PlistResult result;
-  std::string text = bytes.starts_with("\xEF\xBB\xBF") ? bytes.substr(3) : bytes;
-  const bool binary = text.starts_with("bplist00");
-  if (!binary && text.find('<') == std::string::npos) {
-    result.problem = text.empty() ? "the file is empty" : "neither an XML nor a binary property list";
-    return result;
-  }
-  if (const auto refused = binary ? refuseBinary(text) : refuseXml(text)) {
-    result.problem = *refused;
-    return result;
-  }
-  plist_t raw = nullptr;
-  if (binary) {
-    plist_from_bin(text.data(), static_cast<std::uint32_t>(text.size()), &raw);
+  std::string_view text = bytes;
+  if (text.starts_with(kByteOrderMark)) text.remove_prefix(kByteOrderMark.size());
+  if (text.empty()) return refusal("the file is empty");
+  if (text.size() > kParseLimit) return refusal("larger than " + std::to_string(kParseLimit) + " bytes");
+  plist_t root = nullptr;
+  if (text.starts_with("bplist00")) {
+    if (auto refused = refuseBinary(text)) return refusal(std::move(*refused));
+    plist_from_bin(text.data(), static_cast<std::uint32_t>(text.size()), &root);
+  } else if (text.find('<') != std::string_view::npos) {
+    const XmlCheck check = checkXml(text);
+    if (check.refused) return refusal(*check.refused);
+    plist_from_xml(check.clean.c_str(), static_cast<std::uint32_t>(check.clean.size()), &root);
   } else {
-    plist_from_xml(text.data(), static_cast<std::uint32_t>(text.size()), &raw);
+    return refusal("neither an XML nor a binary property list");
   }
-  const Node node(raw);
-  if (!node) {
-    result.problem = "not a well-formed property list";
-    return result;
-  }
+  const Node node(root);
+  if (!node) return refusal("not a well-formed property list");
+  PlistResult result;
   result.value = valueFrom(node.get());
   return result;
 }
 
 PlistResult readPropertyList(const std::string& path, std::size_t limit) {
-  PlistResult result;
-  const UniqueFd file(open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK));
+  const UniqueFd file(open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK | O_NOCTTY));
   struct stat info {};
-  if (!file.valid() || fstat(file.get(), &info) != 0) {
-    result.systemError = errno;
-    result.problem = std::strerror(result.systemError);
-    return result;
-  }
-  if (!S_ISREG(info.st_mode)) {
-    result.problem = "not a regular file";
-    return result;
-  }
+  if (!file.valid() || fstat(file.get(), &info) != 0) return systemFailure(errno);
+  if (!S_ISREG(info.st_mode)) return refusal("not a regular file", S_ISDIR(info.st_mode) ? EISDIR : EINVAL);
   std::string bytes;
   char buffer[16384];
   for (;;) {
     const ssize_t n = read(file.get(), buffer, sizeof buffer);
     if (n < 0 && errno == EINTR) continue;
-    if (n < 0) {
-      result.systemError = errno;
-      result.problem = std::strerror(result.systemError);
-      return result;
-    }
-    if (n == 0) break;
+    if (n < 0) return systemFailure(errno);
+    if (n == 0) return parsePropertyList(bytes);
     bytes.append(buffer, static_cast<std::size_t>(n));
-    if (bytes.size() > limit) {
-      result.problem = "larger than " + std::to_string(limit) + " bytes";
-      return result;
-    }
+    if (bytes.size() > limit) return refusal("larger than " + std::to_string(limit) + " bytes", EFBIG);
   }
-  return parsePropertyList(bytes);
 }
 
 std::string propertyListXml(const PlistValue& value) {

@@ -1,57 +1,42 @@
-// Walking property lists to measure them.
+// Walking binary property lists to measure them.
 #include "platform/property_list_guard.h"
 
+#include <bit>
 #include <cstdint>
 #include <set>
-#include <vector>
 
 #include "platform/property_list.h"
 
 namespace lmx {
 namespace {
 
-std::string tooDeep() { return "nested more than " + std::to_string(kPlistDepthLimit) + " levels"; }
-std::string tooMany() { return "more than " + std::to_string(kPlistNodeLimit) + " values"; }
+constexpr std::uint64_t kTrailerSize = 32;
+constexpr std::uint64_t kHeaderSize = 8;
+/// Texts and data, each counted as often as it is referred to.
+constexpr std::uint64_t kExpandedBytesLimit = 16U << 20;
+/// Dates are handed on as 32-bit seconds.
+constexpr double kDateLimit = 2147483647.0;
+constexpr const char* kMalformed = "malformed binary property list";
 
-/// The end of the tag that starts at `at`: behind its ">", quoted attribute values skipped.
-std::size_t endOfTag(std::string_view text, std::size_t at) {
-  char quote = '\0';
-  for (; at < text.size(); ++at) {
-    if (quote != '\0') {
-      if (text[at] == quote) quote = '\0';
-    } else if (text[at] == '"' || text[at] == '\'') {
-      quote = text[at];
-    } else if (text[at] == '>') {
-      return at + 1;
-    }
-  }
-  return std::string_view::npos;
-}
-
-std::size_t behind(std::string_view text, std::size_t at, std::string_view terminator) {
-  const std::size_t end = text.find(terminator, at);
-  return end == std::string_view::npos ? end : end + terminator.size();
-}
-
-/// The binary form's tables.
 class BinaryWalk {
  public:
   explicit BinaryWalk(std::string_view bytes) : bytes_(bytes) {}
 
   std::optional<std::string> check() {
-    if (bytes_.size() < 40) return "too short for a binary property list";
-    const std::size_t trailer = bytes_.size() - 32;
+    if (bytes_.size() < kHeaderSize + kTrailerSize) return "too short for a binary property list";
+    const std::uint64_t trailer = bytes_.size() - kTrailerSize;
     offset_size_ = byte(trailer + 6);
     reference_size_ = byte(trailer + 7);
     objects_ = number(trailer + 8, 8);
     const std::uint64_t top = number(trailer + 16, 8);
     table_ = number(trailer + 24, 8);
-    if (offset_size_ < 1 || offset_size_ > 8 || reference_size_ < 1 || reference_size_ > 8 || objects_ == 0 ||
-        objects_ > bytes_.size() || table_ > trailer || objects_ * offset_size_ > trailer - table_ ||
-        top >= objects_) {
-      return "malformed binary property list";
+    const bool sizes_fit = std::has_single_bit(offset_size_) && offset_size_ <= 8 &&
+                           std::has_single_bit(reference_size_) && reference_size_ <= 8;
+    if (!sizes_fit || objects_ > bytes_.size() || table_ < kHeaderSize || table_ > trailer ||
+        objects_ * offset_size_ > trailer - table_ || top >= objects_) {
+      return kMalformed;
     }
-    walk(top, 0);
+    walk(top, 1);
     return problem_;
   }
 
@@ -67,53 +52,124 @@ class BinaryWalk {
     if (!problem_) problem_ = std::move(problem);
   }
 
-  /// Reads the element count behind a marker. @return false when it does not fit.
-  bool readCount(std::uint64_t& at, std::uint64_t& count) {
+  /// Where an object's bytes begin; 0 when that is outside of the objects.
+  [[nodiscard]] std::uint64_t placeOf(std::uint64_t object) const {
+    const std::uint64_t at = number(table_ + object * offset_size_, offset_size_);
+    return at >= kHeaderSize && at < table_ ? at : 0;
+  }
+
+  /// Reads the element count at and behind a marker and moves `at` to the elements. @return false when it
+  /// does not fit.
+  bool readCount(std::uint64_t& at, std::uint64_t& count) const {
     count = byte(at) & 0x0FU;
     ++at;
     if (count != 0x0F) return true;
-    if (at >= table_) return false;
+    if (at >= table_ || (byte(at) & 0xF0U) != 0x10 || (byte(at) & 0x0FU) > 3) return false;
     const unsigned size = 1U << (byte(at) & 0x0FU);
-    if ((byte(at) & 0xF0U) != 0x10 || size > 8 || at + 1 + size > table_) return false;
+    if (size >= table_ - at) return false;
     count = number(at + 1, size);
     at += 1 + size;
-    return true;
+    return count <= bytes_.size();
   }
 
   void walk(std::uint64_t object, int depth) {
-    if (problem_) return;
     if (depth > kPlistDepthLimit) return fail(tooDeep());
     if (++nodes_ > kPlistNodeLimit) return fail(tooMany());
-    std::uint64_t at = number(table_ + object * offset_size_, offset_size_);
-    if (at < 8 || at >= table_) return fail("malformed binary property list");
-    const unsigned kind = byte(at) & 0xF0U;
-    std::uint64_t count = 0;
-    if (kind == 0xA0 || kind == 0xC0 || kind == 0xD0) {
-      if (!readCount(at, count)) return fail("malformed binary property list");
-      const std::uint64_t references = kind == 0xD0 ? count * 2 : count;
-      if (count > bytes_.size() || references * reference_size_ > table_ - at) {
-        return fail("malformed binary property list");
-      }
-      walkChildren(object, at, references, depth);
-    } else if (kind == 0x40 || kind == 0x50 || kind == 0x60) {
-      const unsigned unit = kind == 0x60 ? 2 : 1;
-      if (!readCount(at, count) || count > bytes_.size() || count * unit > table_ - at) {
-        fail("malformed binary property list");
-      }
-    } else if (kind == 0x10 || kind == 0x20 || kind == 0x30) {
-      if (at + 1 + (std::uint64_t{1} << (byte(at) & 0x0FU)) > table_) fail("malformed binary property list");
+    const std::uint64_t at = placeOf(object);
+    if (at == 0) return fail(kMalformed);
+    switch (byte(at) & 0xF0U) {
+      case 0x00:
+        return walkBoolean(at);
+      case 0x10:
+        return walkFixed(at, 4);
+      case 0x20:
+        return walkFixed(at, 3);
+      case 0x30:
+        return walkDate(at);
+      case 0x40:
+        return (void)walkBytes(at, 1, 1);
+      case 0x50:
+      case 0x60:
+        return walkText(at);
+      case 0xA0:
+      case 0xD0:
+        return walkContainer(object, at, depth);
+      default:
+        return fail("a value of a kind that is not supported");
     }
   }
 
-  void walkChildren(std::uint64_t object, std::uint64_t at, std::uint64_t references, int depth) {
+  void walkBoolean(std::uint64_t at) {
+    if (byte(at) != 0x08 && byte(at) != 0x09) fail("a value of a kind that is not supported");
+  }
+
+  /// A number of 2^n bytes, n at most `maximum`.
+  void walkFixed(std::uint64_t at, unsigned maximum) {
+    const unsigned exponent = byte(at) & 0x0FU;
+    const bool real_too_short = maximum == 3 && exponent < 2;
+    if (exponent > maximum || real_too_short || (1ULL << exponent) >= table_ - at) fail(kMalformed);
+  }
+
+  void walkDate(std::uint64_t at) {
+    if (byte(at) != 0x33 || table_ - at <= 8) return fail(kMalformed);
+    const double seconds = std::bit_cast<double>(number(at + 1, 8));
+    if (!(seconds >= -kDateLimit && seconds <= kDateLimit)) fail("a date out of range");
+  }
+
+  /// @return the bytes; empty when they are refused.
+  std::string_view walkBytes(std::uint64_t at, unsigned unit, unsigned expanded) {
+    std::uint64_t count = 0;
+    if (!readCount(at, count) || count * unit > table_ - at) {
+      fail(kMalformed);
+      return {};
+    }
+    expanded_bytes_ += count * expanded;
+    if (expanded_bytes_ > kExpandedBytesLimit) {
+      fail("texts and data of more than " + std::to_string(kExpandedBytesLimit) + " bytes");
+    }
+    return bytes_.substr(at, count * unit);
+  }
+
+  void walkText(std::uint64_t at) {
+    const bool wide = (byte(at) & 0xF0U) == 0x60;
+    // Two bytes of UTF-16 become up to three of UTF-8.
+    const std::string_view text = walkBytes(at, wide ? 2 : 1, wide ? 3 : 1);
+    const std::size_t step = wide ? 2 : 1;
+    for (std::size_t i = 0; i < text.size(); i += step) {
+      // The library aborts the process on such a text.
+      if (text[i] == '\0' && text[i + step - 1] == '\0') return fail("a NUL character");
+    }
+  }
+
+  void walkContainer(std::uint64_t object, std::uint64_t at, int depth) {
+    const bool dictionary = (byte(at) & 0xF0U) == 0xD0;
+    std::uint64_t count = 0;
+    if (!readCount(at, count)) return fail(kMalformed);
+    const std::uint64_t references = dictionary ? count * 2 : count;
+    if (references * reference_size_ > table_ - at) return fail(kMalformed);
     if (!open_.insert(object).second) return fail("a value that contains itself");
     for (std::uint64_t i = 0; i < references && !problem_; ++i) {
       const std::uint64_t child = number(at + i * reference_size_, reference_size_);
-      if (child >= objects_) return fail("malformed binary property list");
-      walk(child, depth + 1);
+      if (child >= objects_) return fail(kMalformed);
+      // A dictionary lists its keys before its values.
+      if (dictionary && i < count) {
+        walkKey(child);
+      } else {
+        walk(child, depth + 1);
+      }
     }
     open_.erase(object);
   }
+
+  void walkKey(std::uint64_t object) {
+    const std::uint64_t at = placeOf(object);
+    const unsigned kind = at == 0 ? 0 : byte(at) & 0xF0U;
+    if (kind != 0x50 && kind != 0x60) return fail("a key that is not a text");
+    walkText(at);
+  }
+
+  static std::string tooDeep() { return "nested more than " + std::to_string(kPlistDepthLimit) + " levels"; }
+  static std::string tooMany() { return "more than " + std::to_string(kPlistNodeLimit) + " values"; }
 
   std::string_view bytes_;
   unsigned offset_size_ = 0;
@@ -121,40 +177,12 @@ class BinaryWalk {
   std::uint64_t objects_ = 0;
   std::uint64_t table_ = 0;
   std::size_t nodes_ = 0;
-  std::set<std::uint64_t> open_;
+  std::uint64_t expanded_bytes_ = 0;
+  std::set<std::uint64_t> open_;  ///< the containers that are being walked: one met again contains itself
   std::optional<std::string> problem_;
 };
 
 }  // namespace
-
-std::optional<std::string> refuseXml(std::string_view text) {
-  int depth = 0;
-  std::size_t elements = 0;
-  for (std::size_t at = text.find('<'); at != std::string_view::npos; at = text.find('<', at)) {
-    const std::string_view rest = text.substr(at);
-    if (rest.starts_with("<!--")) {
-      at = behind(text, at + 4, "-->");
-    } else if (rest.starts_with("<![CDATA[")) {
-      at = behind(text, at, "]]>");
-    } else if (rest.starts_with("<?")) {
-      at = behind(text, at, "?>");
-    } else {
-      const std::size_t end = endOfTag(text, at);
-      if (end == std::string_view::npos) return "a tag that does not end";
-      if (rest.starts_with("<!")) {
-        if (rest.substr(0, end - at).find('[') != std::string_view::npos) return "a DOCTYPE with definitions";
-      } else if (rest.starts_with("</")) {
-        --depth;
-      } else if (text[end - 2] != '/') {
-        if (++depth > kPlistDepthLimit) return tooDeep();
-        if (++elements > 2 * kPlistNodeLimit) return tooMany();
-      }
-      at = end;
-    }
-    if (at == std::string_view::npos) return "markup that does not end";
-  }
-  return std::nullopt;
-}
 
 std::optional<std::string> refuseBinary(std::string_view bytes) { return BinaryWalk(bytes).check(); }
 

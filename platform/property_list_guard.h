@@ -6,12 +6,21 @@
 
 namespace lmx {
 
-/// Why an XML document must not be parsed (depth, number of elements, a DOCTYPE with definitions); nothing
-/// when it may.
-std::optional<std::string> refuseXml(std::string_view text);
+/// An XML document reduced to what a property list may hold, or why it is refused.
+struct XmlCheck {
+  std::string clean;                   ///< bare tags and their text: no comment, CDATA, attribute or DOCTYPE
+  std::optional<std::string> refused;  ///< depth, number of values, definitions, unbalanced or unknown tags
+};
 
-/// The same for a binary property list: malformed tables, references in a circle, depth, nodes as often as
-/// they expand.
+/// The parser gets `clean` instead of the document, so that nothing that it reads differently (a comment's
+/// end, a quoted bracket) can get past the bounds counted here.
+XmlCheck checkXml(std::string_view text);
+
+/// Why a binary property list must not be parsed (malformed tables, references in a circle, depth, values and
+/// bytes counted as often as they expand); nothing when it may.
 std::optional<std::string> refuseBinary(std::string_view bytes);
+
+/// `text` with what XML can't hold (control characters, bytes that are not UTF-8) replaced by U+FFFD.
+std::string xmlText(std::string_view text);
 
 }  // namespace lmx

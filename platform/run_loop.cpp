@@ -10,8 +10,8 @@
 #include <cerrno>
 #include <condition_variable>
 #include <deque>
-#include <list>
 #include <mutex>
+#include <optional>
 #include <thread>
 #include <vector>
 
@@ -19,30 +19,67 @@
 #include "support/unique_fd.h"
 
 namespace lmx {
-
-using Clock = std::chrono::steady_clock;
-
 namespace {
 
-/// A posted action and, when somebody waits for it, its outcome.
+using Clock = std::chrono::steady_clock;
+constexpr std::chrono::milliseconds kLongestTurn = std::chrono::hours(24);
+
+/// The outcome that the poster of an action waits for. It outlives the loop when it must.
+class Waiter {
+ public:
+  void finish(bool ran) {
+    const std::lock_guard lock(mutex_);
+    done_ = true;
+    ran_ = ran;
+    changed_.notify_all();
+  }
+  bool wait() {
+    std::unique_lock lock(mutex_);
+    changed_.wait(lock, [this] { return done_; });
+    return ran_;
+  }
+
+ private:
+  std::mutex mutex_;
+  std::condition_variable changed_;
+  bool done_ = false;  // guarded by mutex_
+  bool ran_ = false;   // guarded by mutex_
+};
+
 struct Posted {
   RunLoop::Action action;
-  bool waited = false;
-  bool done = false;
-  bool ran = false;
+  std::shared_ptr<Waiter> waiter;  ///< null when nobody waits
 };
 
-struct Timer {
-  Clock::duration interval;
-  Clock::time_point due;
+/// A timer or a watch. While its action runs it is not offered again, so that a nested turn can't recurse
+/// into it.
+struct Entry {
   RunLoop::Action action;
+  int fd = -1;                 ///< watches
+  Clock::duration interval{};  ///< timers
+  Clock::time_point due{};     ///< timers
+  bool running = false;
+  bool removed = false;
+};
+using Entries = std::vector<std::shared_ptr<Entry>>;
+
+/// Shares the entry with the loop, which forgets it at its next turn.
+class EntrySource : public RunLoop::Source {
+ public:
+  explicit EntrySource(std::shared_ptr<Entry> entry) : entry_(std::move(entry)) {}
+  EntrySource(const EntrySource&) = delete;
+  EntrySource& operator=(const EntrySource&) = delete;
+  ~EntrySource() override {
+    entry_->removed = true;
+    // A running action must not lose what it has captured: the loop drops it afterwards.
+    if (!entry_->running) entry_->action = nullptr;
+  }
+
+ private:
+  std::shared_ptr<Entry> entry_;
 };
 
-struct Watch {
-  int fd;
-  RunLoop::Action action;
-};
-
+/// A failing action costs itself, not the loop.
 void runGuarded(const RunLoop::Action& action) {
   try {
     action();
@@ -53,174 +90,182 @@ void runGuarded(const RunLoop::Action& action) {
   }
 }
 
+void runEntry(const std::shared_ptr<Entry>& entry) {
+  entry->running = true;
+  runGuarded(entry->action);
+  entry->running = false;
+  if (entry->removed) entry->action = nullptr;
+}
+
+/// The next beat after `now`, in step with the earlier ones.
+Clock::time_point nextBeat(const Entry& timer, Clock::time_point now) {
+  return timer.due + timer.interval * ((now - timer.due) / timer.interval + 1);
+}
+
 }  // namespace
 
 struct RunLoop::Impl {
   UniqueFd wake{eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK)};
   std::atomic<std::thread::id> owner{};
   std::mutex mutex;
-  std::condition_variable changed;
-  std::deque<std::shared_ptr<Posted>> queue;  // guarded by mutex
-  bool stopped = false;                       // guarded by mutex
-  int waiters = 0;                            // guarded by mutex
-  std::list<std::shared_ptr<Timer>> timers;   // owner thread
-  std::list<std::shared_ptr<Watch>> watches;  // owner thread
+  std::deque<Posted> queue;  // guarded by mutex
+  bool rung = false;         // guarded by mutex: `wake` is readable
+  bool stopped = false;      // guarded by mutex
+  Entries timers;            // owner thread
+  Entries watches;           // owner thread
 
-  void ring() const {
+  /// Call with the lock held.
+  void ring() {
+    if (rung) return;
     const std::uint64_t one = 1;
-    [[maybe_unused]] const ssize_t n = write(wake.get(), &one, sizeof one);
+    rung = write(wake.get(), &one, sizeof one) == sizeof one;
   }
-  void quiet() const {
-    std::uint64_t count = 0;
-    [[maybe_unused]] const ssize_t n = read(wake.get(), &count, sizeof count);
-  }
-  void stop();
-  bool runPosted();
+  /// Takes the next posted action. @return false when the loop has stopped.
+  bool takePosted(std::optional<Posted>& posted);
   bool runDueTimer();
-  bool runReadyWatch(const std::vector<std::shared_ptr<Watch>>& order, const std::vector<pollfd>& polled);
-  [[nodiscard]] int waitMilliseconds(Clock::time_point deadline) const;
+  /// Waits for a descriptor, a post or `deadline`. @return whether a watch's action ran.
+  bool pollWatches(Clock::time_point deadline);
+  [[nodiscard]] Clock::time_point nextDue(Clock::time_point deadline) const;
+  void forgetRemoved();
 };
 
 RunLoop::RunLoop() : impl_(std::make_unique<Impl>()) {}
-
-RunLoop::~RunLoop() {
-  stop();
-  std::unique_lock lock(impl_->mutex);
-  impl_->changed.wait(lock, [this] { return impl_->waiters == 0; });
-}
+RunLoop::~RunLoop() { stop(); }
 
 void RunLoop::adoptThread() { impl_->owner = std::this_thread::get_id(); }
 bool RunLoop::isOwnerThread() const { return impl_->owner.load() == std::this_thread::get_id(); }
 
 bool RunLoop::post(Action action, Wait wait) {
-  if (wait == Wait::untilDone && isOwnerThread()) {
-    runGuarded(action);
-    return true;
+  const bool waits = wait == Wait::untilDone;
+  const bool inline_run = waits && isOwnerThread();
+  const auto waiter = waits && !inline_run ? std::make_shared<Waiter>() : nullptr;
+  {
+    const std::lock_guard lock(impl_->mutex);
+    if (impl_->stopped) return false;
+    if (!inline_run) {
+      impl_->queue.push_back({std::move(action), waiter});
+      impl_->ring();
+    }
   }
-  auto posted = std::make_shared<Posted>();
-  posted->action = std::move(action);
-  posted->waited = wait == Wait::untilDone;
-  std::unique_lock lock(impl_->mutex);
-  if (impl_->stopped) return false;
-  impl_->queue.push_back(posted);
-  impl_->ring();
-  if (wait == Wait::no) return true;
-  ++impl_->waiters;
-  impl_->changed.wait(lock, [&] { return posted->done; });
-  --impl_->waiters;
-  impl_->changed.notify_all();
-  return posted->ran;
+  if (inline_run) runGuarded(action);
+  return waiter == nullptr || waiter->wait();
 }
 
-void RunLoop::Impl::stop() {
-  std::deque<std::shared_ptr<Posted>> dropped;
+void RunLoop::stop() {
+  std::deque<Posted> dropped;  // destroyed without the lock: what the actions hold may do anything
   {
-    const std::lock_guard lock(mutex);
-    stopped = true;
-    dropped.swap(queue);
-    for (const auto& posted : dropped) posted->done = true;
-    changed.notify_all();
+    const std::lock_guard lock(impl_->mutex);
+    impl_->stopped = true;
+    dropped.swap(impl_->queue);
+    impl_->ring();
   }
-  ring();
+  for (const Posted& posted : dropped) {
+    if (posted.waiter) posted.waiter->finish(false);
+  }
 }
 
-void RunLoop::stop() { impl_->stop(); }
-
-bool RunLoop::Impl::runPosted() {
-  std::shared_ptr<Posted> posted;
-  {
-    const std::lock_guard lock(mutex);
-    if (queue.empty()) return false;
-    posted = std::move(queue.front());
-    queue.pop_front();
-    if (!queue.empty()) ring();
-  }
-  runGuarded(posted->action);
+bool RunLoop::Impl::takePosted(std::optional<Posted>& posted) {
   const std::lock_guard lock(mutex);
-  posted->action = nullptr;
-  posted->ran = posted->done = true;
-  if (posted->waited) changed.notify_all();
+  if (stopped) return false;
+  if (rung) {
+    // Quiet again before looking: a post from here on rings anew, and nothing wakes the loop for nothing.
+    std::uint64_t count = 0;
+    [[maybe_unused]] const ssize_t n = read(wake.get(), &count, sizeof count);
+    rung = false;
+  }
+  if (queue.empty()) return true;
+  posted = std::move(queue.front());
+  queue.pop_front();
   return true;
 }
 
 bool RunLoop::Impl::runDueTimer() {
   const auto now = Clock::now();
   for (const auto& timer : timers) {
-    if (timer->due > now) continue;
-    const auto held = timer;  // it may remove itself
-    held->due = now + held->interval;
-    runGuarded(held->action);
+    if (timer->running || timer->removed || timer->due > now) continue;
+    const auto held = timer;  // the action may add timers, which moves the list
+    held->due = nextBeat(*held, now);
+    runEntry(held);
     return true;
   }
   return false;
 }
 
-bool RunLoop::Impl::runReadyWatch(const std::vector<std::shared_ptr<Watch>>& order,
-                                  const std::vector<pollfd>& polled) {
-  for (std::size_t i = 0; i < order.size(); ++i) {
-    if (polled[i + 1].revents == 0) continue;
-    if (std::find(watches.begin(), watches.end(), order[i]) == watches.end()) continue;
-    runGuarded(order[i]->action);
+Clock::time_point RunLoop::Impl::nextDue(Clock::time_point deadline) const {
+  for (const auto& timer : timers) {
+    if (!timer->running && !timer->removed) deadline = std::min(deadline, timer->due);
+  }
+  return deadline;
+}
+
+bool RunLoop::Impl::pollWatches(Clock::time_point deadline) {
+  std::vector<pollfd> polled{{wake.get(), POLLIN, 0}};
+  // A negative descriptor is skipped by poll: indices stay those of the list.
+  for (const auto& watch : watches) polled.push_back({watch->running ? -1 : watch->fd, POLLIN, 0});
+  const auto left = std::max(Clock::duration::zero(), nextDue(deadline) - Clock::now());
+  const auto seconds = std::chrono::floor<std::chrono::seconds>(left);
+  const timespec timeout{seconds.count(), std::chrono::nanoseconds(left - seconds).count()};
+  if (ppoll(polled.data(), polled.size(), &timeout, nullptr) <= 0) return false;
+  for (std::size_t i = 0; i < watches.size(); ++i) {
+    const short events = polled[i + 1].revents;
+    if (events == 0) continue;
+    const auto watch = watches[i];
+    if ((events & POLLNVAL) != 0) {
+      LMPLogMessage(nullptr, kLogCritical, "Descriptor %d was closed while the run loop watched it",
+                    watch->fd);
+      watch->fd = -1;  // else every turn would end here at once
+      return false;
+    }
+    // To the end of the list: a busy descriptor must not keep the others waiting.
+    std::rotate(watches.begin() + static_cast<std::ptrdiff_t>(i),
+                watches.begin() + static_cast<std::ptrdiff_t>(i) + 1, watches.end());
+    runEntry(watch);
     return true;
   }
   return false;
 }
 
-int RunLoop::Impl::waitMilliseconds(Clock::time_point deadline) const {
-  for (const auto& timer : timers) deadline = std::min(deadline, timer->due);
-  const auto left = std::chrono::ceil<std::chrono::milliseconds>(deadline - Clock::now()).count();
-  return static_cast<int>(std::clamp<std::int64_t>(left, 0, 3600000));
+void RunLoop::Impl::forgetRemoved() {
+  const auto removed = [](const std::shared_ptr<Entry>& entry) { return entry->removed; };
+  std::erase_if(timers, removed);
+  std::erase_if(watches, removed);
 }
 
 RunLoop::Turn RunLoop::run(std::chrono::milliseconds limit) {
   adoptThread();
-  const auto deadline = Clock::now() + limit;
-  for (;;) {
-    {
-      const std::lock_guard lock(impl_->mutex);
-      if (impl_->stopped) return Turn::stopped;
+  const auto deadline = Clock::now() + std::clamp(limit, std::chrono::milliseconds(0), kLongestTurn);
+  for (bool last = false;; last = Clock::now() >= deadline) {
+    std::optional<Posted> posted;
+    if (!impl_->takePosted(posted)) return Turn::stopped;
+    if (posted) {
+      runGuarded(posted->action);
+      posted->action = nullptr;  // what it holds is gone before its poster goes on
+      if (posted->waiter) posted->waiter->finish(true);
+      return Turn::handledSource;
     }
-    if (impl_->runPosted() || impl_->runDueTimer()) return Turn::handledSource;
-    const std::vector<std::shared_ptr<Watch>> order(impl_->watches.begin(), impl_->watches.end());
-    std::vector<pollfd> polled{{impl_->wake.get(), POLLIN, 0}};
-    for (const auto& watch : order) polled.push_back({watch->fd, POLLIN, 0});
-    const int ready = poll(polled.data(), polled.size(), impl_->waitMilliseconds(deadline));
-    if (ready > 0) {
-      if (polled[0].revents != 0) impl_->quiet();
-      if (impl_->runReadyWatch(order, polled)) return Turn::handledSource;
-    } else if (Clock::now() >= deadline) {
-      return impl_->runDueTimer() ? Turn::handledSource : Turn::timedOut;
-    }
+    impl_->forgetRemoved();
+    if (impl_->runDueTimer()) return Turn::handledSource;
+    if (last) return Turn::timedOut;
+    if (impl_->pollWatches(deadline)) return Turn::handledSource;
   }
 }
-
-namespace {
-
-template <class Item>
-class ListedSource : public RunLoop::Source {
- public:
-  ListedSource(std::list<std::shared_ptr<Item>>& list, std::shared_ptr<Item> item)
-      : list_(list), item_(item) {
-    list_.push_back(std::move(item));
-  }
-  ~ListedSource() override { list_.remove(item_); }
-
- private:
-  std::list<std::shared_ptr<Item>>& list_;
-  std::shared_ptr<Item> item_;
-};
-
-}  // namespace
 
 std::unique_ptr<RunLoop::Source> RunLoop::addRepeatingTimer(std::chrono::milliseconds interval,
                                                             Action action) {
-  auto timer = std::make_shared<Timer>(Timer{interval, Clock::now() + interval, std::move(action)});
-  return std::make_unique<ListedSource<Timer>>(impl_->timers, std::move(timer));
+  auto timer = std::make_shared<Entry>();
+  timer->action = std::move(action);
+  timer->interval = std::clamp(interval, std::chrono::milliseconds(1), kLongestTurn);
+  timer->due = Clock::now() + timer->interval;
+  impl_->timers.push_back(timer);
+  return std::make_unique<EntrySource>(std::move(timer));
 }
 
 std::unique_ptr<RunLoop::Source> RunLoop::watchReadable(int fd, Action action) {
-  auto watch = std::make_shared<Watch>(Watch{fd, std::move(action)});
-  return std::make_unique<ListedSource<Watch>>(impl_->watches, std::move(watch));
+  auto watch = std::make_shared<Entry>();
+  watch->action = std::move(action);
+  watch->fd = fd;
+  impl_->watches.push_back(watch);
+  return std::make_unique<EntrySource>(std::move(watch));
 }
 
 }  // namespace lmx

@@ -51,9 +51,7 @@ class Gatherer {
   bool addRecording(const AgentRecord* record, std::int64_t duration) {
     if (!addIfMissing("RecordingMetadata_DURATION", formatted("%d", static_cast<std::int32_t>(duration))))
       return false;
-    const std::int32_t type = record == nullptr ? 0 : record->recordingType();
-    const char* name = AgentPreferences::recTypeToString(type);
-    return addIfMissing("RecordingMetadata_TYPE", name == nullptr ? Text() : Text(name)) &&
+    return addType(record == nullptr ? 0 : record->recordingType()) &&
            addIfMissing("RecordingMetadata_VIDEO_MAXIMUM_FRAME_RATE",
                         context_.recording_video_maximum_frame_rate()) &&
            addImageSide("RecordingMetadata_VIDEO_IMAGE_HEIGHT",
@@ -75,8 +73,14 @@ class Gatherer {
   }
 
  private:
+  bool addType(std::int32_t code) {
+    if (code == 0 || !missing("RecordingMetadata_TYPE")) return true;
+    const char* name = AgentPreferences::recTypeToString(code);
+    return job_.addValue(name == nullptr ? Text() : Text(name), "RecordingMetadata_TYPE");
+  }
+
   /// Only where the property is there already, and then the add must fail: the agent never writes an image
-  /// size itself, and servers have come to rely on it.
+  /// size itself, and a START that claims one for a picture whose size is known is in error.
   bool addImageSide(const char* name, std::uint32_t pixels) {
     if (missing(name) || pixels == 0) return true;
     return job_.addValue(formatted("%d", static_cast<int>(pixels)), std::string(name));

@@ -53,7 +53,10 @@ class AgentSubmit {
                                     const SharedDictionary& user_properties, bool canceled);
   /// The document's text: XML 1.0, UTF-8, one property an element.
   [[nodiscard]] std::string propertiesXml() const;
-  /// Writes the document beside the movie, atomically. Always 0: a failed write is left to the tool to
+  /// Writes the document beside the movie, atomically; nothing without a path. @return false when it could
+  /// not be written, which is logged
+  [[nodiscard]] bool tryWriteProperties() const;
+  /// The same for a recording that goes on to the tool. Always 0: a failed write is left to the tool to
   /// complain of.
   int writeProperties() const;
 

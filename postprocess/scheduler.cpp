@@ -1,8 +1,7 @@
-// The scheduler thread.
+// The scheduler's loop and its thread.
 #include "postprocess/scheduler.h"
 
 #include <atomic>
-#include <chrono>
 #include <condition_variable>
 #include <mutex>
 #include <system_error>
@@ -14,17 +13,37 @@ namespace lmx {
 
 using namespace std::chrono_literals;
 
+int agentPostProcessSchedulerRunLoop(AgentContext& context, ChildRunner& children,
+                                     const SchedulerHooks& hooks) {
+  context.logInfo("Post-Process Scheduler starts");
+  while (context.running() && !hooks.cancelled()) {
+    hooks.setBusy(true);  // before the list is empty: between list and thread a job must not be overlooked
+    if (const auto job = context.postProcessListNext()) {
+      job->addRecordingWithCommentary(children);  // a failure is logged there; the next job has its own luck
+      continue;
+    }
+    hooks.setBusy(false);
+    hooks.sleep(5s);
+  }
+  hooks.setBusy(false);
+  context.logInfo("Post-Process Scheduler stopped");
+  return 0;
+}
+
+/// Owned by the scheduler and its thread: whichever ends last.
 struct PostProcessScheduler::State {
-  std::shared_ptr<AgentContext> context;
-  ChildRunner* children = nullptr;
   std::mutex mutex;
   std::condition_variable changed;
   bool cancelled = false;  // guarded by mutex
   std::atomic<bool> busy{false};
 
-  bool wait(std::chrono::milliseconds time) {
+  void sleep(std::chrono::milliseconds time) {
     std::unique_lock lock(mutex);
-    return !changed.wait_for(lock, time, [this] { return cancelled; });
+    changed.wait_for(lock, time, [this] { return cancelled; });
+  }
+  bool isCancelled() {
+    const std::lock_guard lock(mutex);
+    return cancelled;
   }
 };
 
@@ -32,10 +51,14 @@ PostProcessScheduler::PostProcessScheduler() : state_(std::make_shared<State>())
 PostProcessScheduler::~PostProcessScheduler() { cancel(); }
 
 bool PostProcessScheduler::start(std::shared_ptr<AgentContext> context, ChildRunner& children) {
-  state_->context = std::move(context);
-  state_->children = &children;
+  const auto body = [state = state_, context = std::move(context), &children] {
+    agentPostProcessSchedulerRunLoop(*context, children,
+                                     {.sleep = [&state](auto time) { state->sleep(time); },
+                                      .cancelled = [&state] { return state->isCancelled(); },
+                                      .setBusy = [&state](bool busy) { state->busy = busy; }});
+  };
   try {
-    std::thread([state = state_] { agentPostProcessSchedulerRunLoop(state); }).detach();
+    std::thread(body).detach();
   } catch (const std::system_error&) {
     return false;
   }
@@ -49,22 +72,5 @@ void PostProcessScheduler::cancel() {
 }
 
 bool PostProcessScheduler::busy() const { return state_->busy; }
-
-int PostProcessScheduler::agentPostProcessSchedulerRunLoop(const std::shared_ptr<State>& state) {
-  AgentContext& context = *state->context;
-  context.logInfo("Post-Process Scheduler starts");
-  while (context.running()) {
-    state->busy = true;  // before the list is empty: between list and thread a job must not be overlooked
-    if (const auto job = context.postProcessListNext()) {
-      job->addRecordingWithCommentary(*state->children);
-      continue;
-    }
-    state->busy = false;
-    if (!state->wait(5s)) break;
-  }
-  state->busy = false;
-  context.logInfo("Post-Process Scheduler stopped");
-  return 0;
-}
 
 }  // namespace lmx

@@ -40,21 +40,37 @@ int copyContents(int from, int to) {
   }
 }
 
+bool nameTaken(const std::string& path) {
+  struct stat status {};
+  return lstat(path.c_str(), &status) == 0;  // also a link that leads nowhere
+}
+
+/// @return 0 or the errno; EEXIST when the name is taken.
+int renameToFreeName(const std::string& from, const std::string& to) {
+  if (renameat2(AT_FDCWD, from.c_str(), AT_FDCWD, to.c_str(), RENAME_NOREPLACE) == 0) return 0;
+  // Some file systems can't refuse to replace; there nothing but a look beforehand protects what is there.
+  if (errno != EINVAL && errno != ENOSYS) return errno;
+  if (nameTaken(to)) return EEXIST;
+  return rename(from.c_str(), to.c_str()) == 0 ? 0 : errno;
+}
+
 /// Copies a file so that no half copy ever bears the name. @return 0 or the errno; EEXIST when the name is
 /// taken.
 int copyFile(const std::string& from, const std::string& to) {
-  if (access(to.c_str(), F_OK) == 0) return EEXIST;
+  if (nameTaken(to)) return EEXIST;
   const UniqueFd source(open(from.c_str(), O_RDONLY | O_CLOEXEC));
   if (!source.valid()) return errno;
-  std::string temporary = to + ".XXXXXX";
+  std::string temporary = directoryOf(to) + "/.lmx-copy.XXXXXX";
   const UniqueFd target(mkostemp(temporary.data(), O_CLOEXEC));
   if (!target.valid()) return errno;
   int error = copyContents(source.get(), target.get());
   if (error == 0 && fchmod(target.get(), 0644) != 0) error = errno;
-  // link, unlike rename, never replaces what has come there meanwhile.
-  if (error == 0 && link(temporary.c_str(), to.c_str()) != 0) error = errno;
-  unlink(temporary.c_str());
-  return error != 0 ? error : syncDirectory(directoryOf(to));
+  if (error == 0) error = renameToFreeName(temporary, to);
+  if (error != 0) {
+    unlink(temporary.c_str());
+    return error;
+  }
+  return syncDirectory(directoryOf(to));
 }
 
 void copyIntoRepository(const std::string& from, const std::string& to) {
@@ -64,11 +80,11 @@ void copyIntoRepository(const std::string& from, const std::string& to) {
   }
 }
 
-void removeFile(const AgentContext& context, const std::string& path) {
+void removeFile(LMPLogContext log, const std::string& path) {
   if (unlink(path.c_str()) == 0) {
-    context.logInfo("File \"" + path + "\" was removed");
+    LMPLogMessage(log, kLogInfo, "File \"%s\" was removed", path.c_str());
   } else {
-    LMPLogMessage(context.log_context(), kLogError, "An error occurred removing file \"%s\"", path.c_str());
+    LMPLogMessage(log, kLogError, "An error occurred removing file \"%s\"", path.c_str());
   }
 }
 
@@ -90,33 +106,33 @@ int failedBeforeTheTool() {
 }  // namespace
 
 std::vector<std::string> submissionArguments(const Submission& s) {
-  if (!s.workflow.empty()) {
-    return {"--server", s.server, "--submit", "--file", s.file,     "--workflow_uuid",
-            s.workflow, "--user", s.user,     "-p",     s.password, "--delete"};
+  if (s.workflow) {
+    return {"--server",  s.server, "--submit", "--file", s.file,     "--workflow_uuid",
+            *s.workflow, "--user", s.user,     "-p",     s.password, "--delete"};
   }
   return {"--server", s.server, "--submit", "--recording", s.recordingUUID, "--delete"};
 }
 
 int AgentSubmit::addRecordingWithCommentary(ChildRunner& children) {
-  if (!agentContext_) return -1;
-  AgentContext& context = *agentContext_;
-  context.logInfo("Post-process mechanism is starting...");
-  if (!context.submit_disabled() && !canceled_) {
-    context.logInfo("Completion in progress...");
+  const LMPLogContext log = agentContext_ ? agentContext_->log_context() : nullptr;
+  const bool disabled = agentContext_ && agentContext_->submit_disabled();
+  LMPLogMessage(log, kLogInfo, "Post-process mechanism is starting...");
+  if (!disabled && !canceled_) {
+    LMPLogMessage(log, kLogInfo, "Completion in progress...");
     if (addRecording(children) != 0) {
-      LMPLogMessage(context.log_context(), kLogError, "An error occurred completing recording \"%s\"",
-                    context.lumex_url().value_or("(null)").c_str());
-      LMPLogMessage(context.log_context(), kLogCritical,
-                    "An internal error occurred during agent post-processing");
+      const Text server = agentContext_ ? agentContext_->lumex_url() : std::nullopt;
+      LMPLogMessage(log, kLogError, "An error occurred completing recording \"%s\"",
+                    server.value_or("(null)").c_str());
+      LMPLogMessage(log, kLogCritical, "An internal error occurred during agent post-processing");
       return -1;
     }
-    context.logInfo("Recording completed with success");
+    LMPLogMessage(log, kLogInfo, "Recording completed with success");
   } else if (canceled_) {
-    context.logInfo("Submission not launched because the recording was canceled");
-    removeFile(context, recording_file_path_.value_or(""));
-    removeFile(context, properties_file_path_.value_or(""));
+    LMPLogMessage(log, kLogInfo, "Submission not launched because the recording was canceled");
+    removeFile(log, recording_file_path_.value_or(""));
+    removeFile(log, properties_file_path_.value_or(""));
   }
-  context.logInfo("Post-process mechanism completed with success");
+  LMPLogMessage(log, kLogInfo, "Post-process mechanism completed with success");
   return 0;
 }
 
@@ -131,8 +147,7 @@ int AgentSubmit::addRecording(ChildRunner& children) {
     copyIntoRepository(movie.substr(0, movie.size() - std::min<std::size_t>(3, movie.size())) + "xml",
                        copy + ".xml");
   }
-  Submission submission{
-      .server = agentContext_->lumex_url().value_or(""), .recordingUUID = *uuid, .workflow = {}};
+  Submission submission{.server = agentContext_->lumex_url().value_or(""), .recordingUUID = *uuid};
   if (adhoc_workflow_uuid_) {
     const auto user = agentContext_->user();
     const auto password = agentContext_->password();

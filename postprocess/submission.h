@@ -1,5 +1,6 @@
 // The submission tool's arguments. Pure.
 #pragma once
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -8,11 +9,12 @@ namespace lmx {
 struct Submission {
   std::string server;
   std::string recordingUUID;
-  // Of an ad-hoc submission to a workflow; otherwise empty.
-  std::string workflow;
-  std::string file;
-  std::string user;
-  std::string password;
+  /// Of an ad-hoc submission of `file`; absent for a recording of the repository.
+  std::optional<std::string> workflow = {};
+  // Read with a workflow only.
+  std::string file = {};
+  std::string user = {};
+  std::string password = {};
 };
 
 /// Everything behind the tool's name.

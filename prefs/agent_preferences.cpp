@@ -4,6 +4,8 @@
 #include <unistd.h>
 
 #include <cerrno>
+#include <charconv>
+#include <cmath>
 #include <cstdlib>
 #include <mutex>
 
@@ -19,29 +21,40 @@ bool missesSilently(const std::string& key) {
   return key == "RecordingPreviewIntervalInSeconds" || key == "PreviewPath";
 }
 
-/// The whole file; nothing, with an error line that names it, when it is there but can't be used.
-std::optional<PlistDictionary> loadFile(const std::string& path) {
+/// The whole file; nothing when it is not there or can't be used.
+/// @param complained  whether an error line has named the file before; set when this writes one
+std::optional<PlistDictionary> loadFile(const std::string& path, bool& complained) {
   PlistResult file = readPropertyList(path);
   if (file.value && file.value->dictionary() != nullptr) return *file.value->dictionary();
-  if (file.systemError == ENOENT) return std::nullopt;
+  if (file.systemError == ENOENT || complained) return std::nullopt;
+  complained = true;
   LMPLogMessage(nullptr, kLogError,
                 "The preferences file \"%s\" can't be used: %s. Nothing is read from it; correct it.",
                 path.c_str(), file.value ? "its top level is not a dictionary" : file.problem.c_str());
   return std::nullopt;
 }
 
+/// A number as its decimal text, without an exponent; nothing for any other value.
+std::optional<std::string> numberText(const PlistValue& value) {
+  if (const auto* integer = std::get_if<std::int64_t>(&value.value)) return std::to_string(*integer);
+  const auto* real = std::get_if<double>(&value.value);
+  if (real == nullptr || !std::isfinite(*real)) return std::nullopt;
+  char text[512];  // the largest double has 309 digits, the smallest some 330 decimals
+  const auto end = std::to_chars(text, text + sizeof text, *real, std::chars_format::fixed).ptr;
+  return std::string(text, end);
+}
+
 /// The value when it has the type its key wants: a text, or for the continuous settings a dictionary. People
-/// write <integer> and <true/> by habit: numbers and flags count as their texts.
+/// write <integer> and <real> by habit: numbers count as their texts.
 std::optional<PlistValue> typed(const std::string& key, const PlistValue& value) {
-  if (key == kContinuous) {
-    if (value.dictionary() != nullptr) return value;
-  } else if (value.string() != nullptr) {
-    return value;
-  } else if (std::holds_alternative<std::int64_t>(value.value)) {
-    return PlistValue(std::to_string(value.asInteger()));
+  const bool dictionaryWanted = key == kContinuous;
+  if (dictionaryWanted ? value.dictionary() != nullptr : value.string() != nullptr) return value;
+  if (!dictionaryWanted) {
+    if (auto number = numberText(value)) return std::optional<PlistValue>(std::in_place, std::move(*number));
   }
-  LMPLogMessage(nullptr, kLogError, "The preference \"%s\" is not a %s: it counts as missing", key.c_str(),
-                key == kContinuous ? "dictionary" : "string");
+  LMPLogMessage(nullptr, kLogError,
+                "The preference \"%s\" has the wrong type and counts as missing; write it as a <%s>.",
+                key.c_str(), dictionaryWanted ? "dict" : "string");
   return std::nullopt;
 }
 
@@ -66,6 +79,8 @@ std::optional<PlistDictionary> AgentPreferences::prefsDict() {
 void AgentPreferences::setPrefsDict(std::optional<PlistDictionary> dictionary) {
   const std::lock_guard lock(prefsCacheMutex_);
   prefsDict_ = std::move(dictionary);
+  complained_ = false;
+  user_complained_ = false;
 }
 
 void AgentPreferences::resetPrefsCache() { setPrefsDict(std::nullopt); }
@@ -74,7 +89,7 @@ std::optional<PlistValue> AgentPreferences::getFromPrefsFile(const std::string& 
   std::optional<PlistValue> value;
   {
     const std::lock_guard lock(prefsCacheMutex_);
-    if (!prefsDict_) prefsDict_ = loadFile(systemPath(kPreferencesFile));
+    if (!prefsDict_) prefsDict_ = loadFile(systemPath(kPreferencesFile), complained_);
     if (prefsDict_) {
       const auto found = prefsDict_->find(key);
       if (found != prefsDict_->end()) value = typed(key, found->second);
@@ -86,11 +101,15 @@ std::optional<PlistValue> AgentPreferences::getFromPrefsFile(const std::string& 
   return value;
 }
 
+std::array<std::optional<PlistDictionary>, 3> AgentPreferences::domainLayers() {
+  const std::lock_guard lock(prefsCacheMutex_);
+  const std::string user = userPreferencesFile();
+  return {user.empty() ? std::nullopt : loadFile(user, user_complained_),
+          loadFile(systemPath(kPreferencesFile), complained_), adHocDefaults()};
+}
+
 std::optional<PlistValue> AgentPreferences::get(const std::string& key) {
-  const std::optional<PlistDictionary> layers[] = {
-      userPreferencesFile().empty() ? std::nullopt : loadFile(userPreferencesFile()),
-      loadFile(systemPath(kPreferencesFile)), adHocDefaults()};
-  for (const auto& layer : layers) {
+  for (const auto& layer : domainLayers()) {
     if (!layer) continue;
     const auto found = layer->find(key);
     if (found == layer->end()) continue;

@@ -1,5 +1,6 @@
 // The agent's settings: reading, caching, watching and validating the preferences file.
 #pragma once
+#include <array>
 #include <functional>
 #include <memory>
 #include <optional>
@@ -35,7 +36,7 @@ class AgentPreferences {
   AgentPreferences& operator=(const AgentPreferences&) = delete;
 
   /// The value in the preferences file, through the cache of the whole file. A file that is there but can't
-  /// be read as a property list is an error line that names it, once for each loading.
+  /// be read as a property list is an error line that names it, once until the cache is reset.
   std::optional<PlistValue> getFromPrefsFile(const std::string& key);
   /// The value in the preferences domain: the user's "~/Library/Preferences/…" file, then the system file,
   /// then the ad-hoc defaults. A text for every key but "ContinuousRecording", which is a dictionary.
@@ -81,10 +82,16 @@ class AgentPreferences {
   [[noreturn]] void failPreferenceRequired(const std::string& key);
 
  private:
+  /// The preferences domain, the layer that wins first.
+  std::array<std::optional<PlistDictionary>, 3> domainLayers();
+
   std::shared_ptr<CaptureCatalog> catalog_;
   RecursiveMutex prefsCacheMutex_;
-  std::optional<PlistDictionary> prefsDict_;  // guarded by prefsCacheMutex_
-  FileWatcher watcher_;                       // main thread only
+  // Guarded by prefsCacheMutex_:
+  std::optional<PlistDictionary> prefsDict_;
+  bool complained_ = false;       ///< the system file's error line has been written since the last reset
+  bool user_complained_ = false;  ///< the user file's
+  FileWatcher watcher_;           // main thread only
 };
 
 }  // namespace lmx

@@ -1,6 +1,7 @@
 // The settings on their way into the context.
 #include <arpa/inet.h>
 
+#include <array>
 #include <cstdlib>
 #include <cstring>
 #include <mutex>
@@ -37,7 +38,7 @@ bool requiredTagMissing(const AgentContext& context, const char* name) {
 /// Stores the value first and judges it afterwards, so that a failing key leaves its field holding what was
 /// found.
 Text store(AgentPreferences& prefs, AgentContext& context, const char* key, Setter setter) {
-  const Text value = textOf(prefs.getFromPrefsFile(key));
+  Text value = textOf(prefs.getFromPrefsFile(key));
   (context.*setter)(value);
   return value;
 }

@@ -167,7 +167,7 @@ std::shared_ptr<LMRRecordingContext> AgentPreferences::newRecordingContextWithSe
   context->captureTempDir = *repository;
   context->diskSpaceCutoffInMB = integerOf(text("RecordingDiskSpaceCutoffInMB"));
   context->previewIntervalInMilliseconds = integerOf(text("PreviewIntervalInMilliseconds"));
-  context->previewImagePath = std::string(kPreviewImage);
+  context->previewImagePath = systemPath(kPreviewImage);
   const auto continuous = (this->*read)("ContinuousRecording");
   if (continuous && continuous->dictionary() != nullptr) {
     context->continuous = continuousInfoFrom(*continuous->dictionary());

@@ -18,7 +18,8 @@ bool meansDeviceLost(const std::optional<CaptureError>& error) {
 }
 
 void LMRCaptureDelegate::lmrCaptureDidComplete(const std::optional<CaptureError>& error) {
-  // The agent first: once the error can be seen, the main loop must know that there is still something to submit.
+  // The agent first: once the error can be seen, the main loop must know that there is still something to
+  // submit.
   if (AgentActions* actions = engineEnvironment().actions) actions->captureDidComplete(controller_);
   if (error) setRecordError(error);
   resetDefaultRecordingType();

@@ -1,68 +1,86 @@
-// Base64 by hand: a strict decoder is shorter than the work-arounds for lenient ones.
+// Base64 by table, both ways.
 #include "support/base64.h"
 
-#include <cstdlib>
+#include <array>
+#include <cstdint>
 #include <cstring>
+
+#include "support/heap_ptr.h"
 
 namespace lmx {
 namespace {
 
 constexpr char kAlphabet[] = "ABCDEFGHIJKLMNOPQRSTUVWXYZabcdefghijklmnopqrstuvwxyz0123456789+/";
+constexpr std::uint8_t kNotInAlphabet = 0xFF;
 
-int valueOf(char c) {
-  const void* at = c == '\0' ? nullptr : std::memchr(kAlphabet, c, 64);
-  return at == nullptr ? -1 : static_cast<int>(static_cast<const char*>(at) - kAlphabet);
+constexpr std::array<std::uint8_t, 256> reverseAlphabet() {
+  std::array<std::uint8_t, 256> table{};
+  table.fill(kNotInAlphabet);
+  for (std::uint8_t i = 0; i < 64; ++i) table[static_cast<unsigned char>(kAlphabet[i])] = i;
+  return table;
+}
+constexpr auto kReverse = reverseAlphabet();
+
+/// The number of "=" at the end of a text whose length is a multiple of four.
+std::size_t paddingOf(const char* text, std::size_t length) {
+  if (length == 0 || text[length - 1] != '=') return 0;
+  return text[length - 2] == '=' ? 2 : 1;
+}
+
+bool allInAlphabet(const char* text, std::size_t length) {
+  for (std::size_t i = 0; i < length; ++i) {
+    if (kReverse[static_cast<unsigned char>(text[i])] == kNotInAlphabet) return false;
+  }
+  return true;
 }
 
 }  // namespace
 
 char* lmp_encode_base64(const void* bytes, std::size_t length, std::size_t* textLength) {
+  if ((bytes == nullptr && length != 0) || length > SIZE_MAX / 2) return nullptr;
   const std::size_t size = (length + 2) / 3 * 4;
-  auto* text = static_cast<char*>(std::malloc(size + 1));
-  if (text == nullptr) return nullptr;
-  const auto* in = static_cast<const unsigned char*>(bytes);
-  char* out = text;
+  heap_ptr<char> text(static_cast<char*>(std::malloc(size + 1)));
+  if (!text) return nullptr;
+  const auto* in = static_cast<const std::uint8_t*>(bytes);
+  char* out = text.get();
   for (std::size_t i = 0; i < length; i += 3) {
     const std::size_t left = length - i;
-    const unsigned group = static_cast<unsigned>(in[i]) << 16 |
-                           (left > 1 ? static_cast<unsigned>(in[i + 1]) << 8 : 0U) |
-                           (left > 2 ? in[i + 2] : 0U);
+    std::uint32_t group = static_cast<std::uint32_t>(in[i]) << 16;
+    if (left > 1) group |= static_cast<std::uint32_t>(in[i + 1]) << 8;
+    if (left > 2) group |= in[i + 2];
     *out++ = kAlphabet[group >> 18];
-    *out++ = kAlphabet[group >> 12 & 63];
-    *out++ = left > 1 ? kAlphabet[group >> 6 & 63] : '=';
+    *out++ = kAlphabet[(group >> 12) & 63];
+    *out++ = left > 1 ? kAlphabet[(group >> 6) & 63] : '=';
     *out++ = left > 2 ? kAlphabet[group & 63] : '=';
   }
   *out = '\0';
   if (textLength != nullptr) *textLength = size;
-  return text;
+  return text.release();
 }
 
 unsigned char* lmp_decode_base64(const char* text, std::size_t* length) {
-  const std::size_t size = text == nullptr ? 1 : std::strlen(text);
-  if (size % 4 != 0) return nullptr;
-  std::size_t padding = 0;
-  while (padding < 2 && padding < size && text[size - 1 - padding] == '=') ++padding;
-  const std::size_t count = size / 4 * 3 - padding;
-  auto* bytes = static_cast<unsigned char*>(std::malloc(count + 3));
-  if (bytes == nullptr) return nullptr;
-  for (std::size_t i = 0; i < size; i += 4) {
-    unsigned group = 0;
-    for (std::size_t k = 0; k < 4; ++k) {
-      const bool pad = i + k >= size - padding;
-      const int value = pad ? 0 : valueOf(text[i + k]);
-      if (value < 0) {
-        std::free(bytes);
-        return nullptr;
-      }
-      group = group << 6 | static_cast<unsigned>(value);
-    }
-    unsigned char* out = bytes + i / 4 * 3;
-    out[0] = static_cast<unsigned char>(group >> 16);
-    out[1] = static_cast<unsigned char>(group >> 8 & 0xFF);
-    out[2] = static_cast<unsigned char>(group & 0xFF);
+  if (text == nullptr) return nullptr;
+  const std::size_t textLength = std::strlen(text);
+  if (textLength % 4 != 0) return nullptr;
+  const std::size_t padding = paddingOf(text, textLength);
+  const std::size_t digits = textLength - padding;
+  if (!allInAlphabet(text, digits)) return nullptr;
+
+  const std::size_t size = textLength / 4 * 3 - padding;
+  heap_ptr<unsigned char> bytes(static_cast<unsigned char*>(std::malloc(size + 1)));
+  if (!bytes) return nullptr;
+  std::uint32_t group = 0;
+  std::size_t written = 0;
+  for (std::size_t i = 0; i < digits; ++i) {
+    group = (group << 6) | kReverse[static_cast<unsigned char>(text[i])];
+    // Of each group of four digits, every digit but the first completes a byte.
+    if (i % 4 == 0) continue;
+    const unsigned spare = 6 - 2 * static_cast<unsigned>(i % 4);
+    bytes.get()[written++] = static_cast<unsigned char>(group >> spare);
   }
-  if (length != nullptr) *length = count;
-  return bytes;
+  bytes.get()[size] = 0;
+  if (length != nullptr) *length = size;
+  return bytes.release();
 }
 
 }  // namespace lmx

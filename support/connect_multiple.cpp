@@ -1,15 +1,22 @@
-// Resolving and connecting, one host after the other.
+// Resolves and connects host by host, each within its own time limit.
 #include "support/connect_multiple.h"
 
 #include <fcntl.h>
 #include <netdb.h>
 #include <poll.h>
+#include <sys/eventfd.h>
 #include <sys/socket.h>
 
 #include <algorithm>
 #include <cerrno>
 #include <chrono>
+#include <cstdint>
 #include <memory>
+#include <mutex>
+#include <optional>
+#include <string_view>
+#include <system_error>
+#include <thread>
 
 #include "support/unique_fd.h"
 
@@ -17,68 +24,147 @@ namespace lmx {
 namespace {
 
 using Clock = std::chrono::steady_clock;
-constexpr std::chrono::seconds kHostLimit{10};
+constexpr std::chrono::seconds kTimePerHost{10};
 
-struct HostAndPort {
+struct Endpoint {
   std::string host;
   std::string port;
 };
 
-HostAndPort splitEntry(const std::string& entry, const std::string& defaultPort) {
-  if (!entry.empty() && entry[0] == '[') {
-    const std::size_t close = entry.find(']');
-    if (close == std::string::npos) return {entry, defaultPort};
-    const bool hasPort = close + 1 < entry.size() && entry[close + 1] == ':';
-    return {entry.substr(1, close - 1), hasPort ? entry.substr(close + 2) : defaultPort};
+struct AddressListDeleter {
+  void operator()(addrinfo* list) const noexcept { freeaddrinfo(list); }
+};
+using AddressList = std::unique_ptr<addrinfo, AddressListDeleter>;
+
+bool isPort(std::string_view text) {
+  if (text.empty() || text.size() > 5) return false;
+  unsigned value = 0;
+  for (const char c : text) {
+    if (c < '0' || c > '9') return false;
+    value = value * 10 + static_cast<unsigned>(c - '0');
   }
-  const std::size_t colon = entry.find(':');
-  // More than one colon without brackets is an IPv6 address.
-  if (colon == std::string::npos || entry.find(':', colon + 1) != std::string::npos)
-    return {entry, defaultPort};
-  return {entry.substr(0, colon), entry.substr(colon + 1)};
+  return value >= 1 && value <= 65535;
 }
 
-int connectTo(const addrinfo& address, Clock::time_point deadline) {
-  UniqueFd fd(socket(address.ai_family, SOCK_STREAM | SOCK_CLOEXEC | SOCK_NONBLOCK, 0));
-  if (!fd.valid()) return -1;
-  if (connect(fd.get(), address.ai_addr, address.ai_addrlen) != 0) {
-    if (errno != EINPROGRESS) return -1;
-    pollfd waiting{fd.get(), POLLOUT, 0};
-    int ready = 0;
-    do {
-      const auto left = std::chrono::duration_cast<std::chrono::milliseconds>(deadline - Clock::now());
-      ready = poll(&waiting, 1, static_cast<int>(std::max<std::int64_t>(0, left.count())));
-    } while (ready < 0 && errno == EINTR);
-    int error = 0;
-    socklen_t size = sizeof error;
-    if (ready != 1 || getsockopt(fd.get(), SOL_SOCKET, SO_ERROR, &error, &size) != 0 || error != 0) return -1;
+/// Takes "host", "host:port", "[v6]" and "[v6]:port" apart; a bare v6 address (several colons) is a host.
+std::optional<Endpoint> parseEntry(std::string_view entry, std::string_view defaultPort) {
+  std::string_view host = entry;
+  std::string_view port = defaultPort;
+  if (!entry.empty() && entry.front() == '[') {
+    const auto bracket = entry.find(']');
+    if (bracket == std::string_view::npos) return std::nullopt;
+    host = entry.substr(1, bracket - 1);
+    const std::string_view rest = entry.substr(bracket + 1);
+    if (!rest.empty() && rest.front() != ':') return std::nullopt;
+    if (!rest.empty()) port = rest.substr(1);
+  } else if (std::count(entry.begin(), entry.end(), ':') == 1) {
+    const auto colon = entry.find(':');
+    host = entry.substr(0, colon);
+    port = entry.substr(colon + 1);
   }
-  fcntl(fd.get(), F_SETFL, fcntl(fd.get(), F_GETFL) & ~O_NONBLOCK);
-  return fd.release();
+  if (host.empty() || !isPort(port)) return std::nullopt;
+  return Endpoint{std::string(host), std::string(port)};
 }
 
-int connectToHost(const HostAndPort& target) {
+AddressList resolveNow(const Endpoint& endpoint, int flags) {
   addrinfo hints{};
+  hints.ai_family = AF_UNSPEC;
   hints.ai_socktype = SOCK_STREAM;
+  hints.ai_flags = flags | AI_NUMERICSERV;
   addrinfo* list = nullptr;
-  if (getaddrinfo(target.host.c_str(), target.port.c_str(), &hints, &list) != 0) return -1;
-  const std::unique_ptr<addrinfo, decltype(&freeaddrinfo)> owner(list, &freeaddrinfo);
-  const auto deadline = Clock::now() + kHostLimit;
-  for (const addrinfo* address = list; address != nullptr && Clock::now() < deadline;
-       address = address->ai_next) {
-    const int fd = connectTo(*address, deadline);
-    if (fd >= 0) return fd;
+  if (getaddrinfo(endpoint.host.c_str(), endpoint.port.c_str(), &hints, &list) != 0) return nullptr;
+  return AddressList(list);
+}
+
+int millisecondsUntil(Clock::time_point deadline) {
+  const auto left = std::chrono::ceil<std::chrono::milliseconds>(deadline - Clock::now()).count();
+  return static_cast<int>(std::clamp<std::int64_t>(left, 0, 60000));
+}
+
+/// Waits until `fd` has one of `events` (or an error). @return false when the deadline came first.
+bool awaitEvent(int fd, short events, Clock::time_point deadline) {
+  pollfd polled{fd, events, 0};
+  for (;;) {
+    const int ready = poll(&polled, 1, millisecondsUntil(deadline));
+    if (ready > 0) return true;
+    if (ready == 0 || errno != EINTR) return false;
   }
-  return -1;
+}
+
+/// What a resolver thread and the caller that may have given up on it share.
+struct Lookup {
+  UniqueFd done{eventfd(0, EFD_CLOEXEC)};
+  std::mutex mutex;
+  AddressList addresses;  // guarded by mutex
+};
+
+/// getaddrinfo has no time limit (dead name servers take half a minute), so a name is looked up on a
+/// thread of its own that is left behind when the time is over.
+AddressList resolve(const Endpoint& endpoint, Clock::time_point deadline) {
+  if (AddressList numeric = resolveNow(endpoint, AI_NUMERICHOST)) return numeric;
+  const auto lookup = std::make_shared<Lookup>();
+  try {
+    std::thread([lookup, endpoint] {
+      AddressList addresses = resolveNow(endpoint, 0);
+      const std::lock_guard lock(lookup->mutex);
+      lookup->addresses = std::move(addresses);
+      eventfd_write(lookup->done.get(), 1);
+    }).detach();
+  } catch (const std::system_error&) {
+    return nullptr;
+  }
+  awaitEvent(lookup->done.get(), POLLIN, deadline);
+  const std::lock_guard lock(lookup->mutex);
+  return std::move(lookup->addresses);
+}
+
+/// Waits until the connection is made or has failed. @return whether it is made.
+bool awaitConnected(int fd, Clock::time_point deadline) {
+  if (!awaitEvent(fd, POLLOUT, deadline)) return false;
+  int error = 0;
+  socklen_t size = sizeof error;
+  return getsockopt(fd, SOL_SOCKET, SO_ERROR, &error, &size) == 0 && error == 0;
+}
+
+UniqueFd connectTo(const addrinfo& address, Clock::time_point deadline) {
+  UniqueFd fd(
+      socket(address.ai_family, address.ai_socktype | SOCK_CLOEXEC | SOCK_NONBLOCK, address.ai_protocol));
+  if (!fd.valid()) return {};
+  const int result = connect(fd.get(), address.ai_addr, address.ai_addrlen);
+  if (result != 0 && errno != EINPROGRESS && errno != EINTR) return {};
+  if (result != 0 && !awaitConnected(fd.get(), deadline)) return {};
+  // Non-blocking was only for the time limit: the caller gets a socket as connect() leaves it.
+  const int flags = fcntl(fd.get(), F_GETFL);
+  if (flags < 0 || fcntl(fd.get(), F_SETFL, flags & ~O_NONBLOCK) != 0) return {};
+  return fd;
+}
+
+UniqueFd connectToHost(const Endpoint& endpoint) {
+  const auto deadline = Clock::now() + kTimePerHost;
+  const AddressList addresses = resolve(endpoint, deadline);
+  int left = 0;
+  for (const addrinfo* address = addresses.get(); address != nullptr; address = address->ai_next) ++left;
+  for (const addrinfo* address = addresses.get(); address != nullptr; address = address->ai_next) {
+    // An even share of what is left: one mute address must not use up the time of the others.
+    const auto now = Clock::now();
+    UniqueFd fd = connectTo(*address, now + (deadline - now) / left--);
+    if (fd.valid()) return fd;
+  }
+  return {};
 }
 
 }  // namespace
 
 int lmp_connect_multiple(const std::vector<std::string>& hosts, const std::string& port, int* socketOut) {
+  if (socketOut == nullptr) return -1;
   *socketOut = -1;
   for (const std::string& entry : hosts) {
-    *socketOut = connectToHost(splitEntry(entry, port));
-    if (*socketOut >= 0) return 0;
+    const auto endpoint = parseEntry(entry, port);
+    if (!endpoint) continue;
+    UniqueFd fd = connectToHost(*endpoint);
+    if (!fd.valid()) continue;
+    *socketOut = fd.release();
+    return 0;
   }
   return -1;
 }

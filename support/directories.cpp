@@ -1,4 +1,4 @@
-// Directories and files that survive a crash.
+// Directories made with their parents, and files replaced so that a power cut leaves the old or the new one.
 #include "support/directories.h"
 
 #include <fcntl.h>
@@ -6,40 +6,74 @@
 #include <unistd.h>
 
 #include <cerrno>
+#include <cstdio>
+#include <cstdlib>
+#include <string_view>
 
 #include "support/unique_fd.h"
 
 namespace lmx {
 namespace {
 
-int makeOne(const std::string& path, mode_t mode) {
-  if (mkdir(path.c_str(), mode) == 0) return 0;
-  const int error = errno;
-  struct stat info {};
-  if (stat(path.c_str(), &info) == 0) return S_ISDIR(info.st_mode) ? 0 : ENOTDIR;
-  return error;
+bool isDirectory(const char* path) {
+  struct stat status {};
+  return stat(path, &status) == 0 && S_ISDIR(status.st_mode);
 }
 
-int writeAndSync(int fd, const std::string& content) {
-  std::size_t done = 0;
-  while (done < content.size()) {
-    const ssize_t n = write(fd, content.data() + done, content.size() - done);
-    if (n < 0 && errno == EINTR) continue;
-    if (n < 0) return errno;
-    done += static_cast<std::size_t>(n);
+/// mkdir for which an existing directory is success, whatever mkdir says (read-only file systems differ).
+int makeOne(const char* path, mode_t mode) {
+  if (mkdir(path, mode) == 0) return 0;
+  const int error = errno;
+  if (isDirectory(path)) return 0;
+  return error == EEXIST ? ENOTDIR : error;
+}
+
+std::string parentOf(std::string_view path) {
+  const auto slash = path.rfind('/');
+  if (slash == std::string_view::npos) return ".";
+  return slash == 0 ? "/" : std::string(path.substr(0, slash));
+}
+
+int writeAll(int fd, std::string_view content) {
+  while (!content.empty()) {
+    const ssize_t written = write(fd, content.data(), content.size());
+    if (written < 0 && errno == EINTR) continue;
+    if (written < 0) return errno;
+    content.remove_prefix(static_cast<std::size_t>(written));
   }
-  return fsync(fd) == 0 ? 0 : errno;
+  return 0;
+}
+
+/// Gives the new file the mode and owner of the one it replaces, or `mode` when there is none.
+int takeOverAccess(int fd, const std::string& path, mode_t mode) {
+  struct stat old {};
+  if (stat(path.c_str(), &old) == 0 && S_ISREG(old.st_mode)) {
+    mode = old.st_mode & 07777;
+    // Only root may give files away. When the owner can't be kept, access for others must not grow,
+    // and it does not: the mode stays the same.
+    if (fchown(fd, old.st_uid, old.st_gid) != 0 && errno != EPERM) return errno;
+  }
+  return fchmod(fd, mode) == 0 ? 0 : errno;
+}
+
+int fillAndRename(int fd, const std::string& temporary, const std::string& path, const std::string& content,
+                  mode_t mode) {
+  if (const int error = writeAll(fd, content)) return error;
+  if (const int error = takeOverAccess(fd, path, mode)) return error;
+  if (fsync(fd) != 0) return errno;
+  if (rename(temporary.c_str(), path.c_str()) != 0) return errno;
+  return 0;
 }
 
 }  // namespace
 
 int mkdir_p(const char* path, mode_t mode) {
-  const std::string whole = path == nullptr ? "" : path;
-  if (whole.empty()) return ENOENT;
-  for (std::size_t at = whole.find('/', 1); at != std::string::npos; at = whole.find('/', at + 1)) {
-    if (const int error = makeOne(whole.substr(0, at), mode)) return error;
+  if (path == nullptr || *path == '\0') return ENOENT;
+  const std::string whole(path);
+  for (auto slash = whole.find('/', 1); slash != std::string::npos; slash = whole.find('/', slash + 1)) {
+    if (const int error = makeOne(whole.substr(0, slash).c_str(), mode)) return error;
   }
-  return makeOne(whole, mode);
+  return makeOne(path, mode);
 }
 
 int syncDirectory(const std::string& directory) {
@@ -49,22 +83,15 @@ int syncDirectory(const std::string& directory) {
 }
 
 int writeFileAtomically(const std::string& path, const std::string& content, mode_t mode) {
-  struct stat old {};
-  const bool replaces = stat(path.c_str(), &old) == 0;
-  std::string temporary = path + ".XXXXXX";
-  UniqueFd file(mkostemp(temporary.data(), O_CLOEXEC));
-  if (!file.valid()) return errno;
-  int error = fchmod(file.get(), replaces ? old.st_mode & 07777 : mode) == 0 ? 0 : errno;
-  // Only root may give a file away; a file that becomes ours is better than none.
-  if (replaces && fchown(file.get(), old.st_uid, old.st_gid) != 0) errno = 0;
-  if (error == 0) error = writeAndSync(file.get(), content);
-  if (error == 0 && rename(temporary.c_str(), path.c_str()) != 0) error = errno;
-  if (error != 0) {
+  const std::string directory = parentOf(path);
+  std::string temporary = directory + "/.lmx-" + path.substr(path.rfind('/') + 1) + ".XXXXXX";
+  const UniqueFd fd(mkostemp(temporary.data(), O_CLOEXEC));
+  if (!fd.valid()) return errno;
+  if (const int error = fillAndRename(fd.get(), temporary, path, content, mode)) {
     unlink(temporary.c_str());
     return error;
   }
-  const std::size_t slash = path.rfind('/');
-  return syncDirectory(slash == std::string::npos ? "." : slash == 0 ? "/" : path.substr(0, slash));
+  return syncDirectory(directory);
 }
 
 }  // namespace lmx

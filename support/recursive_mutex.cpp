@@ -1,4 +1,4 @@
-// Making recursive mutexes.
+// Set-up of the agent's recursive mutexes.
 #include "support/recursive_mutex.h"
 
 #include <unistd.h>
@@ -6,13 +6,13 @@
 namespace lmx {
 
 void agent_init_recursive_mutex(pthread_mutex_t* mutex) {
-  constexpr int kExitOperatingSystem = 71;
-  pthread_mutexattr_t attributes;
-  pthread_mutexattr_init(&attributes);
-  pthread_mutexattr_settype(&attributes, PTHREAD_MUTEX_RECURSIVE);
-  const int result = pthread_mutex_init(mutex, &attributes);
-  pthread_mutexattr_destroy(&attributes);
-  if (result != 0) _exit(kExitOperatingSystem);
+  constexpr int kExitSystemError = 71;
+  pthread_mutexattr_t attribute;
+  if (pthread_mutexattr_init(&attribute) != 0) _exit(kExitSystemError);
+  const bool made = pthread_mutexattr_settype(&attribute, PTHREAD_MUTEX_RECURSIVE) == 0 &&
+                    pthread_mutex_init(mutex, &attribute) == 0;
+  if (!made) _exit(kExitSystemError);
+  pthread_mutexattr_destroy(&attribute);
 }
 
 }  // namespace lmx

@@ -1,20 +1,49 @@
-// Time arithmetic.
+// Time values on the heap, their differences and their text.
 #include "support/time_value.h"
 
 #include <cstdlib>
-#include <cstring>
 #include <ctime>
+#include <limits>
+
+#include "support/format.h"
+#include "support/heap_ptr.h"
 
 namespace lmx {
 namespace {
 
-TimeValue* newTimeValue(TimeValue value) {
+constexpr std::int64_t kMicrosPerSecond = 1000000;
+
+TimeValue* newTimeValue(const TimeValue& value) {
   auto* block = static_cast<TimeValue*>(std::malloc(sizeof(TimeValue)));
   if (block != nullptr) *block = value;
   return block;
 }
 
-constexpr suseconds_t kMicroseconds = 1000000;
+std::int64_t saturated(bool negative) {
+  return negative ? std::numeric_limits<std::int64_t>::min() : std::numeric_limits<std::int64_t>::max();
+}
+std::int64_t add(std::int64_t a, std::int64_t b) {
+  std::int64_t sum = 0;
+  return __builtin_add_overflow(a, b, &sum) ? saturated(b < 0) : sum;
+}
+std::int64_t subtract(std::int64_t a, std::int64_t b) {
+  std::int64_t difference = 0;
+  return __builtin_sub_overflow(a, b, &difference) ? saturated(a < b) : difference;
+}
+
+/// Brings `micros` into 0 … 999999, moving whole seconds over.
+TimeValue normalised(std::int64_t seconds, std::int64_t micros) {
+  std::int64_t carry = micros / kMicrosPerSecond;
+  micros %= kMicrosPerSecond;
+  if (micros < 0) {
+    micros += kMicrosPerSecond;
+    --carry;
+  }
+  TimeValue value{};
+  value.tv_sec = add(seconds, carry);
+  value.tv_usec = micros;
+  return value;
+}
 
 }  // namespace
 
@@ -30,45 +59,48 @@ TimeValue* lmp_gettimeofday() {
 }
 
 std::int64_t lmp_diff_timeval(const TimeValue* a, const TimeValue* b) {
-  const std::int64_t seconds = static_cast<std::int64_t>(a->tv_sec) - b->tv_sec;
-  const std::int64_t microseconds = static_cast<std::int64_t>(a->tv_usec) - b->tv_usec;
-  return (seconds * kMicroseconds + microseconds) / 1000;
+  const std::int64_t seconds = subtract(a->tv_sec, b->tv_sec);
+  const std::int64_t micros = subtract(a->tv_usec, b->tv_usec);
+  std::int64_t total = 0;
+  if (!__builtin_mul_overflow(seconds, kMicrosPerSecond, &total) &&
+      !__builtin_add_overflow(total, micros, &total)) {
+    return total / 1000;
+  }
+  // Too far apart for a count of microseconds: whole milliseconds, at most what fits.
+  if (__builtin_mul_overflow(seconds, std::int64_t{1000}, &total)) return saturated(seconds < 0);
+  return add(total, micros / 1000);
 }
 
 TimeValue* lmp_timevalptr_from_timeval(const TimeValue* value) {
-  return value == nullptr ? nullptr : newTimeValue(*value);
+  return value != nullptr ? newTimeValue(*value) : nullptr;
 }
 
 char* lmp_timeval_to_ctime(const TimeValue* value) {
+  // By hand instead of ctime_r, which has no room for years of more than four digits.
+  static constexpr const char* kDays[] = {"Sun", "Mon", "Tue", "Wed", "Thu", "Fri", "Sat"};
+  static constexpr const char* kMonths[] = {"Jan", "Feb", "Mar", "Apr", "May", "Jun",
+                                            "Jul", "Aug", "Sep", "Oct", "Nov", "Dec"};
   if (value == nullptr) return nullptr;
-  char text[32];
-  if (ctime_r(&value->tv_sec, text) == nullptr) return nullptr;
-  text[std::strcspn(text, "\n")] = '\0';
-  return strdup(text);
+  const std::time_t seconds = value->tv_sec;
+  std::tm local{};
+  if (localtime_r(&seconds, &local) == nullptr) return nullptr;
+  return string_with_format("%s %s %2d %02d:%02d:%02d %lld", kDays[local.tm_wday], kMonths[local.tm_mon],
+                            local.tm_mday, local.tm_hour, local.tm_min, local.tm_sec, 1900LL + local.tm_year);
 }
 
 TimeValue* LXAgentTimevalAdd(const TimeValue* a, const TimeValue* b) {
-  TimeValue sum{a->tv_sec + b->tv_sec, a->tv_usec + b->tv_usec};
-  if (sum.tv_usec >= kMicroseconds) {
-    sum.tv_usec -= kMicroseconds;
-    ++sum.tv_sec;
-  }
-  return newTimeValue(sum);
+  return newTimeValue(normalised(add(a->tv_sec, b->tv_sec), add(a->tv_usec, b->tv_usec)));
 }
 
 TimeValue* LXAgentTimevalSubtract(const TimeValue* a, const TimeValue* b) {
-  TimeValue difference{a->tv_sec - b->tv_sec, a->tv_usec - b->tv_usec};
-  if (difference.tv_usec < 0) {
-    difference.tv_usec += kMicroseconds;
-    --difference.tv_sec;
-  }
-  return newTimeValue(difference);
+  return newTimeValue(normalised(subtract(a->tv_sec, b->tv_sec), subtract(a->tv_usec, b->tv_usec)));
 }
 
 double secondsSinceReferenceDate() {
-  timespec now{};
+  std::timespec now{};
   clock_gettime(CLOCK_REALTIME, &now);
-  return static_cast<double>(now.tv_sec) - kReferenceDateOffset + static_cast<double>(now.tv_nsec) / 1e9;
+  // The subtraction comes before the fraction: fewer digits are lost.
+  return (static_cast<double>(now.tv_sec) - kReferenceDateOffset) + static_cast<double>(now.tv_nsec) * 1e-9;
 }
 
 }  // namespace lmx

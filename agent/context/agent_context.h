@@ -118,7 +118,9 @@ class AgentContext {
   /// The recording session; null only after cleanup.
   [[nodiscard]] std::shared_ptr<AgentRecord> record_context() const { return record_context_.get(); }
   /// The session's face towards the preferences.
-  [[nodiscard]] std::shared_ptr<RecordingSettings> recording_settings() const { return recording_settings_.get(); }
+  [[nodiscard]] std::shared_ptr<RecordingSettings> recording_settings() const {
+    return recording_settings_.get();
+  }
   template <class Record>
   void setRecord_context(std::shared_ptr<Record> record) {
     recording_settings_.set(record);

@@ -45,9 +45,11 @@ def test_pause_and_resume_by_signals(running):
     running.start_recording("SIG")
     running.sandbox.signal(signal.SIGUSR1)
     running.log.wait("^Got Pause Signal$", level=7)
+    running.log.wait("recording paused", level=5)
     assert running.command("STATUS").fields["recordStatus"] == "1"
     running.sandbox.signal(signal.SIGUSR2)
     running.log.wait("^Got Resume Signal$", level=7)
+    running.log.wait("recording resumed", level=5)
     assert running.command("STATUS").fields["recordStatus"] == "2"
 
 

@@ -1,4 +1,5 @@
 """A repository that can't take a recording: missing, read-only, full, or full in the middle."""
+import contextlib
 import os
 import time
 
@@ -10,7 +11,10 @@ def fill(agent, leave=0):
     """Fills the repository's file system but for `leave` bytes."""
     path = agent.path(f"{REPOSITORY}/filler")
     stat = os.statvfs(path.parent)
-    path.write_bytes(bytes(stat.f_bavail * stat.f_frsize - leave))
+    size = stat.f_bavail * stat.f_frsize - leave
+    with path.open("wb", buffering=0) as file, contextlib.suppress(OSError):  # the recorder takes its share meanwhile
+        while size > 0:
+            size -= file.write(bytes(min(size, 65536)))
     return path
 
 

@@ -20,6 +20,7 @@ class ScriptedActions : public AgentActions {
   bool loop_runs = true;  ///< false: the main loop has ended, nothing is performed
   std::function<void()> on_prepare_capture;
   std::function<void()> on_stop_recording;
+  std::function<void()> on_stop_capture;
 
   bool perform(Action action, Wait wait) override {
     if (!loop_runs) return false;
@@ -34,7 +35,7 @@ class ScriptedActions : public AgentActions {
   void stopPreview() override { note("stopPreview"); }
   void pauseCapture() override { note("pauseCapture"); }
   void resumeCapture() override { note("resumeCapture"); }
-  void stopCapture() override { note("stopCapture"); }
+  void stopCapture() override { note("stopCapture", on_stop_capture); }
   void cancelCapture() override { note("cancelCapture"); }
   void stopRecording() override { note("stopRecording", on_stop_recording); }
   void setRecorderStatusToIdle() override { note("setRecorderStatusToIdle"); }

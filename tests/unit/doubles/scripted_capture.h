@@ -1,6 +1,7 @@
 // A capture controller and a preview controller that do what the test says and remember what they were told.
 #pragma once
 #include <atomic>
+#include <functional>
 #include <memory>
 #include <mutex>
 #include <optional>
@@ -34,6 +35,9 @@ class ScriptedCaptureController : public LMRCaptureController {
   double elapsed_of_request = 0;
   std::vector<double> power_levels;
   std::optional<CaptureError> error;
+  std::function<void()> on_start_recording;  ///< on the capture thread
+  /// What processRequest does instead of answering `error`.
+  std::function<std::optional<CaptureError>(const std::string& path)> on_process_request;
 
   [[nodiscard]] std::vector<Mark> marks() const {
     const std::lock_guard lock(mutex_);
@@ -60,6 +64,7 @@ class ScriptedCaptureController : public LMRCaptureController {
   }
   bool startRecording() override {
     journal_.add("startRecording");
+    if (on_start_recording) on_start_recording();
     return start_succeeds;
   }
   void stopRecording() override { journal_.add("controller stopRecording"); }
@@ -90,7 +95,7 @@ class ScriptedCaptureController : public LMRCaptureController {
   std::optional<CaptureError> processRequestWithUUID(const std::string& uuid,
                                                      const std::string& outputPath) override {
     journal_.add("processRequest " + uuid + " " + outputPath);
-    return error;
+    return on_process_request ? on_process_request(outputPath) : error;
   }
   void requestHandedOver(const std::string& uuid) override { journal_.add("requestHandedOver " + uuid); }
   std::vector<RecoveredRecording> recoverAbandonedRequests() override { return {}; }

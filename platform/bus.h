@@ -1,0 +1,47 @@
+// Message buses with a time limit on everything, so that a mute bus can't hold the agent up.
+#pragma once
+#include <gio/gio.h>
+
+#include <chrono>
+#include <memory>
+#include <string>
+#include <thread>
+
+#include "support/unique_fd.h"
+
+namespace lmx {
+
+inline constexpr std::chrono::milliseconds kBusLimit{2000};
+
+/// Cancels what uses cancellable() when `kBusLimit` has passed since the construction.
+class BusTimeLimit {
+ public:
+  BusTimeLimit();
+  ~BusTimeLimit();
+  BusTimeLimit(const BusTimeLimit&) = delete;
+  BusTimeLimit& operator=(const BusTimeLimit&) = delete;
+
+  [[nodiscard]] GCancellable* cancellable() const { return cancellable_; }
+
+ private:
+  void watch();
+
+  GCancellable* cancellable_;
+  UniqueFd finished_;  ///< an eventfd
+  std::thread watcher_;
+};
+
+struct BusClose {
+  void operator()(GDBusConnection* bus) const;
+};
+/// A connection of our own, not the one that the library shares: closed with its owner.
+using BusConnection = std::unique_ptr<GDBusConnection, BusClose>;
+
+/// Connects to the system or the session bus. Never starts a bus. Null with `problem` set when there is none
+/// or it does not answer in time.
+BusConnection connectToBus(GBusType type, const BusTimeLimit& limit, std::string* problem);
+
+/// Moves the message out of `error`, which may be null, and frees it.
+std::string takeMessage(GError* error);
+
+}  // namespace lmx

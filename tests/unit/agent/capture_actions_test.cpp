@@ -1,0 +1,247 @@
+// The actions of the main thread, the engine's callbacks and the loss of the device.
+#include <chrono>
+
+#include "record/capture_delegate.h"
+#include "tests/unit/agent/agent_fixture.h"
+
+namespace lmx {
+namespace {
+
+class Actions : public AgentTest {
+ protected:
+  void setContinuous() {
+    LMRContinuousRecordingInfo info;
+    info.enabled = true;
+    context_->setContinuous(info);
+  }
+};
+
+TEST_F(Actions, PrepareRecordsWithACopyOfTheParameters) {
+  start("R1", {{"RecordingMetadata_TITLE", "Talk"}});
+  EXPECT_TRUE(log_.contains(7, "Process prepareCapture"));
+  EXPECT_EQ(session_->filename(), movie("R1.mov"));
+  EXPECT_EQ(lookUp(session_->metadata(), "RecordingMetadata_TITLE"), "Talk");
+  EXPECT_NE(session_->metadata(), context_->properties());
+  EXPECT_TRUE(log_.contains(5, "\"" + movie("R1.mov") + "\" recording started"));
+}
+
+TEST_F(Actions, PrepareLeavesItsResultInTheStatus) {
+  session_->setRecordingType(7);
+  agent_.prepareCapture();
+  EXPECT_EQ(context_->status(), 1);
+  EXPECT_TRUE(log_.contains(3, "An error occurred during recording (1)"));
+}
+
+TEST_F(Actions, PreviewActionsLogAndSucceedAlsoWithoutACamera) {
+  context_->setStatus(9);
+  agent_.startPreview();
+  EXPECT_EQ(context_->status(), 0);
+  context_->setStatus(9);
+  agent_.stopPreview();
+  EXPECT_EQ(context_->status(), 0);
+  EXPECT_TRUE(log_.contains(7, "Process startPreview"));
+  EXPECT_TRUE(log_.contains(7, "Process stopPreview"));
+}
+
+TEST_F(Actions, PauseIsReportedOnlyWhenItChangesSomething) {
+  const auto controller = start("R1");
+  controller->elapsed_milliseconds = 65999;
+  const std::string line = "\"" + movie("R1.mov") + "\" recording paused (current duration: 65s)";
+  controller->state = 4;
+  agent_.pauseCapture();
+  EXPECT_EQ(log_.count(5, line), 0);
+  controller->state = 3;
+  agent_.pauseCapture();
+  EXPECT_EQ(log_.count(5, line), 1);
+  EXPECT_EQ(journalCount("pauseRecording"), 2);
+  EXPECT_EQ(log_.count(7, "Process pauseCapture"), 2);
+}
+
+TEST_F(Actions, ResumeIsReportedOnlyWhenItChangesSomething) {
+  const auto controller = start("R1");
+  const std::string line = "\"" + movie("R1.mov") + "\" recording resumed";
+  agent_.resumeCapture();
+  EXPECT_EQ(log_.count(5, line), 0);
+  controller->state = 4;
+  agent_.resumeCapture();
+  EXPECT_EQ(log_.count(5, line), 1);
+  EXPECT_EQ(journalCount("resumeRecording"), 2);
+  EXPECT_EQ(log_.count(7, "Process resumeCapture"), 2);
+}
+
+TEST_F(Actions, PauseAndResumeLeaveTheStatus) {
+  start("R1");
+  context_->setStatus(9);
+  agent_.pauseCapture();
+  agent_.resumeCapture();
+  EXPECT_EQ(context_->status(), 9);
+}
+
+TEST_F(Actions, StopStopsTheControllerAndMakesIdle) {
+  start("R1");
+  context_->setStatus(9);
+  agent_.stopCapture();
+  EXPECT_EQ(journalCount("controller stopRecording"), 1);
+  EXPECT_EQ(journalCount("cancelRecording"), 0);
+  EXPECT_EQ(session_->status(), kRecorderIdle);
+  EXPECT_EQ(context_->status(), 0);
+  EXPECT_TRUE(log_.contains(7, "Process stopCapture"));
+}
+
+TEST_F(Actions, CancelCancelsTheController) {
+  start("R1");
+  agent_.cancelCapture();
+  EXPECT_EQ(journalCount("cancelRecording"), 1);
+  EXPECT_EQ(journalCount("controller stopRecording"), 0);
+  EXPECT_EQ(session_->status(), kRecorderIdle);
+  EXPECT_TRUE(log_.contains(7, "Process cancelCapture"));
+}
+
+TEST_F(Actions, WithoutACaptureTheyDoNothing) {
+  agent_.pauseCapture();
+  agent_.resumeCapture();
+  agent_.stopCapture();
+  agent_.cancelCapture();
+  EXPECT_EQ(context_->status(), 0);
+  EXPECT_TRUE(journal_.entries().empty());
+}
+
+TEST_F(Actions, AdhocCancelNamesTheRequestAndNothingElse) {
+  const auto controller = start("R1");
+  context_->setAdhoc(true);
+  agent_.cancelCapture();
+  ASSERT_EQ(controller->marks().back().operation, "cancelRequest");
+  EXPECT_EQ(controller->marks().back().uuid, session_->recording_uuid());
+  EXPECT_EQ(session_->status(), kRecorderRecording);
+  EXPECT_EQ(journalCount("cancelRecording"), 0);
+  context_->setAdhoc(false);
+}
+
+TEST_F(Actions, AdhocStopMarksTheShiftedStopThenStopsTheRecording) {
+  const auto controller = start("R1");
+  context_->setAdhoc(true);
+  context_->setTimeshift_seconds(20);
+  setContinuous();  // a submission instead of another stop
+  const double before = secondsSinceReferenceDate();
+  agent_.stopCapture();
+  const auto mark = controller->marks().back();
+  EXPECT_EQ(mark.operation, "setStop");
+  EXPECT_EQ(mark.uuid, session_->recording_uuid());
+  EXPECT_NEAR(*mark.time, before - 20, 1.0);
+  EXPECT_TRUE(log_.contains(7, "Process stopRecording"));
+  context_->setAdhoc(false);
+  context_->setRunning(false);
+}
+
+TEST_F(Actions, StopRecordingWithoutParametersIsACancelLineAndNothingElse) {
+  start("R1");
+  for (const auto& parameters : {SharedDictionary(), std::make_shared<const Dictionary>()}) {
+    context_->setProperties(parameters);
+    agent_.stopRecording();
+  }
+  EXPECT_EQ(log_.count(1, "Recording canceled, missing RecordingMetadata_RECORDING_UUID."), 2);
+  EXPECT_EQ(session_->status(), kRecorderRecording);
+  EXPECT_EQ(journalCount("controller stopRecording"), 0);
+}
+
+TEST_F(Actions, StopRecordingIsContentWithAFilePath) {
+  start("R1");
+  setParameters({{"RecordingMetadata_ADHOC_FILE_PATH", movie("chosen.mov")}});
+  agent_.stopRecording();
+  EXPECT_EQ(journalCount("controller stopRecording"), 1);
+}
+
+TEST_F(Actions, StopRecordingOfAContinuousCaptureSubmitsAndGoesOn) {
+  start("R1");
+  setContinuous();
+  agent_.stopRecording();
+  EXPECT_TRUE(log_.contains(7, "Submitting Stopped Recording"));
+  EXPECT_EQ(journalCount("controller stopRecording"), 0);
+  EXPECT_NE(nextJob(), nullptr);
+}
+
+TEST_F(Actions, ShutDownControlCancelsAndAsksForTheDeviceAgain) {
+  start("R1");
+  agent_.shutDownControl();
+  EXPECT_TRUE(log_.contains(7, "Process shutDownControl"));
+  EXPECT_EQ(journalCount("cancelRecording"), 1);
+  EXPECT_GT(context_->last_device_check(), 0);
+}
+
+TEST_F(Actions, SignalsRunTheirActions) {
+  start("R1");
+  agent_.signal(SIGPIPE);
+  agent_.signal(SIGUSR1);
+  agent_.signal(SIGUSR2);
+  EXPECT_EQ(journalCount("pauseRecording"), 1);
+  EXPECT_EQ(journalCount("resumeRecording"), 1);
+  EXPECT_TRUE(context_->running());
+  agent_.signal(SIGTERM);
+  EXPECT_EQ(journalCount("controller stopRecording"), 1);
+  EXPECT_FALSE(context_->running());
+  for (const char* line : {"Got Pause Signal", "Got Resume Signal", "Got Termination Signal (SIGTERM)"}) {
+    EXPECT_TRUE(log_.contains(7, line)) << line;
+  }
+}
+
+TEST_F(Actions, PerformedFromAnotherThreadTheyRunInTheLoop) {
+  session_->setStatus(kRecorderRecording);
+  std::atomic<bool> done{false};
+  std::thread poster([&] {
+    EXPECT_TRUE(agent_.perform(&AgentActions::setRecorderStatusToIdle, Wait::untilDone));
+    EXPECT_EQ(session_->status(), kRecorderIdle);
+    done = true;
+  });
+  while (!done) agent_.mainRunLoop().run(std::chrono::milliseconds(5));
+  poster.join();
+}
+
+TEST_F(Actions, CallbacksLogNothingWhenTheAgentIsNotRunning) {
+  context_->setRunning(false);
+  agent_.recordDidStartWithFile("/r/A.mov", nullptr, std::nullopt);
+  agent_.recordDidPauseWithFile("/r/A.mov", nullptr, 1);
+  agent_.recordDidResumeWithFile("/r/A.mov", nullptr);
+  agent_.recordRuntimeErrorCallback(4);
+  agent_.recordDidStopWithFile(session_, "/r/A.mov", nullptr, std::nullopt, 1, std::nullopt, false);
+  EXPECT_TRUE(log_.entries().empty());
+  EXPECT_EQ(context_->postProcessListCount(), 0U);
+}
+
+TEST_F(Actions, CallbacksLogTheirLines) {
+  agent_.recordDidStartWithFile("/r/A.mov", nullptr, std::nullopt);
+  agent_.recordDidPauseWithFile("/r/A.mov", nullptr, 61);
+  agent_.recordDidResumeWithFile("/r/A.mov", nullptr);
+  agent_.recordRuntimeErrorCallback(4);
+  EXPECT_EQ(log_.entries(), (std::vector<testing::LogCapture::Entry>{
+                                {5, "\"/r/A.mov\" recording started"},
+                                {5, "\"/r/A.mov\" recording paused (current duration: 61s)"},
+                                {5, "\"/r/A.mov\" recording resumed"},
+                                {3, "An error occurred during recording (4)"}}));
+}
+
+/// Ends in the two-second pause that is part of the behaviour.
+TEST_F(Actions, ALostDeviceWaitsForTheQueue) {
+  const auto delegate = std::make_shared<LMRCaptureDelegate>(nullptr);
+  delegate->setRecordError(CaptureError{CaptureError::kDomain, kDeviceRemoved, "gone"});
+  session_->setCaptureControllerDelegate(delegate);
+  context_->postProcessListAddJob(std::make_shared<AgentSubmit>());
+  context_->postProcessListAddJob(std::make_shared<AgentSubmit>());
+  EXPECT_FALSE(agent_.deviceDisconnected());
+  context_->postProcessListNext();
+  EXPECT_FALSE(agent_.deviceDisconnected());
+  EXPECT_TRUE(log_.entries().empty());
+  context_->postProcessListNext();
+  const auto before = std::chrono::steady_clock::now();
+  EXPECT_TRUE(agent_.deviceDisconnected());
+  EXPECT_GE(std::chrono::steady_clock::now() - before, std::chrono::milliseconds(1900));
+  EXPECT_TRUE(log_.contains(2, "The capture device has been disconnected."));
+}
+
+TEST_F(Actions, ADeviceThatIsThereKeepsTheLoop) {
+  EXPECT_FALSE(agent_.deviceDisconnected());
+  start("R1");
+  EXPECT_FALSE(agent_.deviceDisconnected());
+}
+
+}  // namespace
+}  // namespace lmx

@@ -1,0 +1,114 @@
+// The PID file, the recording repository and the time-shift file.
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include "tests/unit/agent/agent_fixture.h"
+
+namespace lmx {
+namespace {
+
+namespace fs = std::filesystem;
+using testing::readFile;
+using testing::writeFile;
+
+class DaemonFiles : public AgentTest {
+ protected:
+  ~DaemonFiles() override {
+    fs::remove_all(systemPath(kPidFile));
+    fs::remove_all(systemPath(kTimeShiftFile));
+  }
+  /// One turn of the main loop, which is where the time shift is read.
+  void turn() {
+    agent_.mainRunLoop().post([this] { context_->setRunning(false); }, Wait::no);
+    EXPECT_EQ(agent_.appLoop(), 0);
+    context_->setRunning(true);
+  }
+};
+
+TEST_F(DaemonFiles, PidFileHoldsTheProcessInDecimal) {
+  EXPECT_EQ(agent_.createPIDFile(), 0);
+  EXPECT_EQ(readFile(systemPath(kPidFile)), std::to_string(getpid()) + "\n");
+  EXPECT_EQ(fs::status(systemPath(kPidFile)).permissions(), fs::perms{0644});
+  agent_.removePIDFile();
+  EXPECT_FALSE(fs::exists(systemPath(kPidFile)));
+  agent_.removePIDFile();
+}
+
+TEST_F(DaemonFiles, PidFileReplacesALongerOne) {
+  writeFile(systemPath(kPidFile), "999999999999\nleft over");
+  EXPECT_EQ(agent_.createPIDFile(), 0);
+  EXPECT_EQ(readFile(systemPath(kPidFile)), std::to_string(getpid()) + "\n");
+}
+
+TEST_F(DaemonFiles, PidFileThatCannotBeMadeIsAFailureWithoutALine) {
+  fs::create_directory(systemPath(kPidFile));
+  EXPECT_EQ(agent_.createPIDFile(), 1);
+  EXPECT_TRUE(log_.entries().empty());
+}
+
+TEST_F(DaemonFiles, PidFileThatAccessIsDeniedToIsOnlyLogged) {
+  // The effective user of this thread alone: root is denied nothing.
+  if (geteuid() != 0) GTEST_SKIP() << "needs root to become somebody else";
+  fs::permissions(systemPath("/var/run"), fs::perms{0700});
+  fs::permissions(systemPath(""), fs::perms{0755});
+  ASSERT_EQ(seteuid(65534), 0);
+  const int result = agent_.createPIDFile();
+  ASSERT_EQ(seteuid(0), 0);
+  EXPECT_EQ(result, 0);
+  EXPECT_TRUE(log_.contains(3, "unable to write pid file (EACCES)"));
+}
+
+TEST_F(DaemonFiles, RepositoryThatExistsIsTaken) {
+  EXPECT_TRUE(agent_.setupRecordingRepository());
+  EXPECT_TRUE(log_.entries().empty());
+}
+
+TEST_F(DaemonFiles, MissingRepositoryIsMadeWithItsParents) {
+  const std::string path = repository_.file("a/b/c");
+  context_->setRecording_repository_path(path);
+  EXPECT_TRUE(agent_.setupRecordingRepository());
+  EXPECT_TRUE(fs::is_directory(path));
+  EXPECT_EQ(fs::status(path).permissions(), fs::perms{0755});
+  EXPECT_TRUE(log_.contains(6, "Recording Repository does not exist, creating " + path + "."));
+}
+
+TEST_F(DaemonFiles, RepositoryThatCannotBeMadeIsAFailure) {
+  fs::create_symlink("/no/such/place", repository_.file("link"));
+  context_->setRecording_repository_path(repository_.file("link"));
+  EXPECT_FALSE(agent_.setupRecordingRepository());
+  EXPECT_TRUE(log_.contains(2, "Unable to create recording directory"));
+}
+
+TEST_F(DaemonFiles, RepositoryBelowAFileDoesNotExist) {
+  writeFile(repository_.file("plain"), "");
+  const std::string path = repository_.file("plain/sub");
+  context_->setRecording_repository_path(path);
+  EXPECT_FALSE(agent_.setupRecordingRepository());
+  EXPECT_TRUE(log_.contains(2, "Recording repository path \"" + path + "\" does not exist"));
+}
+
+TEST_F(DaemonFiles, TimeShiftIsReadOnEveryTurn) {
+  const std::string path = systemPath(kTimeShiftFile);
+  ASSERT_EQ(writePropertyList(path, PlistDictionary{{"TimeShiftSeconds", std::int64_t{20}}}), 0);
+  turn();
+  EXPECT_EQ(context_->timeshift_seconds(), 20);
+  ASSERT_EQ(writePropertyList(path, PlistDictionary{{"Other", std::int64_t{30}}}), 0);
+  turn();
+  EXPECT_EQ(context_->timeshift_seconds(), 0);
+}
+
+TEST_F(DaemonFiles, WithoutAUsableTimeShiftFileThereIsNone) {
+  for (const char* content : {"", "not a property list"}) {
+    context_->setTimeshift_seconds(20);
+    writeFile(systemPath(kTimeShiftFile), content);
+    turn();
+    EXPECT_EQ(context_->timeshift_seconds(), 0);
+  }
+  fs::remove(systemPath(kTimeShiftFile));
+  context_->setTimeshift_seconds(20);
+  turn();
+  EXPECT_EQ(context_->timeshift_seconds(), 0);
+}
+
+}  // namespace
+}  // namespace lmx

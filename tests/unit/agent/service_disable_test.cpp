@@ -1,0 +1,51 @@
+// The end of an agent whose configuration can't work: exit status and what the service manager is asked.
+#include "tests/unit/agent/agent_fixture.h"
+
+// The thread sanitizer can't follow the forks of these tests.
+#if !defined(__SANITIZE_THREAD__)
+
+namespace lmx {
+namespace {
+
+/// Tells on standard error, which is all that is left of a process that has ended.
+class TellingServiceManager : public testing::ScriptedServiceManager {
+ public:
+  std::optional<std::string> disable(const std::string& job) override {
+    std::fprintf(stderr, "disable %s\n", job.c_str());
+    return disable_error;
+  }
+  int runShellCommand(const std::string& command) override {
+    std::fprintf(stderr, "shell %s\n", command.c_str());
+    return 0;
+  }
+};
+
+class ServiceDisable : public ::testing::Test {
+ protected:
+  ServiceDisable() { GTEST_FLAG_SET(death_test_style, "threadsafe"); }
+  [[noreturn]] void disable() const {
+    AgentMain(newAgentContext(), {nullptr, services_, nullptr}).disableService();
+  }
+  std::shared_ptr<TellingServiceManager> services_ = std::make_shared<TellingServiceManager>();
+};
+
+constexpr const char* kFallback = "shell /bin/keeperctl -1 remove com.zandor.lmxagentd";
+
+TEST_F(ServiceDisable, EndsWithSeventyEight) {
+  EXPECT_EXIT(disable(), ::testing::ExitedWithCode(78), "disable com.zandor.lmxagentd");
+}
+
+TEST_F(ServiceDisable, ThatFailsRemovesTheJobAndEndsWithSeventyOne) {
+  services_->disable_error = "no such unit";
+  EXPECT_EXIT(disable(), ::testing::ExitedWithCode(71), kFallback);
+}
+
+TEST_F(ServiceDisable, WithoutAuthorizationRemovesTheJobAndEndsWithSeventyOne) {
+  services_->authorizes = false;
+  EXPECT_EXIT(disable(), ::testing::ExitedWithCode(71), kFallback);
+}
+
+}  // namespace
+}  // namespace lmx
+
+#endif

@@ -1,0 +1,229 @@
+// The way of a stopped recording to its job: movie, document, queue.
+#include "tests/unit/agent/agent_fixture.h"
+
+namespace lmx {
+namespace {
+
+using testing::readFile;
+
+class StoppedRecording : public AgentTest {
+ protected:
+  /// Stops the capture, has it report, and turns the loop for the hand-over.
+  void stopAndReport(const Controller& controller) {
+    agent_.stopRecording();
+    reportEnd(controller);
+    turnTheLoop();
+  }
+};
+
+TEST_F(StoppedRecording, BecomesAMovieADocumentAndAJob) {
+  const auto controller = start("R1", {{"RecordingMetadata_TITLE", "Talk"}});
+  controller->elapsed_of_request = 61.9;
+  stopAndReport(controller);
+  const auto job = nextJob();
+  ASSERT_NE(job, nullptr);
+  EXPECT_EQ(job->recording_file_path(), movie("R1.mov"));
+  EXPECT_EQ(job->properties_file_path(), movie("R1.xml"));
+  EXPECT_FALSE(job->canceled());
+  EXPECT_EQ(job->getProperty("RecordingMetadata_RECORDING_UUID"), "R1");
+  EXPECT_EQ(job->getProperty("RecordingMetadata_TITLE"), "Talk");
+  EXPECT_EQ(job->getProperty("RecordingMetadata_DURATION"), "61");
+  EXPECT_EQ(job->getProperty("RecordingMetadata_TYPE"), "Audio+Video");
+  EXPECT_EQ(readFile(movie("R1.mov")), "movie");
+  EXPECT_EQ(readFile(movie("R1.xml")), job->propertiesXml());
+  EXPECT_EQ(journalCount("processRequest request of R1 " + movie("R1.mov")), 1);
+  EXPECT_TRUE(log_.contains(5, "\"" + movie("R1.mov") + "\" recording stopped (duration: 61s)"));
+  EXPECT_TRUE(testing::waitUntil([&] { return journalCount("requestHandedOver request of R1") == 1; }));
+}
+
+TEST_F(StoppedRecording, EndDateIsNowLessTheTimeShift) {
+  context_->setTimeshift_seconds(1000);
+  stopAndReport(start("R1"));
+  const auto job = nextJob();
+  ASSERT_NE(job, nullptr);
+  EXPECT_NEAR(std::stod(job->getProperty("RecordingMetadata_END_DATE").value()),
+              static_cast<double>(std::time(nullptr) - 1000), 2.0);
+}
+
+TEST_F(StoppedRecording, GoesToTheChosenFile) {
+  const auto controller = start("R1", {{"RecordingMetadata_ADHOC_FILE_PATH", movie("chosen.mov")}});
+  stopAndReport(controller);
+  const auto job = nextJob();
+  ASSERT_NE(job, nullptr);
+  EXPECT_EQ(job->recording_file_path(), movie("chosen.mov"));
+}
+
+TEST_F(StoppedRecording, CarriesItsWorkflow) {
+  stopAndReport(start("R1", {{"RecordingMetadata_ADHOC_WORKFLOW_UUID", "W"}}));
+  const auto job = nextJob();
+  ASSERT_NE(job, nullptr);
+  EXPECT_EQ(job->adhoc_workflow_uuid(), "W");
+}
+
+TEST_F(StoppedRecording, OnlyTheTextOneDisablesItsSubmission) {
+  const auto jobsFor = [&](Dictionary parameters) {
+    setParameters(std::move(parameters));
+    agent_.recordDidStopWithFile(session_, "/nowhere/r/A.mov", nullptr, std::nullopt, 5, std::nullopt, false);
+    std::size_t jobs = 0;
+    while (context_->postProcessListNext()) ++jobs;
+    return jobs;
+  };
+  constexpr const char* kKey = "RecordingMetadata_ADHOC_SUBMIT_DISABLED";
+  EXPECT_EQ(jobsFor({{kKey, "1"}}), 0U);
+  for (const char* value : {"0", "", "true", "11"}) EXPECT_EQ(jobsFor({{kKey, value}}), 1U) << value;
+  EXPECT_EQ(jobsFor({}), 1U);
+  context_->setSubmit_disabled(true);
+  EXPECT_EQ(jobsFor({}), 0U);
+  context_->setSubmit_disabled(false);
+  context_->setAdhoc(true);
+  EXPECT_EQ(jobsFor({}), 0U);
+  context_->setAdhoc(false);
+}
+
+TEST_F(StoppedRecording, IsLeftToTheNextStartWhenTheAgentHasStopped) {
+  const auto controller = start("R1");
+  agent_.stopRecording();
+  context_->setRunning(false);
+  reportEnd(controller);
+  turnTheLoop();
+  session_->setCaptureController(nullptr);
+  EXPECT_TRUE(testing::waitUntil([&] { return controller.use_count() == 1; }));
+  EXPECT_EQ(context_->postProcessListCount(), 0U);
+  EXPECT_EQ(journalCount("processRequest request of R1 " + movie("R1.mov")), 0);
+}
+
+TEST_F(StoppedRecording, AMovieThatCannotBeWrittenIsARuntimeErrorAndNoJob) {
+  const auto controller = start("R1");
+  controller->on_process_request = [](const std::string&) {
+    return std::optional(CaptureError{CaptureError::kDomain, kNoSpace, "disk full"});
+  };
+  stopAndReport(controller);
+  EXPECT_TRUE(log_.waitFor(2, "The recording could not be finished: disk full"));
+  EXPECT_TRUE(log_.waitFor(3, "An error occurred during recording (8)"));
+  EXPECT_TRUE(testing::waitUntil([&] { return session_->error() == kRecordCannotWrite; }));
+  EXPECT_EQ(context_->postProcessListCount(), 0U);
+  EXPECT_EQ(journalCount("requestHandedOver request of R1"), 0);
+}
+
+/// The second START comes before the first capture has reported.
+TEST_F(StoppedRecording, ASecondOneThatHasStartedMeanwhileHasItsOwnMovieParametersAndType) {
+  const auto first = start("R1", {{"RecordingMetadata_TITLE", "First"}});
+  agent_.stopRecording();
+  const auto second =
+      start("R2", {{"RecordingMetadata_TITLE", "Second"}, {"RecordingMetadata_AUDIO_ONLY", "true"}});
+  ASSERT_NE(first, second);
+  reportEnd(first);
+  turnTheLoop();
+  const auto job1 = nextJob();
+  ASSERT_NE(job1, nullptr);
+  EXPECT_EQ(session_->recordingType(), kRecordingTypeAudio);  // the report is not for the second one
+  EXPECT_TRUE(session_->audioOnlyMode());
+  stopAndReport(second);
+  const auto job2 = nextJob();
+  ASSERT_NE(job2, nullptr);
+  EXPECT_EQ(session_->recordingType(), kRecordingTypeAudioVideo);
+
+  EXPECT_EQ(job1->recording_file_path(), movie("R1.mov"));
+  EXPECT_EQ(job1->getProperty("RecordingMetadata_RECORDING_UUID"), "R1");
+  EXPECT_EQ(job1->getProperty("RecordingMetadata_TITLE"), "First");
+  EXPECT_EQ(job1->getProperty("RecordingMetadata_TYPE"), "Audio+Video");
+  EXPECT_EQ(job2->recording_file_path(), movie("R2.mov"));
+  EXPECT_EQ(job2->getProperty("RecordingMetadata_RECORDING_UUID"), "R2");
+  EXPECT_EQ(job2->getProperty("RecordingMetadata_TITLE"), "Second");
+  EXPECT_EQ(job2->getProperty("RecordingMetadata_TYPE"), "Audio");
+}
+
+TEST_F(StoppedRecording, AHandedOverOneDoesNotMakeASessionIdleThatHasGoneOn) {
+  const auto first = start("R1");
+  agent_.stopRecording();
+  start("R2");
+  reportEnd(first);
+  turnTheLoop();
+  EXPECT_TRUE(testing::waitUntil([&] { return journalCount("requestHandedOver request of R1") == 1; }));
+  EXPECT_NE(nextJob(), nullptr);  // it holds the capture too
+  EXPECT_TRUE(testing::waitUntil([&] { return first.use_count() == 1; }));
+  EXPECT_EQ(session_->status(), kRecorderRecording);
+}
+
+TEST_F(StoppedRecording, ALateCancellationDoesNotMakeASessionIdleThatHasGoneOn) {
+  const auto first = start("R1");
+  agent_.cancelCapture();
+  start("R2");
+  first->shut_down = true;
+  agent_.captureDidCancel(first.get());
+  turnTheLoop();
+  EXPECT_TRUE(testing::waitUntil([&] { return first.use_count() == 1; }));
+  EXPECT_EQ(session_->status(), kRecorderRecording);
+  EXPECT_EQ(context_->postProcessListCount(), 0U);
+}
+
+TEST_F(StoppedRecording, ACancelledOneBecomesIdleAndNoJob) {
+  const auto controller = start("R1");
+  agent_.cancelCapture();
+  session_->setStatus(kRecorderRecording);
+  controller->shut_down = true;
+  controller->delegate()->lmrCaptureDidCancel(std::nullopt);
+  turnTheLoop();
+  EXPECT_EQ(session_->status(), kRecorderIdle);
+  EXPECT_EQ(context_->postProcessListCount(), 0U);
+}
+
+TEST_F(StoppedRecording, ALostDeviceStillHandsOverWhatWasRecorded) {
+  const auto controller = start("R1");
+  reportEnd(controller, CaptureError{CaptureError::kDomain, kDeviceRemoved, "gone"});
+  EXPECT_FALSE(agent_.deviceDisconnected()) << "the recording is on its way";
+  turnTheLoop();
+  EXPECT_NE(nextJob(), nullptr);
+}
+
+TEST_F(StoppedRecording, AFileRecordingMakesItsJobWithoutACapture) {
+  session_->setRecordingType(kRecordingTypeFile);
+  context_->setInput_file(movie("in.mov"));
+  setParameters({{"RecordingMetadata_RECORDING_UUID", "R1"}});
+  agent_.prepareCapture();
+  ASSERT_EQ(context_->status(), 0);
+  EXPECT_TRUE(testing::waitUntil([&] { return session_->startTime().has_value(); }));
+  agent_.stopRecording();
+  const auto job = context_->postProcessListNext();
+  ASSERT_NE(job, nullptr);
+  EXPECT_EQ(job->recording_file_path(), movie("in.mov"));
+  EXPECT_EQ(job->getProperty("RecordingMetadata_TYPE"), "File");
+  EXPECT_EQ(session_->status(), kRecorderIdle);
+}
+
+TEST_F(StoppedRecording, RecoveredOnesGetTheirDocumentAndAreNotSubmitted) {
+  bool forgotten = false;
+  RecoveredRecording recovered;
+  recovered.path = movie("R9.mov");
+  recovered.parameters = std::make_shared<const Dictionary>(Dictionary{{"RecordingMetadata_TITLE", "Lost"}});
+  recovered.recordingType = kRecordingTypeVideo;
+  recovered.startTime = 100 - kReferenceDateOffset;
+  recovered.stopTime = 160 - kReferenceDateOffset;
+  recovered.duration = 60.5;
+  recovered.forget = [&] {
+    EXPECT_TRUE(std::filesystem::exists(movie("R9.xml"))) << "forgotten before the document is there";
+    forgotten = true;
+  };
+  agent_.keepRecovered({recovered});
+  EXPECT_TRUE(forgotten);
+  EXPECT_EQ(context_->postProcessListCount(), 0U);
+  const std::string xml = readFile(movie("R9.xml"));
+  for (const char* part :
+       {"value=\"Lost\"", "value=\"100\"", "value=\"160\"", "value=\"60\"", "value=\"Video\""}) {
+    EXPECT_NE(xml.find(part), std::string::npos) << part;
+  }
+  EXPECT_TRUE(log_.contains(
+      5, "Recovered unfinished recording \"" + movie("R9.mov") + "\" (duration: 60s); it was not submitted"));
+}
+
+TEST_F(StoppedRecording, ARecoveredOneWithoutItsDocumentIsKeptForTheNextStart) {
+  bool forgotten = false;
+  RecoveredRecording recovered;
+  recovered.path = movie("missing-folder/R9.mov");
+  recovered.forget = [&] { forgotten = true; };
+  agent_.keepRecovered({recovered});
+  EXPECT_FALSE(forgotten);
+}
+
+}  // namespace
+}  // namespace lmx

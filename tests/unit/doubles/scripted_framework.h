@@ -1,0 +1,74 @@
+// A capture framework that hands out scripted controllers.
+#pragma once
+#include <functional>
+#include <memory>
+#include <mutex>
+#include <string>
+#include <utility>
+#include <vector>
+
+#include "tests/unit/doubles/scripted_capture.h"
+
+namespace lmx::testing {
+
+/// Knows the devices "camera" and "microphone". Thread-safe, but for the scripts: set them first.
+class ScriptedFramework : public CaptureFramework {
+ public:
+  explicit ScriptedFramework(Journal& journal) : journal_(journal) {}
+
+  bool audio_device_usable = true;
+  bool cameras_attach = true;
+  /// What is done to a new controller before the engine gets it.
+  std::function<void(ScriptedCaptureController&)> on_new_controller;
+
+  [[nodiscard]] std::size_t controllersMade() const {
+    const std::lock_guard lock(mutex_);
+    return controllers_.size();
+  }
+  /// The n-th controller handed out, null when nobody holds it any more.
+  [[nodiscard]] std::shared_ptr<ScriptedCaptureController> controller(std::size_t n) const {
+    const std::lock_guard lock(mutex_);
+    return n < controllers_.size() ? controllers_[n].lock() : nullptr;
+  }
+  /// Whether nobody holds a controller any more: no thread and no work item is left that could use one.
+  [[nodiscard]] bool allReleased() const {
+    const std::lock_guard lock(mutex_);
+    for (const auto& made : controllers_) {
+      if (!made.expired()) return false;
+    }
+    return true;
+  }
+
+  std::shared_ptr<LMRCaptureController> newCaptureController() override {
+    auto made = std::make_shared<ScriptedCaptureController>(journal_);
+    if (on_new_controller) on_new_controller(*made);
+    const std::lock_guard lock(mutex_);
+    controllers_.push_back(made);
+    return made;
+  }
+  std::unique_ptr<LMRPreviewController> newPreviewController(std::shared_ptr<CaptureSession>) override {
+    auto made = std::make_unique<ScriptedPreviewController>();
+    made->attaches = cameras_attach;
+    return made;
+  }
+  void warmUp() override { journal_.add("warmUp"); }
+  std::string deviceInformation() override { return "camera, microphone\n"; }
+  std::vector<RecoveredRecording> recoverUnfinished(const std::string&) override { return {}; }
+
+  std::optional<std::string> defaultVideoDevice() override { return "camera"; }
+  std::optional<std::string> defaultMuxedDevice() override { return std::nullopt; }
+  bool hasDevice(const std::string& uniqueID) override { return uniqueID == "camera"; }
+  PreferredAudio preferredAudioDevice(const std::string&) override { return {"microphone", false}; }
+  bool audioDeviceUsable(const std::optional<std::string>&) override { return audio_device_usable; }
+  std::optional<LMRCompressionOptions> compressionOptions(MediaType media,
+                                                          RecordingQuality quality) override {
+    return LMRCompressionOptions{.media = media, .quality = quality};
+  }
+
+ private:
+  Journal& journal_;
+  mutable std::mutex mutex_;
+  std::vector<std::weak_ptr<ScriptedCaptureController>> controllers_;  // guarded by mutex_
+};
+
+}  // namespace lmx::testing

@@ -1,0 +1,77 @@
+// Preferences files for a test, in a directory of its own.
+#pragma once
+#include <gtest/gtest.h>
+#include <sys/stat.h>
+
+#include <chrono>
+#include <filesystem>
+#include <fstream>
+#include <optional>
+#include <string>
+#include <vector>
+
+#include "platform/log.h"
+#include "platform/paths.h"
+#include "platform/property_list.h"
+#include "prefs/agent_preferences.h"
+#include "tests/unit/doubles/log_capture.h"
+#include "tests/unit/prefs/temporary_root.h"
+
+namespace lmx::testing {
+
+/// Starts without any preferences file.
+class PrefsFixture : public ::testing::Test {
+ protected:
+  PrefsFixture() {
+    kRoot.clear();
+    std::filesystem::create_directories(directoryOf(systemFile()));
+    std::filesystem::create_directories(directoryOf(userFile()));
+  }
+
+  static std::string systemFile() { return systemPath(kPreferencesFile); }
+  static std::string userFile() { return kRoot.path() + "/home" + std::string(kPreferencesFile); }
+
+  /// Puts a new file under the name, as an editor that renames does.
+  static void replace(const std::string& path, const PlistDictionary& dictionary) {
+    ASSERT_EQ(writePropertyList(path, dictionary), 0);
+    makeOld(path);
+  }
+  static void replace(const PlistDictionary& dictionary) { replace(systemFile(), dictionary); }
+  /// Writes into the file that is there, as an editor that does not rename.
+  static void writeInPlace(const std::string& text) {
+    std::ofstream(systemFile(), std::ios::in | std::ios::out | std::ios::trunc) << text;
+  }
+  static void writeText(const std::string& text) {
+    std::ofstream(systemFile()) << text;
+    makeOld(systemFile());
+  }
+
+  /// The clock of file times ticks slowly: a later write must be seen to be later.
+  static void makeOld(const std::string& path) {
+    std::filesystem::last_write_time(path,
+                                     std::filesystem::file_time_type::clock::now() - std::chrono::hours(1));
+  }
+  static ino_t inodeOf(const std::string& path) {
+    struct stat status {};
+    return stat(path.c_str(), &status) == 0 ? status.st_ino : 0;
+  }
+
+  static std::optional<std::string> text(const std::optional<PlistValue>& value) {
+    return value && value->string() != nullptr ? std::optional(*value->string()) : std::nullopt;
+  }
+
+  /// What was logged but for the debug lines.
+  [[nodiscard]] std::vector<LogCapture::Entry> messages() const {
+    auto entries = log_.entries();
+    std::erase_if(entries, [](const LogCapture::Entry& entry) { return entry.level == kLogDebug; });
+    return entries;
+  }
+
+  LogCapture log_;
+};
+
+inline void PrintTo(const LogCapture::Entry& entry, std::ostream* out) {
+  *out << entry.level << " " << entry.text;
+}
+
+}  // namespace lmx::testing

@@ -1,0 +1,415 @@
+// Building and refusing the settings of a capture.
+#include <gmock/gmock.h>
+
+#include <functional>
+
+#include "tests/unit/prefs/prefs_fixture.h"
+#include "tests/unit/prefs/scripted_catalog.h"
+
+namespace lmx {
+namespace {
+
+using ::testing::ElementsAre;
+using Entry = testing::LogCapture::Entry;
+using testing::ScriptedCatalog;
+
+constexpr auto kFile = &AgentPreferences::getFromPrefsFile;
+
+class RecordingContext : public testing::PrefsFixture {
+ protected:
+  static PlistDictionary complete() {
+    return {{"RecordingType", "Audio+Video"},        {"RecordingCapturePreset", "Video:Better"},
+            {"RecordingVideoInput", "Automatic"},    {"RecordingAudioInput", "Automatic"},
+            {"RecordingRepositoryPath", "/movies"},  {"RecordingDiskSpaceCutoffInMB", "1024"},
+            {"PreviewIntervalInMilliseconds", "400"}};
+  }
+  std::shared_ptr<LMRRecordingContext> build(CaptureType type = CaptureType::audioAndVideo) {
+    return AgentPreferences(catalog_).newRecordingContextWithSelector(kFile, type);
+  }
+  /// The reason of the refusal; also proves that the next attempt will read the file afresh.
+  std::string reasonOfRefusal(const std::function<void(AgentPreferences&)>& step) {
+    AgentPreferences prefs(catalog_);
+    prefs.getFromPrefsFile("RecordingType");
+    try {
+      step(prefs);
+    } catch (const PreferenceError& error) {
+      EXPECT_EQ(prefs.prefsDict(), std::nullopt);
+      EXPECT_STREQ(PreferenceError::name(), "Preference Error");
+      return error.what();
+    }
+    return "accepted";
+  }
+  std::string reasonOfRefusedBuild(CaptureType type = CaptureType::audioAndVideo) {
+    return reasonOfRefusal(
+        [type](AgentPreferences& prefs) { prefs.newRecordingContextWithSelector(kFile, type); });
+  }
+
+  std::shared_ptr<ScriptedCatalog> catalog_ = std::make_shared<ScriptedCatalog>();
+};
+
+TEST_F(RecordingContext, HoldsWhatThePreferencesSay) {
+  replace(complete());
+  const auto context = build();
+  ASSERT_TRUE(context);
+  EXPECT_EQ(context->captureType, CaptureType::audioAndVideo);
+  EXPECT_EQ(context->videoDeviceID, "camera");
+  EXPECT_EQ(context->audioDeviceID, "microphone");
+  EXPECT_EQ(context->captureTempDir, "/movies");
+  EXPECT_EQ(context->diskSpaceCutoffInMB, 1024);
+  EXPECT_EQ(context->previewIntervalInMilliseconds, 400);
+  EXPECT_EQ(context->previewImagePath, systemPath("/var/lmx/agent/preview.jpg"));
+  EXPECT_EQ(context->continuous, LMRContinuousRecordingInfo{});
+  EXPECT_EQ(context->outputPath, "");
+  EXPECT_EQ(context->maxDurationMinutes, 0U);
+}
+
+TEST_F(RecordingContext, EveryOneHasItsOwnIdentifier) {
+  replace(complete());
+  const auto first = build();
+  const auto second = build();
+  EXPECT_EQ(first->uuid.size(), 36U);
+  EXPECT_NE(first->uuid, second->uuid);
+}
+
+TEST_F(RecordingContext, TheTypeDecidesWhichMediaAreOn) {
+  struct Media {
+    CaptureType type;
+    bool audio, video, preview;
+  };
+  replace(complete());
+  for (const Media& media :
+       {Media{CaptureType::audioAndVideo, true, true, true}, Media{CaptureType::audio, true, false, false},
+        Media{CaptureType::video, false, true, true}, Media{CaptureType::file, false, false, false}}) {
+    const auto context = build(media.type);
+    SCOPED_TRACE(static_cast<int>(media.type));
+    EXPECT_EQ(context->audioEnabled, media.audio);
+    EXPECT_EQ(context->videoEnabled, media.video);
+    EXPECT_EQ(context->previewEnabled, media.preview);
+    EXPECT_EQ(context->videoCompressionOptions.has_value(), media.video);
+    EXPECT_EQ(context->audioCompressionOptions.has_value(), media.audio);
+  }
+}
+
+TEST_F(RecordingContext, AFileRecordingHasNoDeviceAndNoCompression) {
+  replace(complete());
+  const auto context = AgentPreferences().newRecordingContextForDaemonWithRecordingType(CaptureType::file);
+  ASSERT_TRUE(context);
+  EXPECT_EQ(context->videoDeviceID, std::nullopt);
+  EXPECT_EQ(context->audioDeviceID, std::nullopt);
+  EXPECT_EQ(context->videoCompressionOptions, std::nullopt);
+  EXPECT_EQ(context->audioCompressionOptions, std::nullopt);
+  EXPECT_EQ(context->captureTempDir, "/movies");
+}
+
+TEST_F(RecordingContext, TheSuffixOfThePresetIsTheQuality) {
+  struct Preset {
+    std::optional<const char*> text;
+    RecordingQuality quality;
+  };
+  for (const Preset& preset :
+       {Preset{"Video:Good", RecordingQuality::good}, Preset{":Good", RecordingQuality::good},
+        Preset{"Video:Best", RecordingQuality::best}, Preset{"Video:Better", RecordingQuality::better},
+        Preset{"Video:Best ", RecordingQuality::better}, Preset{"Good", RecordingQuality::better},
+        Preset{"", RecordingQuality::better}, Preset{std::nullopt, RecordingQuality::better}}) {
+    PlistDictionary all = complete();
+    all.erase("RecordingCapturePreset");
+    if (preset.text) all["RecordingCapturePreset"] = *preset.text;
+    replace(all);
+    const auto context = build();
+    SCOPED_TRACE(preset.text.value_or("none"));
+    EXPECT_EQ(context->videoCompressionOptions->quality, preset.quality);
+    EXPECT_EQ(context->videoCompressionOptions->media, MediaType::video);
+    EXPECT_EQ(context->audioCompressionOptions->quality, preset.quality);
+    EXPECT_EQ(context->audioCompressionOptions->media, MediaType::audio);
+  }
+}
+
+// Devices.
+
+TEST_F(RecordingContext, WithoutACameraAutomaticTakesTheMuxedDevice) {
+  replace(complete());
+  catalog_->camera.reset();
+  catalog_->muxed = "camcorder";
+  catalog_->devices = {"camcorder"};
+  catalog_->microphone_of = {{"camcorder", "camcorder"}};
+  catalog_->usable = {"camcorder"};
+  const auto context = build();
+  EXPECT_EQ(context->videoDeviceID, "camcorder");
+  EXPECT_EQ(context->audioDeviceID, "camcorder");
+}
+
+TEST_F(RecordingContext, WithoutAnyDeviceAutomaticNamesNone) {
+  replace(complete());
+  catalog_->camera.reset();
+  const auto context = build();
+  ASSERT_TRUE(context);
+  EXPECT_EQ(context->videoDeviceID, std::nullopt);
+  EXPECT_EQ(context->audioDeviceID, std::nullopt);
+}
+
+TEST_F(RecordingContext, ANamedCameraIsTakenUnchecked) {
+  PlistDictionary all = complete();
+  all["RecordingVideoInput"] = "gone";
+  replace(all);
+  catalog_->microphone_of["gone"] = "microphone";
+  const auto context = build();
+  EXPECT_EQ(context->videoDeviceID, "gone");
+  EXPECT_EQ(context->audioDeviceID, std::nullopt);  // the microphone of a camera that is not there
+}
+
+TEST_F(RecordingContext, ACameraWithoutMicrophoneLeavesTheAudioDeviceOpen) {
+  replace(complete());
+  catalog_->microphone_of.clear();
+  EXPECT_EQ(build()->audioDeviceID, std::nullopt);
+}
+
+TEST_F(RecordingContext, ANamedMicrophoneIsTaken) {
+  PlistDictionary all = complete();
+  all["RecordingAudioInput"] = "lapel";
+  replace(all);
+  catalog_->usable = {"lapel"};
+  EXPECT_EQ(build()->audioDeviceID, "lapel");
+}
+
+TEST_F(RecordingContext, SoundOnlyWithAutomaticAsksForTheDefaultDevice) {
+  replace(complete());
+  catalog_->usable = {std::nullopt};
+  const auto context = build(CaptureType::audio);
+  ASSERT_TRUE(context);
+  EXPECT_EQ(context->audioDeviceID, std::nullopt);
+  catalog_->usable = {"microphone"};
+  EXPECT_EQ(reasonOfRefusedBuild(CaptureType::audio),
+            "Unknown device ID:  for preference: RecordingAudioInput");
+}
+
+// Refusals.
+
+TEST_F(RecordingContext, AnUnusableMicrophoneIsRefused) {
+  PlistDictionary all = complete();
+  all["RecordingAudioInput"] = "gone";
+  replace(all);
+  EXPECT_EQ(reasonOfRefusedBuild(), "Unknown device ID: gone for preference: RecordingAudioInput");
+}
+
+TEST_F(RecordingContext, AnUnknownCompressionIsRefusedForEitherMedium) {
+  replace(complete());
+  const std::string refused =
+      "Unknown compression type: \"Video:Better\" for preference: RecordingCapturePreset";
+  for (const MediaType only : {MediaType::audio, MediaType::video}) {
+    catalog_->compressible = {only};
+    EXPECT_EQ(reasonOfRefusedBuild(), refused);
+  }
+}
+
+TEST_F(RecordingContext, NoRepositoryIsRefusedForEveryType) {
+  PlistDictionary all = complete();
+  all.erase("RecordingRepositoryPath");
+  replace(all);
+  for (const CaptureType type :
+       {CaptureType::audioAndVideo, CaptureType::audio, CaptureType::video, CaptureType::file}) {
+    EXPECT_EQ(reasonOfRefusedBuild(type), "Missing required preference: RecordingRepositoryPath");
+  }
+}
+
+TEST_F(RecordingContext, EachRefusalHasItsReasonAndDropsTheCache) {
+  replace(complete());
+  EXPECT_EQ(reasonOfRefusal([](AgentPreferences& p) { p.failInvalidCompression("Key", "value"); }),
+            "Unknown compression type: \"value\" for preference: Key");
+  EXPECT_EQ(reasonOfRefusal([](AgentPreferences& p) { p.failInvalidDevice("Key", "value"); }),
+            "Unknown device ID: value for preference: Key");
+  EXPECT_EQ(reasonOfRefusal([](AgentPreferences& p) { p.failInvalidPreference("Key", "value"); }),
+            "Invalid value: value for preference: Key");
+  EXPECT_EQ(reasonOfRefusal([](AgentPreferences& p) { p.failPreferenceRequired("Key"); }),
+            "Missing required preference: Key");
+}
+
+TEST_F(RecordingContext, MissingNumbersAreZero) {
+  replace({{"RecordingRepositoryPath", "/movies"}});
+  const auto context = build(CaptureType::file);
+  EXPECT_EQ(context->diskSpaceCutoffInMB, 0);
+  EXPECT_EQ(context->previewIntervalInMilliseconds, 0);
+}
+
+TEST_F(RecordingContext, ContinuousSettingsAreTakenOver) {
+  PlistDictionary all = complete();
+  all["ContinuousRecording"] = PlistDictionary{{"Enabled", true},
+                                               {"RecordingSegmentLength", std::int64_t{10}},
+                                               {"ContinuousUpload", true},
+                                               {"RecordingDiskSpaceCutoffPercentLeft", 5.5}};
+  replace(all);
+  EXPECT_EQ(build()->continuous, (LMRContinuousRecordingInfo{5.5, 10, true, true}));
+}
+
+TEST_F(RecordingContext, InvalidContinuousSettingsGiveNothingAndOneLine) {
+  PlistDictionary all = complete();
+  all["ContinuousRecording"] =
+      PlistDictionary{{"Enabled", true}, {"RecordingSegmentLength", std::int64_t{10}}};
+  replace(all);
+  EXPECT_EQ(build(), nullptr);
+  EXPECT_THAT(
+      messages(),
+      ElementsAre(Entry{kLogCritical, "Continuous capture is enabled, but the preferences are invalid."}));
+}
+
+TEST_F(RecordingContext, ABuildDropsTheCache) {
+  replace(complete());
+  AgentPreferences prefs(catalog_);
+  prefs.newRecordingContextWithSelector(kFile, CaptureType::audioAndVideo);
+  EXPECT_EQ(prefs.prefsDict(), std::nullopt);
+}
+
+// Types.
+
+TEST(RecordingTypes, NamesAndCodesConvertBothWays) {
+  const std::pair<const char*, int> kTypes[] = {{"Audio", 1}, {"Audio+Video", 2}, {"Video", 3}, {"File", 4}};
+  for (const auto& [name, code] : kTypes) {
+    EXPECT_EQ(AgentPreferences::recTypeToCode(name), code);
+    EXPECT_STREQ(AgentPreferences::recTypeToString(code), name);
+  }
+  for (const char* name : {"audio", "Audio ", "Video+Audio", ""}) {
+    EXPECT_EQ(AgentPreferences::recTypeToCode(name), 0) << name;
+  }
+  EXPECT_EQ(AgentPreferences::recTypeToCode(nullptr), 0);
+  for (const int code : {-1, 0, 5}) EXPECT_EQ(AgentPreferences::recTypeToString(code), nullptr) << code;
+}
+
+TEST_F(RecordingContext, CaptureTypesHaveNumbersOfTheirOwn) {
+  const AgentPreferences prefs;
+  EXPECT_EQ(static_cast<int>(prefs.captureTypeFromString("Audio+Video")), 0);
+  EXPECT_EQ(static_cast<int>(prefs.captureTypeFromString("Audio")), 1);
+  EXPECT_EQ(static_cast<int>(prefs.captureTypeFromString("Video")), 2);
+  EXPECT_EQ(static_cast<int>(prefs.captureTypeFromString("File")), 3);
+  EXPECT_EQ(static_cast<int>(prefs.captureTypeFromString("audio")), 0);
+}
+
+TEST_F(RecordingContext, TheCaptureTypeOfThePreferencesDropsTheCache) {
+  replace({{"RecordingType", "Video"}});
+  AgentPreferences prefs;
+  EXPECT_EQ(prefs.captureTypeFromPrefsWithSelector(kFile), CaptureType::video);
+  EXPECT_EQ(prefs.prefsDict(), std::nullopt);
+}
+
+TEST_F(RecordingContext, ATypeInLowerCaseIsRefused) {
+  replace({{"RecordingType", "audio"}});
+  EXPECT_EQ(reasonOfRefusal([](AgentPreferences& p) { p.captureTypeFromPrefsWithSelector(kFile); }),
+            "Invalid value: audio for preference: RecordingType");
+}
+
+TEST_F(RecordingContext, NoTypeIsRefused) {
+  replace({{"CameraName", "Hall 3"}});
+  EXPECT_EQ(reasonOfRefusal([](AgentPreferences& p) { p.captureTypeFromPrefsWithSelector(kFile); }),
+            "Missing required preference: RecordingType");
+}
+
+// The two modes.
+
+TEST_F(RecordingContext, TheDaemonsMigratesTheObsoleteIntervalFirst) {
+  PlistDictionary all = complete();
+  all.erase("PreviewIntervalInMilliseconds");
+  all["RecordingPreviewIntervalInSeconds"] = "2";
+  all["RecordingType"] = "Video";
+  replace(all);
+  const auto context = AgentPreferences::newRecordingContextForDaemon(catalog_);
+  EXPECT_EQ(context->captureType, CaptureType::video);
+  EXPECT_EQ(context->previewIntervalInMilliseconds, 2000);
+  const auto file = readPropertyList(systemFile());
+  EXPECT_FALSE(file.value->dictionary()->contains("RecordingPreviewIntervalInSeconds"));
+}
+
+TEST_F(RecordingContext, TheDaemonsReadsNoUserFileAndNoDefaults) {
+  replace(userFile(), complete());
+  EXPECT_THROW(AgentPreferences::newRecordingContextForDaemon(catalog_), PreferenceError);
+}
+
+TEST_F(RecordingContext, TheAdHocOneStandsOnUserFileAndDefaults) {
+  replace(userFile(), {{"RecordingRepositoryPath", "/my/movies"}});
+  const auto context = AgentPreferences::newRecordingContextForAdHoc(catalog_);
+  EXPECT_EQ(context->captureType, CaptureType::audioAndVideo);
+  EXPECT_EQ(context->captureTempDir, "/my/movies");
+  EXPECT_EQ(context->diskSpaceCutoffInMB, 1024);
+  EXPECT_EQ(context->previewIntervalInMilliseconds, 400);
+  EXPECT_EQ(context->videoDeviceID, "camera");
+}
+
+TEST_F(RecordingContext, TheAdHocOneNeedsARepositoryToo) {
+  try {
+    AgentPreferences::newRecordingContextForAdHoc(catalog_);
+    FAIL() << "accepted";
+  } catch (const PreferenceError& error) {
+    EXPECT_STREQ(error.what(), "Missing required preference: RecordingRepositoryPath");
+  }
+}
+
+// In words.
+
+TEST(DescribeRecordingContext, SaysWhatIsOnAndWhere) {
+  LMRRecordingContext context;
+  context.audioEnabled = context.videoEnabled = true;
+  context.videoDeviceID = "camera";
+  context.captureTempDir = "/movies";
+  context.diskSpaceCutoffInMB = 1024;
+  context.previewIntervalInMilliseconds = 400;
+  context.continuous.enabled = true;
+  EXPECT_EQ(describe(context),
+            "type Audio+Video, video camera, audio default, repository /movies, disk cut-off 1024 MB, "
+            "preview every 400 ms, continuous on");
+  LMRRecordingContext file;
+  file.captureType = CaptureType::file;
+  EXPECT_EQ(describe(file),
+            "type File, video off, audio off, repository , disk cut-off 0 MB, preview every 0 ms, "
+            "continuous off");
+}
+
+class Dump : public testing::PrefsFixture {
+ protected:
+  static std::string printed(void (*dump)()) {
+    ::testing::internal::CaptureStdout();
+    dump();
+    return ::testing::internal::GetCapturedStdout();
+  }
+};
+
+TEST_F(Dump, OfAnEmptyFileIsEmpty) {
+  replace(PlistDictionary{});
+  EXPECT_EQ(printed(&AgentPreferences::dumpDaemon), "");
+}
+
+TEST_F(Dump, ListsItsKeysInTheirOrder) {
+  replace({{"CameraName", "Hall 3"},
+           {"CameraUUID", "CAMERA-1"},
+           {"LumexURL", "https://lumex.example"},
+           {"PreviewIntervalInMilliseconds", "400"},
+           {"RecordingAudioChannel", "Stereo"},
+           {"RecordingAudioInput", "Automatic"},
+           {"RecordingAudioSampleRate", "44"},
+           {"RecordingDiskSpaceCutoffInMB", "1024"},
+           {"RecordingRepositoryPath", "/movies"},
+           {"RecordingType", "Audio"},
+           {"RecordingVideoInput", "Automatic"},
+           {"RecordingVideoMaximumFrameRate", "30"},
+           {"ServerUUID", "SERVER-1"},
+           {"TunnelHost", "tunnel.example"},
+           {"TunnelPort", "8170"},
+           {"RecordingCapturePreset", "not listed"}});
+  EXPECT_EQ(printed(&AgentPreferences::dumpDaemon),
+            "'RecordingType' == 'Audio'\n'RecordingVideoInput' == 'Automatic'\n"
+            "'RecordingVideoMaximumFrameRate' == '30'\n'RecordingAudioChannel' == 'Stereo'\n"
+            "'RecordingAudioInput' == 'Automatic'\n'RecordingAudioSampleRate' == '44'\n"
+            "'CameraName' == 'Hall 3'\n'CameraUUID' == 'CAMERA-1'\n"
+            "'RecordingRepositoryPath' == '/movies'\n'RecordingDiskSpaceCutoffInMB' == '1024'\n"
+            "'PreviewIntervalInMilliseconds' == '400'\n'ServerUUID' == 'SERVER-1'\n"
+            "'TunnelHost' == 'tunnel.example'\n'TunnelPort' == '8170'\n"
+            "'LumexURL' == 'https://lumex.example'\n");
+}
+
+TEST_F(Dump, AdHocListsTheDefaultsUnderTheUsersValues) {
+  replace(userFile(), {{"RecordingType", "Video"}});
+  EXPECT_EQ(printed(&AgentPreferences::dumpAdHoc),
+            "'RecordingType' == 'Video'\n'RecordingVideoInput' == 'Automatic'\n"
+            "'RecordingVideoMaximumFrameRate' == '30'\n'RecordingAudioChannel' == 'Stereo'\n"
+            "'RecordingAudioInput' == 'Automatic'\n'RecordingAudioSampleRate' == '44'\n"
+            "'RecordingDiskSpaceCutoffInMB' == '1024'\n'PreviewIntervalInMilliseconds' == '400'\n");
+}
+
+}  // namespace
+}  // namespace lmx
