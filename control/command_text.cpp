@@ -13,29 +13,6 @@ using namespace std::string_view_literals;
 
 constexpr std::array kLineBreaks{"\n"sv, "\v"sv, "\f"sv, "\r"sv, "\u0085"sv, "\u2028"sv, "\u2029"sv};
 
-constexpr bool isContinuation(unsigned char byte) { return (byte & 0xC0) == 0x80; }
-
-/// Bytes of the UTF-8 sequence that begins with `lead`, with the narrowest second byte allowed; length 0: no
-/// lead byte.
-struct Sequence {
-  std::size_t length = 0;
-  unsigned char second_from = 0x80;
-  unsigned char second_to = 0xBF;
-};
-
-constexpr Sequence sequenceOf(unsigned char lead) {
-  if (lead < 0x80) return {1};
-  if (lead < 0xC2) return {0};
-  if (lead < 0xE0) return {2};
-  if (lead == 0xE0) return {3, 0xA0, 0xBF};
-  if (lead == 0xED) return {3, 0x80, 0x9F};
-  if (lead < 0xF0) return {3};
-  if (lead == 0xF0) return {4, 0x90, 0xBF};
-  if (lead < 0xF4) return {4};
-  if (lead == 0xF4) return {4, 0x80, 0x8F};
-  return {0};
-}
-
 }  // namespace
 
 std::string_view trimLineBreaks(std::string_view text) {
@@ -54,25 +31,6 @@ std::string_view trimLineBreaks(std::string_view text) {
   while (std::any_of(kLineBreaks.begin(), kLineBreaks.end(), cutBack)) {
   }
   return text;
-}
-
-bool isUtf8(std::string_view text) {
-  while (!text.empty()) {
-    const auto at = [&](std::size_t i) { return static_cast<unsigned char>(text[i]); };
-    const Sequence sequence = sequenceOf(at(0));
-    if (sequence.length == 0 || sequence.length > text.size()) return false;
-    if (sequence.length > 1 && (at(1) < sequence.second_from || at(1) > sequence.second_to)) return false;
-    for (std::size_t i = 2; i < sequence.length; ++i) {
-      if (!isContinuation(at(i))) return false;
-    }
-    text.remove_prefix(sequence.length);
-  }
-  return true;
-}
-
-std::size_t characterCount(std::string_view utf8) {
-  return static_cast<std::size_t>(std::count_if(
-      utf8.begin(), utf8.end(), [](char c) { return !isContinuation(static_cast<unsigned char>(c)); }));
 }
 
 std::int32_t decimalValue(const std::string& text) {

@@ -1,6 +1,5 @@
 // Small text rules of the command protocol: what is trimmed, what is counted, what is hidden from the log.
 #pragma once
-#include <cstddef>
 #include <cstdint>
 #include <optional>
 #include <string>
@@ -11,12 +10,6 @@ namespace lmx {
 /// `text` without the line breaks at both ends: line feed, vertical tab, form feed, carriage return and the
 /// UTF-8 forms of U+0085, U+2028 and U+2029.
 std::string_view trimLineBreaks(std::string_view text);
-
-/// Whether `text` is well-formed UTF-8 (RFC 3629: no overlong forms, no surrogates, nothing above U+10FFFF).
-bool isUtf8(std::string_view text);
-
-/// Characters (not bytes) of a UTF-8 text.
-std::size_t characterCount(std::string_view utf8);
 
 /// The decimal number at the start of `text`, 0 when there is none; what 32 bits can't hold becomes the
 /// nearest limit.

@@ -3,8 +3,8 @@
 
 #include <chrono>
 
-#include "control/command_text.h"
 #include "control/socket_io.h"
+#include "support/utf8.h"
 
 namespace lmx {
 namespace {

@@ -20,6 +20,7 @@
 #include "platform/property_list_guard.h"
 #include "support/directories.h"
 #include "support/unique_fd.h"
+#include "support/utf8.h"
 
 namespace lmx {
 namespace {
@@ -125,27 +126,28 @@ std::int32_t dateSeconds(const PlistDate& date) {
 }
 
 plist_t newNode(const PlistValue& value) {
-  return std::visit(Overloaded{[](const std::string& v) { return plist_new_string(xmlText(v).c_str()); },
-                               [](bool v) { return plist_new_bool(v ? 1 : 0); },
-                               [](std::int64_t v) { return plist_new_uint(static_cast<std::uint64_t>(v)); },
-                               [](double v) { return plist_new_real(v); },
-                               [](const PlistDate& v) { return plist_new_date(dateSeconds(v), 0); },
-                               [](const PlistValue::Data& v) {
-                                 return plist_new_data(reinterpret_cast<const char*>(v.data()), v.size());
-                               },
-                               [](const PlistArray& v) {
-                                 plist_t array = plist_new_array();
-                                 for (const PlistValue& item : v)
-                                   plist_array_append_item(array, newNode(item));
-                                 return array;
-                               },
-                               [](const PlistDictionary& v) {
-                                 plist_t dictionary = plist_new_dict();
-                                 for (const auto& [key, item] : v)
-                                   plist_dict_set_item(dictionary, xmlText(key).c_str(), newNode(item));
-                                 return dictionary;
-                               }},
-                    value.value);
+  return std::visit(
+      Overloaded{
+          [](const std::string& v) { return plist_new_string(xmlText(v, kReplacementCharacter).c_str()); },
+          [](bool v) { return plist_new_bool(v ? 1 : 0); },
+          [](std::int64_t v) { return plist_new_uint(static_cast<std::uint64_t>(v)); },
+          [](double v) { return plist_new_real(v); },
+          [](const PlistDate& v) { return plist_new_date(dateSeconds(v), 0); },
+          [](const PlistValue::Data& v) {
+            return plist_new_data(reinterpret_cast<const char*>(v.data()), v.size());
+          },
+          [](const PlistArray& v) {
+            plist_t array = plist_new_array();
+            for (const PlistValue& item : v) plist_array_append_item(array, newNode(item));
+            return array;
+          },
+          [](const PlistDictionary& v) {
+            plist_t dictionary = plist_new_dict();
+            for (const auto& [key, item] : v)
+              plist_dict_set_item(dictionary, xmlText(key, kReplacementCharacter).c_str(), newNode(item));
+            return dictionary;
+          }},
+      value.value);
 }
 
 constexpr std::string_view kByteOrderMark = "\xEF\xBB\xBF";

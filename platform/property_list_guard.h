@@ -20,7 +20,7 @@ XmlCheck checkXml(std::string_view text);
 /// bytes counted as often as they expand); nothing when it may.
 std::optional<std::string> refuseBinary(std::string_view bytes);
 
-/// `text` with what XML can't hold (control characters, bytes that are not UTF-8) replaced by U+FFFD.
-std::string xmlText(std::string_view text);
+/// Stands for what a property list's XML can't hold: U+FFFD.
+inline constexpr std::string_view kReplacementCharacter = "\xEF\xBF\xBD";
 
 }  // namespace lmx

@@ -10,6 +10,7 @@
 
 #include "platform/property_list.h"
 #include "platform/property_list_guard.h"
+#include "support/utf8.h"
 
 namespace lmx {
 namespace {
@@ -48,23 +49,6 @@ void appendEscaped(std::string& out, std::string_view text) {
   }
 }
 
-/// The length of the UTF-8 character that `text` begins with; 0 when it is none, or none that XML can hold.
-std::size_t characterLength(std::string_view text) {
-  const auto at = [&](std::size_t i) { return static_cast<unsigned char>(i < text.size() ? text[i] : 0); };
-  const unsigned first = at(0);
-  if (first < 0x80) return first >= 0x20 || first == '\t' || first == '\n' || first == '\r' ? 1 : 0;
-  const std::size_t length = first >= 0xF0 ? 4 : first >= 0xE0 ? 3 : 2;
-  if (first < 0xC2 || first > 0xF4) return 0;
-  for (std::size_t i = 1; i < length; ++i) {
-    if ((at(i) & 0xC0) != 0x80) return 0;
-  }
-  const bool overlong = (first == 0xE0 && at(1) < 0xA0) || (first == 0xF0 && at(1) < 0x90);
-  const bool surrogate = first == 0xED && at(1) >= 0xA0;
-  const bool beyond = first == 0xF4 && at(1) >= 0x90;
-  const bool no_character = first == 0xEF && at(1) == 0xBF && at(2) >= 0xBE;
-  return overlong || surrogate || beyond || no_character ? 0 : length;
-}
-
 void appendUtf8(std::string& out, std::uint32_t character) {
   const auto tail = [&](unsigned shift) { out += static_cast<char>(0x80U | (character >> shift & 0x3FU)); };
   if (character < 0x80) {
@@ -96,7 +80,7 @@ std::optional<std::string> referredCharacter(std::string_view reference) {
   if (parsed.ec != std::errc() || parsed.ptr != end || character > 0x10FFFF) return std::nullopt;
   std::string text;
   appendUtf8(text, character);
-  if (characterLength(text) == 0) return std::nullopt;
+  if (xmlCharacterLength(text) == 0) return std::nullopt;
   return text;
 }
 
@@ -203,7 +187,7 @@ class XmlReducer {
                                          [](char c) { return std::isspace(static_cast<unsigned char>(c)); });
     const std::string_view name(inner.begin(), end);
     if (!isOneOf(kContainers, name) && !isOneOf(kTexts, name) && !isOneOf(kBooleans, name)) {
-      return fail("an unknown element " + tagOf(xmlText(name.substr(0, 32))));
+      return fail("an unknown element " + tagOf(xmlText(name.substr(0, 32), kReplacementCharacter)));
     }
     if (closing) return close(name);
     open(name);
@@ -245,16 +229,5 @@ class XmlReducer {
 }  // namespace
 
 XmlCheck checkXml(std::string_view text) { return XmlReducer(text).run(); }
-
-std::string xmlText(std::string_view text) {
-  std::string out;
-  out.reserve(text.size());
-  while (!text.empty()) {
-    const std::size_t length = characterLength(text);
-    out += length == 0 ? std::string_view("\xEF\xBF\xBD") : text.substr(0, length);
-    text.remove_prefix(std::max<std::size_t>(length, 1));
-  }
-  return out;
-}
 
 }  // namespace lmx

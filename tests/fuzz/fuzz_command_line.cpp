@@ -8,6 +8,7 @@
 #include "control/command_parser.h"
 #include "control/command_text.h"
 #include "control/line_assembler.h"
+#include "support/utf8.h"
 
 namespace {
 

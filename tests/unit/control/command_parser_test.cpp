@@ -62,22 +62,6 @@ TEST(CommandText, LineBreaksAreTrimmedAtBothEndsOnly) {
   EXPECT_EQ(trimLineBreaks("\n\r\n"), "");
 }
 
-TEST(CommandText, Utf8IsToldFromOtherBytes) {
-  for (const char* good : {"", "STATUS", "Hörsaal", "\u0085", "講堂", "\U0001F3A5", "\xF4\x8F\xBF\xBF"}) {
-    EXPECT_TRUE(isUtf8(good)) << good;
-  }
-  for (const char* bad :
-       {"\x80", "H\xF6rsaal", "\xC3", "\xC0\xAF", "\xE0\x80\x80", "\xED\xA0\x80", "\xF0\x80\x80\x80",
-        "\xF4\x90\x80\x80", "\xF5\x80\x80\x80", "\xE2\x80", "\xE2\x80x"}) {
-    EXPECT_FALSE(isUtf8(bad)) << bad;
-  }
-}
-
-TEST(CommandText, CharactersAreCountedNotBytes) {
-  EXPECT_EQ(characterCount("Hall"), 4U);
-  EXPECT_EQ(characterCount("Hörsaal"), 7U);
-}
-
 TEST(CommandText, DecimalValueStopsAtTheFirstOtherCharacterAndAtTheLimits) {
   EXPECT_EQ(decimalValue("2"), 2);
   EXPECT_EQ(decimalValue(" 17minutes"), 17);

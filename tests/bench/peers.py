@@ -1,0 +1,126 @@
+"""The peers: bare pipelines in gst-launch-1.0, ffmpeg, and a small echo server."""
+import re
+import shutil
+import signal
+import subprocess
+import time
+from dataclasses import dataclass
+from pathlib import Path
+
+HERE = Path(__file__).resolve().parent
+X264 = re.compile(rb"x264 - core [^\0]*?options: ([^\0]+)\0")
+
+
+@dataclass(frozen=True)
+class Picture:
+    """What is recorded. Bit rate and effort are the daemon's for the preset "Video:Better"; x264_options() of a movie of
+    each tells whether that is still true."""
+
+    width: int
+    height: int
+
+    def __str__(self):
+        return f"{self.width}x{self.height}"
+
+    @property
+    def kilobits(self):
+        return max(150, int(205.0 * (self.width * self.height * 30 / 1e6) ** 0.75))
+
+    @property
+    def effort(self):
+        return "veryfast" if self.width * self.height <= 1280 * 720 else "superfast"
+
+
+def x264_options(movie):
+    """The encoder's own note of its settings in the movie's first picture."""
+    with open(movie, "rb") as file:
+        found = X264.search(file.read(4 << 20))
+    assert found, f"{movie} holds no note of x264"
+    return found[1].decode()
+
+
+def synthetic_sources(picture):
+    """The launch lines of the daemon's synthetic camera and microphone, without what it draws into the frames."""
+    video = ("videotestsrc is-live=true pattern=smpte horizontal-speed=4 ! video/x-raw,format=I420,"
+             f"width={picture.width},height={picture.height},framerate=30/1,pixel-aspect-ratio=1/1")
+    audio = ("audiotestsrc is-live=true wave=ticks freq=1000 samplesperbuffer=480 ! "
+             "audio/x-raw,format=F32LE,layout=interleaved,rate=48000,channels=2")
+    return video, audio
+
+
+def file_sources(movie):
+    """The launch lines of the daemon's file camera."""
+    video = (f"uridecodebin name=file uri={Path(movie).as_uri()} file. ! queue ! videoconvert ! videoscale ! videorate ! "
+             "video/x-raw,format=I420,pixel-aspect-ratio=1/1,framerate=30/1 ! identity sync=true")
+    audio = ("file. ! queue ! audioconvert ! audioresample ! audio/x-raw,format=F32LE,layout=interleaved,rate=48000,"
+             "channels=2 ! identity sync=true")
+    return video, audio
+
+
+def launch_words(picture, sources, target, first=""):
+    """A pipeline with the daemon's encoders into a growing, crash-proof file. `first` goes in front of the encoder."""
+    video, audio = sources
+    line = (f"{video} {first} ! x264enc tune=zerolatency speed-preset={picture.effort} bitrate={picture.kilobits} "
+            "key-int-max=30 byte-stream=false aud=false option-string=scenecut=0 ! "
+            "video/x-h264,stream-format=avc,alignment=au ! "
+            "qtmux name=mux fragment-duration=500 fragment-mode=first-moov-then-finalise ! "
+            f"filesink location={target} buffer-mode=unbuffered {audio} ! avenc_aac bitrate=128000 ! mux.")
+    return line.split()
+
+
+def ffmpeg_words(picture, movie, target):
+    rate = f"{picture.kilobits}k"
+    return ["ffmpeg", "-v", "error", "-nostdin", "-re", "-i", str(movie), "-c:v", "libx264", "-preset", picture.effort,
+            "-tune", "zerolatency", "-b:v", rate, "-maxrate", rate, "-bufsize", f"{picture.kilobits * 6 // 10}k",
+            "-g", "30", "-keyint_min", "3", "-sc_threshold", "0", "-x264-params", "scenecut=0", "-pix_fmt", "yuv420p",
+            "-c:a", "aac", "-b:a", "128k", "-ar", "48000", "-ac", "2",
+            "-movflags", "empty_moov+default_base_moof", "-frag_duration", "500000", "-f", "mov", "-y", str(target)]
+
+
+class Process:
+    """A peer that runs for a while; stop() lets it close its file."""
+
+    def __init__(self, words, environment, stdout=subprocess.DEVNULL):
+        self.begun = time.monotonic()
+        self.process = subprocess.Popen(words, env=environment, stdin=subprocess.DEVNULL, stdout=stdout,
+                                        stderr=subprocess.PIPE)
+
+    @property
+    def pid(self):
+        return self.process.pid
+
+    def stop(self, timeout=15):
+        self.process.send_signal(signal.SIGINT)
+        try:
+            _, errors = self.process.communicate(timeout=timeout)
+        except subprocess.TimeoutExpired:
+            self.process.kill()
+            _, errors = self.process.communicate()
+            raise AssertionError("a peer did not end: " + errors.decode(errors="replace")) from None
+        return errors.decode(errors="replace")
+
+
+def gst_launch(picture, sources, target, environment):
+    return Process(["gst-launch-1.0", "-q", "-e", *launch_words(picture, sources, target)], environment)
+
+
+def seconds_to_first_buffer(picture, target, environment):
+    """From exec to the line in which the element in front of the encoder tells of its first frame."""
+    words = launch_words(picture, synthetic_sources(picture), target, "! identity name=first silent=false")
+    peer = Process(["gst-launch-1.0", "-v", *words], environment, subprocess.PIPE)
+    try:
+        for line in peer.process.stdout:
+            if b"first: last-message = chain" in line:
+                return time.monotonic() - peer.begun
+        raise AssertionError("the peer gave no frame")
+    finally:
+        peer.stop()
+
+
+def compile_roundtrip(folder):
+    """The client and the echo server. @return the program"""
+    compiler = shutil.which("cc") or shutil.which("gcc") or shutil.which("clang")
+    assert compiler, "a C compiler is needed for the echo server"
+    program = Path(folder) / "roundtrip"
+    subprocess.run([compiler, "-O2", "-o", str(program), str(HERE / "roundtrip.c")], check=True)
+    return program
