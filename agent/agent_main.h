@@ -14,6 +14,7 @@
 #include "agent/context/agent_actions.h"
 #include "agent/context/agent_context.h"
 #include "control/agent_control_unix.h"
+#include "control/client_connect.h"
 #include "platform/child_process.h"
 #include "platform/run_loop.h"
 #include "platform/service_manager.h"
@@ -26,6 +27,8 @@
 namespace lmx {
 
 inline constexpr double kVersion = 100;
+/// What the service manager knows the agent as.
+inline constexpr const char* kServiceJob = "com.zandor.lmxagentd";
 
 /// What the agent is given from outside; scripted in tests.
 struct AgentEnvironment {
@@ -46,6 +49,7 @@ class AgentMain : public AgentActions {
   // ---- command line (command_line.cpp)
   /// Reads the options into the context. @return YES when the program is to go on to startup; NO when it is
   /// to exit with `*exitCode`.
+  /// Its messages go to standard error.
   bool parseArgs(char* const* argv, int count, int* exitCode);
   static void usageForTool(const std::string& tool);
   static std::string toolNameFromPathArg(const char* argument);
@@ -64,6 +68,12 @@ class AgentMain : public AgentActions {
   bool setupRecordingRepository();
   /// Has the service manager never start this agent again, and ends the process: 78, or 71 when that failed.
   [[noreturn]] void disableService();
+
+  // ---- ad-hoc mode (adhoc.cpp)
+  /// One command to the running daemon; a recording lasts until an interrupt. @return the exit status
+  int startupAdHoc();
+  /// Until the process is told to end or a capture of its own loses its device. @return 0
+  int appLoopAdHoc();
 
   // ---- main loop (main_loop.cpp)
   /// @return 0 for an orderly end, 1 when the capture device was lost.
@@ -107,6 +117,17 @@ class AgentMain : public AgentActions {
   [[nodiscard]] bool runLoopRunning() const { return runLoopRunning_; }
 
  private:
+  // Steps of parseArgs.
+  struct ToolRequest;
+  bool readOptions(char* const* argv, int count, int& exitCode);
+  /// An option that ends the reading. @return the exit code
+  int stopAtOption(int option, const std::string& tool);
+  /// @return whether it was one of these (and could be taken)
+  bool takeToolOption(int option, ToolRequest& request);
+  bool takeAdHocOption(int option);
+  [[nodiscard]] bool combinationAllowed(const ToolRequest& request) const;
+  int runTools(const ToolRequest& request);
+
   // Steps of startupDaemon, in order.
   enum class Start { ok, fatal, fatalAndDisable };
   Start loadSettings();
@@ -115,6 +136,10 @@ class AgentMain : public AgentActions {
   Start startServices();
   int stopSequence(Start result, int status);
 
+  int recordAdHoc(ClientConnect& client);
+  /// Acts on the signals that have come. @return whether the process is to go on
+  bool handleSignals();
+
   // Steps of a turn of the main loop.
   void retryDevice(std::int64_t now);
   void stopForgottenPreview(std::int64_t now);
@@ -122,6 +147,7 @@ class AgentMain : public AgentActions {
   void reloadChangedPreferences();
   void checkServerRefusal(std::int64_t now);
 
+  void pauseOrResume(bool pause);
   void stopOrCancelCapture(bool cancel);
   void rememberStopped(const std::shared_ptr<LMRCaptureController>& controller);
   std::shared_ptr<AgentRecord> takeStopped(const void* controller);

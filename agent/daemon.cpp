@@ -28,7 +28,7 @@ AgentMain::~AgentMain() {
   setEngineEnvironment({});
 }
 
-int AgentMain::startup() { return startupDaemon(); }
+int AgentMain::startup() { return context_->adhoc() ? startupAdHoc() : startupDaemon(); }
 
 bool AgentMain::setupLoggingContext() {
   LMPLogContext log = LMPLogCreateContext("lmxagentd", "com.zandor.lumex");

@@ -153,6 +153,16 @@ std::shared_ptr<LMRRecordingContext> AgentMain::recordingContext() {
   return nullptr;
 }
 
+void AgentMain::pauseOrResume(bool pause) {
+  if (!context_->adhoc()) return pause ? pauseCapture() : resumeCapture();
+  const auto controller = captureController();
+  if (!controller) return;
+  const std::string uuid = session()->recording_uuid();
+  const double now = secondsSinceReferenceDate() - context_->timeshift_seconds();
+  pause ? controller->setStopWithUUID(uuid, now)
+        : controller->setStartWithUUID(uuid, now, context_->properties());
+}
+
 void AgentMain::signal(int number) {
   switch (number) {
     case SIGHUP:
@@ -171,11 +181,11 @@ void AgentMain::signal(int number) {
       break;
     case SIGUSR1:
       context_->logDebug("Got Pause Signal");
-      pauseCapture();
+      pauseOrResume(true);
       break;
     case SIGUSR2:
       context_->logDebug("Got Resume Signal");
-      resumeCapture();
+      pauseOrResume(false);
       break;
     default:  // SIGPIPE: a broken connection must not end the process
       break;

@@ -22,10 +22,9 @@ constexpr int kExitOperatingSystem = 71;
 }  // namespace
 
 void AgentMain::disableService() {
-  static constexpr const char* kJob = "com.zandor.lmxagentd";
   LMPLogMessage(nullptr, kLogNotice, "Disabling lmxagentd with keeperd...");
   if (environment_.serviceManager->authorize()) {
-    const auto error = environment_.serviceManager->disable(kJob);
+    const auto error = environment_.serviceManager->disable(kServiceJob);
     if (!error) endProcess(kExitConfiguration);
     LMPLogMessage(nullptr, kLogCritical, "Unable to disable lmxagentd. KeeperToggle: error: %s\n",
                   error->c_str());

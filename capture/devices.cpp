@@ -4,6 +4,8 @@
 #include <algorithm>
 #include <set>
 
+#include "capture/device_list.h"
+
 namespace lmx {
 namespace {
 
@@ -33,30 +35,6 @@ std::string uniqueIdentifier(const GstStructure* properties, bool isVideo) {
                                         "alsa.card_name", "api.alsa.path", "device.string", "device.api"});
 }
 
-std::string describeFormats(GstDevice* device, bool isVideo) {
-  const CapsHandle caps(gst_device_get_caps(device));
-  std::set<std::string> formats;
-  if (!caps) return {};
-  for (guint i = 0; i < gst_caps_get_size(caps.get()) && formats.size() < 12; ++i) {
-    const GstStructure* s = gst_caps_get_structure(caps.get(), i);
-    int width = 0;
-    int height = 0;
-    int rate = 0;
-    if (isVideo && gst_structure_get_int(s, "width", &width) && gst_structure_get_int(s, "height", &height)) {
-      int n = 0;
-      int d = 1;
-      gst_structure_get_fraction(s, "framerate", &n, &d);
-      formats.insert(std::to_string(width) + "x" + std::to_string(height) +
-                     (n > 0 ? "@" + std::to_string(n / std::max(1, d)) : std::string()));
-    } else if (!isVideo && gst_structure_get_int(s, "rate", &rate)) {
-      formats.insert(std::to_string(rate) + " Hz");
-    }
-  }
-  std::string text;
-  for (const std::string& format : formats) text += (text.empty() ? "" : ", ") + format;
-  return text;
-}
-
 HardwareDevice describeDevice(GstHandle<GstDevice> device, bool isVideo) {
   HardwareDevice result;
   GstStructure* properties = gst_device_get_properties(device.get());
@@ -64,7 +42,7 @@ HardwareDevice describeDevice(GstHandle<GstDevice> device, bool isVideo) {
   result.parent = firstOf(properties, {"device.bus_path", "device.bus-path", "device.serial", "device.id"});
   if (properties != nullptr) gst_structure_free(properties);
   result.name = GText(gst_device_get_display_name(device.get())).get();
-  result.formats = describeFormats(device.get(), isVideo);
+  result.formats = formatsText(CapsHandle(gst_device_get_caps(device.get())).get(), isVideo);
   result.isVideo = isVideo;
   result.device = std::move(device);
   return result;

@@ -8,6 +8,7 @@
 #include <iterator>
 
 #include "capture/capture_controller.h"
+#include "capture/device_list.h"
 #include "capture/devices.h"
 #include "capture/finished_capture.h"
 #include "capture/preview_controller.h"
@@ -30,7 +31,7 @@ std::vector<std::string> subfolders(const std::string& folder) {
 
 class GstCaptureFramework : public CaptureFramework {
  public:
-  std::optional<std::string> defaultVideoDevice() override { return firstDevice(true); }
+  std::optional<std::string> defaultVideoDevice() override { return identifierOfFirst(true); }
   // Devices that carry both are cameras with a microphone of their own here; files and streams are never a
   // default.
   std::optional<std::string> defaultMuxedDevice() override { return std::nullopt; }
@@ -57,19 +58,11 @@ class GstCaptureFramework : public CaptureFramework {
       return {id.asFastAsPossible() ? "test://audio?speed=max" : "test://audio", false};
     }
     if (id.kind == DeviceKind::file || id.kind == DeviceKind::network) return {videoDevice, true};
-    const auto devices = listHardware();
-    std::string parent;
-    for (const HardwareDevice& device : devices) {
-      if (device.uniqueID == videoDevice) parent = device.parent;
-    }
-    for (const HardwareDevice& device : devices) {
-      if (!device.isVideo && !parent.empty() && device.parent == parent) return {device.uniqueID, true};
-    }
-    return {firstDevice(false), false};
+    return microphoneFor(listHardware(), videoDevice);
   }
 
   bool audioDeviceUsable(const std::optional<std::string>& audioDevice) override {
-    return audioDevice ? hasDevice(*audioDevice) : firstDevice(false).has_value();
+    return audioDevice ? hasDevice(*audioDevice) : identifierOfFirst(false).has_value();
   }
 
   std::optional<LMRCompressionOptions> compressionOptions(MediaType media,
@@ -78,7 +71,7 @@ class GstCaptureFramework : public CaptureFramework {
   }
 
   std::shared_ptr<LMRCaptureController> newCaptureController() override {
-    return std::make_shared<CaptureController>([] { return firstDevice(false); });
+    return std::make_shared<CaptureController>([] { return identifierOfFirst(false); });
   }
 
   std::unique_ptr<LMRPreviewController> newPreviewController(
@@ -87,15 +80,14 @@ class GstCaptureFramework : public CaptureFramework {
   }
 
   void warmUp() override;
-  std::string deviceInformation() override;
+  std::string deviceInformation() override { return deviceListText(listHardware()); }
   std::vector<RecoveredRecording> recoverUnfinished(const std::string& repository) override;
 
  private:
-  static std::optional<std::string> firstDevice(bool video) {
-    for (const HardwareDevice& device : listHardware()) {
-      if (device.isVideo == video) return device.uniqueID;
-    }
-    return std::nullopt;
+  static std::optional<std::string> identifierOfFirst(bool video) {
+    const auto devices = listHardware();
+    const HardwareDevice* device = firstDevice(devices, video);
+    return device == nullptr ? std::nullopt : std::optional(device->uniqueID);
   }
 };
 
@@ -117,29 +109,6 @@ void GstCaptureFramework::warmUp() {
       gst_object_unref(element);
     }
   }
-}
-
-std::string GstCaptureFramework::deviceInformation() {
-  std::string text;
-  const auto devices = listHardware();
-  for (const bool video : {true, false}) {
-    const auto automatic = firstDevice(video);
-    text += video ? "Cameras (RecordingVideoInput):\n" : "Microphones (RecordingAudioInput):\n";
-    for (const HardwareDevice& device : devices) {
-      if (device.isVideo != video) continue;
-      text += "  " + device.uniqueID + (automatic == device.uniqueID ? "   (Automatic)" : "") + "\n";
-      text += "      name: " + device.name + "\n";
-      if (!device.formats.empty()) text += "      formats: " + device.formats + "\n";
-      if (!video) continue;
-      if (const auto audio = preferredAudioDevice(device.uniqueID).uniqueID) {
-        text += "      microphone: " + *audio + "\n";
-      }
-    }
-    text += video ? "  test://video   (synthetic, never Automatic)\n  file:///PATH   (a movie, looped as a "
-                    "live camera)\n"
-                  : "  test://audio   (synthetic, never Automatic)\n";
-  }
-  return text;
 }
 
 std::vector<RecoveredRecording> GstCaptureFramework::recoverUnfinished(const std::string& repository) {

@@ -2,11 +2,9 @@
 #include "control/agent_control_unix.h"
 
 #include <sys/socket.h>
-#include <sys/un.h>
 #include <unistd.h>
 
-#include <cstddef>
-
+#include "control/local_socket.h"
 #include "control/plain_text.h"
 #include "platform/paths.h"
 #include "support/format.h"
@@ -15,14 +13,6 @@ namespace lmx {
 namespace {
 
 constexpr int kBacklog = 1024;
-
-std::optional<sockaddr_un> socketAddress(const std::string& path) {
-  sockaddr_un address{};
-  address.sun_family = AF_UNIX;
-  if (path.size() >= sizeof address.sun_path) return std::nullopt;  // cut off it would name another file
-  path.copy(address.sun_path, path.size());
-  return address;
-}
 
 }  // namespace
 
@@ -47,7 +37,7 @@ int AgentControlUnix::run() {
 int AgentControlUnix::localConnect() {
   logInfo("Connecting local pipe");
   const std::string path = systemPath(kLocalSocket);
-  const auto address = socketAddress(path);
+  const auto address = localSocketAddress(path);
   if (!address) return -1;
   localDomainSocket_.reset(::socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC | SOCK_NONBLOCK, 0));
   if (!localDomainSocket_.valid()) return -1;

@@ -45,7 +45,8 @@ def waiting(agent, seconds):
         count = voluntary - by_thread.get(thread, (name, 0.0, 0))[2]
         if count > 0:
             woken[f"{name}-{thread}" if name in woken else name] = count / minutes
-    return ((cpu_seconds(pid) - cpu) / minutes, (after[0] - before[0]) / minutes, (after[1] - before[1]) / minutes, woken)
+    voluntary, involuntary = ((b - a) / minutes for a, b in zip(before, after))
+    return (cpu_seconds(pid) - cpu) / minutes, voluntary, involuntary, woken
 
 
 def idle(ground):
@@ -70,8 +71,8 @@ def idle(ground):
             Row("exec → first STATUS answered", median(starts), "ms", limit=100, samples={"ours": starts})]
     wakers = ", ".join(f"{name} {count:.0f}" for name, count in sorted(woken.items(), key=lambda item: -item[1]))
     return Result(rows, [
-        f"over {seconds} s, no peer: the limits are absolute (0.1 % of a core, 5 wake-ups a second). Wake-ups are voluntary "
-        f"context switches of all threads; {involuntary:.0f} involuntary ones a minute. By thread: {wakers}",
+        f"over {seconds} s, no peer: the limits are absolute (0.1 % of a core, 5 wake-ups a second). Wake-ups are "
+        f"voluntary context switches of all threads; {involuntary:.0f} involuntary ones a minute. By thread: {wakers}",
         "private: Private_Clean + Private_Dirty of smaps_rollup, 5 s after the start, plug-ins loaded.",
-        f"exec → STATUS: median of {len(starts)}, GStreamer's catalogue of plug-ins warm, asked every 0.3 ms; the moment of "
-        "the exec is written down by the process itself."])
+        f"exec → STATUS: median of {len(starts)}, GStreamer's catalogue of plug-ins warm, asked every 0.3 ms; the "
+        "moment of the exec is written down by the process itself."])

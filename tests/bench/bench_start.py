@@ -42,9 +42,9 @@ def start(ground):
             Row("START → reply", median(replied), "ms", samples={"ours": replied}),
             Row("first START after the daemon's", seen[0], "ms", seen[-1], f"START number {count}")]
     return Result(rows, [
-        f"median of {count}, {PICTURE} with sound. The recorder notes in its journal when it takes the first frame of a run; "
-        "the benchmark looks there every 0.3 ms. The frame's own time comes from the same line.",
-        "The peer's figure ends when the element in front of its encoder reports its first frame; it holds the start of a "
-        "process and the loading of plug-ins, which the daemon has behind it.",
-        "Nothing in the daemon opens the camera ahead of START yet (no preview runs), so there is no figure for a warm "
-        "camera."])
+        f"median of {count}, {PICTURE} with sound. The recorder writes to its journal when it takes the first frame of "
+        "a run; the benchmark looks there every 0.3 ms. The frame's own time comes from the same line.",
+        "The peer's figure ends when the element in front of its encoder reports its first frame; it holds the "
+        "start of a process and the loading of plug-ins, which the daemon has behind it.",
+        "Nothing in the daemon opens the camera ahead of START yet (no preview runs), so there is no figure for a "
+        "warm camera."])

@@ -11,8 +11,8 @@ BLOCK = 100
 
 
 def microseconds(program, mode, path, count):
-    out = subprocess.run([str(program), mode, str(path), str(count), "STATUS"], capture_output=True, text=True, timeout=60,
-                         check=False)
+    out = subprocess.run([str(program), mode, str(path), str(count), "STATUS"], capture_output=True, text=True,
+                         timeout=60, check=False)
     assert out.returncode == 0, out.stderr
     return [int(line) / 1000 for line in out.stdout.split()]
 
@@ -36,14 +36,15 @@ class Trips:
         taken = self.take(mode)
         what = {"ask": "STATUS", "connect": "connect + STATUS"}[mode]
         goal = 2 if mode == "ask" else None
-        return [Row(f"{what}, {state}: median", median(taken["ours"]), "µs", median(taken["peer"]), "echo server in C",
-                    ratio_goal=goal),
-                Row(f"{what}, {state}: 99 %", percentile(taken["ours"], 0.99), "µs", percentile(taken["peer"], 0.99),
-                    "echo server in C", limit=1000 if goal else None)]
+        peer = "echo server in C"
+        middle = {name: median(values) for name, values in taken.items()}
+        late = {name: percentile(values, 0.99) for name, values in taken.items()}
+        return [Row(f"{what}, {state}: median", middle["ours"], "µs", middle["peer"], peer, ratio_goal=goal),
+                Row(f"{what}, {state}: 99 %", late["ours"], "µs", late["peer"], peer, limit=1000 if goal else None)]
 
 
 def status(ground):
-    """STATUS round trip on the local socket, idle and while recording, against an echo server through the same client."""
+    """STATUS round trip on the local socket, idle and while recording, against an echo server with the same client."""
     program = compile_roundtrip(ground.folder)
     echo_path = ground.folder / "echo.socket"
     with subprocess.Popen([str(program), "serve", str(echo_path)]) as echo:
@@ -59,8 +60,9 @@ def status(ground):
             echo.terminate()
     count = trips.blocks * BLOCK
     return Result(rows, [
-        f"{count} requests each, back to back, in turns of {BLOCK} with the peer; client and echo server are one C program, "
-        "compiled for this run. STATUS: all requests of a turn on one connection. connect + STATUS: a connection each.",
+        f"{count} requests each, back to back, in turns of {BLOCK} with the peer; client and echo server are one C "
+        "program, compiled for this run. STATUS: all requests of a turn on one connection. connect + STATUS: a "
+        "connection each.",
         "recording: 1280x720 with sound; the echo server is measured beside the same recording.",
         f"the daemon writes two messages a request to the system log (three more a connection), read by the benchmark; "
         f"{len(lost)} notices of lost messages."])

@@ -111,8 +111,8 @@ def live(ground):
 
 
 class FastHour:
-    """Media made as fast as the machine can. A mark lies on the wall clock, and such a camera's frames run ahead of it: the
-    operator's file of the time shift brings the mark of the end behind the last frame."""
+    """Media made as fast as the machine can. A mark lies on the wall clock, and such a camera's frames run ahead of it:
+    the operator's file of the time shift brings the mark of the end behind the last frame."""
 
     def __init__(self, agent, wanted):
         self.agent, self.wanted = agent, wanted
@@ -137,7 +137,7 @@ class FastHour:
         self.made_in = time.monotonic() - self.begin
 
     def settle(self):
-        """Lets the camera run past the mark of the end: what is timed is the end of the file, not the wait for frames."""
+        """Lets the camera run past the mark of the end: the end of the file is timed, not the wait for frames."""
         before = -1
         while before != (before := self.elapsed()):
             time.sleep(1)
@@ -162,8 +162,8 @@ def hour(ground):
         left = cached_share(path)
         notes = [f"{lengths['video']:.0f} s of media, {size / 1e6:.1f} MB, made in {fast.made_in:.0f} s "
                  f"({lengths['video'] / fast.made_in:.0f} times real time); one STOP",
-                 "the fast camera goes on at full speed until the capture is closed, so STOP works beside two busy threads; "
-                 "cp does not"]
+                 "the fast camera goes on at full speed until the capture is closed, so STOP works beside two busy "
+                 "threads; cp does not"]
         if left is not None:
             notes.append(f"cold: dropped with posix_fadvise before each cp, {left:.0f} % of the file left in memory")
         return Result(rows, notes)
@@ -173,5 +173,5 @@ def stop(ground):
     """STOP → finished movie in the repository, ten seconds live and an hour of media, against rename and cp."""
     short, long = live(ground), hour(ground)
     return Result(short.rows + long.rows, [*short.notes, *long.notes,
-                  "Our figure begins before STOP is sent and holds the wait for the frame that ends the recording (up to one "
-                  "interval), the sync of file and directory, and the rename; cp syncs nothing."])
+                  "Our figure begins before STOP is sent and holds the wait for the frame that ends the recording (up "
+                  "to one interval), the sync of file and directory, and the rename; cp syncs nothing."])

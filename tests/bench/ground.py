@@ -10,9 +10,16 @@ from pathlib import Path
 from harness.agent import Agent, REPOSITORY
 from harness.waiting import wait_until
 from measuring import other_load
+from peers import compile_camera_plugin
 
 # Seconds between the Unix epoch and that of the daemon's marks, 2001-01-01.
 REFERENCE_DATE = 978307200
+
+
+def make_catalogue(path, element, **environment):
+    """GStreamer's catalogue of plug-ins, which must know `element`."""
+    subprocess.run(["gst-inspect-1.0", element], env={**os.environ, "GST_REGISTRY": str(path), **environment},
+                   check=True, stdout=subprocess.DEVNULL, timeout=120)
 
 
 class Ground:
@@ -25,13 +32,21 @@ class Ground:
         self.binary = self.folder / "lmxagentd"
         shutil.copy2(binary, self.binary)
         self.registry = self.folder / "registry.bin"
-        environment = {**os.environ, "GST_REGISTRY": str(self.registry)}
-        subprocess.run(["gst-inspect-1.0", "fakesink"], env=environment, check=True, stdout=subprocess.DEVNULL)
-        # The peers get the same warm catalogue as the daemon.
-        self.environment = {**environment, "GST_REGISTRY_UPDATE": "no"}
+        make_catalogue(self.registry, "fakesink")
+        self._environment = None
 
     def close(self):
         shutil.rmtree(self.folder)
+
+    @property
+    def environment(self):
+        """For the peers: a catalogue of plug-ins as warm as the daemon's, with the synthetic camera in it."""
+        if self._environment is None:
+            plugins = {"GST_PLUGIN_PATH": str(compile_camera_plugin(self.folder))}
+            catalogue = self.folder / "peers-registry.bin"
+            make_catalogue(catalogue, "lmxtestcamera", **plugins)
+            self._environment = {**os.environ, **plugins, "GST_REGISTRY": str(catalogue), "GST_REGISTRY_UPDATE": "no"}
+        return self._environment
 
     @contextlib.contextmanager
     def agent(self, start=True, **preferences):
@@ -93,7 +108,8 @@ def recording(agent, uuid):
 
 def idle(agent):
     """Waits until the recorder is idle and no capture is left unfinished."""
-    wait_until(lambda: agent.command("STATUS").fields["recordStatus"] == "0" and not journals(agent), 20, "an idle recorder")
+    wait_until(lambda: agent.command("STATUS").fields["recordStatus"] == "0" and not journals(agent), 20,
+               "an idle recorder")
 
 
 def movie_streams(path):

@@ -8,13 +8,17 @@ from dataclasses import dataclass
 from pathlib import Path
 
 HERE = Path(__file__).resolve().parent
+TOP = HERE.parents[1]
+# What the daemon's synthetic camera is made of.
+CAMERA_SOURCES = ("capture/test_source.cpp", "capture/test_picture.cpp", "capture/device_id.cpp",
+                  "capture/gst_handles.cpp", "support/format.cpp")
 X264 = re.compile(rb"x264 - core [^\0]*?options: ([^\0]+)\0")
 
 
 @dataclass(frozen=True)
 class Picture:
-    """What is recorded. Bit rate and effort are the daemon's for the preset "Video:Better"; x264_options() of a movie of
-    each tells whether that is still true."""
+    """What is recorded. Bit rate and effort are the daemon's for the preset "Video:Better"; x264_options() of a movie
+    of each tells whether that is still true."""
 
     width: int
     height: int
@@ -39,19 +43,19 @@ def x264_options(movie):
     return found[1].decode()
 
 
-def synthetic_sources(picture):
-    """The launch lines of the daemon's synthetic camera and microphone, without what it draws into the frames."""
-    video = ("videotestsrc is-live=true pattern=smpte horizontal-speed=4 ! video/x-raw,format=I420,"
-             f"width={picture.width},height={picture.height},framerate=30/1,pixel-aspect-ratio=1/1")
-    audio = ("audiotestsrc is-live=true wave=ticks freq=1000 samplesperbuffer=480 ! "
+def synthetic_sources(picture, camera="lmxtestcamera size={}", microphone="audiotestsrc is-live=true"):
+    """The launch lines of the daemon's synthetic camera, as the plug-in has it, and microphone."""
+    video = (f"{camera.format(picture)} ! video/x-raw,format=I420,width={picture.width},height={picture.height},"
+             "framerate=30/1,pixel-aspect-ratio=1/1")
+    audio = (f"{microphone} wave=ticks freq=1000 samplesperbuffer=480 ! "
              "audio/x-raw,format=F32LE,layout=interleaved,rate=48000,channels=2")
     return video, audio
 
 
 def file_sources(movie):
     """The launch lines of the daemon's file camera."""
-    video = (f"uridecodebin name=file uri={Path(movie).as_uri()} file. ! queue ! videoconvert ! videoscale ! videorate ! "
-             "video/x-raw,format=I420,pixel-aspect-ratio=1/1,framerate=30/1 ! identity sync=true")
+    video = (f"uridecodebin name=file uri={Path(movie).as_uri()} file. ! queue ! videoconvert ! videoscale ! "
+             "videorate ! video/x-raw,format=I420,pixel-aspect-ratio=1/1,framerate=30/1 ! identity sync=true")
     audio = ("file. ! queue ! audioconvert ! audioresample ! audio/x-raw,format=F32LE,layout=interleaved,rate=48000,"
              "channels=2 ! identity sync=true")
     return video, audio
@@ -115,6 +119,31 @@ def seconds_to_first_buffer(picture, target, environment):
         raise AssertionError("the peer gave no frame")
     finally:
         peer.stop()
+
+
+def make_camera_file(picture, seconds, folder, environment):
+    """A movie to play as a camera, of decent quality."""
+    path = Path(folder) / f"camera-{picture}.mov"
+    camera = f"videotestsrc num-buffers={int(seconds * 30)} pattern=smpte horizontal-speed=4"
+    video, audio = synthetic_sources(picture, camera, f"audiotestsrc num-buffers={int(seconds * 100)}")
+    line = (f"{video} ! x264enc speed-preset=veryfast bitrate={2 * picture.kilobits} key-int-max=60 ! qtmux name=mux ! "
+            f"filesink location={path} {audio} ! avenc_aac ! mux.")
+    subprocess.run(["gst-launch-1.0", "-q", *line.split()], env=environment, check=True, timeout=120)
+    return path
+
+
+def compile_camera_plugin(folder):
+    """The daemon's synthetic camera as a plug-in for gst-launch-1.0. @return the plug-in's directory"""
+    compiler = shutil.which("c++") or shutil.which("g++") or shutil.which("clang++")
+    assert compiler, "a C++ compiler is needed for the peer's camera"
+    flags = subprocess.run(["pkg-config", "--cflags", "--libs", "gstreamer-1.0", "gstreamer-video-1.0"], check=True,
+                           capture_output=True, text=True).stdout.split()
+    directory = Path(folder) / "plugins"
+    directory.mkdir()
+    subprocess.run([compiler, "-std=c++20", "-O2", "-shared", "-fPIC", f"-I{TOP}", str(HERE / "test_camera_plugin.cpp"),
+                    *(str(TOP / source) for source in CAMERA_SOURCES), *flags, "-o", str(directory / "liblmxbench.so")],
+                   check=True)
+    return directory
 
 
 def compile_roundtrip(folder):

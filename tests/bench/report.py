@@ -2,6 +2,8 @@
 import os
 import platform
 import sys
+import textwrap
+import time
 from dataclasses import dataclass, field
 from pathlib import Path
 
@@ -76,7 +78,7 @@ def print_table(rows, show_samples):
 
 def print_notes(notes):
     for note in notes:
-        print("  * " + note)
+        print(textwrap.fill(note, 118, initial_indent="  * ", subsequent_indent="    ", break_on_hyphens=False))
     sys.stdout.flush()
 
 
@@ -89,4 +91,4 @@ def machine_notes(binary):
             + (f", governor {governor.read_text().strip()}" if governor.exists() else ", no frequency governor seen"),
             f"Linux {platform.release()}; load average {load}",
             f"daemon: {Path(binary).stat().st_size >> 20} MiB build of "
-            + f"{__import__('time').strftime('%F %T', __import__('time').localtime(Path(binary).stat().st_mtime))}"]
+            + time.strftime("%F %T", time.localtime(Path(binary).stat().st_mtime))]

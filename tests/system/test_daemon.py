@@ -25,6 +25,31 @@ def test_start_and_orderly_end(agent):
     assert not agent.path("/var/run/lmxagentd.pid").exists()
 
 
+def notified(agent):
+    """What the agent wanted to tell the buses, in order: there is none in here, so each attempt is a debug line."""
+    lines = agent.log.lines(r"^Notification com\.zandor\.lmxagentd\.\w+ was not sent on the \w+ bus", level=7)
+    return re.findall(r"lmxagentd\.(\w+) was not sent on the (\w+) bus", "\n".join(line.text for line in lines))
+
+
+def test_the_buses_are_told_of_start_and_end(running):
+    running.log.wait("started was not sent on the session bus", level=7)
+    assert notified(running) == [("started", "system"), ("started", "session")]
+    assert running.stop() == 0
+    running.log.wait("^lmxagentd stopped$", level=6)
+    assert notified(running)[2:] == [("stopped", "system"), ("stopped", "session")]
+
+
+@pytest.mark.parametrize("arguments, status, printed", [
+    (["-v"], 0, "\nLumex lmxagentd (version 100)\n\n"), (["-i", "nonsense"], 0, ""), (["-Q"], 64, None)])
+def test_the_tool_modes_say_goodbye_too(agent, arguments, status, printed):
+    agent.start(wait=False, arguments=arguments)
+    assert agent.wait_exit() == status
+    agent.log.wait("^lmxagentd stopped$", level=6)
+    assert notified(agent) == [("stopped", "system"), ("stopped", "session")]
+    assert not agent.log.lines("starting")
+    assert printed is None or agent.errors() == printed
+
+
 @pytest.mark.parametrize("number, text", [(signal.SIGINT, r"^Got Stop Signal \(SIGINT\)$"),
                                           (signal.SIGTERM, r"^Got Termination Signal \(SIGTERM\)$")])
 def test_stop_signals(running, number, text):
@@ -51,6 +76,27 @@ def test_pause_and_resume_by_signals(running):
     running.log.wait("^Got Resume Signal$", level=7)
     running.log.wait("recording resumed", level=5)
     assert running.command("STATUS").fields["recordStatus"] == "2"
+
+
+def test_a_hang_up_cancels_and_opens_the_camera_again(running):
+    """What was recorded is kept as a recovered movie: nobody has asked for the recording to be thrown away."""
+    running.start_recording("HUP")
+    time.sleep(2)
+    mark = running.log.mark()
+    running.sandbox.signal(signal.SIGHUP)
+    running.log.wait(r"^Got Signal \(SIGHUP\)$", level=7)
+    running.log.wait("^Process shutDownControl$", after=mark, level=7)
+    running.log.wait("^Process cancelCapture$", after=mark, level=7)
+    running.log.wait(r'^Recovered unfinished recording "/var/lmx/agent/recordings/HUP\.mov"', after=mark, level=5)
+    assert running.command("STATUS").fields["recordStatus"] == "0"
+    running.log.wait("^Using Video Device Named: ", after=mark, level=7)
+    time.sleep(1)
+    assert running.alive(), "the camera is back: the daemon goes on"
+    assert running.start_recording("NEXT").text == "cmdStatus=0"
+    time.sleep(1)
+    running.command("STOP")
+    running.wait_tool_call("NEXT")
+    assert [call["arguments"][4] for call in running.tool_calls()] == ["NEXT"]
 
 
 def test_a_stale_socket_and_pid_file_do_not_matter(running):

@@ -1,5 +1,7 @@
 // The actions of the main thread, the engine's callbacks and the loss of the device.
 #include <chrono>
+#include <csignal>
+#include <ctime>
 
 #include "record/capture_delegate.h"
 #include "tests/unit/agent/agent_fixture.h"
@@ -182,6 +184,42 @@ TEST_F(Actions, SignalsRunTheirActions) {
   for (const char* line : {"Got Pause Signal", "Got Resume Signal", "Got Termination Signal (SIGTERM)"}) {
     EXPECT_TRUE(log_.contains(7, line)) << line;
   }
+}
+
+TEST_F(Actions, AHangUpCancelsTheCaptureAndTheAgentGoesOn) {
+  start("R1");
+  const std::int64_t before = std::time(nullptr);
+  agent_.signal(SIGHUP);
+  EXPECT_TRUE(log_.contains(7, "Got Signal (SIGHUP)"));
+  EXPECT_EQ(journalCount("cancelRecording"), 1);
+  EXPECT_EQ(journalCount("controller stopRecording"), 0);
+  EXPECT_GE(context_->last_device_check(), before);
+  EXPECT_TRUE(context_->running());
+}
+
+TEST_F(Actions, AnInterruptStopsTheCaptureOfADaemonOnly) {
+  start("R1");
+  context_->setAdhoc(true);
+  agent_.signal(SIGINT);
+  EXPECT_EQ(journalCount("setStop"), 0);
+  EXPECT_EQ(journalCount("controller stopRecording"), 0);
+  EXPECT_FALSE(context_->running());
+  context_->setAdhoc(false);
+  context_->setRunning(true);
+  agent_.signal(SIGINT);
+  EXPECT_EQ(journalCount("controller stopRecording"), 1);
+  EXPECT_FALSE(context_->running());
+  EXPECT_EQ(log_.count(7, "Got Stop Signal (SIGINT)"), 2);
+}
+
+TEST_F(Actions, OtherSignalNumbersAreIgnored) {
+  start("R1");
+  const Entries before = journal_.entries();
+  const auto lines = log_.entries().size();
+  for (const int number : {0, SIGALRM, SIGCHLD, 99}) agent_.signal(number);
+  EXPECT_EQ(journal_.entries(), before);
+  EXPECT_EQ(log_.entries().size(), lines);
+  EXPECT_TRUE(context_->running());
 }
 
 TEST_F(Actions, PerformedFromAnotherThreadTheyRunInTheLoop) {

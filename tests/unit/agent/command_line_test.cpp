@@ -1,4 +1,7 @@
 // The options: what they set, what they print, with which exit code the program is to end.
+#include <ctime>
+
+#include "support/date_text.h"
 #include "tests/unit/agent/agent_fixture.h"
 
 namespace lmx {
@@ -26,6 +29,12 @@ class CommandLine : public AgentTest {
     return {goesOn, code, ::testing::internal::GetCapturedStderr(), output};
   }
 };
+
+std::string storedText(const char* key) {
+  const PlistResult read = readPropertyList(systemPath(kPreferencesFile));
+  const auto* dictionary = read.value ? read.value->dictionary() : nullptr;
+  return dictionary != nullptr && dictionary->contains(key) ? *dictionary->at(key).string() : "";
+}
 
 constexpr const char* kUsage =
     "\nlmxagentd (version 100)\n\n"
@@ -68,10 +77,152 @@ TEST_F(CommandLine, SubmissionCanBeDisabled) {
 }
 
 TEST_F(CommandLine, UnknownOptionIsAUsageError) {
-  const Outcome outcome = parse({"-Z"});
+  const Outcome outcome = parse({"-x"});
   EXPECT_FALSE(outcome.goes_on);
   EXPECT_EQ(outcome.exit_code, 64);
-  EXPECT_EQ(outcome.errors, std::string("/usr/sbin/lmxagentd: invalid option -- 'Z'\n") + kUsage);
+  EXPECT_EQ(outcome.errors, std::string("/usr/sbin/lmxagentd: invalid option -- 'x'\n") + kUsage);
+  EXPECT_EQ(parse({"--unknown"}).exit_code, 64);
+}
+
+TEST_F(CommandLine, OptionsWithoutTheirArgumentAreUsageErrors) {
+  for (const char* option : {"-c", "-d", "-f", "-p", "-t", "-u", "-Z", "--file", "--password", "--timerstart",
+                             "--timerdelay", "--timerrevoke", "--max_duration", "--unattended_minutes"}) {
+    const Outcome outcome = parse({option});
+    EXPECT_FALSE(outcome.goes_on) << option;
+    EXPECT_EQ(outcome.exit_code, 64) << option;
+    EXPECT_TRUE(outcome.errors.ends_with(kUsage)) << option;
+  }
+}
+
+TEST_F(CommandLine, DurationNeedsAdHocMode) {
+  const Outcome outcome = parse({"-d", "60"});
+  EXPECT_FALSE(outcome.goes_on);
+  EXPECT_EQ(outcome.exit_code, 64);
+  EXPECT_EQ(outcome.errors, "The -d option only applies to ad-hoc mode (requires a file path)\n");
+}
+
+TEST_F(CommandLine, AFileToRecordToIsAdHocMode) {
+  EXPECT_TRUE(parse({"-f", "out.mov", "-d", "60", "-s"}).goes_on);
+  EXPECT_TRUE(context_->adhoc());
+  EXPECT_EQ(context_->adhoc_request_type(), 0);
+  EXPECT_EQ(context_->adhoc_output_file(), "out.mov");
+  EXPECT_EQ(context_->duration(), 60);
+  EXPECT_EQ(context_->unattended(), 60) << "the default";
+}
+
+TEST_F(CommandLine, SubmissionNeedsAUser) {
+  const Outcome outcome = parse({"--file", "out.mov"});
+  EXPECT_FALSE(outcome.goes_on);
+  EXPECT_EQ(outcome.exit_code, 64);
+  EXPECT_EQ(outcome.errors, "A user name is required for ad-hoc file submission.\n");
+  EXPECT_TRUE(parse({"-f", "out.mov", "-u", "jane", "--password", "secret"}).goes_on);
+  EXPECT_EQ(context_->user(), "jane");
+  EXPECT_EQ(context_->password(), "secret");
+}
+
+TEST_F(CommandLine, QuestionsNeedNoUser) {
+  EXPECT_TRUE(parse({"--status"}).goes_on);
+  EXPECT_TRUE(context_->adhoc());
+  EXPECT_EQ(context_->adhoc_request_type(), 1);
+  EXPECT_TRUE(parse({"--timerlist"}).goes_on);
+  EXPECT_EQ(context_->adhoc_request_type(), 2);
+  EXPECT_TRUE(parse({"--timerrevoke", "T-1"}).goes_on);
+  EXPECT_EQ(context_->adhoc_request_type(), 3);
+  EXPECT_EQ(context_->timer_id(), "T-1");
+}
+
+TEST_F(CommandLine, APathThatIsNotUtf8StopsAtOnce) {
+  const Outcome outcome = parse({"-f", "H\xF6rsaal.mov", "-v"});
+  EXPECT_FALSE(outcome.goes_on);
+  EXPECT_EQ(outcome.exit_code, 71);
+  EXPECT_EQ(outcome.errors, "The -f option requires a path in UTF-8\n");
+  EXPECT_FALSE(context_->adhoc());
+}
+
+TEST_F(CommandLine, ANumberThatDoesNotParseLeavesTheLastOne) {
+  EXPECT_TRUE(parse({"-f", "a.mov", "-s", "-d", "x"}).goes_on);
+  EXPECT_EQ(context_->duration(), 0);
+  EXPECT_TRUE(parse({"-Z", "30", "-d", "x", "-f", "a.mov", "-s"}).goes_on);
+  EXPECT_EQ(context_->unattended(), 30);
+  EXPECT_EQ(context_->duration(), 30);
+  EXPECT_TRUE(parse({"--max_duration", "45", "--unattended_minutes", "", "-f", "a.mov", "-s"}).goes_on);
+  EXPECT_EQ(context_->duration(), 45);
+  EXPECT_EQ(context_->unattended(), 45);
+}
+
+TEST_F(CommandLine, TimerStartIsTakenAsGiven) {
+  EXPECT_TRUE(parse({"--timerstart", "tomorrow"}).goes_on);
+  EXPECT_EQ(context_->start_timer(), "tomorrow");
+  EXPECT_FALSE(context_->adhoc());
+}
+
+TEST_F(CommandLine, TimerDelayBecomesADate) {
+  const std::time_t before = std::time(nullptr);
+  EXPECT_TRUE(parse({"--timerdelay", "90"}).goes_on);
+  EXPECT_FALSE(context_->adhoc());
+  const auto start = context_->start_timer();
+  ASSERT_TRUE(start);
+  bool found = false;
+  for (std::time_t at = before + 90; at <= std::time(nullptr) + 91; ++at) found |= start == dateText(at);
+  EXPECT_TRUE(found) << *start;
+}
+
+TEST_F(CommandLine, ATimerDelayThatIsNoneIsIgnored) {
+  for (const char* delay : {"-5", "0", "abc", "", "nan", "1e300"}) {
+    const Outcome outcome = parse({"--timerdelay", delay});
+    EXPECT_TRUE(outcome.goes_on) << delay;
+    EXPECT_EQ(outcome.errors, "") << delay;
+    EXPECT_EQ(context_->start_timer(), std::nullopt) << delay;
+  }
+}
+
+TEST_F(CommandLine, AStoppingOptionHidesWhatFollows) {
+  EXPECT_EQ(parse({"-v", "-d", "60"}).exit_code, 0);
+  EXPECT_EQ(parse({"-d", "60", "-h"}).exit_code, 0);
+  EXPECT_EQ(context_->duration(), 60);
+  EXPECT_EQ(parse({"-x", "-v"}).exit_code, 64);
+}
+
+TEST_F(CommandLine, AnUnknownKindOfInformationIsNothing) {
+  const Outcome outcome = parse({"-i", "nonsense"});
+  EXPECT_FALSE(outcome.goes_on);
+  EXPECT_EQ(outcome.exit_code, 0);
+  EXPECT_EQ(outcome.output + outcome.errors, "");
+}
+
+TEST_F(CommandLine, AdHocPreferencesAreDumped) {
+  const Outcome outcome = parse({"-i", "ad-hoc-prefs"});
+  EXPECT_EQ(outcome.exit_code, 0);
+  EXPECT_TRUE(outcome.errors.starts_with("Got recording context (with ad-hoc-prefs): "));
+  EXPECT_TRUE(outcome.output.starts_with("\n\n'RecordingType' == "));
+}
+
+TEST_F(CommandLine, BindGoesBeforeThePreviewPath) {
+  children_.result.output =
+      "Successfully bound " + std::string(36, 'c') + std::string(11, ' ') + std::string(36, 's');
+  const Outcome bound = parse({"-p", "/p.jpg", "-t", "/a.mov", "-u", "jane", "-c", "host"});
+  EXPECT_FALSE(bound.goes_on);
+  EXPECT_EQ(bound.exit_code, 0);
+  EXPECT_EQ(storedText("PreviewPath"), "/p.jpg");
+  EXPECT_EQ(storedText("RecordingPath"), "/a.mov");
+
+  children_.result.status = 9;
+  EXPECT_EQ(parse({"-t", "/b.mov", "-u", "jane", "-c", "host", "-p", "/q.jpg"}).exit_code, 9);
+  EXPECT_EQ(storedText("PreviewPath"), "/p.jpg");
+}
+
+TEST_F(CommandLine, APreviewPathAloneIsSet) {
+  const Outcome outcome = parse({"-p", "/p.jpg"});
+  EXPECT_FALSE(outcome.goes_on);
+  EXPECT_EQ(outcome.exit_code, 0);
+  EXPECT_EQ(storedText("PreviewPath"), "/p.jpg");
+}
+
+TEST_F(CommandLine, ABindTestNeedsItsUserAndServer) {
+  const Outcome outcome = parse({"-t", "/a.mov"});
+  EXPECT_EQ(outcome.exit_code, 64);
+  EXPECT_NE(outcome.errors.find("Usage: lmxagentd -t <file-path> -u <username> -c <server>\n"),
+            std::string::npos);
 }
 
 TEST_F(CommandLine, InformationWithoutItsKindIsAUsageError) { EXPECT_EQ(parse({"-i"}).exit_code, 64); }

@@ -24,25 +24,38 @@ class ServiceDisable : public ::testing::Test {
  protected:
   ServiceDisable() { GTEST_FLAG_SET(death_test_style, "threadsafe"); }
   [[noreturn]] void disable() const {
+    setLogSinkForTesting(
+        [](void*, int level, const std::string& text) {
+          std::fprintf(stderr, "%d %s\n", level, text.c_str());
+        },
+        nullptr);
     AgentMain(newAgentContext(), {nullptr, services_, nullptr}).disableService();
   }
   std::shared_ptr<TellingServiceManager> services_ = std::make_shared<TellingServiceManager>();
 };
 
-constexpr const char* kFallback = "shell /bin/keeperctl -1 remove com.zandor.lmxagentd";
+constexpr const char* kDisabling = "5 Disabling lmxagentd with keeperd\\.\\.\\.\n";
+constexpr const char* kFallback =
+    "2 Removing job from keeperd\\.\nshell /bin/keeperctl -1 remove com.zandor.lmxagentd\n";
 
 TEST_F(ServiceDisable, EndsWithSeventyEight) {
-  EXPECT_EXIT(disable(), ::testing::ExitedWithCode(78), "disable com.zandor.lmxagentd");
+  EXPECT_EXIT(disable(), ::testing::ExitedWithCode(78),
+              std::string("^") + kDisabling + "disable com.zandor.lmxagentd\n$");
 }
 
 TEST_F(ServiceDisable, ThatFailsRemovesTheJobAndEndsWithSeventyOne) {
   services_->disable_error = "no such unit";
-  EXPECT_EXIT(disable(), ::testing::ExitedWithCode(71), kFallback);
+  // The line ends in a line feed of its own.
+  EXPECT_EXIT(disable(), ::testing::ExitedWithCode(71),
+              std::string(kDisabling) +
+                  "disable com.zandor.lmxagentd\n"
+                  "2 Unable to disable lmxagentd\\. KeeperToggle: error: no such unit\n\n" +
+                  kFallback);
 }
 
 TEST_F(ServiceDisable, WithoutAuthorizationRemovesTheJobAndEndsWithSeventyOne) {
   services_->authorizes = false;
-  EXPECT_EXIT(disable(), ::testing::ExitedWithCode(71), kFallback);
+  EXPECT_EXIT(disable(), ::testing::ExitedWithCode(71), std::string("^") + kDisabling + kFallback + "$");
 }
 
 }  // namespace

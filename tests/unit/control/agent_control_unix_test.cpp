@@ -318,5 +318,62 @@ TEST_F(LocalSocket, RestartBindsAgain) {
   }
 }
 
+/// A channel whose waiting for a peer can be called by itself.
+class Acceptor final : public AgentControlBase {
+ public:
+  using AgentControlBase::acceptPeer;
+  using AgentControlBase::AgentControlBase;
+  using AgentControlBase::serverSocket;
+  ~Acceptor() override { stop(); }
+  bool requiresAuthentication() const override { return false; }
+  void setAuthenticated(bool) override {}
+
+ protected:
+  int connect() override { return -1; }
+  std::optional<std::string> commandFromReceivedData(const std::string& line) override { return line; }
+  void sendReply(const std::string&) override {}
+};
+
+class Accepting : public ::testing::Test {
+ protected:
+  static int keepAliveOf(int socket) {
+    int on = -1;
+    socklen_t size = sizeof on;
+    return ::getsockopt(socket, SOL_SOCKET, SO_KEEPALIVE, &on, &size) == 0 ? on : -1;
+  }
+  [[nodiscard]] std::string lineFor(int peer) const {
+    return "accepted connection fd = " + std::to_string(peer) +
+           " from listen fd = " + std::to_string(listening_.get());
+  }
+  LogCapture log_;
+  UniqueFd listening_{::socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0)};
+  Acceptor channel_{newAgentContext(), nullptr};
+};
+
+TEST_F(Accepting, KeepAliveIsSetOnTheListeningSocketNotOnThePeers) {
+  sockaddr_un address{};
+  address.sun_family = AF_UNIX;  // with no path: the system picks a name
+  socklen_t size = sizeof address.sun_family;
+  ASSERT_EQ(::bind(listening_.get(), reinterpret_cast<const sockaddr*>(&address), size), 0);
+  ASSERT_EQ(::listen(listening_.get(), 1), 0);
+  size = sizeof address;
+  ASSERT_EQ(::getsockname(listening_.get(), reinterpret_cast<sockaddr*>(&address), &size), 0);
+  const UniqueFd peer(::socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0));
+  ASSERT_EQ(::connect(peer.get(), reinterpret_cast<const sockaddr*>(&address), size), 0);
+  EXPECT_EQ(channel_.acceptPeer(listening_.get()), 0);
+  EXPECT_GE(channel_.serverSocket(), 0);
+  EXPECT_TRUE(log_.contains(6, lineFor(channel_.serverSocket())));
+  EXPECT_EQ(keepAliveOf(listening_.get()), 1);
+  EXPECT_EQ(keepAliveOf(channel_.serverSocket()), 0);
+}
+
+TEST_F(Accepting, AFailureIsLoggedWithMinusOneAndTriedAgainAtOnce) {
+  const auto before = std::chrono::steady_clock::now();
+  EXPECT_EQ(channel_.acceptPeer(listening_.get()), -1);  // nobody has called listen
+  EXPECT_LT(std::chrono::steady_clock::now() - before, 1s);
+  EXPECT_EQ(channel_.serverSocket(), -1);
+  EXPECT_TRUE(log_.contains(6, lineFor(-1)));
+}
+
 }  // namespace
 }  // namespace lmx

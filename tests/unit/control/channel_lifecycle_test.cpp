@@ -290,6 +290,13 @@ TEST_F(Lifecycle, DisconnectIsLoggedAndClosesOnce) {
   EXPECT_GE(log_.count(6, "Disconnecting from tunnel..."), 1);
 }
 
+TEST_F(Lifecycle, DisconnectWithNothingOpenIsLoggedAllTheSame) {
+  channel_.disconnect();
+  EXPECT_EQ(log_.count(6, "Disconnecting from tunnel..."), 1);
+  channel_.disconnectOld();
+  EXPECT_EQ(log_.count(6, "Disconnecting from tunnel..."), 2);
+}
+
 TEST_F(Lifecycle, PeerThatClosedItsSideIsNotConnected) {
   std::array<int, 2> ends{};
   ASSERT_EQ(::socketpair(AF_UNIX, SOCK_STREAM, 0, ends.data()), 0);

@@ -18,10 +18,11 @@ class ScriptedChildRunner : public ChildRunner {
   ChildResult result{.end = ChildResult::End::exited, .status = 0, .output = {}};
   std::function<void()> on_run;
 
-  ChildResult run(const std::vector<std::string>& argv, const ChildOptions&) override {
+  ChildResult run(const std::vector<std::string>& argv, const ChildOptions& options) override {
     {
       const std::lock_guard lock(mutex_);
       runs_.push_back(argv);
+      options_ = options;
     }
     if (on_run) on_run();
     return result;
@@ -30,10 +31,16 @@ class ScriptedChildRunner : public ChildRunner {
     const std::lock_guard lock(mutex_);
     return runs_;
   }
+  /// Those of the last run.
+  [[nodiscard]] ChildOptions options() const {
+    const std::lock_guard lock(mutex_);
+    return options_;
+  }
 
  private:
   mutable std::mutex mutex_;
   std::vector<std::vector<std::string>> runs_;  // guarded by mutex_
+  ChildOptions options_;                        // guarded by mutex_
 };
 
 /// Main thread only.

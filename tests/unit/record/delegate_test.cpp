@@ -75,7 +75,8 @@ TEST_F(EngineTest, PreviewControllerNamesTheCamera) {
 TEST_F(EngineTest, PreviewControllerOfAMissingCameraIsNone) {
   framework_->cameras_attach = false;
   EXPECT_EQ(LXAgentRecordCreatePreviewController("camera", std::nullopt, false, 400, nullptr), nullptr);
-  EXPECT_TRUE(log_.mentions("An error occurred while initializing the capture device: "));
+  EXPECT_TRUE(log_.contains(
+      5, "An error occurred while initializing the capture device: com.zandor.lmxcapture 1002, no camera"));
   EXPECT_EQ(LXAgentRecordCreatePreviewController(std::nullopt, std::nullopt, false, 400, nullptr), nullptr);
 }
 

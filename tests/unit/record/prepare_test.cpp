@@ -1,4 +1,6 @@
 // Preparing a recording: the movie's path, the type, the results and their log lines.
+#include <gmock/gmock.h>
+
 #include "record/capture_delegate.h"
 #include "tests/unit/record/engine_fixture.h"
 
@@ -79,6 +81,38 @@ TEST_F(Prepare, DurationOfTheContextIsTheLongestRecording) {
   context_->setDuration(77);
   ASSERT_EQ(prepare(), 0);
   EXPECT_EQ(framework_->controller(0)->settings()->maxDurationMinutes, 77U);
+}
+
+TEST_F(Prepare, ADurationBelowOneIsNoLimit) {
+  for (const int duration : {0, -5}) {
+    context_->setDuration(duration);
+    ASSERT_EQ(prepare(), 0);
+    EXPECT_EQ(framework_->controller(framework_->controllersMade() - 1)->settings()->maxDurationMinutes, 0U);
+    endCaptures();
+    session_->setStatus(kRecorderIdle);
+  }
+}
+
+TEST_F(Prepare, ASegmentLengthGoesBeforeTheDuration) {
+  PlistDictionary preferences = testing::capturePreferences(repository_.path());
+  // What counts is the length alone, cut to 32 bits, not whether continuous recording is on.
+  preferences["ContinuousRecording"] =
+      PlistDictionary{{"Enabled", false}, {"RecordingSegmentLength", std::int64_t{0x100000005}}};
+  testing::writePreferences(preferences);
+  context_->setDuration(77);
+  ASSERT_EQ(prepare(), 0);
+  EXPECT_EQ(framework_->controller(0)->settings()->maxDurationMinutes, 5U);
+}
+
+TEST_F(Prepare, TheFrameRateOfThePreferencesIsAskedFor) {
+  const std::pair<const char*, double> rows[] = {{"25", 25}, {"29.97", 29.97}, {"0", 30}, {"fast", 30}};
+  for (const auto& [text, rate] : rows) {
+    context_->setRecording_video_maximum_frame_rate(text);
+    ASSERT_EQ(prepare(), 0);
+    EXPECT_EQ(framework_->controller(framework_->controllersMade() - 1)->settings()->maximumFrameRate, rate);
+    endCaptures();
+    session_->setStatus(kRecorderIdle);
+  }
 }
 
 TEST_F(Prepare, FileRecordingTakesTheInputFileAndNoController) {
@@ -174,7 +208,9 @@ TEST_F(Prepare, TooLittleSpaceIsThirtyAndLeavesTheError) {
   EXPECT_EQ(prepare(), 30);
   EXPECT_EQ(session_->error(), 3);
   EXPECT_EQ(session_->recording_uuid(), "");
-  EXPECT_TRUE(log_.mentions(" MB is below threshold "));
+  ASSERT_EQ(log_.entries().size(), 1U);
+  EXPECT_EQ(log_.entries()[0].level, 4);
+  EXPECT_THAT(log_.entries()[0].text, ::testing::MatchesRegex("[0-9]+ MB is below threshold -1 MB"));
 }
 
 TEST_F(Prepare, AVolumeThatCannotBeMeasuredPassesTheThreshold) {

@@ -1,6 +1,7 @@
 // The session: its state when new, its copy and its end.
 #include "record/agent_record.h"
 
+#include "record/preview_controller.h"
 #include "support/heap_ptr.h"
 #include "tests/unit/record/engine_fixture.h"
 
@@ -45,6 +46,87 @@ TEST_F(Session, CopyHasTheValuesAndSharesTheCapture) {
   EXPECT_FALSE(copy->autoShutoffCheckTimer());
   copy->captureController()->stopRecording();
   EXPECT_EQ(journalCount("controller stopRecording"), 1);
+}
+
+TEST_F(Session, CopyHasEverySetting) {
+  session_->setError(30);
+  session_->setDelay(1);
+  session_->setMaxUnattendedRecordingMinutes(2);
+  session_->setSessions({.captureWidth = 3, .videoKeyFrameRate = 4});
+  session_->setVideoPercent(5);
+  session_->setVideoWidth(6);
+  session_->setVideoHeight(7);
+  session_->setAudioSampleRate(8);
+  session_->setAudioChannelsNumber(9);
+  session_->setAudioOnlyMode(true);
+  session_->setDiskSpaceCutoffInMB(10);
+  session_->setMetadata(parameters({{"a", "b"}}));
+  const auto copy = session_->copy();
+  EXPECT_EQ(copy->error(), 30);
+  EXPECT_EQ(copy->delay(), 1);
+  EXPECT_EQ(copy->maxUnattendedRecordingMinutes(), 2);
+  EXPECT_EQ(copy->sessions().captureWidth, 3);
+  EXPECT_EQ(copy->sessions().videoKeyFrameRate, 4U);
+  EXPECT_EQ(copy->videoPercent(), 5U);
+  EXPECT_EQ(copy->videoWidth(), 6U);
+  EXPECT_EQ(copy->videoHeight(), 7U);
+  EXPECT_EQ(copy->audioSampleRate(), 8);
+  EXPECT_EQ(copy->audioChannelsNumber(), 9);
+  EXPECT_TRUE(copy->audioOnlyMode());
+  EXPECT_EQ(copy->diskSpaceCutoffInMB(), 10U);
+  EXPECT_EQ(lookUp(copy->metadata(), "a"), "b");
+}
+
+TEST_F(Session, CopyHasEachTimeThatIsSetAndNoOther) {
+  using Time = AgentRecord::Time;
+  const std::pair<Time (AgentRecord::*)() const, void (AgentRecord::*)(Time)> kTimes[] = {
+      {&AgentRecord::elapsedTime, &AgentRecord::setElapsedTime},
+      {&AgentRecord::launchTime, &AgentRecord::setLaunchTime},
+      {&AgentRecord::startTime, &AgentRecord::setStartTime},
+      {&AgentRecord::stopTime, &AgentRecord::setStopTime},
+      {&AgentRecord::hardStopTime, &AgentRecord::setHardStopTime},
+      {&AgentRecord::softStopTime, &AgentRecord::setSoftStopTime},
+      {&AgentRecord::lastContact, &AgentRecord::setLastContact}};
+  for (const auto& [get, set] : kTimes) {
+    (session_.get()->*set)(TimeValue{5, 6});
+    const auto copy = session_->copy();
+    for (const auto& [other, unused] : kTimes) {
+      EXPECT_EQ((copy.get()->*other)().has_value(), other == get);
+    }
+    const Time copied = (copy.get()->*get)();
+    ASSERT_TRUE(copied);
+    EXPECT_EQ(copied->tv_sec, 5);
+    EXPECT_EQ(copied->tv_usec, 6);
+    (session_.get()->*set)(std::nullopt);
+  }
+}
+
+TEST_F(Session, CopySharesTheCaptureObjects) {
+  ASSERT_EQ(LXAgentRecordPrepareCapture(*context_, parameters({})), 0);
+  session_->setPreviewController(
+      LXAgentRecordCreatePreviewController("camera", std::nullopt, false, 400, nullptr));
+  const auto copy = session_->copy();
+  EXPECT_NE(copy->captureThread(), nullptr);
+  EXPECT_EQ(copy->captureThread(), session_->captureThread());
+  EXPECT_NE(copy->previewController(), nullptr);
+  EXPECT_EQ(copy->previewController(), session_->previewController());
+  EXPECT_NE(copy->captureControllerDelegate(), nullptr);
+  EXPECT_EQ(copy->captureControllerDelegate(), session_->captureControllerDelegate());
+}
+
+TEST_F(Session, StoppingThroughACopyStopsTheSameRecording) {
+  ASSERT_EQ(LXAgentRecordPrepareCapture(*context_, parameters({})), 0);
+  const auto copy = session_->copy();
+  actions_.on_stop_capture = [&] {
+    copy->setStatus(kRecorderIdle);
+    endCaptures();
+  };
+  EXPECT_EQ(LXAgentRecordStopCapture(copy), 0);
+  const auto marks = framework_->controller(0)->marks();
+  ASSERT_EQ(marks.size(), 2U);
+  EXPECT_EQ(marks[1].operation, "setStop");
+  EXPECT_EQ(marks[1].uuid, session_->recording_uuid());
+  EXPECT_EQ(journalCount("stopCapture"), 1);
 }
 
 TEST_F(Session, CopyKeepsItsValuesWhenTheSessionGoesOn) {

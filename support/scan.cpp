@@ -1,0 +1,36 @@
+// Scanning numbers, whatever the locale.
+#include "support/scan.h"
+
+#include <algorithm>
+#include <charconv>
+#include <cmath>
+
+namespace lmx {
+namespace {
+
+/// `text` from the number's first character on; from_chars takes a minus sign, but neither blanks nor a plus.
+std::string_view numberPart(std::string_view text) {
+  text.remove_prefix(std::min(text.find_first_not_of(" \t\n\v\f\r"), text.size()));
+  if (text.starts_with('+') && !text.substr(1).starts_with('-')) text.remove_prefix(1);
+  return text;
+}
+
+template <typename Number>
+std::optional<Number> scan(std::string_view text) {
+  const std::string_view part = numberPart(text);
+  Number value{};
+  const auto read = std::from_chars(part.data(), part.data() + part.size(), value);
+  if (read.ec != std::errc()) return std::nullopt;
+  return value;
+}
+
+}  // namespace
+
+std::optional<int> scanInteger(std::string_view text) { return scan<int>(text); }
+
+std::optional<double> scanReal(std::string_view text) {
+  const auto value = scan<double>(text);
+  return value && std::isfinite(*value) ? value : std::nullopt;
+}
+
+}  // namespace lmx

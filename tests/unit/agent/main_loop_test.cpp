@@ -1,0 +1,181 @@
+// The turns of the main loop: a missed device, forgotten previews, the server's refusal, and how it ends.
+#include <unistd.h>
+
+#include <cstdio>
+#include <ctime>
+
+#include "record/capture_delegate.h"
+#include "record/engine.h"
+#include "record/preview_controller.h"
+#include "tests/unit/agent/agent_fixture.h"
+
+namespace lmx {
+namespace {
+
+/// The main loop's checks, a turn at a time.
+class MainLoop : public AgentTest {
+ protected:
+  static constexpr const char* kOffline =
+      "Unable to acquire the specified video device. The agent will remain offline until the device becomes "
+      "available.";
+
+  /// @return whether the loop would have gone on after this turn.
+  bool turn() {
+    bool goesOn = false;
+    agent_.mainRunLoop().post(
+        [&] {
+          goesOn = context_->running();
+          context_->setRunning(false);
+        },
+        Wait::no);
+    EXPECT_EQ(agent_.appLoop(), 0);
+    context_->setRunning(true);
+    return goesOn;
+  }
+  void checkedDevice(int secondsAgo) { context_->setLast_device_check(std::time(nullptr) - secondsAgo); }
+};
+
+TEST_F(MainLoop, ADeviceThatIsNotMissedIsNotLookedFor) {
+  EXPECT_TRUE(turn());
+  EXPECT_EQ(session_->previewController(), nullptr);
+}
+
+TEST_F(MainLoop, AMissedDeviceIsLookedForAfterMoreThanTenSeconds) {
+  checkedDevice(9);
+  EXPECT_TRUE(turn());
+  EXPECT_EQ(session_->previewController(), nullptr);
+  EXPECT_GT(context_->last_device_check(), 0);
+  checkedDevice(11);
+  EXPECT_TRUE(turn());
+  EXPECT_NE(session_->previewController(), nullptr);
+  EXPECT_EQ(context_->last_device_check(), 0);
+  EXPECT_FALSE(log_.mentions(kOffline));
+}
+
+TEST_F(MainLoop, ADeviceThatIsStillMissingEndsTheDaemon) {
+  framework_->cameras_attach = false;
+  checkedDevice(11);
+  EXPECT_FALSE(turn());
+  EXPECT_EQ(session_->previewController(), nullptr);
+  EXPECT_FALSE(log_.mentions(kOffline));
+}
+
+TEST_F(MainLoop, ADeviceThatFailedGetsOneMoreRetryWithAWarning) {
+  framework_->cameras_attach = false;
+  agent_.shutDownControlBecauseDeviceFailed();
+  EXPECT_TRUE(log_.contains(7, "Process shutDownControl"));
+  checkedDevice(11);
+  const std::int64_t before = std::time(nullptr);
+  EXPECT_TRUE(turn());
+  EXPECT_EQ(log_.count(4, kOffline), 1);
+  EXPECT_GE(context_->last_device_check(), before);
+  checkedDevice(11);
+  EXPECT_FALSE(turn());
+  EXPECT_EQ(log_.count(4, kOffline), 1);
+}
+
+TEST_F(MainLoop, ADeviceThatIsBackForgetsTheWarning) {
+  agent_.shutDownControlBecauseDeviceFailed();
+  checkedDevice(11);
+  EXPECT_TRUE(turn());
+  framework_->cameras_attach = false;
+  checkedDevice(11);
+  EXPECT_FALSE(turn());
+  EXPECT_FALSE(log_.mentions(kOffline));
+}
+
+TEST_F(MainLoop, PreferencesThatAreGoneAtTheRetryEndTheDaemon) {
+  framework_->audio_device_usable = false;
+  checkedDevice(11);
+  EXPECT_FALSE(turn());
+  EXPECT_TRUE(log_.contains(2,
+                            "Unable to load the recording context, exception = Unknown device ID: microphone "
+                            "for preference: RecordingAudioInput"));
+}
+
+TEST_F(MainLoop, APreviewThatNobodyAsksForIsStoppedAfterSixteenSeconds) {
+  const auto preview = LXAgentRecordCreatePreviewController("camera", std::nullopt, false, 400, nullptr);
+  ASSERT_NE(preview, nullptr);
+  session_->setPreviewController(preview);
+  preview->controller().startPreview();
+  preview->setMLastPreviewRequestTime(std::time(nullptr) - 14);
+  turn();
+  EXPECT_TRUE(preview->controller().isPreviewRunning());
+  preview->setMLastPreviewRequestTime(0);
+  turn();
+  EXPECT_TRUE(preview->controller().isPreviewRunning());
+  preview->setMLastPreviewRequestTime(std::time(nullptr) - 16);
+  turn();
+  EXPECT_FALSE(preview->controller().isPreviewRunning());
+  EXPECT_EQ(preview->mLastPreviewRequestTime(), 0);
+  EXPECT_TRUE(log_.contains(7, "Process stopPreview"));
+}
+
+TEST_F(MainLoop, ALostDeviceEndsItWithOne) {
+  const auto delegate = std::make_shared<LMRCaptureDelegate>(nullptr);
+  delegate->setRecordError(CaptureError{CaptureError::kDomain, kDeviceRemoved, "gone"});
+  session_->setCaptureControllerDelegate(delegate);
+  EXPECT_EQ(agent_.appLoop(), 1);
+  EXPECT_FALSE(context_->running());
+}
+
+TEST_F(MainLoop, ARunLoopThatWasStoppedEndsItInOrder) {
+  agent_.mainRunLoop().stop();
+  EXPECT_EQ(agent_.appLoop(), 0);
+  EXPECT_TRUE(context_->running());
+}
+
+// The thread sanitizer can't follow the forks of these tests.
+#if !defined(__SANITIZE_THREAD__)
+
+/// The log of a process that is about to end, on its standard error.
+void tellOnStandardError(void*, int level, const std::string& text) {
+  std::fprintf(stderr, "%d %s\n", level, text.c_str());
+}
+
+class Refusal : public MainLoop {
+ protected:
+  static constexpr const char* kLine = "2 Server rejected agent connection, restarting for retry\\.";
+  static constexpr int kWentOn = 7;
+
+  Refusal() { GTEST_FLAG_SET(death_test_style, "threadsafe"); }
+  /// One turn, which may end the process; else kWentOn does.
+  [[noreturn]] void turnAfter(int seconds) {
+    setLogSinkForTesting(tellOnStandardError, nullptr);
+    context_->setServerRejectTime(std::time(nullptr) - seconds);
+    turn();
+    _exit(kWentOn);
+  }
+};
+
+TEST_F(Refusal, EndsTheProcessWithZeroAfterAMinute) {
+  EXPECT_EXIT(turnAfter(60), ::testing::ExitedWithCode(0), kLine);
+}
+
+TEST_F(Refusal, IsNotActedUponEarlier) { EXPECT_EXIT(turnAfter(57), ::testing::ExitedWithCode(kWentOn), ""); }
+
+TEST_F(Refusal, IsNeverActedUponInAdhocMode) {
+  context_->setAdhoc(true);
+  EXPECT_EXIT(turnAfter(1000), ::testing::ExitedWithCode(kWentOn), "");
+  context_->setAdhoc(false);
+}
+
+TEST_F(MainLoop, ALostDeviceEndsAnAdhocProcessWithSixtyNine) {
+  GTEST_FLAG_SET(death_test_style, "threadsafe");
+  const auto delegate = std::make_shared<LMRCaptureDelegate>(nullptr);
+  delegate->setRecordError(CaptureError{CaptureError::kDomain, kDeviceRemoved, "gone"});
+  session_->setCaptureControllerDelegate(delegate);
+  context_->setAdhoc(true);
+  context_->postProcessListAddJob(std::make_shared<AgentSubmit>());  // not waited for
+  const auto ask = [this] {
+    setLogSinkForTesting(tellOnStandardError, nullptr);
+    agent_.deviceDisconnected();
+  };
+  EXPECT_EXIT(ask(), ::testing::ExitedWithCode(69), "2 The capture device has been disconnected\\.");
+  context_->setAdhoc(false);
+}
+
+#endif
+
+}  // namespace
+}  // namespace lmx
