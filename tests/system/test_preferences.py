@@ -149,6 +149,13 @@ def test_a_file_replaced_by_a_broken_one_disables_the_service(running):
     assert [l for l in running.log.lines(level=2) if l.text == required("TunnelHost")[1]]
 
 
+def test_a_file_replaced_by_a_malformed_one_is_named_and_disables_the_service(running):
+    mark = running.log.mark()
+    running.preferences_bytes(b"no property list")
+    disabled_after_change(running)
+    assert [l for l in running.log.lines(PREFERENCES, after=mark) if l.level <= 3], running.report()
+
+
 def test_a_deleted_file_disables_the_service(running):
     running.path(PREFERENCES).unlink()
     disabled_after_change(running)

@@ -100,15 +100,27 @@ class Agent:
     # Its life --------------------------------------------------------------------------------------------------
 
     def start(self, wait=True, env=None, **sandbox_options):
-        environment = dict(env or {})
-        if self.registry:
-            inside = self.sandbox.root / "var/cache/gstreamer.registry"
-            inside.write_bytes(Path(self.registry).read_bytes())
-            environment |= {"GST_REGISTRY": "/var/cache/gstreamer.registry", "GST_REGISTRY_UPDATE": "no"}
-        self.sandbox.start(env=environment, **sandbox_options)
+        self.sandbox.start(env=self._environment(env), **sandbox_options)
         if wait:
             self.wait_started()
         return self
+
+    def run(self, *arguments, env=None, **options):
+        """Runs the program with `arguments` to its end, beside the daemon when that runs."""
+        return self.sandbox.run(*arguments, env=self._environment(env), **options)
+
+    def popen(self, *arguments, env=None):
+        """Starts it and lets it run."""
+        return self.sandbox.popen(arguments, env=self._environment(env))
+
+    def _environment(self, env):
+        environment = dict(env or {})
+        if self.registry:
+            inside = self.sandbox.root / "var/cache/gstreamer.registry"
+            if not inside.exists():
+                inside.write_bytes(Path(self.registry).read_bytes())
+            environment |= {"GST_REGISTRY": "/var/cache/gstreamer.registry", "GST_REGISTRY_UPDATE": "no"}
+        return environment
 
     def wait_started(self, timeout=20.0):
         """Waits until the local socket answers."""

@@ -56,23 +56,50 @@ class Sandbox:
         """Starts the daemon: `mounts` as sandbox_init.sh reads them, `prefix` a command in front of the daemon's."""
         assert self.process is None, "a daemon runs already"
         self._daemon = None
-        environment = {"PATH": "/usr/bin:/usr/sbin", "HOME": "/root", "LANG": "C.UTF-8", "TMPDIR": "/tmp",
-                       "LMX_MOUNTS": "\n".join(mounts), **(env or {})}
-        user = [] if os.geteuid() == 0 else ["-U", "-r"]
-        command = ["setpriv", "--pdeathsig", "KILL", "--", "unshare", *user, "-m", "-n", "-p", "-f", "--kill-child",
-                   "sh", str(HARNESS / "sandbox_init.sh"), str(self.root), str(self.binary),
-                   *prefix, "/opt/lmxagentd", *arguments]
         with open(self.errors, "ab") as errors:
-            self.process = subprocess.Popen(command, env=environment, stdin=subprocess.DEVNULL, stdout=errors,
-                                            stderr=errors, start_new_session=True)
+            self.process = subprocess.Popen(self._command(arguments, prefix), env=self._environment(env, mounts),
+                                            stdin=subprocess.DEVNULL, stdout=errors, stderr=errors,
+                                            start_new_session=True)
         wait_until(lambda: self.daemon_pid or self.process.poll() is not None, what="the daemon's process")
+
+    def popen(self, arguments, env=None, mounts=(), prefix=()):
+        """Starts the program as a person at a shell does, beside the daemon when one runs. @return the Popen"""
+        if self.daemon_pid:
+            user = [] if os.geteuid() == 0 else ["--user", "--preserve-credentials"]
+            command = ["nsenter", "--target", str(self.daemon_pid), *user, "--mount", "--net", "--pid", "--root",
+                       "--wd", "--", *prefix, "/opt/lmxagentd", *arguments]
+        else:
+            command = self._command(arguments, prefix)
+        return subprocess.Popen(command, env=self._environment(env, mounts), stdin=subprocess.DEVNULL,
+                                stdout=subprocess.PIPE, stderr=subprocess.PIPE)
+
+    def run(self, *arguments, timeout=30, **options):
+        """The same to its end. @return its status and what it said, as subprocess.run does"""
+        with self.popen(arguments, **options) as process:
+            try:
+                output, errors = process.communicate(timeout=timeout)
+            except BaseException:
+                process.kill()
+                raise
+        return subprocess.CompletedProcess(arguments, process.returncode, output.decode(), errors.decode())
+
+    def _command(self, arguments, prefix):
+        user = [] if os.geteuid() == 0 else ["-U", "-r"]
+        return ["setpriv", "--pdeathsig", "KILL", "--", "unshare", *user, "-m", "-n", "-p", "-f", "--kill-child",
+                "sh", str(HARNESS / "sandbox_init.sh"), str(self.root), str(self.binary),
+                *prefix, "/opt/lmxagentd", *arguments]
+
+    @staticmethod
+    def _environment(env, mounts):
+        return {"PATH": "/usr/bin:/usr/sbin", "HOME": "/root", "LANG": "C.UTF-8", "TMPDIR": "/tmp",
+                "LMX_MOUNTS": "\n".join(mounts), **(env or {})}
 
     @property
     def daemon_pid(self):
         """The daemon's process as the host numbers it, None when there is none (any more)."""
         if self._daemon is None and self.process is not None:
-            for init in _children(self.process.pid):
-                for child in _children(init):
+            for init in children_of(self.process.pid):
+                for child in children_of(init):
                     if _name(child) == "lmxagentd":
                         self._daemon = child
         return self._daemon
@@ -107,7 +134,7 @@ class Sandbox:
         """Ends the whole process tree at once, whatever it does."""
         if self.process is None:
             return
-        for init in _children(self.process.pid):
+        for init in children_of(self.process.pid):
             os.kill(init, signal.SIGKILL)
         self.process.kill()
         self.process.wait(10)
@@ -119,7 +146,7 @@ class Sandbox:
         shutil.rmtree(self.base)
 
 
-def _children(pid):
+def children_of(pid):
     try:
         return [int(word) for word in Path(f"/proc/{pid}/task/{pid}/children").read_text().split()]
     except (FileNotFoundError, ProcessLookupError):

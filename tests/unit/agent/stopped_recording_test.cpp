@@ -191,6 +191,33 @@ TEST_F(StoppedRecording, AFileRecordingMakesItsJobWithoutACapture) {
   EXPECT_EQ(session_->status(), kRecorderIdle);
 }
 
+TEST_F(StoppedRecording, ACancelledFileRecordingMakesNoJob) {
+  session_->setRecordingType(kRecordingTypeFile);
+  context_->setInput_file(movie("in.mov"));
+  setParameters({{"RecordingMetadata_RECORDING_UUID", "R1"}});
+  agent_.prepareCapture();
+  EXPECT_TRUE(testing::waitUntil([&] { return session_->startTime().has_value(); }));
+  agent_.cancelCapture();
+  EXPECT_EQ(session_->status(), kRecorderIdle);
+  agent_.stopRecording();
+  EXPECT_EQ(context_->postProcessListCount(), 0U);
+  EXPECT_FALSE(log_.mentions("recording stopped"));
+}
+
+TEST_F(StoppedRecording, ASecondStopMakesNoSecondJob) {
+  const auto controller = start("R1");
+  agent_.stopRecording();
+  agent_.stopRecording();
+  reportEnd(controller);
+  turnTheLoop();
+  EXPECT_NE(nextJob(), nullptr);
+  agent_.stopRecording();
+  turnTheLoop();
+  EXPECT_TRUE(testing::waitUntil([&] { return journalCount("requestHandedOver request of R1") == 1; }));
+  EXPECT_EQ(context_->postProcessListCount(), 0U);
+  EXPECT_EQ(journalCount("processRequest request of R1 " + movie("R1.mov")), 1);
+}
+
 TEST_F(StoppedRecording, RecoveredOnesGetTheirDocumentAndAreNotSubmitted) {
   bool forgotten = false;
   RecoveredRecording recovered;

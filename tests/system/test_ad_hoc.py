@@ -1,0 +1,77 @@
+"""The ad-hoc client against the real daemon."""
+import os
+import re
+import signal
+
+from harness import movie
+from harness.agent import REPOSITORY
+from harness.sandbox import children_of
+from harness.waiting import wait_until
+
+START = ("START RecordingMetadata_RECORDING_UUID=90201534-37B5-482F-AD57-C3762F5020E1,"
+         "RecordingMetadata_MAX_RECORDING_MINUTES=240,RecordingMetadata_UNATTENDED_RECORDING_MINUTES=60,"
+         "RecordingMetadata_ADHOC_WORKFLOW_UUID=DEFA1587-A650-426E-92DA-01C5EB811705")
+OUTPUT = "/var/lmx/lecture 1.mov"
+
+
+def test_without_a_daemon(agent):
+    for arguments in (("--status",), ("--timerlist",), ("--timerrevoke", "T"), ("-f", OUTPUT, "-s")):
+        result = agent.run(*arguments)
+        assert (result.returncode, result.stdout, result.stderr) == (0, "", ""), arguments
+
+
+def test_status(running):
+    result = running.run("--status")
+    assert (result.returncode, result.stderr) == (0, "")
+    reply = running.command("STATUS include_preview=true").text
+    assert result.stdout == f"Connected.\nsending: STATUS include_preview=true\n\nreceived: {reply}\n"
+
+
+def test_an_interrupt_ends_a_client_that_gets_no_answer(running):
+    with running.connect(), running.popen("--status") as client:  # behind a peer that holds the socket
+        assert client.stdout.readline() == b"Connected.\n"
+        interrupt(client, signal.SIGINT)
+        output, _ = client.communicate(timeout=10)
+    assert (client.returncode, output.decode()) == (0, "sending: STATUS include_preview=true\n\nreceived: <empty>\n")
+
+
+def let_it_record(agent, mark):
+    """Waits for some media; the socket can't be asked, the client holds it."""
+    agent.log.wait("recording started$", after=mark)
+    wait_until(lambda: sum(p.stat().st_size for p in agent.path(REPOSITORY).rglob("media.mov")) > 60_000, 20, "media")
+
+
+def interrupt(client, number):
+    """Sends a signal to the program, which is the child of the command that entered the sandbox."""
+    (program,) = wait_until(lambda: children_of(client.pid), 5, "the client's process")
+    os.kill(program, number)
+
+
+def test_a_recording_until_an_interrupt(running):
+    mark = running.log.mark()
+    with running.popen("-f", OUTPUT, "-s") as client:
+        let_it_record(running, mark)
+        interrupt(client, signal.SIGINT)
+        output, errors = client.communicate(timeout=30)
+    assert (client.returncode, errors) == (0, b"")
+    command = f"{START},RecordingMetadata_ADHOC_SUBMIT_DISABLED=1,RecordingMetadata_ADHOC_FILE_PATH={OUTPUT}\n"
+    assert output.decode() == (f"Connected.\nsending: {command}\nreceived: cmdStatus=0\n"
+                               "sent STOP, received: cmdStatus=0\n")
+    running.log.wait(f'^"{re.escape(OUTPUT)}" recording stopped', after=mark)
+    movie.decodes(running.path(OUTPUT))
+    assert not running.tool_calls(), "the submission was disabled"
+
+
+def test_a_recording_that_is_submitted(running):
+    mark = running.log.mark()
+    with running.popen("-f", OUTPUT, "-u", "jane", "--password", "geheim", "-d", "5", "-Z", "7") as client:
+        let_it_record(running, mark)
+        interrupt(client, signal.SIGTERM)
+        output, _ = client.communicate(timeout=30)
+    assert client.returncode == 0
+    assert "MAX_RECORDING_MINUTES=5,RecordingMetadata_UNATTENDED_RECORDING_MINUTES=7," in output.decode()
+    call = wait_until(running.tool_calls, 30, "the submission")[0]["arguments"]
+    assert call[call.index("--workflow_uuid") + 1] == "DEFA1587-A650-426E-92DA-01C5EB811705"
+    assert call[call.index("--file") + 1] == OUTPUT
+    assert call[call.index("--user") + 1] == "jane"
+    assert not [l for l in running.log.lines("Command is") if "geheim" in l.text]
