@@ -4,7 +4,9 @@
 #include <sys/types.h>
 
 #include <atomic>
+#include <chrono>
 #include <cstdint>
+#include <ctime>
 #include <map>
 #include <memory>
 #include <optional>
@@ -13,8 +15,10 @@
 
 #include "agent/context/agent_actions.h"
 #include "agent/context/agent_context.h"
+#include "agent/schedule.h"
 #include "control/agent_control_unix.h"
 #include "control/client_connect.h"
+#include "control/detached_channel.h"
 #include "platform/child_process.h"
 #include "platform/run_loop.h"
 #include "platform/service_manager.h"
@@ -54,7 +58,8 @@ class AgentMain : public AgentActions {
   static void usageForTool(const std::string& tool);
   static std::string toolNameFromPathArg(const char* argument);
 
-  // ---- life of the daemon (daemon.cpp, daemon_files.cpp, service_disable.cpp)
+  // ---- life of the daemon (daemon.cpp, daemon_files.cpp, disk_space_guard.cpp, schedule.cpp,
+  // service_disable.cpp)
   /// Runs the agent to its end. @return the exit status of the process.
   int startup();
   int startupDaemon();
@@ -66,6 +71,12 @@ class AgentMain : public AgentActions {
   void removePIDFile();
   /// True when the directory exists afterwards.
   bool setupRecordingRepository();
+  /// The disk-space timer and the schedule; each is acted on once at once.
+  void startTimers();
+  /// Stops recording when the movie's volume runs full, and in continuous mode starts it again. Main thread.
+  void checkDiskSpace();
+  /// Schedules what an earlier process left in the timers file. Main thread.
+  void loadSchedule();
   /// Has the service manager never start this agent again, and ends the process: 78, or 71 when that failed.
   [[noreturn]] void disableService();
 
@@ -97,6 +108,7 @@ class AgentMain : public AgentActions {
   void shutDownControl() override;
   void shutDownControlBecauseDeviceFailed() override;
   void submitStoppedRecording() override;
+  void scheduleTimedCommand(SharedDictionary entry, std::time_t date, ChannelKind channel) override;
   void captureDidComplete(const void* controller) override;
   void captureDidCancel(const void* controller) override;
   void recordDidStartWithFile(const std::string& file, const SharedDictionary& metadata,
@@ -141,12 +153,17 @@ class AgentMain : public AgentActions {
   bool handleSignals();
 
   // Steps of a turn of the main loop.
+  void runDueCommands(std::time_t now);
+  [[nodiscard]] std::chrono::milliseconds timeToNextCommand(std::chrono::milliseconds atMost) const;
+  [[nodiscard]] AgentControlBase& channelOf(ChannelKind kind);
   void retryDevice(std::int64_t now);
   void stopForgottenPreview(std::int64_t now);
   void readTimeShift();
   void reloadChangedPreferences();
   void checkServerRefusal(std::int64_t now);
 
+  void recordAgainWithSpace(std::uint64_t megabytes);
+  void stopForLackOfSpace(std::uint64_t megabytes, std::uint32_t wanted);
   void pauseOrResume(bool pause);
   void stopOrCancelCapture(bool cancel);
   void rememberStopped(const std::shared_ptr<LMRCaptureController>& controller);
@@ -169,6 +186,10 @@ class AgentMain : public AgentActions {
   std::unique_ptr<AgentPreferences> agentPrefs_;
   PostProcessScheduler scheduler_;
   std::unique_ptr<AgentControlUnix> agentControlLocal_;
+  Schedule schedule_;
+  DetachedChannel detached_;
+  std::unique_ptr<RunLoop::Source> diskSpaceTimer_;
+  bool shouldDisplayNoDiskSpaceMessage_ = false;
   /// Sessions as they were when their capture was stopped or cancelled, until the capture reports: by then
   /// the session may have gone on to the next recording. Main thread.
   std::map<const void*, std::shared_ptr<AgentRecord>> stopped_;

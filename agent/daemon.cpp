@@ -17,7 +17,7 @@ namespace lmx {
 using namespace std::chrono_literals;
 
 AgentMain::AgentMain(std::shared_ptr<AgentContext> context, AgentEnvironment environment)
-    : context_(std::move(context)), environment_(std::move(environment)) {
+    : context_(std::move(context)), environment_(std::move(environment)), detached_(context_, this) {
   loop_.adoptThread();
   setEngineEnvironment({context_, this, environment_.framework});
 }
@@ -53,6 +53,7 @@ int AgentMain::startupDaemon() {
   if (result == Start::ok) result = prepareGround();
   if (result == Start::ok) result = startServices();
   if (result != Start::ok) return stopSequence(result, 1);
+  startTimers();
   if (appLoop() == 1) return stopSequence(Start::fatal, 1);
   return stopSequence(Start::ok, 0);
 }
@@ -118,7 +119,15 @@ int AgentMain::stopSequence(Start result, int status) {
   return status;
 }
 
+void AgentMain::startTimers() {
+  shouldDisplayNoDiskSpaceMessage_ = true;
+  diskSpaceTimer_ = loop_.addRepeatingTimer(15s, [this] { checkDiskSpace(); });
+  checkDiskSpace();
+  loadSchedule();
+}
+
 void AgentMain::shutdown() {
+  diskSpaceTimer_ = nullptr;
   context_->setRunning(false);
   const auto controller = captureController();
   while (controller && !controller->hasShutDown()) loop_.run(250ms);

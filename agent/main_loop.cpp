@@ -41,7 +41,8 @@ int AgentMain::appLoop() {
     stopForgottenPreview(now);
     readTimeShift();
     reloadChangedPreferences();
-    runLoopRunning_ = loop_.run(250ms) != RunLoop::Turn::stopped;
+    runDueCommands(std::time(nullptr));
+    runLoopRunning_ = loop_.run(timeToNextCommand(250ms)) != RunLoop::Turn::stopped;
     checkServerRefusal(std::time(nullptr));
     if (!context_->running() || !runLoopRunning_) return 0;
   }

@@ -1,8 +1,6 @@
 // Changing the preferences file from the command line.
 #include "agent/preference_tools.h"
 
-#include <unistd.h>
-
 #include <cerrno>
 #include <cstdio>
 #include <cstring>
@@ -12,6 +10,7 @@
 #include "platform/paths.h"
 #include "platform/property_list.h"
 #include "prefs/agent_preferences.h"
+#include "support/directories.h"
 
 namespace lmx {
 namespace {
@@ -26,17 +25,6 @@ constexpr int kShellSignalled = 128;
 
 bool given(const char* argument) { return argument != nullptr && *argument != '\0'; }
 
-/// Gives the file a second name, so that replacing it loses nothing; needs no right to read it.
-/// @return that name, empty when it could not be done (errno tells why).
-std::string keepCopy(const std::string& path) {
-  for (int number = 1; number < 1000; ++number) {
-    const std::string copy = path + ".unreadable-" + std::to_string(number);
-    if (link(path.c_str(), copy.c_str()) == 0) return copy;
-    if (errno != EEXIST) break;
-  }
-  return {};
-}
-
 /// The preferences as they stand, or the defaults. A file that is there but can't be read is kept under
 /// another name first. @return nothing when that failed.
 std::optional<PlistDictionary> loadToChange(const std::string& path) {
@@ -44,7 +32,7 @@ std::optional<PlistDictionary> loadToChange(const std::string& path) {
   if (file.value && file.value->dictionary() != nullptr) return *file.value->dictionary();
   if (file.systemError == ENOENT) return AgentPreferences::adHocDefaults();
   const std::string problem = file.value ? "its top level is not a dictionary" : file.problem;
-  const std::string copy = keepCopy(path);
+  const std::string copy = keepUnderAnotherName(path);
   if (copy.empty()) {
     std::fprintf(stderr, "The preferences file %s can't be used (%s) nor kept under another name (%s)\n",
                  path.c_str(), problem.c_str(), std::strerror(errno));

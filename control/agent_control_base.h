@@ -3,6 +3,7 @@
 #pragma once
 #include <atomic>
 #include <cstdint>
+#include <ctime>
 #include <memory>
 #include <mutex>
 #include <optional>
@@ -91,8 +92,20 @@ class AgentControlBase {
   void handleSERVER(const Dictionary* parameters);
   /// STATUS include_profile=true  →  cmdStatus=0,recordStatus=2,…,CameraName=Hall 3,…
   void handleSTATUS(const Dictionary* parameters);
+  /// TIMEDCMD command=START,time=2030-01-01 10:00:00 +0000,…  →  cmdStatus=0
+  void handleTIMEDCMD(const Dictionary* parameters);
   /// X-PREVIEW refresh_milliseconds=500  →  (no reply)
   void handleXCMD(std::string_view verb, const Dictionary* parameters);
+
+  // Timed commands.
+
+  /// Runs a command whose time has come. Its reply comes unasked. Main thread.
+  void completeTimedCommand(const SharedDictionary& entry);
+  /// The list into its file, whole. Any thread.
+  void writeTimerListToDisk();
+  /// Schedules what the timers file holds. A file that can't be read is kept under another name. Main thread.
+  void loadTimedCommands();
+  [[nodiscard]] virtual ChannelKind kind() const { return ChannelKind::detached; }
 
   [[nodiscard]] std::shared_ptr<AgentContext> agentContext() const { return agentContext_.get(); }
   [[nodiscard]] bool running() const { return running_; }
@@ -151,6 +164,8 @@ class AgentControlBase {
   bool waitForPacket();
   bool receivePacket(int socket);
 
+  std::string timerListReply();
+  void scheduleCommand(const Dictionary* parameters, std::optional<std::time_t> date, bool fromFile);
   void executeCommand(const std::string& text);
   void dispatch(const std::string& verb, const Dictionary* parameters, const std::string& text);
   bool performOnMain(AgentActions::Action action, Wait wait);

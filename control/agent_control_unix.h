@@ -21,6 +21,7 @@ class AgentControlUnix final : public AgentControlBase {
 
   [[nodiscard]] bool requiresAuthentication() const override { return false; }
   void setAuthenticated(bool) override {}
+  [[nodiscard]] ChannelKind kind() const override { return ChannelKind::local; }
 
  protected:
   int run() override;

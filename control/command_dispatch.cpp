@@ -15,7 +15,7 @@ AgentControlBase::Handler AgentControlBase::handlerForVerb(std::string_view verb
       {"CANCEL", &AgentControlBase::handleCANCEL}, {"PAUSE", &AgentControlBase::handlePAUSE},
       {"RESUME", &AgentControlBase::handleRESUME}, {"SERVER", &AgentControlBase::handleSERVER},
       {"START", &AgentControlBase::handleSTART},   {"STATUS", &AgentControlBase::handleSTATUS},
-      {"STOP", &AgentControlBase::handleSTOP},
+      {"STOP", &AgentControlBase::handleSTOP},     {"TIMEDCMD", &AgentControlBase::handleTIMEDCMD},
   };
   const auto found = kVerbs.find(verb);
   return found == kVerbs.end() ? nullptr : found->second;

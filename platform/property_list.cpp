@@ -193,17 +193,17 @@ bool PlistValue::asBool() const {
   return asReal() != 0;
 }
 
-PlistResult parsePropertyList(const std::string& bytes) {
+PlistResult parsePropertyList(const std::string& bytes, PlistLimits limits) {
   std::string_view text = bytes;
   if (text.starts_with(kByteOrderMark)) text.remove_prefix(kByteOrderMark.size());
   if (text.empty()) return refusal("the file is empty");
   if (text.size() > kParseLimit) return refusal("larger than " + std::to_string(kParseLimit) + " bytes");
   plist_t root = nullptr;
   if (text.starts_with("bplist00")) {
-    if (auto refused = refuseBinary(text)) return refusal(std::move(*refused));
+    if (auto refused = refuseBinary(text, limits.values)) return refusal(std::move(*refused));
     plist_from_bin(text.data(), static_cast<std::uint32_t>(text.size()), &root);
   } else if (text.find('<') != std::string_view::npos) {
-    const XmlCheck check = checkXml(text);
+    const XmlCheck check = checkXml(text, limits.values);
     if (check.refused) return refusal(*check.refused);
     plist_from_xml(check.clean.c_str(), static_cast<std::uint32_t>(check.clean.size()), &root);
   } else {
@@ -216,7 +216,7 @@ PlistResult parsePropertyList(const std::string& bytes) {
   return result;
 }
 
-PlistResult readPropertyList(const std::string& path, std::size_t limit) {
+PlistResult readPropertyList(const std::string& path, PlistLimits limits) {
   const UniqueFd file(open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK | O_NOCTTY));
   struct stat info {};
   if (!file.valid() || fstat(file.get(), &info) != 0) return systemFailure(errno);
@@ -227,9 +227,10 @@ PlistResult readPropertyList(const std::string& path, std::size_t limit) {
     const ssize_t n = read(file.get(), buffer, sizeof buffer);
     if (n < 0 && errno == EINTR) continue;
     if (n < 0) return systemFailure(errno);
-    if (n == 0) return parsePropertyList(bytes);
+    if (n == 0) return parsePropertyList(bytes, limits);
     bytes.append(buffer, static_cast<std::size_t>(n));
-    if (bytes.size() > limit) return refusal("larger than " + std::to_string(limit) + " bytes", EFBIG);
+    if (bytes.size() > limits.bytes)
+      return refusal("larger than " + std::to_string(limits.bytes) + " bytes", EFBIG);
   }
 }
 

@@ -42,6 +42,12 @@ inline constexpr std::size_t kPlistFileLimit = 256U << 10;
 inline constexpr int kPlistDepthLimit = 64;
 inline constexpr std::size_t kPlistNodeLimit = 10000;
 
+/// What a document may hold at most; the defaults suit files that people write.
+struct PlistLimits {
+  std::size_t bytes = kPlistFileLimit;
+  std::size_t values = kPlistNodeLimit;
+};
+
 struct PlistResult {
   std::optional<PlistValue> value;
   int systemError = 0;  ///< errno when the file couldn't be read (ENOENT: no such file)
@@ -49,12 +55,12 @@ struct PlistResult {
 };
 
 /// Parses XML or binary bytes. A byte order mark is skipped. Refused before the library sees them: more than
-/// kPlistDepthLimit levels, more than kPlistNodeLimit nodes (shared references of the binary form counted as
+/// kPlistDepthLimit levels, more than `limits.values` values (shared references of the binary form counted as
 /// often as they expand), self-references. Never throws.
-PlistResult parsePropertyList(const std::string& bytes);
+PlistResult parsePropertyList(const std::string& bytes, PlistLimits limits = {});
 
-/// Reads and parses a file of at most `limit` bytes. Regular files only, never blocks on a FIFO.
-PlistResult readPropertyList(const std::string& path, std::size_t limit = kPlistFileLimit);
+/// Reads and parses a file of at most `limits.bytes` bytes. Regular files only, never blocks on a FIFO.
+PlistResult readPropertyList(const std::string& path, PlistLimits limits = {});
 
 /// XML text of `value`, with declaration and DOCTYPE, ending in a line feed.
 std::string propertyListXml(const PlistValue& value);

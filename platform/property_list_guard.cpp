@@ -20,7 +20,7 @@ constexpr const char* kMalformed = "malformed binary property list";
 
 class BinaryWalk {
  public:
-  explicit BinaryWalk(std::string_view bytes) : bytes_(bytes) {}
+  BinaryWalk(std::string_view bytes, std::size_t most) : bytes_(bytes), most_(most) {}
 
   std::optional<std::string> check() {
     if (bytes_.size() < kHeaderSize + kTrailerSize) return "too short for a binary property list";
@@ -74,7 +74,7 @@ class BinaryWalk {
 
   void walk(std::uint64_t object, int depth) {
     if (depth > kPlistDepthLimit) return fail(tooDeep());
-    if (++nodes_ > kPlistNodeLimit) return fail(tooMany());
+    if (++nodes_ > most_) return fail("more than " + std::to_string(most_) + " values");
     const std::uint64_t at = placeOf(object);
     if (at == 0) return fail(kMalformed);
     switch (byte(at) & 0xF0U) {
@@ -169,9 +169,9 @@ class BinaryWalk {
   }
 
   static std::string tooDeep() { return "nested more than " + std::to_string(kPlistDepthLimit) + " levels"; }
-  static std::string tooMany() { return "more than " + std::to_string(kPlistNodeLimit) + " values"; }
 
   std::string_view bytes_;
+  std::size_t most_;
   unsigned offset_size_ = 0;
   unsigned reference_size_ = 0;
   std::uint64_t objects_ = 0;
@@ -184,6 +184,8 @@ class BinaryWalk {
 
 }  // namespace
 
-std::optional<std::string> refuseBinary(std::string_view bytes) { return BinaryWalk(bytes).check(); }
+std::optional<std::string> refuseBinary(std::string_view bytes, std::size_t values) {
+  return BinaryWalk(bytes, values).check();
+}
 
 }  // namespace lmx

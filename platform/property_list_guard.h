@@ -1,5 +1,6 @@
 // Bounds on property lists, checked before a library sees them: it has none of its own. Pure.
 #pragma once
+#include <cstddef>
 #include <optional>
 #include <string>
 #include <string_view>
@@ -14,11 +15,12 @@ struct XmlCheck {
 
 /// The parser gets `clean` instead of the document, so that nothing that it reads differently (a comment's
 /// end, a quoted bracket) can get past the bounds counted here.
-XmlCheck checkXml(std::string_view text);
+/// @param values  most values that it may hold
+XmlCheck checkXml(std::string_view text, std::size_t values);
 
 /// Why a binary property list must not be parsed (malformed tables, references in a circle, depth, values and
 /// bytes counted as often as they expand); nothing when it may.
-std::optional<std::string> refuseBinary(std::string_view bytes);
+std::optional<std::string> refuseBinary(std::string_view bytes, std::size_t values);
 
 /// Stands for what a property list's XML can't hold: U+FFFD.
 inline constexpr std::string_view kReplacementCharacter = "\xEF\xBF\xBD";

@@ -86,7 +86,7 @@ std::optional<std::string> referredCharacter(std::string_view reference) {
 
 class XmlReducer {
  public:
-  explicit XmlReducer(std::string_view text) : rest_(text) {}
+  XmlReducer(std::string_view text, std::size_t most) : rest_(text), most_(most) {}
 
   XmlCheck run() {
     if (rest_.find('\0') != std::string_view::npos) fail("a NUL character");
@@ -203,8 +203,8 @@ class XmlReducer {
     const auto levels = open_.size() - (open_.front() == "plist" ? 1 : 0);
     if (levels > kPlistDepthLimit)
       return fail("nested more than " + std::to_string(kPlistDepthLimit) + " levels");
-    if (name != "plist" && name != "key" && ++values_ > kPlistNodeLimit) {
-      return fail("more than " + std::to_string(kPlistNodeLimit) + " values");
+    if (name != "plist" && name != "key" && ++values_ > most_) {
+      return fail("more than " + std::to_string(most_) + " values");
     }
     check_.clean += '<';
     check_.clean += name;
@@ -221,6 +221,7 @@ class XmlReducer {
   }
 
   std::string_view rest_;
+  std::size_t most_;
   std::vector<std::string_view> open_;
   std::size_t values_ = 0;
   XmlCheck check_;
@@ -228,6 +229,6 @@ class XmlReducer {
 
 }  // namespace
 
-XmlCheck checkXml(std::string_view text) { return XmlReducer(text).run(); }
+XmlCheck checkXml(std::string_view text, std::size_t values) { return XmlReducer(text, values).run(); }
 
 }  // namespace lmx

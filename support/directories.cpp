@@ -94,4 +94,13 @@ int writeFileAtomically(const std::string& path, const std::string& content, mod
   return syncDirectory(directory);
 }
 
+std::string keepUnderAnotherName(const std::string& path) {
+  for (int number = 1; number < 1000; ++number) {
+    std::string copy = path + ".unreadable-" + std::to_string(number);
+    if (link(path.c_str(), copy.c_str()) == 0) return copy;
+    if (errno != EEXIST) break;
+  }
+  return {};
+}
+
 }  // namespace lmx

@@ -18,4 +18,8 @@ int syncDirectory(const std::string& directory);
 /// errno; on failure nothing is left behind.
 int writeFileAtomically(const std::string& path, const std::string& content, mode_t mode);
 
+/// Gives the file `path` a second name, "PATH.unreadable-N", so that replacing it loses nothing; needs no
+/// right to read it. @return that name, empty when it could not be done (errno tells why)
+std::string keepUnderAnotherName(const std::string& path);
+
 }  // namespace lmx

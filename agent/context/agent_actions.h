@@ -1,6 +1,7 @@
 // What the lower folders may ask of the agent: the actions of the main thread and the recording callbacks.
 #pragma once
 #include <cstdint>
+#include <ctime>
 #include <memory>
 #include <optional>
 #include <string>
@@ -12,6 +13,14 @@
 namespace lmx {
 
 class AgentRecord;
+
+/// The control channels an agent can have.
+enum class ChannelKind {
+  detached,  ///< no peer: what is left when a timer's own channel is gone
+  tunnel,    ///< the server's
+  local,     ///< the local socket
+  direct,    ///< the TCP port
+};
 
 /// Implemented by AgentMain. The actions of the capture run on the main thread only: other threads hand them
 /// over with perform(); the callbacks may come from any thread.
@@ -45,6 +54,10 @@ class AgentActions {
   virtual void captureDidComplete(const void* controller) = 0;
   /// A capture was cancelled (delegate report, any thread): the session becomes idle unless it has gone on.
   virtual void captureDidCancel(const void* controller) = 0;
+
+  /// Has `entry` run at `date` (seconds since 1970, wall clock) by the channel of that kind, on the main
+  /// thread. Any thread.
+  virtual void scheduleTimedCommand(SharedDictionary entry, std::time_t date, ChannelKind channel) = 0;
 
   // Callbacks of the engine, any thread. They do nothing once the context's `running` is NO.
   virtual void recordDidStartWithFile(const std::string& file, const SharedDictionary& metadata,

@@ -12,6 +12,7 @@
 #include <vector>
 
 #include "agent/context/recording_settings.h"
+#include "agent/context/timed_command_list.h"
 #include "platform/log.h"
 #include "platform/property_list.h"
 #include "support/dictionary.h"
@@ -141,6 +142,9 @@ class AgentContext {
   std::shared_ptr<AgentSubmit> postProcessListNext();
   std::size_t postProcessListCount();
 
+  /// The commands that wait for their time.
+  [[nodiscard]] TimedCommandList& timedCmdList() { return timedCmdList_; }
+
   void setServer_info(SharedPlist info);
   /// The current cluster information; null when none is stored. The caller's copy keeps it alive.
   [[nodiscard]] SharedPlist server_info_retain();
@@ -180,6 +184,7 @@ class AgentContext {
   SharedValue<std::shared_ptr<AgentRecord>> record_context_;
   SharedValue<std::shared_ptr<RecordingSettings>> recording_settings_;
 
+  TimedCommandList timedCmdList_;
   RecursiveMutex server_info_mutex_;
   SharedPlist server_info_;  // guarded by server_info_mutex_
   RecursiveMutex control_action_mutex_;

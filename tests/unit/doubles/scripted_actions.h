@@ -5,6 +5,7 @@
 #include <optional>
 #include <string>
 #include <utility>
+#include <vector>
 
 #include "agent/context/agent_actions.h"
 #include "tests/unit/doubles/journal.h"
@@ -44,6 +45,17 @@ class ScriptedActions : public AgentActions {
   void shutDownControlBecauseDeviceFailed() override { note("shutDownControlBecauseDeviceFailed"); }
   void captureDidComplete(const void*) override { note("captureDidComplete"); }
   void captureDidCancel(const void*) override { note("captureDidCancel"); }
+
+  void scheduleTimedCommand(SharedDictionary entry, std::time_t date, ChannelKind channel) override {
+    note("scheduleTimedCommand " + lookUp(entry, "command").value_or("(none)"));
+    scheduled.push_back({std::move(entry), date, channel});
+  }
+  struct Scheduled {
+    SharedDictionary entry;
+    std::time_t date;
+    ChannelKind channel;
+  };
+  std::vector<Scheduled> scheduled;
 
   void recordDidStartWithFile(const std::string& file, const SharedDictionary&,
                               std::optional<TimeValue>) override {

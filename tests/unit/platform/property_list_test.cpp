@@ -286,8 +286,8 @@ TEST(PropertyListFile, SizeHasALimit) {
   const TemporaryDirectory directory;
   const std::string text = document("<string>" + std::string(1000, 'x') + "</string>");
   writeFile(directory.file("f"), text);
-  EXPECT_TRUE(readPropertyList(directory.file("f"), text.size()).value);
-  const PlistResult result = readPropertyList(directory.file("f"), text.size() - 1);
+  EXPECT_TRUE(readPropertyList(directory.file("f"), {.bytes = text.size()}).value);
+  const PlistResult result = readPropertyList(directory.file("f"), {.bytes = text.size() - 1});
   EXPECT_FALSE(result.value);
   EXPECT_EQ(result.problem, "larger than " + std::to_string(text.size() - 1) + " bytes");
   writeFile(directory.file("g"), document("<string>" + std::string(kPlistFileLimit, 'x') + "</string>"));
