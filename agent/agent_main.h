@@ -193,6 +193,8 @@ class AgentMain : public AgentActions {
   /// Sessions as they were when their capture was stopped or cancelled, until the capture reports: by then
   /// the session may have gone on to the next recording. Main thread.
   std::map<const void*, std::shared_ptr<AgentRecord>> stopped_;
+  /// The last capture whose report has been dealt with: nothing more is to be expected of it. Main thread.
+  std::weak_ptr<LMRCaptureController> reported_;
   /// Captures that have ended and whose job is not in the list yet.
   std::atomic<int> hand_offs_{0};
 };

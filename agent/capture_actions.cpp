@@ -89,8 +89,9 @@ void AgentMain::stopOrCancelCapture(bool cancel) {
     stopRecording();
     return;
   }
-  const bool isFile = record && record->recordingType() == kRecordingTypeFile;
-  if (isFile && !cancel && record->status() != kRecorderIdle) {
+  const bool isFile =
+      record && record->status() != kRecorderIdle && record->recordedType() == kRecordingTypeFile;
+  if (isFile && !cancel) {
     // No capture will report the end of a "File" recording: the engine's own stop does, and so makes its job.
     LXAgentRecordStopCapture(record);
   } else if (controller && !isFile) {
@@ -114,7 +115,7 @@ void AgentMain::stopRecording() {
   const auto continuous = context_->continuous();
   if (continuous && continuous->enabled) {
     submitStoppedRecording();
-  } else {
+  } else if (!context_->adhoc()) {  // there stopCapture is what has called
     stopCapture();
   }
 }

@@ -78,6 +78,7 @@ void AgentMain::recordAgainWithSpace(std::uint64_t megabytes) {
   shouldDisplayNoDiskSpaceMessage_ = true;
   LMPLogMessage(nullptr, kLogNotice, "%llu MB is sufficient, starting recorder",
                 static_cast<unsigned long long>(megabytes));
+  session()->clearPassedDeadlines();
   prepareCapture();
 }
 

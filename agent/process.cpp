@@ -8,6 +8,7 @@
 #include "agent/agent_main.h"
 #include "platform/log.h"
 #include "platform/notifications.h"
+#include "platform/paths.h"
 #include "support/heap_ptr.h"
 
 namespace lmx {
@@ -15,11 +16,15 @@ namespace {
 
 constexpr int kExitOperatingSystem = 71;
 
+std::shared_ptr<ServiceManager> newServiceManager() {
+  return systemPath("").empty() ? newSystemServiceManager() : newPrivateServiceManager();
+}
+
 int runAgent(int argc, char** argv, std::shared_ptr<CaptureFramework> framework) {
   // The character type alone: numbers in replies must keep their decimal point.
   if (std::setlocale(LC_CTYPE, "C.UTF-8") == nullptr) return kExitOperatingSystem;
   auto* agent = new AgentMain(newAgentContext(),  // NOLINT: lives until the process ends
-                              {std::move(framework), newSystemServiceManager(), &systemChildRunner()});
+                              {std::move(framework), newServiceManager(), &systemChildRunner()});
   const heap_ptr<TimeValue> launched(lmp_gettimeofday());
   if (!launched) return kExitOperatingSystem;
   agent->agentContext()->setLaunch_time(*launched);

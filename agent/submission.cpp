@@ -25,13 +25,12 @@ SharedDictionary propertiesOf(const AgentContext& context, const AgentRecord& st
   return own ? own : context.properties();
 }
 
-/// When the recording began. The capture thread may not have set its time yet when a recording is stopped at
-/// once.
-std::optional<TimeValue> startOf(const AgentRecord& stopped) {
-  const auto start = stopped.startTime();
-  const auto launch = stopped.launchTime();
-  if (!start || (launch && lmp_diff_timeval(&*start, &*launch) < 0)) return launch;
-  return start;
+/// What describes it. A START that was refused meanwhile has taken over the request, and with it what is
+/// submitted; the metadata may still be those of the first.
+SharedDictionary metadataOf(const AgentContext& context, const AgentRecord& stopped) {
+  if (const SharedDictionary own = stopped.request_properties()) return own;
+  const SharedDictionary prepared = stopped.metadata();
+  return prepared ? prepared : context.properties();
 }
 
 TimeValue timeValueFrom(double secondsSinceReference) {
@@ -43,19 +42,21 @@ TimeValue timeValueFrom(double secondsSinceReference) {
 }  // namespace
 
 void AgentMain::rememberStopped(const std::shared_ptr<LMRCaptureController>& controller) {
-  if (controller->hasShutDown()) return;  // it has reported already
+  if (reported_.lock() == controller) return;
   stopped_.try_emplace(controller.get(), session()->copy());
 }
 
 std::shared_ptr<AgentRecord> AgentMain::takeStopped(const void* controller) {
+  std::shared_ptr<AgentRecord> stopped;
   const auto found = stopped_.find(controller);
   if (found != stopped_.end()) {
-    auto record = std::move(found->second);
+    stopped = std::move(found->second);
     stopped_.erase(found);
-    return record;
+  } else if (const auto record = session(); record && record->captureController().get() == controller) {
+    stopped = record->copy();
   }
-  const auto record = session();
-  return record && record->captureController().get() == controller ? record->copy() : nullptr;
+  if (stopped) reported_ = stopped->captureController();
+  return stopped;
 }
 
 void AgentMain::captureDidComplete(const void* controller) {
@@ -104,9 +105,8 @@ void AgentMain::submit(const std::shared_ptr<AgentRecord>& stopped) {
   const std::string path =
       lookUp(properties, "RecordingMetadata_ADHOC_FILE_PATH")
           .value_or(context_->recording_repository_path().value_or("") + "/" + uuid.value_or("") + ".mov");
-  // A START refused meanwhile has cleared the metadata: its parameters then describe what is submitted.
-  stopped->setMetadata(withUuid(stopped->metadata() ? stopped->metadata() : properties, uuid));
-  stopped->setStartTime(startOf(*stopped));
+  stopped->setMetadata(withUuid(metadataOf(*context_, *stopped), uuid));
+  stopped->setStartTime(stopped->beginning());
   dispatchAsync(WorkPriority::background, [this, stopped, path, elapsed] {
     handOff(stopped, path, elapsed);
     --hand_offs_;
@@ -133,7 +133,8 @@ void AgentMain::handOff(const std::shared_ptr<AgentRecord>& stopped, const std::
     LMPLogMessage(context_->log_context(), kLogCritical, "The recording could not be finished: %s",
                   error->message.c_str());
     recordRuntimeErrorCallback(kRecordCannotWrite);
-    if (const auto record = session()) record->setError(kRecordCannotWrite);
+    const auto record = session();
+    if (record && record->captureController() == controller) record->setError(kRecordCannotWrite);
   }
   if (context_->running()) {
     // A movie that could not be written stays in the capture's folder: the next start tries again.

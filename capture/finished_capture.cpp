@@ -60,6 +60,11 @@ std::string readAll(const std::string& path) {
 std::string fileNameFor(const Request& request) {
   std::string name = lookUp(request.parameters, "RecordingMetadata_RECORDING_UUID").value_or("test");
   std::replace(name.begin(), name.end(), '/', '_');
+  // Room for an ending: file systems take 255 bytes. A character is not cut in two.
+  std::size_t length = std::min<std::size_t>(name.size(), 200);
+  while (length > 0 && length < name.size() && (static_cast<unsigned char>(name[length]) & 0xC0) == 0x80)
+    --length;
+  name.resize(length);
   return name.empty() ? "test" : name;
 }
 
@@ -119,12 +124,20 @@ std::optional<CaptureError> FinishedCapture::copyFrames(const std::vector<FrameR
                                                         const std::string& path) {
   const auto index = readMovieIndex(media());
   if (!index) return CaptureError{CaptureError::kDomain, kWriteFailed, media() + " can't be read"};
-  const std::string temporary = directoryOf(path) + "/.lmxagentd-" + std::to_string(getpid()) + ".part";
-  int error = copyMovieRanges(media(), *index, ranges, record_.frameSeconds, temporary);
-  if (error == 0) error = moveFile(temporary, path);
+  // In the capture's own folder: no other capture writes there, and what a crash leaves goes with it.
+  int error = copyOver(*index, ranges, folder_ + "/" + kPartName, path);
+  if (error == EXDEV)
+    error = copyOver(*index, ranges, path + "." + folder_.substr(folder_.rfind('/') + 1) + ".part", path);
   if (error == 0) return std::nullopt;
-  unlink(temporary.c_str());
   return diskError(error, "could not write " + path);
+}
+
+int FinishedCapture::copyOver(const MovieIndex& index, const std::vector<FrameRange>& ranges,
+                              const std::string& temporary, const std::string& path) {
+  int error = copyMovieRanges(media(), index, ranges, record_.frameSeconds, temporary);
+  if (error == 0) error = moveFile(temporary, path);
+  if (error != 0) unlink(temporary.c_str());
+  return error;
 }
 
 RecoveredRecording FinishedCapture::describe(const Request& request, const std::string& path) {
@@ -193,6 +206,7 @@ void FinishedCapture::removeIfResolved() {
 void FinishedCapture::removeIfResolvedLocked() {
   if (record_.marks.othersPending({})) return;
   unlink(media().c_str());
+  unlink((folder_ + "/" + kPartName).c_str());
   unlink((folder_ + "/" + kJournalName).c_str());
   rmdir(folder_.c_str());
   rmdir(directoryOf(folder_).c_str());  // only succeeds for the last capture

@@ -7,6 +7,7 @@
 #include <vector>
 
 #include "capture/journal.h"
+#include "capture/movie_index.h"
 #include "record/capture_framework.h"
 
 namespace lmx {
@@ -20,6 +21,7 @@ class FinishedCapture : public std::enable_shared_from_this<FinishedCapture> {
  public:
   static constexpr const char* kJournalName = "journal";
   static constexpr const char* kMediaName = "media.mov";
+  static constexpr const char* kPartName = "movie.part";
 
   /// @param totalFrames  frames of the movie's clock that were recorded
   FinishedCapture(std::string folder, std::shared_ptr<Journal> journal, CaptureRecord record,
@@ -43,6 +45,9 @@ class FinishedCapture : public std::enable_shared_from_this<FinishedCapture> {
  private:
   std::optional<CaptureError> makeMovieLocked(const Request& request, const std::string& path);
   std::optional<CaptureError> copyFrames(const std::vector<FrameRange>& ranges, const std::string& path);
+  /// Copies into `temporary` and renames it to `path`. @return 0 or the errno; nothing is left then
+  int copyOver(const MovieIndex& index, const std::vector<FrameRange>& ranges, const std::string& temporary,
+               const std::string& path);
   RecoveredRecording describe(const Request& request, const std::string& path);
   [[nodiscard]] std::string media() const { return folder_ + "/" + kMediaName; }
   void removeIfResolvedLocked();

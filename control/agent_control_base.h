@@ -165,7 +165,8 @@ class AgentControlBase {
   bool receivePacket(int socket);
 
   std::string timerListReply();
-  void scheduleCommand(const Dictionary* parameters, std::optional<std::time_t> date, bool fromFile);
+  enum class TimerOrigin { peer, file };
+  bool scheduleCommand(const Dictionary* parameters, TimerOrigin origin);
   void executeCommand(const std::string& text);
   void dispatch(const std::string& verb, const Dictionary* parameters, const std::string& text);
   bool performOnMain(AgentActions::Action action, Wait wait);

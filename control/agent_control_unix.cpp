@@ -4,6 +4,9 @@
 #include <sys/socket.h>
 #include <unistd.h>
 
+#include <cerrno>
+#include <cstring>
+
 #include "control/local_socket.h"
 #include "control/plain_text.h"
 #include "platform/paths.h"
@@ -28,29 +31,34 @@ void AgentControlUnix::cleanup() {
 }
 
 int AgentControlUnix::run() {
-  const int result = localConnect() == 0 ? AgentControlBase::run() : -1;
+  const int listening = localConnect();
+  if (listening != 0 && running()) {
+    LMPLogMessage(logContext(), kLogError, "The local control socket %s could not be set up: %s",
+                  systemPath(kLocalSocket).c_str(), std::strerror(listening));
+  }
+  const int result = listening == 0 ? AgentControlBase::run() : -1;
   localDomainSocket_.reset();
   return result;
 }
 
-/// Sets up the listener and waits for the first peer. @return 0, or -1.
+/// Sets up the listener and waits for the first peer. @return 0, or the errno.
 int AgentControlUnix::localConnect() {
   logInfo("Connecting local pipe");
   const std::string path = systemPath(kLocalSocket);
   const auto address = localSocketAddress(path);
-  if (!address) return -1;
+  if (!address) return ENAMETOOLONG;
   localDomainSocket_.reset(::socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC | SOCK_NONBLOCK, 0));
-  if (!localDomainSocket_.valid()) return -1;
+  if (!localDomainSocket_.valid()) return errno;
   const int on = 1;
   ::setsockopt(localDomainSocket_.get(), SOL_SOCKET, SO_REUSEADDR, &on, sizeof on);
   ::setsockopt(localDomainSocket_.get(), SOL_SOCKET, SO_REUSEPORT, &on, sizeof on);
 
   ::unlink(path.c_str());  // left by an agent that was killed
   if (::bind(localDomainSocket_.get(), reinterpret_cast<const sockaddr*>(&*address), sizeof *address) != 0)
-    return -1;
+    return errno;
   socket_path_.set(path);
-  if (::listen(localDomainSocket_.get(), kBacklog) != 0) return -1;
-  return localAccept();
+  if (::listen(localDomainSocket_.get(), kBacklog) != 0) return errno;
+  return localAccept() == 0 ? 0 : ECONNABORTED;
 }
 
 std::optional<std::string> AgentControlUnix::commandFromReceivedData(const std::string& line) {

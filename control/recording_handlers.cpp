@@ -47,9 +47,16 @@ void AgentControlBase::handleSTART(const Dictionary* parameters) {
     return;
   }
   if (!hasStartParameters(parameters)) return sendReply(kMissingParameter);
+  if (lookUp(parameters, "RecordingMetadata_RECORDING_UUID")->find('/') != std::string::npos) {
+    LMPLogMessage(
+        context->log_context(), kLogError,
+        "START refused: RecordingMetadata_RECORDING_UUID names the movie and must not hold a \"/\"");
+    return sendReply(kMissingParameter);
+  }
+  const auto session = context->record_context();
+  if (session && session->status() == kRecorderIdle) session->clearPassedDeadlines();
   if (configure(parameters) != 0) return sendReply("cmdStatus=1");
 
-  const auto session = context->record_context();
   if (session && isTrue(parameters, "RecordingMetadata_AUDIO_ONLY")) {
     session->setRecordingType(kRecordingTypeAudio);
     LMPLogMessage(context->log_context(), kLogDebug,

@@ -77,7 +77,8 @@ void AgentControlBase::handleTIMEDCMD(const Dictionary* parameters) {
   if (!context) return sendReply(kNotScheduled);
   const std::string command = lookUp(parameters, "command").value_or("");
   if (!command.starts_with(kManagement)) {
-    return scheduleCommand(parameters, dateFromText(lookUp(parameters, "time").value_or("")), false);
+    scheduleCommand(parameters, TimerOrigin::peer);
+    return;
   }
   if (command == "TIMERLIST") return sendReply(timerListReply());
   if (command == "TIMERREVOKE") {
@@ -94,31 +95,36 @@ std::string AgentControlBase::timerListReply() {
   return list.empty() ? std::string(kDone) : std::string(kDone) + ",timerlist=" + list;
 }
 
-/// @param date  absent: now
-/// @param fromFile  an entry that is waiting already stays alone: twice in the list it would run twice
-void AgentControlBase::scheduleCommand(const Dictionary* parameters, std::optional<std::time_t> date,
-                                       bool fromFile) {
+/// @param origin  of the file: an entry that is waiting already stays alone, since twice in the list it would
+/// run twice; and the file is not written here, since a crash before its last entry is read must not lose
+/// that
+/// @return whether it was added to the list
+bool AgentControlBase::scheduleCommand(const Dictionary* parameters, TimerOrigin origin) {
   const auto context = agentContext();
+  const auto date = dateFromText(lookUp(parameters, "time").value_or(""));
   const std::string command = lookUp(parameters, "command").value_or("(null)");
   const std::time_t now = std::time(nullptr);
   const std::string when = dateText(date.value_or(now)).value_or("?");
   if (date && *date <= now) {
     logInfo("Not scheduling " + command + " command. The timer has expired: " + when);
-    return sendReply(kNotScheduled);
+    sendReply(kNotScheduled);
+    return false;
   }
   // A TIMEDCMD within a TIMEDCMD would schedule itself again and again.
   if (handlerForVerb(command) == nullptr || command == "TIMEDCMD") {
     logInfo("Not scheduling unknown command: " + command);
-    return sendReply(kNotScheduled);
+    sendReply(kNotScheduled);
+    return false;
   }
   Dictionary entry = *parameters;
   if (!entry.contains("TimerID")) entry.emplace("TimerID", newUUIDString());
   const auto shared = std::make_shared<const Dictionary>(std::move(entry));
-  if (!context->timedCmdList().append(shared, fromFile)) return;
+  if (!context->timedCmdList().append(shared, origin == TimerOrigin::file)) return false;
   logInfo("Scheduling " + command + " command to run at: " + when);
-  writeTimerListToDisk();
+  if (origin == TimerOrigin::peer) writeTimerListToDisk();
   if (actions_ != nullptr) actions_->scheduleTimedCommand(shared, date.value_or(now), kind());
   sendReply(kDone);
+  return true;
 }
 
 void AgentControlBase::completeTimedCommand(const SharedDictionary& entry) {
@@ -151,9 +157,9 @@ void AgentControlBase::loadTimedCommands() {
     LMPLogMessage(logContext(), kLogError, "The timers file %s can't be used: %s. It is kept as %s.",
                   path.c_str(), file.problem.c_str(), copy.empty() ? "it is" : copy.c_str());
   }
-  for (const SharedDictionary& entry : file.entries) {
-    scheduleCommand(entry.get(), dateFromText(lookUp(entry, "time").value_or("")), true);
-  }
+  bool added = false;
+  for (const SharedDictionary& entry : file.entries) added |= scheduleCommand(entry.get(), TimerOrigin::file);
+  if (added) writeTimerListToDisk();
 }
 
 }  // namespace lmx

@@ -88,10 +88,22 @@ class SystemdServiceManager : public ServiceManager {
   }
 };
 
+class PrivateServiceManager : public ServiceManager {
+ public:
+  bool authorize() override { return false; }
+  std::optional<std::string> disable(const std::string&) override { return "a trial has no service"; }
+  bool isEnabled(const std::string&) override { return false; }
+  int runShellCommand(const std::string&) override { return 0; }
+};
+
 }  // namespace
 
 std::unique_ptr<ServiceManager> newSystemServiceManager() {
   return std::make_unique<SystemdServiceManager>();
+}
+
+std::unique_ptr<ServiceManager> newPrivateServiceManager() {
+  return std::make_unique<PrivateServiceManager>();
 }
 
 }  // namespace lmx

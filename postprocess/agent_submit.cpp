@@ -51,7 +51,7 @@ class Gatherer {
   bool addRecording(const AgentRecord* record, std::int64_t duration) {
     if (!addIfMissing("RecordingMetadata_DURATION", formatted("%d", static_cast<std::int32_t>(duration))))
       return false;
-    return addType(record == nullptr ? 0 : record->recordingType()) &&
+    return addType(record == nullptr ? 0 : record->recordedType()) &&
            addIfMissing("RecordingMetadata_VIDEO_MAXIMUM_FRAME_RATE",
                         context_.recording_video_maximum_frame_rate()) &&
            addImageSide("RecordingMetadata_VIDEO_IMAGE_HEIGHT",

@@ -141,7 +141,7 @@ int AgentSubmit::addRecording(ChildRunner& children) {
   if (!agentContext_ || !uuid) return failedBeforeTheTool();
   const std::string movie = recording_file_path_.value_or("");
   const auto session = record();
-  if (session && session->recordingType() == kRecordingTypeFile) {
+  if (session && session->recordedType() == kRecordingTypeFile) {
     const std::string copy = agentContext_->recording_repository_path().value_or("") + "/" + *uuid;
     copyIntoRepository(movie, copy + ".mov");
     copyIntoRepository(movie.substr(0, movie.size() - std::min<std::size_t>(3, movie.size())) + "xml",

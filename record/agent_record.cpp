@@ -24,6 +24,7 @@ std::shared_ptr<AgentRecord> AgentRecord::copy() const {
   other->setRequest_uuid(request_uuid());
   other->setRequest_properties(request_properties());
   other->setRecordingType(recordingType());
+  other->setRecordedType(recordedType_);
   other->setStatus(status());
   other->setError(error());
   other->setDelay(delay());

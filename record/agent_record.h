@@ -95,6 +95,13 @@ class AgentRecord : public RecordingSettings, public std::enable_shared_from_thi
   LMX_SHARED_FIELD(SharedDictionary, request_properties, setRequest_properties)
 
  public:
+  /// The type of the recording that was prepared last; the configured type may change under it. Falls back to
+  /// the configured type before the first one.
+  [[nodiscard]] std::int32_t recordedType() const {
+    const std::int32_t type = recordedType_;
+    return type == kRecordingTypeNone ? recordingType() : type;
+  }
+  void setRecordedType(std::int32_t v) { recordedType_ = v; }
   [[nodiscard]] std::int32_t status() const { return status_; }
   void setStatus(std::int32_t v) { status_ = v; }
   [[nodiscard]] std::int32_t error() const { return error_; }
@@ -129,6 +136,12 @@ class AgentRecord : public RecordingSettings, public std::enable_shared_from_thi
   void updateSoftStopTime();
   /// Sets the hard stop `seconds` from now; 0 or less clears it.
   void setRecordHardStopTimeSeconds(std::int32_t seconds);
+  /// Forgets deadlines that an earlier recording has left behind: they would end the next one at its first
+  /// check.
+  void clearPassedDeadlines();
+  /// When the recording began. The capture thread may not have stamped its start yet when a recording is
+  /// stopped at once: then the time at which it was prepared.
+  [[nodiscard]] Time beginning() const;
   /// Whether a deadline has passed (logged).
   bool shouldStopRecording();
   /// Stops the recording when a deadline has passed. Capture thread, every 15 seconds.
@@ -146,6 +159,7 @@ class AgentRecord : public RecordingSettings, public std::enable_shared_from_thi
   void cleanup();
 
  private:
+  std::atomic<std::int32_t> recordedType_{kRecordingTypeNone};
   std::atomic<std::int32_t> status_{0};
   std::atomic<std::int32_t> error_{0};
   std::atomic<std::int32_t> delay_{0};

@@ -23,14 +23,13 @@ namespace {
 
 /// The capture thread's body: starts the capture, then checks the stop times every 15 seconds until the
 /// controller has shut down. `cancelled` ends it earlier.
-void videoRunLoop(const std::shared_ptr<AgentRecord>& session, const std::atomic<bool>& cancelled) {
-  const auto controller = session->captureController();
-  if (session->recordingType() != kRecordingTypeFile) {
-    if (!controller || !controller->startRecording()) {
-      LMPLogMessage(nullptr, kLogCritical, "The recording failed to start");
-      LXAgentRecordStopCapture(session);
-      return;
-    }
+void videoRunLoop(const std::shared_ptr<AgentRecord>& session,
+                  const std::shared_ptr<LMRCaptureController>& controller,
+                  const std::atomic<bool>& cancelled) {
+  if (controller && !controller->startRecording()) {
+    LMPLogMessage(nullptr, kLogCritical, "The recording failed to start");
+    LXAgentRecordStopCapture(session);
+    return;
   }
   session->setStartTime(currentTime());
 
@@ -51,10 +50,13 @@ void videoRunLoop(const std::shared_ptr<AgentRecord>& session, const std::atomic
 
 CaptureThread::CaptureThread(std::shared_ptr<State> state) : state_(std::move(state)) {}
 
-std::shared_ptr<CaptureThread> CaptureThread::start(std::shared_ptr<AgentRecord> session) {
+std::shared_ptr<CaptureThread> CaptureThread::start(std::shared_ptr<AgentRecord> session,
+                                                    std::shared_ptr<LMRCaptureController> controller) {
   auto state = std::make_shared<State>();
   try {
-    std::thread([session = std::move(session), state] { videoRunLoop(session, state->cancelled); }).detach();
+    std::thread([session = std::move(session), controller = std::move(controller), state] {
+      videoRunLoop(session, controller, state->cancelled);
+    }).detach();
   } catch (const std::system_error& error) {
     LMPLogMessage(nullptr, kLogCritical, "The capture thread could not be started: %s", error.what());
     return nullptr;

@@ -5,14 +5,18 @@
 namespace lmx {
 
 class AgentRecord;
+class LMRCaptureController;
 
 /// Owns no thread handle: the thread keeps the session alive itself, ends with the capture, and is never
 /// joined (a stop may be waiting on it from the main thread). cancel() asks it to end at its next turn, at
 /// most 0.25 s later.
 class CaptureThread {
  public:
-  /// Starts a thread that runs videoRunLoop on `session`. @return null when no thread could be made.
-  static std::shared_ptr<CaptureThread> start(std::shared_ptr<AgentRecord> session);
+  /// Starts a thread that runs videoRunLoop on `session`.
+  /// @param controller  its capture; null for a recording of a file
+  /// @return null when no thread could be made (logged).
+  static std::shared_ptr<CaptureThread> start(std::shared_ptr<AgentRecord> session,
+                                              std::shared_ptr<LMRCaptureController> controller);
   void cancel();
 
  private:

@@ -38,6 +38,10 @@ struct MovieChoice {
   bool audioOnly = false;
 };
 
+bool isAudioOnly(const SharedDictionary& metadata) {
+  return lookUp(metadata, "RecordingMetadata_AUDIO_ONLY") == "true";
+}
+
 std::optional<MovieChoice> chooseMovie(AgentContext& context, AgentRecord& session,
                                        const SharedDictionary& metadata) {
   if (context.adhoc()) return MovieChoice{context.adhoc_output_file(), false};
@@ -48,7 +52,7 @@ std::optional<MovieChoice> chooseMovie(AgentContext& context, AgentRecord& sessi
     return std::nullopt;
   }
   const std::string identifier = lookUp(metadata, "RecordingMetadata_RECORDING_UUID").value_or("test");
-  const bool audioOnly = lookUp(metadata, "RecordingMetadata_AUDIO_ONLY") == "true";
+  const bool audioOnly = isAudioOnly(metadata);
   if (const auto minutes = lookUp(metadata, "RecordingMetadata_UNATTENDED_RECORDING_MINUTES")) {
     session.setMaxUnattendedRecordingMinutes(std::atoi(minutes->c_str()));
   }
@@ -84,25 +88,20 @@ void logPrepareFailure(AgentRecord& session, int result) {
   LMPLogMessage(nullptr, kLogError, "_LXAgentRecordPrepareCaptureSync received error");
 }
 
-/// A deadline left over from an earlier recording would end the new one at its first check.
-void clearPassedDeadlines(AgentRecord& session) {
-  const auto now = currentTime();
-  if (!now) return;
-  if (const auto hard = session.hardStopTime(); hard && lmp_diff_timeval(&*hard, &*now) <= 0) {
-    session.setHardStopTime(std::nullopt);
-  }
-  if (const auto soft = session.softStopTime(); soft && soft->tv_sec <= now->tv_sec) {
-    session.setSoftStopTime(std::nullopt);
-  }
+/// The type to record. Looked up once: the session's own may be put back by the end of an earlier capture.
+std::int32_t wantedType(const AgentRecord& session, const SharedDictionary& metadata, bool adhoc) {
+  const std::int32_t type = session.recordingType();
+  const bool soundOnly = !adhoc && type != kRecordingTypeFile && isAudioOnly(metadata);
+  return soundOnly ? kRecordingTypeAudio : type;
 }
 
-int prepareByType(AgentContext& context, AgentRecord& session) {
+int prepareByType(AgentContext& context, AgentRecord& session, std::int32_t type) {
   if (session.status() != kRecorderIdle) {
     LMPLogMessage(nullptr, kLogError, "Unable to start, capture not idle");
     reportRuntimeError(kRecordNotIdle);
     return kRecordNotIdle;
   }
-  const std::int32_t type = session.recordingType();
+  session.setRecordedType(type);
   if (type == kRecordingTypeFile) return kRecordSuccess;
   if (type < kRecordingTypeAudio || type > kRecordingTypeFile) {
     reportRuntimeError(kRecordInvalidType);
@@ -113,20 +112,34 @@ int prepareByType(AgentContext& context, AgentRecord& session) {
   return result;
 }
 
-void beginCapture(AgentRecord& session, SharedDictionary metadata) {
-  clearPassedDeadlines(session);
+/// @return kRecordSuccess, or kRecordNotRunning when there is no thread to record with.
+int beginCapture(AgentRecord& session, SharedDictionary metadata) {
   session.setLaunchTime(currentTime());
   session.setElapsedTime(TimeValue{});
   session.setStatus(kRecorderRecording);
   const auto controller =
-      session.recordingType() == kRecordingTypeFile ? nullptr : session.captureController();
+      session.recordedType() == kRecordingTypeFile ? nullptr : session.captureController();
   if (controller) controller->setStartWithUUID(session.recording_uuid());
-  session.setCaptureThread(CaptureThread::start(session.shared_from_this()));
+  session.setCaptureThread(CaptureThread::start(session.shared_from_this(), controller));
+  if (!session.captureThread()) {
+    if (controller) controller->cancelRecording();
+    session.setStatus(kRecorderIdle);
+    return kRecordNotRunning;
+  }
   session.setMetadata(metadata);
   if (AgentActions* actions = engineEnvironment().actions) {
     actions->recordDidStartWithFile(session.filename().value_or(""), metadata, session.startTime());
   }
   session.setError(kRecordSuccess);
+  return kRecordSuccess;
+}
+
+/// After a refused request for sound only the configured type counts again; a capture that is running has its
+/// own.
+void restoreType(const AgentContext& context, AgentRecord& session) {
+  const auto name = context.recording_type();
+  const int code = AgentPreferences::recTypeToCode(name ? name->c_str() : nullptr);
+  if (code != kRecordingTypeNone) session.setRecordingType(code);
 }
 
 }  // namespace
@@ -147,6 +160,7 @@ int LXAgentRecordPrepareCapture(AgentContext& context, SharedDictionary metadata
   session->setAudioOnlyMode(movie->audioOnly);
   if (movie->audioOnly) session->setRecordingType(kRecordingTypeAudio);
   const int result = LXAgentRecordPrepareCaptureSync(context, movie->path, std::move(metadata));
+  if (result != kRecordSuccess && movie->audioOnly) restoreType(context, *session);
   context.unlock_control_action_mutex();
   return result;
 }
@@ -165,10 +179,9 @@ int LXAgentRecordPrepareCaptureSync(AgentContext& context, const std::optional<s
     return kRecordNoDiskSpace;
   }
   session->setRecording_uuid(newUUIDString());
-  const int result = prepareByType(context, *session);
-  if (result == kRecordSuccess) {
-    beginCapture(*session, std::move(metadata));
-  } else {
+  int result = prepareByType(context, *session, wantedType(*session, metadata, context.adhoc()));
+  if (result == kRecordSuccess) result = beginCapture(*session, std::move(metadata));
+  if (result != kRecordSuccess) {
     session->setMetadata(nullptr);
     session->setError(result);
   }
@@ -182,8 +195,8 @@ std::shared_ptr<LMRRecordingContext> captureSettings(AgentContext& context, cons
   try {
     if (context.adhoc()) return AgentPreferences::newRecordingContextForAdHoc(framework);
     CaptureType type = CaptureType::audioAndVideo;
-    if (session.recordingType() == kRecordingTypeAudio) type = CaptureType::audio;
-    if (session.recordingType() == kRecordingTypeVideo) type = CaptureType::video;
+    if (session.recordedType() == kRecordingTypeAudio) type = CaptureType::audio;
+    if (session.recordedType() == kRecordingTypeVideo) type = CaptureType::video;
     return AgentPreferences(framework).newRecordingContextForDaemonWithRecordingType(type);
   } catch (const PreferenceError& error) {
     LMPLogMessage(nullptr, kLogCritical, "Unable to load the recording context, exception = %s",
@@ -230,8 +243,7 @@ int LXAgentRecordPrepareCaptureController(AgentContext& context) {
 
 namespace {
 
-/// Waits until the controller has shut down, at most until `deadline`, without blocking the loop's other
-/// sources.
+/// Waits until the controller has shut down, at most until `deadline`.
 void waitForShutDown(const std::shared_ptr<LMRCaptureController>& controller,
                      std::chrono::steady_clock::time_point deadline) {
   while (controller && !controller->hasShutDown() && std::chrono::steady_clock::now() < deadline) {
@@ -267,7 +279,7 @@ int stopByType(AgentRecord& session, const std::shared_ptr<LMRCaptureController>
     thread->cancel();
     session.setCaptureThread(nullptr);
   }
-  const std::int32_t type = session.recordingType();
+  const std::int32_t type = session.recordedType();
   if (type == kRecordingTypeFile) return kRecordSuccess;
   if (type < kRecordingTypeAudio || type > kRecordingTypeFile) {
     reportRuntimeError(kRecordInvalidType);
@@ -316,7 +328,7 @@ int LXAgentRecordStopCapture(const std::shared_ptr<AgentRecord>& session) {
     session->setError(result);
   } else if (AgentActions* actions = engineEnvironment().actions) {
     actions->recordDidStopWithFile(session, session->filename().value_or(""), session->metadata(),
-                                   session->startTime(), static_cast<std::int64_t>(elapsed),
+                                   session->beginning(), static_cast<std::int64_t>(elapsed),
                                    session->stopTime(), false);
   }
   return result;

@@ -56,6 +56,21 @@ void AgentRecord::setRecordHardStopTimeSeconds(std::int32_t seconds) {
   logTime("hardStopTime set to: ", *deadline);
 }
 
+void AgentRecord::clearPassedDeadlines() {
+  const auto now = currentTime();
+  if (!now) return;
+  if (const Time hard = hardStopTime(); hard && lmp_diff_timeval(&*hard, &*now) <= 0)
+    setHardStopTime(std::nullopt);
+  if (const Time soft = softStopTime(); soft && soft->tv_sec <= now->tv_sec) setSoftStopTime(std::nullopt);
+}
+
+AgentRecord::Time AgentRecord::beginning() const {
+  const Time start = startTime();
+  const Time launch = launchTime();
+  if (!start || (launch && lmp_diff_timeval(&*start, &*launch) < 0)) return launch;
+  return start;
+}
+
 bool AgentRecord::shouldStopRecording() {
   const auto now = currentTime();
   if (!now) return false;

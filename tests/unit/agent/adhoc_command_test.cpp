@@ -1,5 +1,6 @@
 // The ad-hoc client's commands, byte for byte.
 #include "agent/adhoc_command.h"
+#include "record/agent_record.h"
 
 #include <gtest/gtest.h>
 

@@ -218,6 +218,66 @@ TEST_F(StoppedRecording, ASecondStopMakesNoSecondJob) {
   EXPECT_EQ(journalCount("processRequest request of R1 " + movie("R1.mov")), 1);
 }
 
+TEST_F(StoppedRecording, NewPreferencesDuringItDoNotChangeItsType) {
+  const auto controller = start("R1");
+  session_->setRecordingType(kRecordingTypeFile);
+  stopAndReport(controller);
+  const auto job = nextJob();
+  ASSERT_NE(job, nullptr);
+  EXPECT_EQ(journalCount("controller stopRecording"), 1);
+  EXPECT_EQ(job->getProperty("RecordingMetadata_TYPE"), "Audio+Video");
+}
+
+TEST_F(StoppedRecording, OfAFileSurvivesARefusedRequestForSound) {
+  testing::writeFile(movie("in.mov"), "movie");
+  context_->setInput_file(movie("in.mov"));
+  context_->setRecording_type("File");
+  session_->setRecordingType(kRecordingTypeFile);
+  setParameters({{"RecordingMetadata_RECORDING_UUID", "F1"}});
+  agent_.prepareCapture();
+  ASSERT_EQ(context_->status(), 0);
+  const auto begun = session_->launchTime();
+  session_->setRecordingType(kRecordingTypeAudio);  // as the handler of START does
+  setParameters({{"RecordingMetadata_RECORDING_UUID", "F2"}, {"RecordingMetadata_AUDIO_ONLY", "true"}});
+  agent_.prepareCapture();
+  EXPECT_EQ(context_->status(), 4);
+  agent_.stopRecording();
+  const auto job = context_->postProcessListNext();
+  ASSERT_NE(job, nullptr);
+  EXPECT_EQ(job->getProperty("RecordingMetadata_TYPE"), "File");
+  EXPECT_GE(std::stol(job->getProperty("RecordingMetadata_START_DATE").value()), begun->tv_sec);
+  EXPECT_EQ(session_->recordingType(), kRecordingTypeFile);
+}
+
+TEST_F(StoppedRecording, ThatEndedByItselfIsSubmittedThoughItsReportIsStillToCome) {
+  const auto first = start("R1");
+  first->shut_down = true;  // the disk is full, say; its files are being closed
+  agent_.stopRecording();
+  const auto second = start("R2");
+  reportEnd(first);
+  turnTheLoop();
+  const auto job = nextJob();
+  ASSERT_NE(job, nullptr);
+  EXPECT_EQ(job->getProperty("RecordingMetadata_RECORDING_UUID"), "R1");
+  stopAndReport(second);
+  EXPECT_EQ(nextJob()->getProperty("RecordingMetadata_RECORDING_UUID"), "R2");
+}
+
+TEST_F(StoppedRecording, IsDescribedByTheRequestThatTookItOver) {
+  const auto controller = start("R1", {{"RecordingMetadata_TITLE", "First"}});
+  session_->setDiskSpaceCutoffInMB(0xFFFFFFFFU);
+  setParameters({{"RecordingMetadata_RECORDING_UUID", "R2"}, {"RecordingMetadata_TITLE", "Second"}});
+  agent_.prepareCapture();
+  ASSERT_EQ(context_->status(), 30);
+  session_->setRequest_uuid("request of R2");
+  session_->setRequest_properties(context_->properties());
+  stopAndReport(controller);
+  const auto job = nextJob();
+  ASSERT_NE(job, nullptr);
+  EXPECT_EQ(job->getProperty("RecordingMetadata_RECORDING_UUID"), "R2");
+  EXPECT_EQ(job->getProperty("RecordingMetadata_TITLE"), "Second");
+}
+
 TEST_F(StoppedRecording, RecoveredOnesGetTheirDocumentAndAreNotSubmitted) {
   bool forgotten = false;
   RecoveredRecording recovered;

@@ -220,6 +220,27 @@ TEST(Recovery, CancelledAndHandedOverRequestsDoNotComeBack) {
   EXPECT_TRUE(std::filesystem::is_empty(repository.path()));
 }
 
+TEST(Recovery, OfANameTooLongForAFile) {
+  const Folder repository;
+  const std::string uuid = std::string(199, 'a') + "\u00E4" + std::string(200, 'b');
+  const auto capture = FinishedCapture::openAbandoned(crashedCapture(
+      repository,
+      "capture 2 0.0333333 0\nstart R 0.0 RecordingMetadata_RECORDING_UUID " + uuid + "\nrun 0 0\n", 1));
+  const auto recovered = capture->recoverPending(repository.path());
+  ASSERT_EQ(recovered.size(), 1U);
+  EXPECT_EQ(recovered[0].path, repository.file(std::string(199, 'a') + ".mov"));
+}
+
+TEST(Recovery, TakesHalfACopyAway) {
+  const Folder repository;
+  const std::string folder = crashedCapture(repository, kJournal, 2);
+  std::ofstream(folder + "/movie.part") << "half";
+  const auto recovered = FinishedCapture::openAbandoned(folder)->recoverPending(repository.path());
+  ASSERT_EQ(recovered.size(), 1U);
+  recovered[0].forget();
+  EXPECT_FALSE(std::filesystem::exists(folder));
+}
+
 TEST(Recovery, NameCannotLeaveTheRepository) {
   const Folder repository;
   const auto capture = FinishedCapture::openAbandoned(crashedCapture(

@@ -371,5 +371,25 @@ TEST_F(Configure, PropertiesAreReplacedNotMerged) {
   EXPECT_EQ(*channel_.properties(), second);
 }
 
+TEST_F(RecordingHandlers, AMovieCannotBeNamedOutOfTheRepository) {
+  EXPECT_EQ(
+      run("START RecordingMetadata_RECORDING_UUID=../../etc/x,RecordingMetadata_MAX_RECORDING_MINUTES=5,"
+          "RecordingMetadata_UNATTENDED_RECORDING_MINUTES=5\n"),
+      Lines{"cmdStatus=31"});
+  EXPECT_TRUE(journal_.entries().empty());
+}
+
+TEST_F(RecordingHandlers, StartForgetsDeadlinesOfAnEarlierRecordingOnly) {
+  session_->setSoftStopTime(TimeValue{1000, 0});
+  run(kStart);
+  const auto own = session_->hardStopTime();
+  EXPECT_TRUE(own);
+  EXPECT_FALSE(session_->softStopTime());
+  session_->setStatus(kRecorderRecording);
+  session_->setSoftStopTime(TimeValue{1000, 0});
+  run(kStart);
+  EXPECT_NE(session_->softStopTime().value_or(TimeValue{}).tv_sec, 0) << "a running one keeps its deadline";
+}
+
 }  // namespace
 }  // namespace lmx

@@ -25,6 +25,15 @@ class ScriptedCaptureController : public LMRCaptureController {
     SharedDictionary parameters;
   };
 
+  class Session : public CaptureSession {
+   public:
+    explicit Session(bool running) : running_(running) {}
+    bool isRunning() const override { return running_; }
+
+   private:
+    bool running_;
+  };
+
   explicit ScriptedCaptureController(Journal& journal) : journal_(journal) {}
 
   bool prepare_succeeds = true;
@@ -35,6 +44,8 @@ class ScriptedCaptureController : public LMRCaptureController {
   double elapsed_of_request = 0;
   std::vector<double> power_levels;
   std::optional<CaptureError> error;
+  std::function<std::optional<std::string>()> on_delete_segment;
+  std::atomic<bool> devices_run{false};      ///< what its session answers
   std::function<void()> on_start_recording;  ///< on the capture thread
   /// What processRequest does instead of answering `error`.
   std::function<std::optional<CaptureError>(const std::string& path)> on_process_request;
@@ -89,7 +100,7 @@ class ScriptedCaptureController : public LMRCaptureController {
   int recordingState() override { return state; }
   bool hasShutDown() override { return shut_down; }
   std::optional<CaptureError> lastError() override { return error; }
-  std::shared_ptr<CaptureSession> session() override { return nullptr; }
+  std::shared_ptr<CaptureSession> session() override { return std::make_shared<Session>(devices_run.load()); }
   std::vector<double> audioAveragePowerLevels() override { return power_levels; }
 
   std::optional<CaptureError> processRequestWithUUID(const std::string& uuid,
@@ -99,7 +110,9 @@ class ScriptedCaptureController : public LMRCaptureController {
   }
   void requestHandedOver(const std::string& uuid) override { journal_.add("requestHandedOver " + uuid); }
   std::vector<RecoveredRecording> recoverAbandonedRequests() override { return {}; }
-  std::optional<std::string> deleteEarliestSegment() override { return std::nullopt; }
+  std::optional<std::string> deleteEarliestSegment() override {
+    return on_delete_segment ? on_delete_segment() : std::nullopt;
+  }
 
  private:
   void mark(Mark mark) {

@@ -219,18 +219,29 @@ TEST_F(Prepare, AVolumeThatCannotBeMeasuredPassesTheThreshold) {
   EXPECT_EQ(prepare(), 0);
 }
 
-TEST_F(Prepare, DeadlinesThatHavePassedAreForgotten) {
+TEST_F(Prepare, DeadlinesAreLeftAlone) {
+  // One that passes while the camera opens must still end the recording at its first check.
   session_->setHardStopTime(TimeValue{1000, 0});
-  session_->setSoftStopTime(TimeValue{1000, 0});
   ASSERT_EQ(prepare(), 0);
-  EXPECT_FALSE(session_->hardStopTime());
-  EXPECT_FALSE(session_->softStopTime());
+  EXPECT_TRUE(session_->hardStopTime() || log_.contains(5, "Agent recording hit hard stop time"));
 }
 
-TEST_F(Prepare, ADeadlineThatIsStillToComeIsKept) {
-  session_->setRecordHardStopTimeSeconds(3000);
+TEST_F(Prepare, TheRecordedTypeIsThatOfThePreparation) {
   ASSERT_EQ(prepare(), 0);
-  EXPECT_TRUE(session_->hardStopTime());
+  session_->setRecordingType(kRecordingTypeFile);  // as new preferences do
+  EXPECT_EQ(session_->recordedType(), kRecordingTypeAudioVideo);
+  EXPECT_EQ(session_->copy()->recordedType(), kRecordingTypeAudioVideo);
+}
+
+TEST_F(Prepare, ARefusedRequestForSoundChangesNoType) {
+  context_->setRecording_type("Audio+Video");
+  ASSERT_EQ(prepare(), 0);
+  session_->setRecordingType(kRecordingTypeAudio);  // as the handler of START does
+  EXPECT_EQ(LXAgentRecordPrepareCapture(*context_, std::make_shared<const Dictionary>(
+                                                       Dictionary{{"RecordingMetadata_AUDIO_ONLY", "true"}})),
+            4);
+  EXPECT_EQ(session_->recordedType(), kRecordingTypeAudioVideo);
+  EXPECT_EQ(session_->recordingType(), kRecordingTypeAudioVideo);
 }
 
 TEST_F(Prepare, LogLinesOfThePrepareStepByResult) {

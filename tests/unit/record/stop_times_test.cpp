@@ -132,6 +132,26 @@ TEST_F(StopTimes, AutoShutoffMarksTheRequestWaitsAndClearsBothDeadlines) {
   EXPECT_EQ(journalCount("stopRecording, waiting"), 1);
 }
 
+TEST_F(StopTimes, OnlyPassedDeadlinesAreForgotten) {
+  session_->setHardStopTime(TimeValue{1000, 0});
+  session_->setSoftStopTime(TimeValue{1000, 0});
+  session_->clearPassedDeadlines();
+  EXPECT_FALSE(session_->hardStopTime());
+  EXPECT_FALSE(session_->softStopTime());
+  session_->setRecordHardStopTimeSeconds(3000);
+  session_->clearPassedDeadlines();
+  EXPECT_TRUE(session_->hardStopTime());
+}
+
+TEST_F(StopTimes, BeginningIsTheStartOrElseThePreparation) {
+  EXPECT_FALSE(session_->beginning());
+  session_->setStartTime(TimeValue{1000, 0});
+  session_->setLaunchTime(TimeValue{2000, 0});
+  EXPECT_EQ(session_->beginning()->tv_sec, 2000) << "the start is an earlier recording's";
+  session_->setStartTime(TimeValue{2001, 0});
+  EXPECT_EQ(session_->beginning()->tv_sec, 2001);
+}
+
 TEST_F(StopTimes, WithoutADeadlineNothingIsStopped) {
   session_->checkForAutoShutoffConditions();
   EXPECT_TRUE(journal_.entries().empty());

@@ -59,5 +59,45 @@ TEST_F(DateText, IsLocalTimeWithItsOffset) {
 
 TEST_F(DateText, AYearBeyondTheCalendarHasNone) { EXPECT_FALSE(dateText(1LL << 62)); }
 
+TEST(DateFromText, ReadsTheFormOfTheTimers) {
+  EXPECT_EQ(dateFromText("1970-01-01 00:00:00 +0000"), 0);
+  EXPECT_EQ(dateFromText("2011-03-14 09:00:00 +0100"), 1300089600);
+  EXPECT_EQ(dateFromText("2011-03-14 13:30:00 +0530"), 1300089600);
+  EXPECT_EQ(dateFromText("2011-03-14 00:00:00 -0800"), 1300089600);
+  EXPECT_EQ(dateFromText("2028-02-29 12:00:00 +0000"), 1835438400);
+  EXPECT_EQ(dateFromText("1969-12-31 23:59:59 +0000"), -1);
+}
+
+TEST(DateFromText, OtherFormsAndDatesThatDoNotExistGiveNone) {
+  for (const char* text : {"",
+                           "now",
+                           "2011-03-14",
+                           "2011-03-14 09:00:00",
+                           "2011-03-14T09:00:00 +0100",
+                           "2011-03-14 09:00:00 0100",
+                           "2011-03-14 09:00:00 +01:00",
+                           "2011-03-14 09:00:00 +0100 ",
+                           " 2011-03-14 09:00:00 +0100",
+                           "2011-3-14 09:00:00 +0100",
+                           "2011-13-14 09:00:00 +0100",
+                           "2011-02-29 09:00:00 +0100",
+                           "2100-02-29 09:00:00 +0000",
+                           "2011-04-31 09:00:00 +0100",
+                           "2011-03-00 09:00:00 +0100",
+                           "2011-03-14 24:00:00 +0100",
+                           "2011-03-14 09:60:00 +0100",
+                           "2011-03-14 09:00:60 +0100",
+                           "2011-03-14 09:00:00 +2400",
+                           "2011-03-14 09:00:00 +0160",
+                           "-011-03-14 09:00:00 +0100"}) {
+    EXPECT_FALSE(dateFromText(text)) << text;
+  }
+}
+
+TEST_F(DateText, IsReadBack) {
+  zone("IST-5:30");
+  for (const std::time_t at : {0L, 1246363500L, 1835438400L}) EXPECT_EQ(dateFromText(*dateText(at)), at);
+}
+
 }  // namespace
 }  // namespace lmx

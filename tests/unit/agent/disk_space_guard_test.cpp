@@ -1,0 +1,154 @@
+// The watch over free space, against a volume that really has some and a controller that deletes as scripted.
+#include <gmock/gmock.h>
+
+#include "tests/unit/agent/agent_fixture.h"
+
+namespace lmx {
+namespace {
+
+constexpr std::uint32_t kNeverEnough = 0xFFFFFFFFU;
+
+class DiskSpaceGuard : public AgentTest {
+ protected:
+  DiskSpaceGuard() {
+    session_->setDiskSpaceCutoffInMB(1);
+    agent_.startTimers();
+  }
+  void setContinuous(bool enabled) {
+    LMRContinuousRecordingInfo info;
+    info.enabled = enabled;
+    context_->setContinuous(info);
+  }
+  [[nodiscard]] std::ptrdiff_t disabledLines() const {
+    std::ptrdiff_t lines = 0;
+    for (const auto& entry : log_.entries()) {
+      lines += entry.level == 4 && entry.text.ends_with(
+                                       "MB is below threshold 4294967295 MB, unable to free space, "
+                                       "recording disabled");
+    }
+    return lines;
+  }
+};
+
+TEST_F(DiskSpaceGuard, LeavesARecordingAloneWhileThereIsSpace) {
+  start("R1");
+  agent_.checkDiskSpace();
+  EXPECT_EQ(journalCount("controller stopRecording"), 0);
+  EXPECT_TRUE(context_->running());
+}
+
+TEST_F(DiskSpaceGuard, StopsTheRecordingAndSaysSoOnce) {
+  const auto controller = start("R1");
+  controller->devices_run = true;
+  session_->setDiskSpaceCutoffInMB(kNeverEnough);
+  agent_.checkDiskSpace();
+  EXPECT_EQ(journalCount("controller stopRecording"), 1);
+  controller->devices_run = false;
+  agent_.checkDiskSpace();
+  agent_.checkDiskSpace();
+  EXPECT_EQ(journalCount("controller stopRecording"), 1);
+  EXPECT_EQ(disabledLines(), 1);
+  reportEnd(controller);
+  turnTheLoop();
+  EXPECT_NE(nextJob(), nullptr) << "what was recorded until then is submitted";
+}
+
+TEST_F(DiskSpaceGuard, DoesNotRecordAgainByItselfInPlainMode) {
+  session_->setDiskSpaceCutoffInMB(kNeverEnough);
+  agent_.checkDiskSpace();
+  session_->setDiskSpaceCutoffInMB(1);
+  agent_.checkDiskSpace();
+  EXPECT_EQ(framework_->controllersMade(), 0U);
+}
+
+TEST_F(DiskSpaceGuard, RecordsAgainInContinuousMode) {
+  setContinuous(true);
+  agent_.checkDiskSpace();
+  EXPECT_EQ(framework_->controllersMade(), 1U);
+  agent_.checkDiskSpace();
+  EXPECT_EQ(framework_->controllersMade(), 1U) << "it runs";
+  const auto entries = log_.entries();
+  EXPECT_EQ(std::count_if(entries.begin(), entries.end(),
+                          [](const auto& e) {
+                            return e.level == 5 && e.text.ends_with(" MB is sufficient, starting recorder");
+                          }),
+            1);
+  const auto running = framework_->controller(0);
+  ASSERT_NE(running, nullptr);
+  running->shut_down = true;
+  session_->setStatus(kRecorderIdle);
+  agent_.checkDiskSpace();
+  EXPECT_EQ(framework_->controllersMade(), 2U);
+}
+
+TEST_F(DiskSpaceGuard, TellsOfTheNextShortageOnceThereWasSpaceAgain) {
+  setContinuous(true);
+  session_->setDiskSpaceCutoffInMB(kNeverEnough);
+  agent_.checkDiskSpace();
+  agent_.checkDiskSpace();
+  EXPECT_EQ(disabledLines(), 1);
+  session_->setDiskSpaceCutoffInMB(1);
+  agent_.checkDiskSpace();
+  session_->setDiskSpaceCutoffInMB(kNeverEnough);
+  agent_.checkDiskSpace();
+  EXPECT_EQ(disabledLines(), 2);
+}
+
+TEST_F(DiskSpaceGuard, DeletesSegmentsUntilNothingIsGained) {
+  const auto controller = start("R1");
+  controller->on_delete_segment = [&]() -> std::optional<std::string> {
+    journal_.add("deleteEarliestSegment");
+    return std::nullopt;
+  };
+  session_->setDiskSpaceCutoffInMB(kNeverEnough);
+  agent_.checkDiskSpace();
+  EXPECT_GE(journalCount("deleteEarliestSegment"), 1);
+  EXPECT_LE(journalCount("deleteEarliestSegment"), 5) << "others may use this disk, but not for ever";
+}
+
+TEST_F(DiskSpaceGuard, TheDirectoryOfTheLastSegmentGoesWithIt) {
+  const auto controller = start("R1");
+  const std::string full = movie("full");
+  const std::string empty = movie("empty");
+  std::filesystem::create_directories(full);
+  std::filesystem::create_directories(empty);
+  testing::writeFile(full + "/2.mov", "segment");
+  bool first = true;
+  controller->on_delete_segment = [&]() -> std::optional<std::string> {
+    const std::string directory = first ? full : empty;
+    first = false;
+    return directory + "/1.mov";
+  };
+  session_->setDiskSpaceCutoffInMB(kNeverEnough);
+  agent_.checkDiskSpace();
+  agent_.checkDiskSpace();
+  EXPECT_TRUE(std::filesystem::exists(full));
+  EXPECT_FALSE(std::filesystem::exists(empty));
+}
+
+TEST_F(DiskSpaceGuard, AVanishedRepositoryIsMadeAgainAndTheCaptureCancelled) {
+  start("R1");
+  const std::string lost = movie("below");
+  std::filesystem::create_directories(lost);
+  context_->setRecording_repository_path(lost);
+  session_->setFilename(lost + "/R1.mov");
+  std::filesystem::remove_all(lost);
+  agent_.checkDiskSpace();
+  EXPECT_EQ(journalCount("cancelRecording"), 1);
+  EXPECT_TRUE(std::filesystem::is_directory(lost));
+  EXPECT_TRUE(context_->running());
+  EXPECT_TRUE(log_.contains(6, "Recording Repository does not exist, creating " + lost + "."));
+}
+
+TEST_F(DiskSpaceGuard, AVolumeThatCannotBeMeasuredEndsTheAgent) {
+  const auto controller = start("R1");
+  testing::writeFile(movie("file"), "");
+  session_->setFilename(movie("file/below/R1.mov"));  // ENOTDIR
+  agent_.checkDiskSpace();
+  EXPECT_EQ(journalCount("controller stopRecording"), 1);
+  EXPECT_FALSE(context_->running());
+  context_->setRunning(true);
+}
+
+}  // namespace
+}  // namespace lmx
