@@ -16,10 +16,12 @@
 #include "agent/context/agent_actions.h"
 #include "agent/context/agent_context.h"
 #include "agent/schedule.h"
+#include "control/agent_control.h"
 #include "control/agent_control_unix.h"
 #include "control/client_connect.h"
 #include "control/detached_channel.h"
 #include "platform/child_process.h"
+#include "platform/network_watcher.h"
 #include "platform/run_loop.h"
 #include "platform/service_manager.h"
 #include "platform/signals.h"
@@ -79,6 +81,21 @@ class AgentMain : public AgentActions {
   void loadSchedule();
   /// Has the service manager never start this agent again, and ends the process: 78, or 71 when that failed.
   [[noreturn]] void disableService();
+
+  // ---- the server's cluster (cluster.cpp)
+  using SharedPlist = AgentContext::SharedPlist;
+  /// Asks `host`, else one of the cached members. Blocks while the tool runs, half a minute at most.
+  /// @param members  gets the member dictionary, null when there is none
+  /// @return 0, -1 when there was nobody to ask, else the tool's exit status
+  int clusterInformation(const std::optional<std::string>& host, SharedPlist& members) const;
+  int clusterInformationFromSpecificHostOnly(const std::string& host, SharedPlist& members) const;
+  /// Tries the entry at `index`. @return as clusterInformation
+  int clusterInformationWithMember(std::size_t index, const std::vector<std::string>& hosts,
+                                   SharedPlist& members) const;
+  /// The member dictionary that the tool has left on the disk, or null.
+  static SharedPlist clusterInformationFromDisk();
+  /// Asks again in the background and stores the answer; a failure keeps the old one.
+  void refreshClusterInformation();
 
   // ---- ad-hoc mode (adhoc.cpp)
   /// One command to the running daemon; a recording lasts until an interrupt. @return the exit status
@@ -146,6 +163,15 @@ class AgentMain : public AgentActions {
   Start prepareGround();
   void probeDevice(const LMRRecordingContext& settings);
   Start startServices();
+  void learnCluster();
+
+  // The tunnel (tunnel.cpp). Main thread.
+  bool openTunnel();
+  void closeTunnel();
+  /// Has the tunnel reconnect when an address comes or goes.
+  void watchNetwork();
+  /// Leaves word with a server that understands it: a last hello that says offline. Ten seconds at most.
+  void tellServerOfTheEnd();
   int stopSequence(Start result, int status);
 
   int recordAdHoc(ClientConnect& client);
@@ -185,7 +211,12 @@ class AgentMain : public AgentActions {
   std::shared_ptr<LMRRecordingContext> start_settings_;
   std::unique_ptr<AgentPreferences> agentPrefs_;
   PostProcessScheduler scheduler_;
+  std::unique_ptr<AgentControl> agentControl_;  ///< null while the camera is away
   std::unique_ptr<AgentControlUnix> agentControlLocal_;
+  std::atomic<bool> cluster_refresh_{false};
+  std::unique_ptr<RunLoop::Source> clusterInfoTimer_;
+  NetworkWatcher network_;
+  std::unique_ptr<RunLoop::Source> networkSource_;
   Schedule schedule_;
   DetachedChannel detached_;
   std::unique_ptr<RunLoop::Source> diskSpaceTimer_;

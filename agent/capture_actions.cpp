@@ -127,7 +127,9 @@ void AgentMain::setRecorderStatusToIdle() {
 void AgentMain::shutDownControl() {
   context_->logDebug("Process shutDownControl");
   cancelCapture();
-  if (!context_->adhoc()) context_->setLast_device_check(std::time(nullptr));
+  if (context_->adhoc()) return;
+  closeTunnel();
+  context_->setLast_device_check(std::time(nullptr));
 }
 
 void AgentMain::shutDownControlBecauseDeviceFailed() {

@@ -23,6 +23,7 @@ AgentMain::AgentMain(std::shared_ptr<AgentContext> context, AgentEnvironment env
 }
 
 AgentMain::~AgentMain() {
+  agentControl_.reset();
   agentControlLocal_.reset();
   scheduler_.cancel();
   setEngineEnvironment({});
@@ -69,6 +70,7 @@ AgentMain::Start AgentMain::loadSettings() {
 AgentMain::Start AgentMain::prepareGround() {
   if (!setupRecordingRepository() || createPIDFile() != 0) return Start::fatal;
   recoverUnfinishedRecordings();
+  learnCluster();
   probeDevice(*start_settings_);
   return Start::ok;
 }
@@ -94,6 +96,8 @@ AgentMain::Start AgentMain::startServices() {
                   "Internal error occurred creating post-process scheduler thread");
     return Start::fatal;
   }
+  watchNetwork();
+  if (!device_offline_ && !openTunnel()) return Start::fatal;
   agentControlLocal_ = newControlChannel<AgentControlUnix>(context_, this);
   if (!agentControlLocal_) {
     LMPLogMessage(context_->log_context(), kLogAlert, "Unable to start listener on named pipe");
@@ -120,6 +124,8 @@ int AgentMain::stopSequence(Start result, int status) {
 }
 
 void AgentMain::startTimers() {
+  clusterInfoTimer_ = loop_.addRepeatingTimer(180s, [this] { refreshClusterInformation(); });
+  refreshClusterInformation();
   shouldDisplayNoDiskSpaceMessage_ = true;
   diskSpaceTimer_ = loop_.addRepeatingTimer(15s, [this] { checkDiskSpace(); });
   checkDiskSpace();
@@ -127,10 +133,12 @@ void AgentMain::startTimers() {
 }
 
 void AgentMain::shutdown() {
+  clusterInfoTimer_ = nullptr;
   diskSpaceTimer_ = nullptr;
   context_->setRunning(false);
   const auto controller = captureController();
   while (controller && !controller->hasShutDown()) loop_.run(250ms);
+  tellServerOfTheEnd();
   scheduler_.cancel();
   loop_.stop();
 }

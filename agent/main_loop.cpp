@@ -70,7 +70,11 @@ void AgentMain::retryDevice(std::int64_t now) {
   if (preview || !settings->videoEnabled) {
     context_->setLast_device_check(0);
     shouldDisplayOfflineMessage_ = false;
-    device_offline_ = false;
+    if (openTunnel()) {
+      loadSchedule();
+    } else {
+      context_->setRunning(false);
+    }
     return;
   }
   context_->setLast_device_check(now);

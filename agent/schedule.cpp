@@ -57,6 +57,7 @@ std::chrono::milliseconds AgentMain::timeToNextCommand(std::chrono::milliseconds
 }
 
 AgentControlBase& AgentMain::channelOf(ChannelKind kind) {
+  if (kind == ChannelKind::tunnel && agentControl_) return *agentControl_;
   if (kind == ChannelKind::local && agentControlLocal_) return *agentControlLocal_;
   return detached_;
 }

@@ -33,7 +33,6 @@ AgentControlBase::~AgentControlBase() {
 
 bool AgentControlBase::initWithAgentContext() {
   LMPLogMessage(logContext(), kLogNotice, "Control module is starting...");
-  if (registerForNetworkChange() == -1) return false;
   if (!clock_.now()) {  // without the time a lost server would never be noticed
     LMPLogMessage(logContext(), kLogCritical, "Internal error occurred");
     return false;
@@ -65,6 +64,11 @@ void AgentControlBase::threadBody() noexcept {
   }
   thread_id_ = std::thread::id();  // the system may give it to another thread from now on
   thread_ended_ = true;
+}
+
+void AgentControlBase::networkChanged() {
+  logInfo("A network transition was received.");
+  if (const auto now = clock_.now()) setNetTransitionTime(now->tv_sec);
 }
 
 void AgentControlBase::askToStop() {
@@ -99,6 +103,7 @@ bool AgentControlBase::waitForThread() {
 }
 
 void AgentControlBase::closeSockets() {
+  const std::lock_guard lock(send_mutex_);
   for (auto* socket : {&serverSocket_, &serverSocketDumped_}) UniqueFd closing(socket->exchange(-1));
 }
 
@@ -107,23 +112,23 @@ bool AgentControlBase::connected() const {
   return socket != -1 && peerIsConnected(socket);
 }
 
-namespace {
-
-void closeOnce(std::atomic<int>& socket, LMPLogContext log) {
-  int current = socket;
-  if (!socket.compare_exchange_strong(current, -1)) return;
-  LMPLogMessage(log, kLogInfo, "Disconnecting from tunnel...");
+void AgentControlBase::closeOnce(std::atomic<int>& socket) {
+  const std::lock_guard lock(send_mutex_);
+  const int current = socket.exchange(-1);
+  logInfo("Disconnecting from tunnel...");
   const UniqueFd closing(current);
 }
+
+void AgentControlBase::disconnect() { closeOnce(serverSocket_); }
+void AgentControlBase::disconnectOld() { closeOnce(serverSocketDumped_); }
+
+namespace {
 
 struct AddressListDeleter {
   void operator()(addrinfo* list) const noexcept { ::freeaddrinfo(list); }
 };
 
 }  // namespace
-
-void AgentControlBase::disconnect() { closeOnce(serverSocket_, logContext()); }
-void AgentControlBase::disconnectOld() { closeOnce(serverSocketDumped_, logContext()); }
 
 std::string AgentControlBase::dnsResolveName(const std::string& host) {
   addrinfo hints{};

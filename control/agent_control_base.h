@@ -59,10 +59,9 @@ class AgentControlBase {
   int configure(const Dictionary* parameters);
   /// Numeric address of the first address of `host`; empty when it doesn't resolve. Blocks on the resolver.
   [[nodiscard]] static std::string dnsResolveName(const std::string& host);
-  /// Has the network watched so that changes set netTransitionTime. @return 0, or -1 when it can't be
-  /// watched. Does nothing here: a listener's peers reconnect by themselves, so listeners have no use for it
-  /// yet.
-  virtual int registerForNetworkChange() { return 0; }
+  /// The network has changed: the connection is made anew a second later. Thread-safe. For the tunnel; a
+  /// listener's peers are on this machine or reconnect by themselves.
+  void networkChanged();
 
   /// Whether the current connection's peer is still there.
   [[nodiscard]] bool connected() const;
@@ -145,6 +144,9 @@ class AgentControlBase {
   void setServerSocket(int socket) { serverSocket_ = socket; }
   /// Readable once the channel is to stop: to be polled beside whatever the thread waits for.
   [[nodiscard]] int wakeDescriptor() const { return wake_.get(); }
+  /// Held while a reply is sent: timed commands answer from the main thread, and the socket must not be
+  /// closed under them.
+  [[nodiscard]] std::mutex& sendMutex() { return send_mutex_; }
   /// Null once the context is gone: the default log.
   [[nodiscard]] LMPLogContext logContext() const;
   void logDebug(const std::string& message) const;
@@ -174,6 +176,9 @@ class AgentControlBase {
   [[nodiscard]] bool continuous() const;
   [[nodiscard]] double shiftedReferenceTime() const;
 
+  void closeOnce(std::atomic<int>& socket);
+
+  std::mutex send_mutex_;
   ChannelClock& clock_;
   AgentActions* const actions_;
   SharedValue<std::shared_ptr<AgentContext>> agentContext_;

@@ -9,6 +9,9 @@ inline constexpr std::string_view kPreferencesFile = "/Library/Preferences/com.z
 inline constexpr std::string_view kStateDirectory = "/var/lmx/agent";
 inline constexpr std::string_view kSecretsDirectory = "/var/lmx/agent/secrets";
 inline constexpr std::string_view kPreviewImage = "/var/lmx/agent/preview.jpg";
+inline constexpr std::string_view kServerInformation = "/var/lmx/agent/com.zandor.lmxserverinfo.plist";
+inline constexpr std::string_view kServerInformationOfRoot =
+    "/var/root/Library/Caches/com.zandor.lmxserverinfo.plist";
 inline constexpr std::string_view kTimersFile = "/var/lmx/agent/timers";
 inline constexpr std::string_view kTimeShiftFile = "/var/lmx/agent/timeshift";
 inline constexpr std::string_view kPidFile = "/var/run/lmxagentd.pid";

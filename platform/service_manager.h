@@ -22,8 +22,8 @@ class ServiceManager {
 
 std::unique_ptr<ServiceManager> newSystemServiceManager();
 
-/// For an agent under a private root, a trial: it must not disable the unit of the machine's own agent. Grants
-/// nothing and does nothing.
+/// For an agent under a private root, a trial: it must not disable the unit of the machine's own agent.
+/// Grants nothing and does nothing.
 std::unique_ptr<ServiceManager> newPrivateServiceManager();
 
 }  // namespace lmx

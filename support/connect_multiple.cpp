@@ -26,6 +26,12 @@ namespace {
 using Clock = std::chrono::steady_clock;
 constexpr std::chrono::seconds kTimePerHost{10};
 
+/// What ends a wait: the time, or a descriptor that becomes readable.
+struct Patience {
+  Clock::time_point deadline;
+  int wake = -1;
+};
+
 struct Endpoint {
   std::string host;
   std::string port;
@@ -81,14 +87,19 @@ int millisecondsUntil(Clock::time_point deadline) {
   return static_cast<int>(std::clamp<std::int64_t>(left, 0, 60000));
 }
 
-/// Waits until `fd` has one of `events` (or an error). @return false when the deadline came first.
-bool awaitEvent(int fd, short events, Clock::time_point deadline) {
-  pollfd polled{fd, events, 0};
+/// Waits until `fd` has one of `events` (or an error). @return false when the patience ended first.
+bool awaitEvent(int fd, short events, const Patience& patience) {
+  pollfd polled[2] = {{fd, events, 0}, {patience.wake, POLLIN, 0}};
   for (;;) {
-    const int ready = poll(&polled, 1, millisecondsUntil(deadline));
-    if (ready > 0) return true;
+    const int ready = poll(polled, 2, millisecondsUntil(patience.deadline));
+    if (ready > 0) return polled[1].revents == 0;
     if (ready == 0 || errno != EINTR) return false;
   }
+}
+
+bool isReadable(int fd) {
+  pollfd polled{fd, POLLIN, 0};
+  return poll(&polled, 1, 0) > 0;
 }
 
 /// What a resolver thread and the caller that may have given up on it share.
@@ -100,7 +111,7 @@ struct Lookup {
 
 /// getaddrinfo has no time limit (dead name servers take half a minute), so a name is looked up on a
 /// thread of its own that is left behind when the time is over.
-AddressList resolve(const Endpoint& endpoint, Clock::time_point deadline) {
+AddressList resolve(const Endpoint& endpoint, const Patience& patience) {
   if (AddressList numeric = resolveNow(endpoint, AI_NUMERICHOST)) return numeric;
   const auto lookup = std::make_shared<Lookup>();
   try {
@@ -113,41 +124,41 @@ AddressList resolve(const Endpoint& endpoint, Clock::time_point deadline) {
   } catch (const std::system_error&) {
     return nullptr;
   }
-  awaitEvent(lookup->done.get(), POLLIN, deadline);
+  awaitEvent(lookup->done.get(), POLLIN, patience);
   const std::lock_guard lock(lookup->mutex);
   return std::move(lookup->addresses);
 }
 
 /// Waits until the connection is made or has failed. @return whether it is made.
-bool awaitConnected(int fd, Clock::time_point deadline) {
-  if (!awaitEvent(fd, POLLOUT, deadline)) return false;
+bool awaitConnected(int fd, const Patience& patience) {
+  if (!awaitEvent(fd, POLLOUT, patience)) return false;
   int error = 0;
   socklen_t size = sizeof error;
   return getsockopt(fd, SOL_SOCKET, SO_ERROR, &error, &size) == 0 && error == 0;
 }
 
-UniqueFd connectTo(const addrinfo& address, Clock::time_point deadline) {
+UniqueFd connectTo(const addrinfo& address, const Patience& patience) {
   UniqueFd fd(
       socket(address.ai_family, address.ai_socktype | SOCK_CLOEXEC | SOCK_NONBLOCK, address.ai_protocol));
   if (!fd.valid()) return {};
   const int result = connect(fd.get(), address.ai_addr, address.ai_addrlen);
   if (result != 0 && errno != EINPROGRESS && errno != EINTR) return {};
-  if (result != 0 && !awaitConnected(fd.get(), deadline)) return {};
+  if (result != 0 && !awaitConnected(fd.get(), patience)) return {};
   // Non-blocking was only for the time limit: the caller gets a socket as connect() leaves it.
   const int flags = fcntl(fd.get(), F_GETFL);
   if (flags < 0 || fcntl(fd.get(), F_SETFL, flags & ~O_NONBLOCK) != 0) return {};
   return fd;
 }
 
-UniqueFd connectToHost(const Endpoint& endpoint) {
+UniqueFd connectToHost(const Endpoint& endpoint, int wake) {
   const auto deadline = Clock::now() + kTimePerHost;
-  const AddressList addresses = resolve(endpoint, deadline);
+  const AddressList addresses = resolve(endpoint, {deadline, wake});
   int left = 0;
   for (const addrinfo* address = addresses.get(); address != nullptr; address = address->ai_next) ++left;
   for (const addrinfo* address = addresses.get(); address != nullptr; address = address->ai_next) {
     // An even share of what is left: one mute address must not use up the time of the others.
     const auto now = Clock::now();
-    UniqueFd fd = connectTo(*address, now + (deadline - now) / left--);
+    UniqueFd fd = connectTo(*address, {now + (deadline - now) / left--, wake});
     if (fd.valid()) return fd;
   }
   return {};
@@ -155,13 +166,15 @@ UniqueFd connectToHost(const Endpoint& endpoint) {
 
 }  // namespace
 
-int lmp_connect_multiple(const std::vector<std::string>& hosts, const std::string& port, int* socketOut) {
+int lmp_connect_multiple(const std::vector<std::string>& hosts, const std::string& port, int* socketOut,
+                         int wake) {
   if (socketOut == nullptr) return -1;
   *socketOut = -1;
   for (const std::string& entry : hosts) {
+    if (isReadable(wake)) break;
     const auto endpoint = parseEntry(entry, port);
     if (!endpoint) continue;
-    UniqueFd fd = connectToHost(*endpoint);
+    UniqueFd fd = connectToHost(*endpoint, wake);
     if (!fd.valid()) continue;
     *socketOut = fd.release();
     return 0;

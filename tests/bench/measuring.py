@@ -2,6 +2,7 @@
 import os
 import statistics
 import time
+from dataclasses import dataclass
 from pathlib import Path
 
 TICK = os.sysconf("SC_CLK_TCK")
@@ -74,16 +75,21 @@ def percentile(values, share):
 median = statistics.median
 
 
-class CpuSpan:
-    """CPU per second of one process over a span, with the load that others made meanwhile."""
+@dataclass(frozen=True)
+class CpuShare:
+    """CPU seconds of one process per second of a span."""
 
-    def __init__(self, pid, seconds):
-        cpu, self_cpu = cpu_seconds(pid), time.process_time()
-        busy, begin = machine_busy_seconds(), time.monotonic()
-        stat = stat_cpu_seconds(pid)
-        time.sleep(seconds)
-        self.seconds = time.monotonic() - begin
-        self.cpu = (cpu_seconds(pid) - cpu) / self.seconds
-        self.stat_cpu = (stat_cpu_seconds(pid) - stat) / self.seconds
-        own = self.cpu + (time.process_time() - self_cpu) / self.seconds
-        self.others = max(0.0, (machine_busy_seconds() - busy) / self.seconds - own)
+    cpu: float
+    stat_cpu: float  # the same from its stat file
+
+
+def cpu_shares(pids, seconds):
+    """({name: CpuShare} of the processes {name: pid} over the same span, the cores that others kept busy meanwhile)."""
+    before = {name: (cpu_seconds(pid), stat_cpu_seconds(pid)) for name, pid in pids.items()}
+    own, busy, begin = time.process_time(), machine_busy_seconds(), time.monotonic()
+    time.sleep(seconds)
+    spent = time.monotonic() - begin
+    shares = {name: CpuShare((cpu_seconds(pid) - before[name][0]) / spent,
+                             (stat_cpu_seconds(pid) - before[name][1]) / spent) for name, pid in pids.items()}
+    known = time.process_time() - own + sum(share.cpu for share in shares.values()) * spent
+    return shares, max(0.0, (machine_busy_seconds() - busy - known) / spent)

@@ -132,11 +132,10 @@ TEST_F(Lifecycle, StartIsLogged) {
   EXPECT_TRUE(log_.contains(5, "Control module started with success"));
 }
 
-TEST_F(Lifecycle, NoChannelWithoutNetworkRegistration) {
-  channel_.network_registration = -1;
-  EXPECT_FALSE(channel_.initWithAgentContext());
-  EXPECT_FALSE(log_.mentions("started with success"));
-  EXPECT_TRUE(channel_.threadHasEnded());
+TEST_F(Lifecycle, ANetworkTransitionIsLoggedAndNoted) {
+  channel_.networkChanged();
+  EXPECT_TRUE(log_.contains(6, "A network transition was received."));
+  EXPECT_NEAR(static_cast<double>(channel_.netTransitionTime()), static_cast<double>(std::time(nullptr)), 2.0);
 }
 
 TEST_F(Lifecycle, NoChannelWithoutTheTime) {

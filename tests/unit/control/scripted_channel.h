@@ -47,7 +47,6 @@ class ScriptedChannel final : public AgentControlBase {
   bool readable_lines = true;
   std::function<int(ScriptedChannel&)> on_connect;
   std::function<void(ScriptedChannel&)> on_reply;
-  int network_registration = 0;
 
   void receive(std::string_view chunk) {
     packetReceived(chunk.data(), static_cast<std::uint32_t>(chunk.size()));
@@ -57,7 +56,6 @@ class ScriptedChannel final : public AgentControlBase {
 
   bool requiresAuthentication() const override { return requires_authentication; }
   void setAuthenticated(bool authenticated) override { requires_authentication = !authenticated; }
-  int registerForNetworkChange() override { return network_registration; }
 
  protected:
   int connect() override { return on_connect ? on_connect(*this) : -1; }

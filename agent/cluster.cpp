@@ -1,0 +1,115 @@
+// The members of the server's cluster: asked of the server's tool, else read from its cache.
+#include "agent/agent_main.h"
+#include "control/cluster_hosts.h"
+#include "platform/log.h"
+#include "platform/paths.h"
+#include "platform/work_queue.h"
+
+namespace lmx {
+namespace {
+
+using namespace std::chrono_literals;
+
+/// The tool that has not answered by then is killed: at start-up nothing else goes on meanwhile.
+constexpr auto kToolLimit = 30s;
+constexpr const char* kMembers = "cluster_members";
+
+AgentContext::SharedPlist membersOf(const PlistResult& information) {
+  const PlistDictionary* all = information.value ? information.value->dictionary() : nullptr;
+  const auto found = all == nullptr ? PlistDictionary::const_iterator{} : all->find(kMembers);
+  if (all == nullptr || found == all->end() || found->second.dictionary() == nullptr) return nullptr;
+  return std::make_shared<const PlistDictionary>(*found->second.dictionary());
+}
+
+/// The status to hand on: never 0 for a tool that did not exit in order.
+int statusOf(const ChildResult& result) {
+  if (result.end == ChildResult::End::exited) return result.status;
+  return result.end == ChildResult::End::notStarted ? 127 : 128 + result.status;
+}
+
+}  // namespace
+
+int AgentMain::clusterInformationFromSpecificHostOnly(const std::string& host, SharedPlist& members) const {
+  ChildOptions options;
+  options.captureOutput = true;
+  options.limit = kToolLimit;
+  const ChildResult result =
+      environment_.children->run({systemPath(kLumexTool), "--listinfo", "--server", host}, options);
+  if (result.end == ChildResult::End::timedOut) {
+    LMPLogMessage(context_->log_context(), kLogError,
+                  "/usr/bin/lumex --listinfo has not answered for %d seconds and was ended",
+                  static_cast<int>(kToolLimit.count()));
+  }
+  const int status = statusOf(result);
+  if (status != 0) {
+    LMPLogMessage(context_->log_context(), kLogError,
+                  "Unable to retrieve cluster information (/usr/bin/lumex exit code = %d).", status);
+    return status;
+  }
+  members = membersOf(parsePropertyList(result.output));
+  return 0;
+}
+
+int AgentMain::clusterInformationWithMember(std::size_t index, const std::vector<std::string>& hosts,
+                                            SharedPlist& members) const {
+  for (; index < hosts.size(); ++index) {
+    const int status = clusterInformationFromSpecificHostOnly(hosts[index], members);
+    if (status != -1) return status;
+  }
+  return -1;
+}
+
+AgentMain::SharedPlist AgentMain::clusterInformationFromDisk() {
+  for (const std::string_view path : {kServerInformation, kServerInformationOfRoot}) {
+    const PlistResult file = readPropertyList(systemPath(path));
+    if (file.value && file.value->dictionary() != nullptr) return membersOf(file);
+  }
+  return nullptr;
+}
+
+int AgentMain::clusterInformation(const std::optional<std::string>& host, SharedPlist& members) const {
+  members = nullptr;
+  if (!host) return -1;
+  const int status = clusterInformationFromSpecificHostOnly(*host, members);
+  if (status == 0) return 0;
+  const SharedPlist cached = clusterInformationFromDisk();
+  if (!cached) {
+    context_->logDebug("Unable to retrieve cluster information from disk.");
+    return status;
+  }
+  // The first of the list is skipped: it is the server that has just failed.
+  const int result = clusterInformationWithMember(1, clusterHostArray(cached.get()), members);
+  if (result != 0) {
+    context_->logDebug("Unable to contact any member of the cluster.");
+    members = cached;
+  }
+  return result;
+}
+
+void AgentMain::learnCluster() {
+  SharedPlist members;
+  if (clusterInformation(context_->tunnel_host(), members) == -1) {
+    LMPLogMessage(context_->log_context(), kLogCritical, "Unable to retrieve cluster information");
+  }
+  context_->setServer_info(members);
+  std::string joined;
+  const auto hosts = clusterHostArray(members.get());
+  for (const std::string& host : hosts) joined += (joined.empty() ? "" : ", ") + host;
+  context_->logDebug("Hosts: " + (joined.empty() ? "(none)" : joined));
+  if (hosts.empty()) LMPLogMessage(context_->log_context(), kLogError, "No cluster members known");
+}
+
+void AgentMain::refreshClusterInformation() {
+  if (cluster_refresh_.exchange(true)) return;  // the last one is still waiting for its tool
+  dispatchAsync(WorkPriority::background, [this] {
+    SharedPlist members;
+    if (clusterInformation(context_->tunnel_host(), members) != 0) {
+      LMPLogMessage(context_->log_context(), kLogError, "Unable to update cluster information.");
+    } else {
+      context_->setServer_info(members);
+    }
+    cluster_refresh_ = false;
+  });
+}
+
+}  // namespace lmx
