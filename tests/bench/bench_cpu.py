@@ -14,8 +14,8 @@ DISTURBED = 0.1  # busy cores of others
 
 
 class Turns:
-    """Samples of one figure. In a turn all sides record at the same time, so that whatever happens on the machine happens
-    to each of them; who begins changes from turn to turn."""
+    """Samples of one figure. In a turn all sides record at the same time, so that whatever happens on the machine
+    happens to each of them; who begins changes from turn to turn."""
 
     def __init__(self, ground):
         self.count = 2 if ground.quick else 10
@@ -52,9 +52,9 @@ class Turns:
     def note(self, what):
         rounding = max(abs(share.cpu - share.stat_cpu) for turn in self.shares for share in turn.values())
         calm = sum(others <= DISTURBED for others in self.others)
-        return (f"{what}: {self.count} turns of {self.seconds:g} s, all sides at once; in {calm} of them others used at "
-                f"most {DISTURBED} cores, in the worst {max(self.others):.2f}; process clock and utime + stime differ by "
-                f"at most {rounding:.3f} s/s")
+        return (f"{what}: {self.count} turns of {self.seconds:g} s, all sides at once; in {calm} of them others used "
+                f"at most {DISTURBED} cores, in the worst {max(self.others):.2f}; process clock and utime + stime "
+                f"differ by at most {rounding:.3f} s/s")
 
     def thread_note(self):
         """Where the daemon's time goes: the sum over its threads of a name."""

@@ -24,6 +24,8 @@ def first_status(agent, answered):
 
 def seconds_to_first_status(ground):
     with ground.agent(start=False) as agent:
+        # The daemon asks the tool for its cluster first; the harness's stand-in would spend its time starting Python.
+        agent.path("/usr/bin/lumex").write_text("#!/bin/sh\nexit 1\n")
         answered = []
         asker = threading.Thread(target=first_status, args=(agent, answered), daemon=True)
         asker.start()
@@ -64,15 +66,19 @@ def idle(ground):
         afterwards = memory_megabytes(agent.sandbox.daemon_pid)
     rows = [Row("idle: CPU a minute", cpu, "s", limit=0.06),
             Row("idle: wake-ups a minute", voluntary, "", limit=300),
-            Row("idle: private memory", memory["Private"], "MB", limit=15),
+            Row("idle: private memory (dirty)", memory["Dirty"], "MB", limit=15),
+            Row("idle: Private, clean pages too", memory["Private"], "MB"),
             Row("idle: Pss", memory["Pss"], "MB"),
-            Row("private memory, recording 720p", while_recording["Private"], "MB"),
-            Row("private memory, idle after it", afterwards["Private"], "MB"),
+            Row("private (dirty), recording 720p", while_recording["Dirty"], "MB"),
+            Row("private (dirty), idle after it", afterwards["Dirty"], "MB"),
             Row("exec → first STATUS answered", median(starts), "ms", limit=100, samples={"ours": starts})]
     wakers = ", ".join(f"{name} {count:.0f}" for name, count in sorted(woken.items(), key=lambda item: -item[1]))
     return Result(rows, [
         f"over {seconds} s, no peer: the limits are absolute (0.1 % of a core, 5 wake-ups a second). Wake-ups are "
         f"voluntary context switches of all threads; {involuntary:.0f} involuntary ones a minute. By thread: {wakers}",
-        "private: Private_Clean + Private_Dirty of smaps_rollup, 5 s after the start, plug-ins loaded.",
+        "private (dirty): Private_Dirty of smaps_rollup, 5 s after the start, plug-ins loaded. Clean pages are those of "
+        "libraries, private only while nobody else has them mapped and dropped when memory is short: they and Pss "
+        "depend on what else runs.",
+        "No server answers: the tunnel, where it is built in, tries again with growing pauses.",
         f"exec → STATUS: median of {len(starts)}, GStreamer's catalogue of plug-ins warm, asked every 0.3 ms; the "
         "moment of the exec is written down by the process itself."])

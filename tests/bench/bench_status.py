@@ -13,8 +13,8 @@ PEER = "echo server in C"
 
 
 def placements():
-    """{name: (core of the client, core of the server)}. The scheduler puts both on one core in one run and on two in the
-    next, which alone makes a factor of five: so they are put where they shall be."""
+    """{name: (core of the client, core of the server)}. The scheduler puts both on one core in one run and on two in
+    the next, which alone makes a factor of several: so they are put where they shall be."""
     cores = sorted(os.sched_getaffinity(0))
     found = {"same core": (cores[0], cores[0])}
     if len(cores) > 1:
@@ -86,7 +86,8 @@ def status(ground):
         f"{count} requests each, back to back, in turns of {BLOCK} with the peer; client and echo server are one C "
         "program, compiled for this run. STATUS: all requests of a turn on one connection. connect + STATUS: a "
         "connection each.",
-        "same core, two cores: where the client and the thread that answers are put; everything else runs where it likes.",
+        "same core, two cores: where the client and the thread that answers are put; everything else runs where it "
+        "likes. With two, how fast an idle core wakes up is in every figure.",
         "recording: 1280x720 with sound; the echo server is measured beside the same recording.",
-        f"the daemon writes two messages a request to the system log (three more a connection), read by the benchmark; "
-        f"{len(lost)} notices of lost messages."])
+        "the daemon writes two messages a request to the system log (three while it records, two more a connection), "
+        f"read by the benchmark; {len(lost)} notices of lost messages."])

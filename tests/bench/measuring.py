@@ -57,13 +57,15 @@ def threads(pid):
 
 
 def memory_megabytes(pid):
-    """{"Rss", "Pss", "Private"} of a process; private is what would be free again if it ended."""
+    """{"Rss", "Pss", "Private", "Dirty"} of a process: private is what nobody else maps at the moment, dirty the part of
+    it that is its own, whoever else has the same libraries loaded."""
     kilobytes = {}
     for line in Path(f"/proc/{pid}/smaps_rollup").read_text().splitlines()[1:]:
         name, value = line.split(":")
         kilobytes[name] = int(value.split()[0])
     return {"Rss": kilobytes["Rss"] / 1024, "Pss": kilobytes["Pss"] / 1024,
-            "Private": (kilobytes["Private_Clean"] + kilobytes["Private_Dirty"]) / 1024}
+            "Private": (kilobytes["Private_Clean"] + kilobytes["Private_Dirty"]) / 1024,
+            "Dirty": kilobytes["Private_Dirty"] / 1024}
 
 
 def percentile(values, share):

@@ -214,6 +214,7 @@ TEST_F(Actions, AnInterruptStopsTheCaptureOfADaemonOnly) {
 
 TEST_F(Actions, OtherSignalNumbersAreIgnored) {
   start("R1");
+  EXPECT_TRUE(testing::waitUntil([&] { return journalCount("startRecording") == 1; }));
   const Entries before = journal_.entries();
   const auto lines = log_.entries().size();
   for (const int number : {0, SIGALRM, SIGCHLD, 99}) agent_.signal(number);

@@ -135,7 +135,8 @@ TEST_F(Lifecycle, StartIsLogged) {
 TEST_F(Lifecycle, ANetworkTransitionIsLoggedAndNoted) {
   channel_.networkChanged();
   EXPECT_TRUE(log_.contains(6, "A network transition was received."));
-  EXPECT_NEAR(static_cast<double>(channel_.netTransitionTime()), static_cast<double>(std::time(nullptr)), 2.0);
+  EXPECT_NEAR(static_cast<double>(channel_.netTransitionTime()), static_cast<double>(std::time(nullptr)),
+              2.0);
 }
 
 TEST_F(Lifecycle, NoChannelWithoutTheTime) {

@@ -17,6 +17,8 @@ class ScriptedChildRunner : public ChildRunner {
  public:
   ChildResult result{.end = ChildResult::End::exited, .status = 0, .output = {}};
   std::function<void()> on_run;
+  /// Answers instead of `result`.
+  std::function<ChildResult(const std::vector<std::string>& argv)> answer;
 
   ChildResult run(const std::vector<std::string>& argv, const ChildOptions& options) override {
     {
@@ -25,7 +27,7 @@ class ScriptedChildRunner : public ChildRunner {
       options_ = options;
     }
     if (on_run) on_run();
-    return result;
+    return answer ? answer(argv) : result;
   }
   [[nodiscard]] std::vector<std::vector<std::string>> runs() const {
     const std::lock_guard lock(mutex_);
