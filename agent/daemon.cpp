@@ -3,6 +3,7 @@
 #include <csignal>
 #include <cstdio>
 #include <ctime>
+#include <thread>
 
 #include "agent/agent_main.h"
 #include "platform/log.h"
@@ -23,6 +24,7 @@ AgentMain::AgentMain(std::shared_ptr<AgentContext> context, AgentEnvironment env
 }
 
 AgentMain::~AgentMain() {
+  while (cluster_refresh_) std::this_thread::sleep_for(1ms);  // it reaches this object until then
   agentControl_.reset();
   agentControlLocal_.reset();
   scheduler_.cancel();

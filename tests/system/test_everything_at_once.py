@@ -1,4 +1,5 @@
-"""A minute of everything at once: recordings, pauses, cancels, status, preference changes, a slow tool.
+"""A minute of everything at once: recordings, pauses, cancels, status, preference changes, the tunnel, timed
+commands, a slow tool.
 
 With the daemon built for ThreadSanitizer where there is one; a complaint of the sanitizer fails the test.
 """
@@ -11,7 +12,8 @@ from pathlib import Path
 import pytest
 from conftest import BINARY, ROOT, SANITIZER
 from harness import movie
-from harness.agent import Agent
+from harness.agent import SECRET, Agent
+from harness.tunnel_server import TunnelServer
 
 TSAN_BINARY = ROOT / "build/tsan/lmxagentd"
 SECONDS = 60
@@ -53,6 +55,23 @@ def administrator(agent, end):
         time.sleep(1)
 
 
+def headquarters(agent, end, server):
+    """Drives the tunnel: status, timed commands, and now and then a new connection."""
+    for number in itertools.count():
+        if time.monotonic() > end:
+            return
+        if number % 20 == 0:
+            if server.peer:
+                server.hang_up()
+            server.accept(40)
+        status = server.command("STATUS include_profile=true")
+        assert status.startswith("cmdStatus=0,recordStatus="), status
+        when = time.strftime("%Y-%m-%d %H:%M:%S +0000", time.gmtime(time.time() + 2))
+        server.send(f"TIMEDCMD command=SERVER,version=2,server_uuid=5E1F0A52-6B1D-4E8C-9A52-0F6C4C1B7E11,time={when}")
+        assert server.reply() == "cmdStatus=0"
+        time.sleep(0.1)
+
+
 @pytest.mark.limit(240)
 @pytest.mark.parametrize("kind", ["plain", "tsan"])
 def test_everything_at_once(registry, kind):
@@ -84,8 +103,9 @@ def run_everything(agent, seconds):
         except BaseException as failure:  # told by the main thread
             failures.append(failure)
 
+    server = TunnelServer(agent, SECRET)
     threads = [threading.Thread(target=guarded, args=arguments)
-               for arguments in ((operator, outcome), (watcher, replies), (administrator,))]
+               for arguments in ((operator, outcome), (watcher, replies), (administrator,), (headquarters, server))]
     for thread in threads:
         thread.start()
     for thread in threads:
@@ -99,3 +119,4 @@ def run_everything(agent, seconds):
     assert [call["arguments"][4] for call in agent.tool_calls()] == stopped
     assert not [name for name in agent.repository() if any(name.startswith(u + ".") for u, l in outcome if l == "CANCEL")]
     assert agent.stop(timeout=40) == 0
+    server.close()
