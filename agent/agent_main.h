@@ -88,10 +88,12 @@ class AgentMain : public AgentActions {
   /// @param members  gets the member dictionary, null when there is none
   /// @return 0, -1 when there was nobody to ask, else the tool's exit status
   int clusterInformation(const std::optional<std::string>& host, SharedPlist& members) const;
-  int clusterInformationFromSpecificHostOnly(const std::string& host, SharedPlist& members) const;
+  /// @param limit  the tool is killed after that time
+  int clusterInformationFromSpecificHostOnly(const std::string& host, SharedPlist& members,
+                                             std::chrono::milliseconds limit) const;
   /// Tries the entry at `index`. @return as clusterInformation
   int clusterInformationWithMember(std::size_t index, const std::vector<std::string>& hosts,
-                                   SharedPlist& members) const;
+                                   SharedPlist& members, std::chrono::milliseconds limit) const;
   /// The member dictionary that the tool has left on the disk, or null.
   static SharedPlist clusterInformationFromDisk();
   /// Asks again in the background and stores the answer; a failure keeps the old one.

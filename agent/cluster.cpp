@@ -10,8 +10,10 @@ namespace {
 
 using namespace std::chrono_literals;
 
-/// The tool that has not answered by then is killed: at start-up nothing else goes on meanwhile.
-constexpr auto kToolLimit = 30s;
+/// A tool that has not answered by then is killed: at start-up nothing else goes on meanwhile. The second one
+/// gets what the first has left.
+constexpr auto kQueryLimit = 30s;
+constexpr auto kFirstToolLimit = 20s;
 constexpr const char* kMembers = "cluster_members";
 
 AgentContext::SharedPlist membersOf(const PlistResult& information) {
@@ -29,16 +31,17 @@ int statusOf(const ChildResult& result) {
 
 }  // namespace
 
-int AgentMain::clusterInformationFromSpecificHostOnly(const std::string& host, SharedPlist& members) const {
+int AgentMain::clusterInformationFromSpecificHostOnly(const std::string& host, SharedPlist& members,
+                                                      std::chrono::milliseconds limit) const {
   ChildOptions options;
   options.captureOutput = true;
-  options.limit = kToolLimit;
+  options.limit = limit;
   const ChildResult result =
       environment_.children->run({systemPath(kLumexTool), "--listinfo", "--server", host}, options);
   if (result.end == ChildResult::End::timedOut) {
     LMPLogMessage(context_->log_context(), kLogError,
                   "/usr/bin/lumex --listinfo has not answered for %d seconds and was ended",
-                  static_cast<int>(kToolLimit.count()));
+                  static_cast<int>(limit / 1s));
   }
   const int status = statusOf(result);
   if (status != 0) {
@@ -51,9 +54,9 @@ int AgentMain::clusterInformationFromSpecificHostOnly(const std::string& host, S
 }
 
 int AgentMain::clusterInformationWithMember(std::size_t index, const std::vector<std::string>& hosts,
-                                            SharedPlist& members) const {
+                                            SharedPlist& members, std::chrono::milliseconds limit) const {
   for (; index < hosts.size(); ++index) {
-    const int status = clusterInformationFromSpecificHostOnly(hosts[index], members);
+    const int status = clusterInformationFromSpecificHostOnly(hosts[index], members, limit);
     if (status != -1) return status;
   }
   return -1;
@@ -70,15 +73,18 @@ AgentMain::SharedPlist AgentMain::clusterInformationFromDisk() {
 int AgentMain::clusterInformation(const std::optional<std::string>& host, SharedPlist& members) const {
   members = nullptr;
   if (!host) return -1;
-  const int status = clusterInformationFromSpecificHostOnly(*host, members);
+  const auto deadline = std::chrono::steady_clock::now() + kQueryLimit;
+  const int status = clusterInformationFromSpecificHostOnly(*host, members, kFirstToolLimit);
   if (status == 0) return 0;
   const SharedPlist cached = clusterInformationFromDisk();
   if (!cached) {
     context_->logDebug("Unable to retrieve cluster information from disk.");
     return status;
   }
+  const auto left =
+      std::chrono::duration_cast<std::chrono::milliseconds>(deadline - std::chrono::steady_clock::now());
   // The first of the list is skipped: it is the server that has just failed.
-  const int result = clusterInformationWithMember(1, clusterHostArray(cached.get()), members);
+  const int result = clusterInformationWithMember(1, clusterHostArray(cached.get()), members, left);
   if (result != 0) {
     context_->logDebug("Unable to contact any member of the cluster.");
     members = cached;

@@ -3,6 +3,7 @@
 
 #include <arpa/inet.h>
 #include <netinet/in.h>
+#include <netinet/tcp.h>
 #include <sys/socket.h>
 
 #include <algorithm>
@@ -11,6 +12,7 @@
 #include <ctime>
 #include <vector>
 
+#include "control/back_off.h"
 #include "control/cluster_hosts.h"
 #include "control/plain_text.h"
 #include "control/socket_io.h"
@@ -54,9 +56,33 @@ AgentControl::AgentControl(std::shared_ptr<AgentContext> context, AgentActions* 
 
 AgentControl::~AgentControl() { stop(); }
 
+/// A server that accepts and hangs up would otherwise be called ten thousand times a second.
+bool AgentControl::wasDroppedAtOnce() const {
+  return peerHasGone() && connected_at_ && !spoken_to_ &&
+         std::chrono::steady_clock::now() - *connected_at_ < kFirstBackOff;
+}
+
+/// Has the system find out that a silent server is gone: local commands count as contact too, so the
+/// channel's own time-out may never come.
+void AgentControl::watchPeer() {
+  const auto set = [this](int level, int option, int value) {
+    ::setsockopt(serverSocket(), level, option, &value, sizeof value);
+  };
+  set(SOL_SOCKET, SO_KEEPALIVE, 1);
+  set(IPPROTO_TCP, TCP_KEEPIDLE, 60);
+  set(IPPROTO_TCP, TCP_KEEPINTVL, 15);
+  set(IPPROTO_TCP, TCP_KEEPCNT, 4);
+  set(IPPROTO_TCP, TCP_USER_TIMEOUT, 120'000);
+}
+
 int AgentControl::connect() {
   const auto context = agentContext();
   if (!context) return kNotConnected;
+  if (wasDroppedAtOnce()) {
+    connected_at_ = std::nullopt;
+    logDebug("The server has closed the last connection without a word");
+    return kNotConnected;
+  }
   const std::string port = context->tunnel_port().value_or("");
   logInfo("Connecting to lmxserverd tunnel at " + context->tunnel_host().value_or("(null)") + ":" + port);
   hello_sent_ = false;
@@ -64,6 +90,9 @@ int AgentControl::connect() {
   int socket = -1;
   if (lmp_connect_multiple(hostsToTry(*context), port, &socket, wakeDescriptor()) == -1) return kNotConnected;
   setServerSocket(socket);
+  connected_at_ = std::chrono::steady_clock::now();
+  spoken_to_ = false;
+  watchPeer();
   logPeer();
   if (sendAGENT() == 0) return 0;
   disconnect();
@@ -119,6 +148,7 @@ std::optional<std::string> AgentControl::commandFromReceivedData(const std::stri
     const heap_ptr<unsigned char> plaintext(
         agent_decrypt_message(initialization_vector_->data(), secret->data(), line.c_str(),
                               static_cast<std::uint32_t>(line.size()), &length));
+    spoken_to_ = spoken_to_ || plaintext;
     if (plaintext)
       return plainCommand(reinterpret_cast<const char*>(plaintext.get()) + kRandomPrefix, logContext());
   }

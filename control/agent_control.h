@@ -2,6 +2,7 @@
 #pragma once
 #include <array>
 #include <atomic>
+#include <chrono>
 #include <memory>
 #include <mutex>
 #include <optional>
@@ -34,12 +35,17 @@ class AgentControl final : public AgentControlBase {
   void sendReply(const std::string& reply) override;
 
  private:
+  [[nodiscard]] bool wasDroppedAtOnce() const;
+  void watchPeer();
   void logPeer();
   void serverRejected();
 
   using Vector = std::array<unsigned char, kCipherBlock>;
   const std::optional<Vector> initialization_vector_;  ///< absent when there was no memory for it
   std::atomic<bool> hello_sent_{false};
+  // Channel thread only:
+  std::optional<std::chrono::steady_clock::time_point> connected_at_;  ///< the last connection's
+  bool spoken_to_ = false;                                             ///< a line of it could be decrypted
 };
 
 }  // namespace lmx

@@ -140,6 +140,8 @@ class AgentControlBase {
   /// Waits for a peer on `listening` and makes it the connection.
   /// @return 0; -1 when none was accepted, or when the listening socket refused the keep-alive option.
   int acceptPeer(int listening);
+  /// Whether it was the peer that ended the last connection. Channel thread.
+  [[nodiscard]] bool peerHasGone() const { return peer_has_gone_; }
   [[nodiscard]] int serverSocket() const { return serverSocket_; }
   void setServerSocket(int socket) { serverSocket_ = socket; }
   /// Readable once the channel is to stop: to be polled beside whatever the thread waits for.
@@ -187,8 +189,9 @@ class AgentControlBase {
   std::atomic<bool> running_{false};
   std::atomic<std::int32_t> server_protocol_version_{0};
   std::atomic<std::int64_t> netTransitionTime_{0};
-  LineAssembler partial_command_;  // channel thread only
-  UniqueFd wake_;                  // eventfd, written once by stop
+  LineAssembler partial_command_;  // channel thread only, as the next
+  bool peer_has_gone_ = false;
+  UniqueFd wake_;  // eventfd, written once by stop
 
   std::atomic<bool> thread_ended_{true};
   std::atomic<std::thread::id> thread_id_{};

@@ -50,8 +50,13 @@ bool AgentControlBase::connectWithBackOff() {
 }
 
 void AgentControlBase::receiveUntilGone() {
+  peer_has_gone_ = false;
   while (running_) {
-    if (networkHasChanged() || lastContactTimedOut() || !waitForPacket()) return;
+    if (networkHasChanged() || lastContactTimedOut()) return;
+    if (!waitForPacket()) {
+      peer_has_gone_ = true;
+      return;
+    }
   }
 }
 

@@ -152,12 +152,15 @@ void AgentControlBase::writeTimerListToDisk() {
 void AgentControlBase::loadTimedCommands() {
   const std::string path = systemPath(kTimersFile);
   const TimersFile file = readTimers(path);
+  bool kept = false;
   if (!file.problem.empty()) {
     const std::string copy = keepUnderAnotherName(path);
+    kept = !copy.empty();
     LMPLogMessage(logContext(), kLogError, "The timers file %s can't be used: %s. It is kept as %s.",
                   path.c_str(), file.problem.c_str(), copy.empty() ? "it is" : copy.c_str());
   }
-  bool added = false;
+  // Once its content is safe under another name, the file is made readable again.
+  bool added = kept;
   for (const SharedDictionary& entry : file.entries) added |= scheduleCommand(entry.get(), TimerOrigin::file);
   if (added) writeTimerListToDisk();
 }

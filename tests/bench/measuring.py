@@ -57,8 +57,8 @@ def threads(pid):
 
 
 def memory_megabytes(pid):
-    """{"Rss", "Pss", "Private", "Dirty"} of a process: private is what nobody else maps at the moment, dirty the part of
-    it that is its own, whoever else has the same libraries loaded."""
+    """{"Rss", "Pss", "Private", "Dirty"} of a process: private is what nobody else maps at the moment, dirty the part
+    of it that is its own, whoever else has the same libraries loaded."""
     kilobytes = {}
     for line in Path(f"/proc/{pid}/smaps_rollup").read_text().splitlines()[1:]:
         name, value = line.split(":")

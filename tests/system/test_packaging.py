@@ -58,7 +58,7 @@ def test_installation(tmp_path):
     subprocess.run(["cmake", "--install", str(ROOT / "build/release"), "--prefix", str(tmp_path)], check=True,
                    stdout=subprocess.DEVNULL)
     installed = {str(path.relative_to(tmp_path)) for path in tmp_path.rglob("*") if path.is_file()}
-    assert installed == {"sbin/lmxagentd", "share/man/man8/lmxagentd.8", "lib/systemd/system/lmxagentd.service",
+    assert installed == {"sbin/lmxagentd", "bin/lmx-tunnel", "share/man/man8/lmxagentd.8", "lib/systemd/system/lmxagentd.service",
                          "share/bash-completion/completions/lmxagentd",
                          "share/doc/lmxagentd/com.zandor.lmxagentd.sample.plist"}
     program = shutil.which("lmxagentd", path=str(tmp_path / "sbin"))

@@ -280,6 +280,18 @@ def test_the_cache_is_used_when_the_tool_fails(agent):
     agent.log.wait("^Hosts: 127.0.0.1:9001$", level=7)
 
 
+def test_a_server_that_hangs_up_at_once_is_not_stormed(agent):
+    agent.start()
+    server = TunnelServer(agent, SECRET)
+    times = []
+    for _ in range(3):
+        server.accept(10)
+        times.append(time.monotonic())
+        server.hang_up()
+    server.close()
+    assert all(4.5 < later - earlier < 8 for earlier, later in zip(times, times[1:])), times
+
+
 def test_a_hundred_reconnects_leak_nothing(agent, server):
     server.command("STOP")
     wait_until(lambda: server.command("STATUS"), 5)
@@ -287,5 +299,5 @@ def test_a_hundred_reconnects_leak_nothing(agent, server):
     for _ in range(100):
         server.hang_up()
         server.accept()
-    server.command("STOP")
+        server.command("STOP")
     assert descriptors(agent) <= before + 1

@@ -49,7 +49,7 @@ TEST_F(Cluster, TheToolIsAskedForTheHost) {
   EXPECT_EQ(count(members_), 2U);
   EXPECT_THAT(children_.runs(),
               ElementsAre(ElementsAre(systemPath(kLumexTool), "--listinfo", "--server", "server")));
-  EXPECT_EQ(children_.options().limit, std::chrono::seconds(30));
+  EXPECT_EQ(children_.options().limit, std::chrono::seconds(20));
 }
 
 TEST_F(Cluster, OutputThatIsNoPropertyListHasNoMembers) {
@@ -77,7 +77,7 @@ TEST_F(Cluster, AFailingToolWithoutACacheIsItsStatus) {
 TEST_F(Cluster, AHangingToolIsAFailedOne) {
   children_.result = {ChildResult::End::timedOut, 9, ""};
   EXPECT_NE(agent_.clusterInformation("server", members_), 0);
-  EXPECT_TRUE(log_.contains(3, "/usr/bin/lumex --listinfo has not answered for 30 seconds and was ended"));
+  EXPECT_TRUE(log_.contains(3, "/usr/bin/lumex --listinfo has not answered for 20 seconds and was ended"));
 }
 
 TEST_F(Cluster, TheFirstMemberOfTheCacheIsSkipped) {

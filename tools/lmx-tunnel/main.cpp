@@ -1,0 +1,242 @@
+// Plays the server for one agent at a time: shows what it says, sends it what is typed or scripted.
+#include <arpa/inet.h>
+#include <getopt.h>
+#include <netinet/in.h>
+#include <poll.h>
+#include <sys/socket.h>
+#include <unistd.h>
+
+#include <chrono>
+#include <cstdio>
+#include <cstring>
+#include <fstream>
+#include <iostream>
+#include <thread>
+
+#include <editline/readline.h>
+
+#include "support/scan.h"
+#include "support/unique_fd.h"
+#include "tools/lmx-tunnel/server_side.h"
+
+namespace lmx {
+namespace {
+
+constexpr int kExitUsage = 64;
+constexpr int kExitFailed = 1;
+constexpr std::chrono::milliseconds kReplyPatience{10000};
+constexpr const char* kUsage =
+    "usage: lmx-tunnel --secret FILE [--listen ADDRESS:PORT] [--script FILE] [--preview FILE.jpg]\n"
+    "\n"
+    "Waits for an agent as its server does, shows what it answers, and sends it what is typed.\n"
+    "  --secret FILE    the agent's own secrets file (a property list with lmx_secret)\n"
+    "  --listen A:P     where to listen; 127.0.0.1:8175 when not given\n"
+    "  --script FILE    send the lines of FILE, one after another; \"sleep SECONDS\" waits, \"#\" begins a "
+    "comment\n"
+    "  --preview FILE   save the picture of a STATUS reply there\n";
+
+struct Options {
+  std::string secret;
+  std::string address = "127.0.0.1";
+  int port = 8175;
+  std::string script;
+  std::string preview;
+};
+
+bool readListen(const std::string& text, Options& options) {
+  const auto colon = text.rfind(':');
+  const auto port = colon == std::string::npos ? std::nullopt : scanInteger(text.substr(colon + 1));
+  if (!port || *port < 1 || *port > 65535) return false;
+  options.address = text.substr(0, colon);
+  options.port = *port;
+  return true;
+}
+
+bool readOptions(int argc, char** argv, Options& options) {
+  constexpr option kOptions[] = {{"secret", required_argument, nullptr, 's'},
+                                 {"listen", required_argument, nullptr, 'l'},
+                                 {"script", required_argument, nullptr, 'f'},
+                                 {"preview", required_argument, nullptr, 'p'},
+                                 {nullptr, 0, nullptr, 0}};
+  for (int option = 0; (option = getopt_long(argc, argv, "", kOptions, nullptr)) != -1;) {
+    if (option == 's') options.secret = optarg;
+    if (option == 'f') options.script = optarg;
+    if (option == 'p') options.preview = optarg;
+    if (option == '?' || (option == 'l' && !readListen(optarg, options))) return false;
+  }
+  return optind == argc && !options.secret.empty();
+}
+
+UniqueFd listenOn(const Options& options) {
+  sockaddr_in address{};
+  address.sin_family = AF_INET;
+  address.sin_port = htons(static_cast<std::uint16_t>(options.port));
+  UniqueFd socket(::socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0));
+  const int on = 1;
+  if (!socket.valid() || inet_pton(AF_INET, options.address.c_str(), &address.sin_addr) != 1) return {};
+  ::setsockopt(socket.get(), SOL_SOCKET, SO_REUSEADDR, &on, sizeof on);
+  if (::bind(socket.get(), reinterpret_cast<const sockaddr*>(&address), sizeof address) != 0) return {};
+  if (::listen(socket.get(), 1) != 0) return {};
+  return socket;
+}
+
+/// One agent's connection.
+class Connection {
+ public:
+  Connection(UniqueFd socket, const Options& options) : socket_(std::move(socket)), options_(options) {}
+  [[nodiscard]] int descriptor() const { return socket_.get(); }
+
+  /// Takes the hello. @return false when there is none
+  bool begin(const TunnelCipher::Key& secret) {
+    const auto line = readLine(kReplyPatience);
+    const auto hello = line ? parseHello(*line) : std::nullopt;
+    if (!hello) {
+      std::printf("a peer without a proper hello: %s\n", line ? line->c_str() : "(nothing)");
+      return false;
+    }
+    std::printf("agent %s, version %s%s\n", hello->agentUUID.c_str(), hello->version.c_str(),
+                hello->offline ? ", going offline" : "");
+    std::fflush(stdout);
+    cipher_.emplace(secret, hello->vector);
+    return true;
+  }
+
+  bool send(const std::string& command) {
+    const auto line = cipher_->encrypted(command);
+    return line && ::send(socket_.get(), line->data(), line->size(), MSG_NOSIGNAL) ==
+                       static_cast<ssize_t>(line->size());
+  }
+
+  /// Shows the next line. @return false when none came in time or the agent has gone
+  bool show(std::chrono::milliseconds patience) {
+    const auto line = readLine(patience);
+    if (!line) return false;
+    const auto reply = cipher_->decrypted(*line);
+    std::printf("< %s\n",
+                reply ? shortened(*reply).c_str() : "(a line that does not decrypt: is the secret right?)");
+    if (const auto picture = reply ? previewIn(*reply) : std::nullopt; picture && !options_.preview.empty()) {
+      std::ofstream(options_.preview, std::ios::binary) << *picture;
+      std::printf("preview of %zu bytes saved to %s\n", picture->size(), options_.preview.c_str());
+    }
+    std::fflush(stdout);
+    return true;
+  }
+  [[nodiscard]] bool hasLine() const { return buffer_.find('\n') != std::string::npos; }
+
+ private:
+  std::optional<std::string> readLine(std::chrono::milliseconds patience) {
+    const auto deadline = std::chrono::steady_clock::now() + patience;
+    while (!hasLine()) {
+      const auto left =
+          std::chrono::ceil<std::chrono::milliseconds>(deadline - std::chrono::steady_clock::now());
+      pollfd polled{socket_.get(), POLLIN, 0};
+      char bytes[65536];
+      if (left.count() < 0 || ::poll(&polled, 1, static_cast<int>(left.count())) <= 0) return std::nullopt;
+      const ssize_t size = ::recv(socket_.get(), bytes, sizeof bytes, 0);
+      if (size <= 0) return std::nullopt;
+      buffer_.append(bytes, static_cast<std::size_t>(size));
+    }
+    std::string line = buffer_.substr(0, buffer_.find('\n'));
+    buffer_.erase(0, line.size() + 1);
+    return line;
+  }
+
+  UniqueFd socket_;
+  const Options& options_;
+  std::optional<TunnelCipher> cipher_;
+  std::string buffer_;
+};
+
+/// @return the exit status
+int runScript(Connection& agent, const std::string& path) {
+  std::ifstream script(path);
+  if (!script) {
+    std::fprintf(stderr, "lmx-tunnel: %s: %s\n", path.c_str(), std::strerror(errno));
+    return kExitFailed;
+  }
+  for (std::string line; std::getline(script, line);) {
+    if (line.empty() || line.starts_with('#')) continue;
+    if (line.starts_with("sleep ")) {
+      std::this_thread::sleep_for(std::chrono::duration<double>(scanReal(line.substr(6)).value_or(0)));
+      continue;
+    }
+    std::printf("> %s\n", line.c_str());
+    if (!agent.send(line) || (getsReply(line) && !agent.show(kReplyPatience))) {
+      std::fprintf(stderr, "lmx-tunnel: no answer to \"%s\"\n", line.c_str());
+      return kExitFailed;
+    }
+    // The agent takes one line a packet: the next one must not join a line without an answer.
+    if (!getsReply(line)) std::this_thread::sleep_for(std::chrono::milliseconds(100));
+  }
+  return 0;
+}
+
+Connection* typed_to = nullptr;  // the line editor's callback has no argument of its own
+bool typing_ended = false;
+
+void takeTypedLine(char* line) {
+  if (line == nullptr) {
+    typing_ended = true;
+    return;
+  }
+  if (*line != '\0') {
+    add_history(line);
+    if (!typed_to->send(line)) typing_ended = true;
+  }
+  std::free(line);  // NOLINT: the line editor's contract
+}
+
+/// Sends what is typed and shows what comes, until either side ends.
+void converse(Connection& agent) {
+  typed_to = &agent;
+  typing_ended = false;
+  rl_callback_handler_install("", takeTypedLine);
+  while (!typing_ended) {
+    pollfd polled[2] = {{agent.descriptor(), POLLIN, 0}, {STDIN_FILENO, POLLIN, 0}};
+    if (::poll(polled, 2, -1) < 0) break;
+    if (polled[0].revents != 0 && !agent.show(kReplyPatience)) break;
+    while (agent.hasLine()) agent.show(kReplyPatience);
+    if (polled[1].revents != 0) rl_callback_read_char();
+  }
+  rl_callback_handler_remove();
+}
+
+int serve(const Options& options) {
+  std::string problem;
+  const auto secret = readSecret(options.secret, problem);
+  if (!secret) {
+    std::fprintf(stderr, "lmx-tunnel: %s: %s\n", options.secret.c_str(), problem.c_str());
+    return kExitFailed;
+  }
+  const UniqueFd listener = listenOn(options);
+  if (!listener.valid()) {
+    std::fprintf(stderr, "lmx-tunnel: can't listen on %s:%d: %s\n", options.address.c_str(), options.port,
+                 std::strerror(errno));
+    return kExitFailed;
+  }
+  std::printf("listening on %s:%d\n", options.address.c_str(), options.port);
+  std::fflush(stdout);
+  for (;;) {
+    UniqueFd socket(::accept4(listener.get(), nullptr, nullptr, SOCK_CLOEXEC));
+    if (!socket.valid()) return kExitFailed;
+    Connection agent(std::move(socket), options);
+    if (!agent.begin(*secret)) continue;
+    if (!options.script.empty()) return runScript(agent, options.script);
+    converse(agent);
+    if (typing_ended) return 0;
+    std::printf("the agent has gone\n");
+    std::fflush(stdout);
+  }
+}
+
+}  // namespace
+}  // namespace lmx
+
+int main(int argc, char** argv) {
+  lmx::Options options;
+  if (!lmx::readOptions(argc, argv, options)) {
+    std::fputs(lmx::kUsage, stderr);
+    return lmx::kExitUsage;
+  }
+  return lmx::serve(options);
+}
