@@ -43,7 +43,7 @@ bool AgentControlBase::connectWithBackOff() {
     if (connect() != 1) continue;
     logInfo(
         formatted("Failed to connect to server, retrying in %d seconds.", static_cast<int>(delay.count())));
-    for (auto left = delay; left > 0s && running_; left -= 1s) clock_.sleep(1s, wakeDescriptor());
+    if (running_) clock_.sleep(delay, wakeDescriptor());  // a stop ends it at once
     delay = nextBackOff(delay);
   }
   return true;

@@ -171,34 +171,68 @@ int runScript(Connection& agent, const std::string& path) {
   return 0;
 }
 
-Connection* typed_to = nullptr;  // the line editor's callback has no argument of its own
-bool typing_ended = false;
-
-void takeTypedLine(char* line) {
-  if (line == nullptr) {
-    typing_ended = true;
-    return;
+/// What a person types, through the line editor on a terminal, as it comes from a pipe.
+class Typist {
+ public:
+  explicit Typist(Connection& agent) : terminal_(isatty(STDIN_FILENO) == 1) {
+    agent_ = &agent;
+    ended_ = false;
+    if (terminal_) rl_callback_handler_install("", take);
   }
-  if (*line != '\0') {
-    add_history(line);
-    if (!typed_to->send(line)) typing_ended = true;
+  ~Typist() {
+    if (terminal_) rl_callback_handler_remove();
   }
-  std::free(line);  // NOLINT: the line editor's contract
-}
+  Typist(const Typist&) = delete;
+  Typist& operator=(const Typist&) = delete;
 
-/// Sends what is typed and shows what comes, until either side ends.
-void converse(Connection& agent) {
-  typed_to = &agent;
-  typing_ended = false;
-  rl_callback_handler_install("", takeTypedLine);
-  while (!typing_ended) {
+  /// Standard input is readable.
+  void read() {
+    if (terminal_) return rl_callback_read_char();
+    char bytes[4096];
+    const ssize_t size = ::read(STDIN_FILENO, bytes, sizeof bytes);
+    if (size <= 0) {
+      ended_ = true;
+      return;
+    }
+    pending_.append(bytes, static_cast<std::size_t>(size));
+    for (auto end = pending_.find('\n'); end != std::string::npos; end = pending_.find('\n')) {
+      send(pending_.substr(0, end));
+      pending_.erase(0, end + 1);
+    }
+  }
+  [[nodiscard]] static bool ended() { return ended_; }
+
+ private:
+  static void send(const std::string& line) {
+    if (!line.empty() && !agent_->send(line)) ended_ = true;
+  }
+  static void take(char* line) {
+    if (line == nullptr) {
+      ended_ = true;
+      return;
+    }
+    if (*line != '\0') add_history(line);
+    send(line);
+    std::free(line);  // NOLINT: the line editor's contract
+  }
+
+  static inline Connection* agent_ = nullptr;  // the line editor's callback has no argument of its own
+  static inline bool ended_ = false;
+  bool terminal_;
+  std::string pending_;
+};
+
+/// Sends what is typed and shows what comes, until either side ends. @return whether it was the person
+bool converse(Connection& agent) {
+  Typist typist(agent);
+  while (!Typist::ended()) {
     pollfd polled[2] = {{agent.descriptor(), POLLIN, 0}, {STDIN_FILENO, POLLIN, 0}};
     if (::poll(polled, 2, -1) < 0) break;
     if (polled[0].revents != 0 && !agent.show(kReplyPatience)) break;
     while (agent.hasLine()) agent.show(kReplyPatience);
-    if (polled[1].revents != 0) rl_callback_read_char();
+    if (polled[1].revents != 0) typist.read();
   }
-  rl_callback_handler_remove();
+  return Typist::ended();
 }
 
 int serve(const Options& options) {
@@ -222,8 +256,7 @@ int serve(const Options& options) {
     Connection agent(std::move(socket), options);
     if (!agent.begin(*secret)) continue;
     if (!options.script.empty()) return runScript(agent, options.script);
-    converse(agent);
-    if (typing_ended) return 0;
+    if (converse(agent)) return 0;
     std::printf("the agent has gone\n");
     std::fflush(stdout);
   }
