@@ -250,6 +250,29 @@ def test_cluster_members_are_tried_in_turn(agent):
     listener.close()
 
 
+@pytest.mark.parametrize("form", [plistlib.FMT_XML, plistlib.FMT_BINARY])
+def test_long_answers_in_both_forms(agent, form):
+    information = {"cluster_members": members(("127.0.0.1", "9001")), "notes": [f"{i:080}" for i in range(2500)]}
+    answer = plistlib.dumps(information, fmt=form)
+    assert len(answer) > 3 * 65536, "more than a pipe holds"
+    agent.set_tool({"when": "--listinfo", "print_hex": answer.hex()})
+    agent.start()
+    agent.log.wait("^Hosts: 127.0.0.1:9001$", level=7)
+
+
+@pytest.mark.limit(60)
+def test_the_start_waits_half_a_minute_for_the_tool_at_most(agent):
+    cache = agent.path("/var/lmx/agent/com.zandor.lmxserverinfo.plist")
+    cache.write_bytes(plistlib.dumps({"cluster_members": members(("127.0.0.1", "1"), ("127.0.0.1", "2"))}))
+    agent.set_tool({"when": "--listinfo", "hang": True})
+    begin = time.monotonic()
+    agent.start(wait=False)
+    agent.log.wait("^/usr/bin/lumex --listinfo has not answered for 20 seconds and was ended$", timeout=25)
+    agent.wait_started(20)
+    assert 28 < time.monotonic() - begin < 34
+    agent.log.wait("^Hosts: 127.0.0.1:1, 127.0.0.1:2$", level=7)
+
+
 def test_a_v6_member(agent):
     answer = plistlib.dumps({"cluster_members": members(("::1", "9001"))}, fmt=plistlib.FMT_XML).decode()
     agent.set_tool({"when": "--listinfo", "print": answer})

@@ -46,6 +46,8 @@ def main():
     note({"event": "begin", "arguments": arguments, "time": time.time(), "pid": os.getpid()})
     sys.stdout.write(rule.get("print", ""))
     sys.stdout.flush()
+    sys.stdout.buffer.write(bytes.fromhex(rule.get("print_hex", "")))
+    sys.stdout.flush()
     time.sleep(rule.get("delay", 0))
     while rule.get("hang") and not os.path.exists(PLACE + "/release"):
         time.sleep(0.05)
