@@ -8,7 +8,7 @@ if(LMX_SANITIZE)
   target_compile_options(project_flags INTERFACE -fsanitize=${LMX_SANITIZE} -fno-omit-frame-pointer -O1)
   target_link_options(project_flags INTERFACE -fsanitize=${LMX_SANITIZE})
   # GCC 12 reports std::optional members under a sanitizer that it does not report without; release keeps the check.
-  target_compile_options(project_flags INTERFACE -Wno-maybe-uninitialized)
+  target_compile_options(project_flags INTERFACE $<$<CXX_COMPILER_ID:GNU>:-Wno-maybe-uninitialized>)
   if(LMX_SANITIZE MATCHES undefined)
     target_compile_options(project_flags INTERFACE -fno-sanitize-recover=undefined)
   endif()
