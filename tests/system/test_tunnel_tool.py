@@ -45,6 +45,13 @@ def test_typed_lines(running):
         assert tool.wait(10) == 0
 
 
+def test_lines_from_a_pipe_are_all_answered(running):
+    with start_tool(running, stdin=subprocess.PIPE) as tool:
+        output, _ = tool.communicate("STATUS\n", timeout=30)
+    assert tool.returncode == 0
+    assert output.splitlines()[-1].startswith("< cmdStatus=0,recordStatus=0,")
+
+
 @pytest.mark.parametrize("arguments", [[], ["--secret"], ["--secret", "x", "--listen", "nonsense"], ["--nothing"]])
 def test_usage(arguments):
     result = subprocess.run([TOOL, *arguments], capture_output=True, text=True, check=False)

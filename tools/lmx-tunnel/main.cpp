@@ -103,8 +103,10 @@ class Connection {
 
   bool send(const std::string& command) {
     const auto line = cipher_->encrypted(command);
-    return line && ::send(socket_.get(), line->data(), line->size(), MSG_NOSIGNAL) ==
-                       static_cast<ssize_t>(line->size());
+    if (!line) return false;
+    if (getsReply(command)) ++awaited_;
+    return ::send(socket_.get(), line->data(), line->size(), MSG_NOSIGNAL) ==
+           static_cast<ssize_t>(line->size());
   }
 
   /// Shows the next line. @return false when none came in time or the agent has gone
@@ -119,8 +121,11 @@ class Connection {
       std::printf("preview of %zu bytes saved to %s\n", picture->size(), options_.preview.c_str());
     }
     std::fflush(stdout);
+    if (awaited_ > 0) --awaited_;
     return true;
   }
+  /// Whether a command that was sent is still to be answered.
+  [[nodiscard]] bool awaitsReply() const { return awaited_ > 0; }
   [[nodiscard]] bool hasLine() const { return buffer_.find('\n') != std::string::npos; }
 
  private:
@@ -145,6 +150,7 @@ class Connection {
   const Options& options_;
   std::optional<TunnelCipher> cipher_;
   std::string buffer_;
+  int awaited_ = 0;
 };
 
 /// @return the exit status
@@ -231,6 +237,8 @@ bool converse(Connection& agent) {
     if (polled[0].revents != 0 && !agent.show(kReplyPatience)) break;
     while (agent.hasLine()) agent.show(kReplyPatience);
     if (polled[1].revents != 0) typist.read();
+  }
+  while (Typist::ended() && agent.awaitsReply() && agent.show(kReplyPatience)) {
   }
   return Typist::ended();
 }
