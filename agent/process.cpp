@@ -4,6 +4,7 @@
 #include <malloc.h>
 
 #include <clocale>
+#include <memory>
 
 #include "agent/agent_main.h"
 #include "platform/log.h"
@@ -23,14 +24,17 @@ std::shared_ptr<ServiceManager> newServiceManager() {
 int runAgent(int argc, char** argv, std::shared_ptr<CaptureFramework> framework) {
   // The character type alone: numbers in replies must keep their decimal point.
   if (std::setlocale(LC_CTYPE, "C.UTF-8") == nullptr) return kExitOperatingSystem;
-  auto* agent = new AgentMain(newAgentContext(),  // NOLINT: lives until the process ends
-                              {std::move(framework), newServiceManager(), &systemChildRunner()});
+  // Never destroyed: it lives until the process ends.
+  AgentMain& agent = *std::make_unique<AgentMain>(
+                          newAgentContext(),
+                          AgentEnvironment{std::move(framework), newServiceManager(), &systemChildRunner()})
+                          .release();
   const heap_ptr<TimeValue> launched(lmp_gettimeofday());
   if (!launched) return kExitOperatingSystem;
-  agent->agentContext()->setLaunch_time(*launched);
-  agent->agentContext()->setRunning(true);
+  agent.agentContext()->setLaunch_time(*launched);
+  agent.agentContext()->setRunning(true);
   int exitCode = 0;
-  return agent->parseArgs(argv, argc, &exitCode) ? agent->startup() : exitCode;
+  return agent.parseArgs(argv, argc, &exitCode) ? agent.startup() : exitCode;
 }
 
 }  // namespace

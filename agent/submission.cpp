@@ -28,8 +28,8 @@ SharedDictionary propertiesOf(const AgentContext& context, const AgentRecord& st
 /// What describes it. A START that was refused meanwhile has taken over the request, and with it what is
 /// submitted; the metadata may still be those of the first.
 SharedDictionary metadataOf(const AgentContext& context, const AgentRecord& stopped) {
-  if (const SharedDictionary own = stopped.request_properties()) return own;
-  const SharedDictionary prepared = stopped.metadata();
+  if (SharedDictionary own = stopped.request_properties()) return own;
+  SharedDictionary prepared = stopped.metadata();
   return prepared ? prepared : context.properties();
 }
 

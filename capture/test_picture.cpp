@@ -56,7 +56,8 @@ std::uint32_t readFrameNumber(const LumaPlane& plane) {
   const int row = plane.height / 36;
   std::uint32_t number = 0;
   for (int bit = 0; bit < 32; ++bit) {
-    const auto at = static_cast<std::size_t>(row * plane.stride + bit * cell + cell / 2);
+    const auto at = static_cast<std::size_t>(row) * static_cast<std::size_t>(plane.stride) +
+                    static_cast<std::size_t>(bit * cell + cell / 2);
     number = number << 1 | (plane.bytes[at] > 127 ? 1U : 0U);
   }
   return number;

@@ -59,7 +59,8 @@ void draw(GstBuffer* buffer, const Probe& probe) {
     auto* chroma = static_cast<std::uint8_t*>(GST_VIDEO_FRAME_PLANE_DATA(&frame, component));
     for (int row = 0; row < height; ++row) {
       const bool grey = row < height / 18 || row > height - height / 6;
-      if (grey) std::memset(chroma + row * step, 128, static_cast<std::size_t>(width));
+      if (grey)
+        std::memset(chroma + static_cast<std::ptrdiff_t>(row) * step, 128, static_cast<std::size_t>(width));
     }
   }
   gst_video_frame_unmap(&frame);

@@ -147,7 +147,7 @@ bool RunLoop::post(Action action, Wait wait) {
       impl_->ring();
     }
   }
-  if (inline_run) runGuarded(action);
+  if (inline_run) runGuarded(action);  // NOLINT: moved from only when it is not run here
   return waiter == nullptr || waiter->wait();
 }
 
