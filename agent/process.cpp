@@ -25,10 +25,11 @@ int runAgent(int argc, char** argv, std::shared_ptr<CaptureFramework> framework)
   // The character type alone: numbers in replies must keep their decimal point.
   if (std::setlocale(LC_CTYPE, "C.UTF-8") == nullptr) return kExitOperatingSystem;
   // Never destroyed: it lives until the process ends.
-  AgentMain& agent = *std::make_unique<AgentMain>(
-                          newAgentContext(),
-                          AgentEnvironment{std::move(framework), newServiceManager(), &systemChildRunner()})
-                          .release();
+  static AgentMain& agent =
+      *std::make_unique<AgentMain>(
+           newAgentContext(),
+           AgentEnvironment{std::move(framework), newServiceManager(), &systemChildRunner()})
+           .release();
   const heap_ptr<TimeValue> launched(lmp_gettimeofday());
   if (!launched) return kExitOperatingSystem;
   agent.agentContext()->setLaunch_time(*launched);
