@@ -121,9 +121,19 @@ void AgentMain::handOff(const std::shared_ptr<AgentRecord>& stopped, const std::
   if (!context_->running()) return;
   const std::string request = stopped->request_uuid();
   const auto error = controller->processRequestWithUUID(request, path);
+  // The session, unless it has gone on to another capture.
+  const auto own_session = [&]() -> std::shared_ptr<AgentRecord> {
+    auto record = session();
+    return record && record->captureController() == controller ? record : nullptr;
+  };
+  const auto leave_error = [&] {
+    if (const auto record = own_session()) record->setError(kRecordCannotWrite);
+  };
   if (const auto cause = controller->lastError()) {
     LMPLogMessage(context_->log_context(), kLogError, "The capture of \"%s\" ended early: %s", path.c_str(),
                   cause->message.c_str());
+    // A lost device has its own way; what is left is a disk or an encoder that failed.
+    if (!meansDeviceLost(cause)) leave_error();
   }
   if (!error) {
     stopped->setStopTime(shiftedNow(*context_));
@@ -133,8 +143,7 @@ void AgentMain::handOff(const std::shared_ptr<AgentRecord>& stopped, const std::
     LMPLogMessage(context_->log_context(), kLogCritical, "The recording could not be finished: %s",
                   error->message.c_str());
     recordRuntimeErrorCallback(kRecordCannotWrite);
-    const auto record = session();
-    if (record && record->captureController() == controller) record->setError(kRecordCannotWrite);
+    leave_error();
   }
   if (context_->running()) {
     // A movie that could not be written stays in the capture's folder: the next start tries again.
@@ -142,8 +151,7 @@ void AgentMain::handOff(const std::shared_ptr<AgentRecord>& stopped, const std::
       controller->requestHandedOver(request);
       keepRecovered(controller->recoverAbandonedRequests());
     }
-    const auto record = session();
-    if (record && record->captureController() == controller) setRecorderStatusToIdle();
+    if (own_session()) setRecorderStatusToIdle();
   }
 }
 

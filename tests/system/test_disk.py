@@ -5,6 +5,7 @@ import time
 
 from harness import movie
 from harness.agent import REPOSITORY
+from harness.waiting import wait_until
 
 
 def fill(agent, leave=0):
@@ -73,6 +74,7 @@ def test_a_repository_that_fills_up_in_the_middle(agent):
     line = agent.log.wait(r"(?i)space", timeout=30, after=mark)
     assert line.level <= 4
     assert agent.command("STATUS").fields["cmdStatus"] == "0"
+    wait_until(lambda: agent.command("STATUS").fields["lastError"] == "8", 10, "the error in the status")
     filler.unlink()
     agent.command("STOP")
     time.sleep(1)

@@ -263,6 +263,23 @@ TEST_F(StoppedRecording, ThatEndedByItselfIsSubmittedThoughItsReportIsStillToCom
   EXPECT_EQ(nextJob()->getProperty("RecordingMetadata_RECORDING_UUID"), "R2");
 }
 
+TEST_F(StoppedRecording, ThatEndedForWantOfSpaceLeavesItsError) {
+  const auto controller = start("R1");
+  controller->error = CaptureError{CaptureError::kDomain, kWriteFailed, "no space"};
+  stopAndReport(controller);
+  ASSERT_NE(nextJob(), nullptr) << "what was written is submitted";
+  EXPECT_TRUE(testing::waitUntil([&] { return session_->error() == kRecordCannotWrite; }));
+  EXPECT_TRUE(log_.contains(3, "The capture of \"" + movie("R1.mov") + "\" ended early: no space"));
+}
+
+TEST_F(StoppedRecording, OfALostDeviceLeavesNoDiskError) {
+  const auto controller = start("R1");
+  controller->error = CaptureError{CaptureError::kDomain, kDeviceNotFound, "gone"};
+  stopAndReport(controller);
+  ASSERT_NE(nextJob(), nullptr);
+  EXPECT_EQ(session_->error(), kRecordSuccess);
+}
+
 TEST_F(StoppedRecording, IsDescribedByTheRequestThatTookItOver) {
   const auto controller = start("R1", {{"RecordingMetadata_TITLE", "First"}});
   session_->setDiskSpaceCutoffInMB(0xFFFFFFFFU);
