@@ -1,4 +1,4 @@
-// Gathering what the document says.
+// Gathering what goes into the properties document.
 #include "postprocess/agent_submit.h"
 
 #include "platform/log.h"

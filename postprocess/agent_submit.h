@@ -45,7 +45,8 @@ class AgentSubmit {
   /// false when either is absent or the name is already there: an existing value is never replaced.
   bool addValue(const Text& value, const Text& name);
 
-  /// Gathers everything the document says. A failure is logged and ends the gathering; what is there stays.
+  /// Gathers everything for the properties document. A failure is logged and ends the gathering; what is
+  /// there stays.
   /// @param duration  whole seconds of media
   void setPropertyValuesWithContext(std::shared_ptr<AgentContext> context, const Text& recording_file_path,
                                     std::optional<TimeValue> started_date,

@@ -20,7 +20,7 @@ G_DEFINE_TYPE(TestCamera, test_camera, GST_TYPE_BIN)
 
 enum Property { kNoProperty, kSize };
 
-void setProperty(GObject* object, guint property, const GValue* value, GParamSpec* /*spec*/) {
+void setProperty(GObject* object, guint property, const GValue* value, GParamSpec*) {
   const char* size = g_value_get_string(value);
   if (property != kSize || size == nullptr) return;
   lmx::attachTestPicture(GST_ELEMENT(object), lmx::parseDeviceID(std::string("test://video?size=") + size));
