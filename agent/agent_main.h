@@ -21,7 +21,6 @@
 #include "control/client_connect.h"
 #include "control/detached_channel.h"
 #include "platform/child_process.h"
-#include "platform/network_watcher.h"
 #include "platform/run_loop.h"
 #include "platform/service_manager.h"
 #include "platform/signals.h"
@@ -128,6 +127,7 @@ class AgentMain : public AgentActions {
   void shutDownControlBecauseDeviceFailed() override;
   void submitStoppedRecording() override;
   void scheduleTimedCommand(SharedDictionary entry, std::time_t date, ChannelKind channel) override;
+  [[nodiscard]] std::unique_ptr<RunLoop::Source> watchNetwork(std::function<void()> changed) override;
   void captureDidComplete(const void* controller) override;
   void captureDidCancel(const void* controller) override;
   void recordDidStartWithFile(const std::string& file, const SharedDictionary& metadata,
@@ -170,8 +170,6 @@ class AgentMain : public AgentActions {
   // The tunnel (tunnel.cpp). Main thread.
   bool openTunnel();
   void closeTunnel();
-  /// Has the tunnel reconnect when an address comes or goes.
-  void watchNetwork();
   /// Leaves word with a server that understands it: a last hello that says offline. Ten seconds at most.
   void tellServerOfTheEnd();
   int stopSequence(Start result, int status);
@@ -217,8 +215,6 @@ class AgentMain : public AgentActions {
   std::unique_ptr<AgentControlUnix> agentControlLocal_;
   std::atomic<bool> cluster_refresh_{false};
   std::unique_ptr<RunLoop::Source> clusterInfoTimer_;
-  NetworkWatcher network_;
-  std::unique_ptr<RunLoop::Source> networkSource_;
   Schedule schedule_;
   DetachedChannel detached_;
   std::unique_ptr<RunLoop::Source> diskSpaceTimer_;

@@ -98,7 +98,6 @@ AgentMain::Start AgentMain::startServices() {
                   "Internal error occurred creating post-process scheduler thread");
     return Start::fatal;
   }
-  watchNetwork();
   if (!device_offline_ && !openTunnel()) return Start::fatal;
   agentControlLocal_ = newControlChannel<AgentControlUnix>(context_, this);
   if (!agentControlLocal_) {

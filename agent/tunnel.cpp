@@ -1,10 +1,20 @@
 // Life of the server tunnel.
 #include "agent/agent_main.h"
 #include "platform/log.h"
+#include "platform/network_watcher.h"
 
 namespace lmx {
 
 using namespace std::chrono_literals;
+
+namespace {
+
+struct NetworkWatch final : RunLoop::Source {
+  NetworkWatcher watcher;
+  std::unique_ptr<RunLoop::Source> source;  // last: it goes before the descriptor
+};
+
+}  // namespace
 
 bool AgentMain::openTunnel() {
   agentControl_ = newControlChannel<AgentControl>(context_, this);
@@ -30,16 +40,14 @@ void AgentMain::tellServerOfTheEnd() {
   closeTunnel();
 }
 
-void AgentMain::watchNetwork() {
-  if (network_.open() != 0) {
-    LMPLogMessage(context_->log_context(), kLogError,
-                  "Unable to create dynamic store for Netvane registration for Network Notification");
-    LMPLogMessage(context_->log_context(), kLogError, "Unable to register for network notifications");
-    return;
-  }
-  networkSource_ = loop_.watchReadable(network_.descriptor(), [this] {
-    if (network_.takeChanges() && agentControl_) agentControl_->networkChanged();
-  });
+std::unique_ptr<RunLoop::Source> AgentMain::watchNetwork(std::function<void()> changed) {
+  auto watch = std::make_unique<NetworkWatch>();
+  if (watch->watcher.open() != 0) return nullptr;
+  watch->source = loop_.watchReadable(watch->watcher.descriptor(),
+                                      [&watcher = watch->watcher, changed = std::move(changed)] {
+                                        if (watcher.takeChanges()) changed();
+                                      });
+  return watch;
 }
 
 }  // namespace lmx

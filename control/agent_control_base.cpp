@@ -33,6 +33,7 @@ AgentControlBase::~AgentControlBase() {
 
 bool AgentControlBase::initWithAgentContext() {
   LMPLogMessage(logContext(), kLogNotice, "Control module is starting...");
+  if (registerForNetworkChange() == -1) return false;
   if (!clock_.now()) {  // without the time a lost server would never be noticed
     LMPLogMessage(logContext(), kLogCritical, "Internal error occurred");
     return false;
@@ -64,6 +65,16 @@ void AgentControlBase::threadBody() noexcept {
   }
   thread_id_ = std::thread::id();  // the system may give it to another thread from now on
   thread_ended_ = true;
+}
+
+int AgentControlBase::registerForNetworkChange() {
+  if (actions_ == nullptr) return 0;
+  network_watch_ = actions_->watchNetwork([this] { networkChanged(); });
+  if (network_watch_) return 0;
+  LMPLogMessage(logContext(), kLogError,
+                "Unable to create dynamic store for Netvane registration for Network Notification");
+  LMPLogMessage(logContext(), kLogError, "Unable to register for network notifications");
+  return -1;
 }
 
 void AgentControlBase::networkChanged() {

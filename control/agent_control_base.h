@@ -59,9 +59,9 @@ class AgentControlBase {
   int configure(const Dictionary* parameters);
   /// Numeric address of the first address of `host`; empty when it doesn't resolve. Blocks on the resolver.
   [[nodiscard]] static std::string dnsResolveName(const std::string& host);
-  /// The network has changed: the connection is made anew a second later. Thread-safe. For the tunnel; a
-  /// listener's peers are on this machine or reconnect by themselves.
-  void networkChanged();
+  /// Asks to be told when the network changes: the connection is then made anew a second later. Main thread.
+  /// @return 0, or -1 when it can't be watched (logged)
+  [[nodiscard]] int registerForNetworkChange();
 
   /// Whether the current connection's peer is still there.
   [[nodiscard]] bool connected() const;
@@ -137,7 +137,8 @@ class AgentControlBase {
   /// The thread's body: connect, receive, reconnect. @return 0, or -1 when the channel could not be set up.
   virtual int run();
 
-  /// Waits for a peer on `listening` and makes it the connection.
+  /// Waits for a peer on `listening` and makes it the connection. The previous peer becomes it again when it
+  /// speaks before another one comes.
   /// @return 0; -1 when none was accepted, or when the listening socket refused the keep-alive option.
   int acceptPeer(int listening);
   /// Whether it was the peer that ended the last connection. Channel thread.
@@ -156,6 +157,7 @@ class AgentControlBase {
   [[nodiscard]] AgentActions* actions() const { return actions_; }
 
  private:
+  void networkChanged();
   void threadBody() noexcept;
   bool onOwnThread() const { return thread_id_.load() == std::this_thread::get_id(); }
   bool waitForThread();
@@ -179,6 +181,7 @@ class AgentControlBase {
   [[nodiscard]] double shiftedReferenceTime() const;
 
   void closeOnce(std::atomic<int>& socket);
+  bool takeBackPreviousPeer();
 
   std::mutex send_mutex_;
   ChannelClock& clock_;
@@ -191,7 +194,8 @@ class AgentControlBase {
   std::atomic<std::int64_t> netTransitionTime_{0};
   LineAssembler partial_command_;  // channel thread only, as the next
   bool peer_has_gone_ = false;
-  UniqueFd wake_;  // eventfd, written once by stop
+  UniqueFd wake_;                                   // eventfd, written once by stop
+  std::unique_ptr<RunLoop::Source> network_watch_;  // main thread only
 
   std::atomic<bool> thread_ended_{true};
   std::atomic<std::thread::id> thread_id_{};

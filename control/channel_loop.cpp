@@ -67,6 +67,7 @@ bool AgentControlBase::networkHasChanged() {
   if (!now || now->tv_sec <= changed) return false;
   // A change that is reported right now keeps its place.
   netTransitionTime_.compare_exchange_strong(changed, 0);
+  logDebug("The connection is made anew after a network change");
   return true;
 }
 
@@ -103,9 +104,26 @@ bool AgentControlBase::receivePacket(int socket) {
   return true;
 }
 
+/// Puts the previous peer in its place again if it has said something. @return whether it has
+bool AgentControlBase::takeBackPreviousPeer() {
+  char next = 0;
+  if (::recv(serverSocketDumped_, &next, 1, MSG_PEEK | MSG_DONTWAIT) <= 0) return false;
+  logDebug("The previous peer speaks again");
+  setServerSocket(serverSocketDumped_.exchange(-1));
+  return true;
+}
+
 int AgentControlBase::acceptPeer(int listening) {
+  // A peer that lost its place to a change of the network, or to ten minutes without a command, knows nothing
+  // of that: its STOP must not be lost.
+  int previous = serverSocketDumped_;
   Readiness readiness = Readiness::interrupted;
-  while (readiness == Readiness::interrupted) readiness = awaitReadable(listening, wakeDescriptor(), -1ms);
+  while (readiness == Readiness::interrupted || readiness == Readiness::otherReadable) {
+    readiness = awaitReadable(listening, wakeDescriptor(), -1ms, previous);
+    if (readiness != Readiness::otherReadable) continue;
+    if (takeBackPreviousPeer()) return 0;
+    previous = -1;  // it has gone
+  }
   if (readiness == Readiness::woken) return -1;
 
   const int peer = ::accept4(listening, nullptr, nullptr, SOCK_CLOEXEC);

@@ -42,12 +42,13 @@ int sendWhole(int socket, std::string_view bytes, std::chrono::milliseconds pati
   }
 }
 
-Readiness awaitReadable(int descriptor, int wake, std::chrono::milliseconds limit) {
-  std::array<pollfd, 2> waited{{{descriptor, POLLIN, 0}, {wake, POLLIN, 0}}};
+Readiness awaitReadable(int descriptor, int wake, std::chrono::milliseconds limit, int other) {
+  std::array<pollfd, 3> waited{{{descriptor, POLLIN, 0}, {wake, POLLIN, 0}, {other, POLLIN, 0}}};
   const int ready = ::poll(waited.data(), waited.size(), static_cast<int>(limit.count()));
   if (ready < 0) return errno == EINTR ? Readiness::interrupted : Readiness::failed;
   if (waited[1].revents != 0) return Readiness::woken;
   if (ready == 0) return Readiness::timedOut;
+  if (waited[2].revents != 0) return Readiness::otherReadable;
   return (waited[0].revents & POLLNVAL) != 0 ? Readiness::badDescriptor : Readiness::readable;
 }
 

@@ -15,7 +15,8 @@ int sendWhole(int socket, std::string_view bytes, std::chrono::milliseconds pati
 
 /// What a wait for a readable descriptor came to.
 enum class Readiness {
-  readable,  ///< data, end of stream or an error to fetch
+  readable,       ///< data, end of stream or an error to fetch
+  otherReadable,  ///< the same of `other`; it comes first
   timedOut,
   woken,        ///< `wake` is readable
   interrupted,  ///< a signal came first
@@ -23,8 +24,10 @@ enum class Readiness {
   failed,
 };
 
-/// Waits once until `descriptor` is readable. @param limit  negative: no limit
-Readiness awaitReadable(int descriptor, int wake, std::chrono::milliseconds limit);
+/// Waits once until `descriptor` or `other` is readable.
+/// @param limit  negative: no limit
+/// @param other  negative: none
+Readiness awaitReadable(int descriptor, int wake, std::chrono::milliseconds limit, int other = -1);
 
 /// Whether the peer of `socket` is still there: it has neither hung up nor closed its sending side.
 /// Linux reports the latter as POLLRDHUP only, so without it a closed peer would look connected for ever.

@@ -2,6 +2,7 @@
 #pragma once
 #include <cstdint>
 #include <ctime>
+#include <functional>
 #include <memory>
 #include <optional>
 #include <string>
@@ -58,6 +59,11 @@ class AgentActions {
   /// Has `entry` run at `date` (seconds since 1970, wall clock) by the channel of that kind, on the main
   /// thread. Any thread.
   virtual void scheduleTimedCommand(SharedDictionary entry, std::time_t date, ChannelKind channel) = 0;
+
+  /// Has `changed` called on the main thread whenever an IPv4 address of this machine comes or goes, for as
+  /// long as the result lives. Main thread, as the destruction of the result.
+  /// @return null when the network can't be watched
+  [[nodiscard]] virtual std::unique_ptr<RunLoop::Source> watchNetwork(std::function<void()> changed) = 0;
 
   // Callbacks of the engine, any thread. They do nothing once the context's `running` is NO.
   virtual void recordDidStartWithFile(const std::string& file, const SharedDictionary& metadata,

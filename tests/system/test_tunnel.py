@@ -9,7 +9,7 @@ import time
 
 import pytest
 from harness import movie
-from harness.agent import DEFAULTS, SECRET
+from harness.agent import DEFAULTS, SECRET, exchange
 from harness.tunnel_server import TunnelServer, cipher, in_network_of
 from harness.waiting import wait_until
 
@@ -232,7 +232,18 @@ def test_a_network_change_reconnects(agent, server):
     before = agent.log.mark()
     in_network(agent, "ip", "addr", "del", "192.0.2.7/24", "dev", "lo")
     server.accept(8)
-    assert len(agent.log.lines("network transition", after=before)) == 1
+    assert len(agent.log.lines("network transition", after=before)) == 2, "one line a channel"
+
+
+def test_a_local_client_keeps_its_stop_across_a_network_change(agent, server):
+    with agent.connect() as local:
+        assert exchange(local, START.format("R1")).text == "cmdStatus=0"
+        before = agent.log.mark()
+        in_network(agent, "ip", "addr", "add", "192.0.2.7/24", "dev", "lo")
+        server.accept(8)
+        agent.log.wait("made anew after a network change", after=before, count=2)  # the tunnel's and this one
+        assert exchange(local, "STOP").text == "cmdStatus=0"
+    agent.wait_tool_call("R1")
 
 
 def members(*hosts):

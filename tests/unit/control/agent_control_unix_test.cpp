@@ -235,6 +235,40 @@ TEST_F(LocalSocket, LineAByteAtATimeIsExecutedOnce) {
   EXPECT_EQ(log_.count(7, "Command is [STOP]"), 1);
 }
 
+TEST_F(LocalSocket, APeerThatLostItsPlaceToANetworkChangeIsHeardAgain) {
+  Peer peer;
+  actions_.network_changed();
+  channel_->setNetTransitionTime(1);  // long ago
+  peer.send("ST");                    // the connection in hand is given up behind it
+  peer.send("OP\n");
+  EXPECT_EQ(peer.receiveUpTo("cmdStatus=0"), "cmdStatus=0");
+  EXPECT_TRUE(log_.contains(7, "The previous peer speaks again"));
+  EXPECT_EQ(journal_.entries(), std::vector<std::string>{"stopRecording"});
+}
+
+TEST_F(LocalSocket, APeerThatLostItsPlaceMakesRoomForTheNext) {
+  Peer first;
+  first.send("x\n");
+  ASSERT_TRUE(log_.waitFor(3, "Unknown command [x]"));
+  channel_->setNetTransitionTime(1);
+  ASSERT_TRUE(log_.waitFor(7, "The connection is made anew after a network change"));
+  Peer second;
+  second.send("STOP\n");
+  EXPECT_EQ(second.receiveUpTo("cmdStatus=0"), "cmdStatus=0");
+  EXPECT_TRUE(first.isClosed());
+}
+
+TEST_F(LocalSocket, APeerThatIsGoneWithItsPlaceCostsNothing) {
+  channel_->setNetTransitionTime(1);  // the first peer loses its place as soon as it has it
+  {
+    const Peer first;
+    ASSERT_TRUE(log_.waitFor(7, "The connection is made anew after a network change"));
+  }
+  Peer second;
+  second.send("STOP\n");
+  EXPECT_EQ(second.receiveUpTo("cmdStatus=0"), "cmdStatus=0");
+}
+
 TEST_F(LocalSocket, TenMegabytesWithoutALineFeedLeaveTheChannelUsable) {
   Peer peer;
   const std::string block(1U << 20, 'x');

@@ -12,6 +12,7 @@
 #include "control/back_off.h"
 #include "tests/unit/control/scripted_channel.h"
 #include "tests/unit/doubles/log_capture.h"
+#include "tests/unit/doubles/scripted_actions.h"
 
 namespace lmx {
 namespace {
@@ -19,6 +20,7 @@ namespace {
 using namespace std::chrono_literals;
 using testing::Journal;
 using testing::LogCapture;
+using testing::ScriptedActions;
 using testing::ScriptedChannel;
 using testing::TurnedClock;
 using Lines = std::vector<std::string>;
@@ -123,7 +125,9 @@ class Lifecycle : public ::testing::Test {
   TurnedClock clock_;
   Connections connections_;
   std::shared_ptr<AgentContext> context_ = newAgentContext();
-  ScriptedChannel channel_{context_, nullptr, clock_};
+  Journal journal_;
+  ScriptedActions actions_{journal_};
+  ScriptedChannel channel_{context_, &actions_, clock_};
 };
 
 TEST_F(Lifecycle, StartIsLogged) {
@@ -133,10 +137,20 @@ TEST_F(Lifecycle, StartIsLogged) {
 }
 
 TEST_F(Lifecycle, ANetworkTransitionIsLoggedAndNoted) {
-  channel_.networkChanged();
+  start();
+  actions_.network_changed();
   EXPECT_TRUE(log_.contains(6, "A network transition was received."));
   EXPECT_NEAR(static_cast<double>(channel_.netTransitionTime()), static_cast<double>(std::time(nullptr)),
               2.0);
+}
+
+TEST_F(Lifecycle, NoChannelWithoutNewsOfTheNetwork) {
+  actions_.network_can_be_watched = false;
+  EXPECT_FALSE(channel_.initWithAgentContext());
+  EXPECT_TRUE(
+      log_.contains(3, "Unable to create dynamic store for Netvane registration for Network Notification"));
+  EXPECT_TRUE(log_.contains(3, "Unable to register for network notifications"));
+  EXPECT_FALSE(log_.contains(5, "Control module started with success"));
 }
 
 TEST_F(Lifecycle, NoChannelWithoutTheTime) {

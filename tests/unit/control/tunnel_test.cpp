@@ -115,7 +115,7 @@ TEST_F(Tunnel, AThousandReconnectsLeakNoDescriptor) {
 TEST_F(Tunnel, TheOldConnectionIsClosedOnlyBehindTheNewOne) {
   ASSERT_TRUE(tunnel_.initWithAgentContext());
   const UniqueFd old = acceptWithHello();
-  tunnel_.networkChanged();
+  actions_.network_changed();
   clock_.ahead_seconds = 2;
   const UniqueFd peer = acceptWithHello();
   pollfd polled{old.get(), POLLIN, 0};

@@ -50,6 +50,13 @@ class ScriptedActions : public AgentActions {
     note("scheduleTimedCommand " + lookUp(entry, "command").value_or("(none)"));
     scheduled.push_back({std::move(entry), date, channel});
   }
+  [[nodiscard]] std::unique_ptr<RunLoop::Source> watchNetwork(std::function<void()> changed) override {
+    if (!network_can_be_watched) return nullptr;
+    network_changed = std::move(changed);
+    return std::make_unique<RunLoop::Source>();
+  }
+  bool network_can_be_watched = true;
+  std::function<void()> network_changed;  ///< of the last watch
   struct Scheduled {
     SharedDictionary entry;
     std::time_t date;
