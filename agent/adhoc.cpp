@@ -53,6 +53,12 @@ int AgentMain::recordAdHoc(ClientConnect& client) {
   std::string reply;
   client.execCommand("STOP \n", &reply, [end] { return std::chrono::steady_clock::now() < end; });
   say("sent STOP, received: ", orEmpty(reply));
+  if (reply.empty()) {  // not sent again: by now it might end somebody else's recording
+    std::fputs(
+        "lmxagentd: the daemon has not answered the STOP, the recording may still be running; ask it with "
+        "--status\n",
+        stderr);
+  }
   return result;
 }
 

@@ -63,6 +63,18 @@ def test_a_recording_until_an_interrupt(running):
     assert not running.tool_calls(), "the submission was disabled"
 
 
+def test_a_stop_that_nobody_answers_is_said(running):
+    mark = running.log.mark()
+    with running.popen("-f", OUTPUT, "-s") as client:
+        let_it_record(running, mark)
+        os.kill(running.sandbox.daemon_pid, signal.SIGSTOP)
+        interrupt(client, signal.SIGINT)
+        output, errors = client.communicate(timeout=60)
+        os.kill(running.sandbox.daemon_pid, signal.SIGCONT)
+    assert output.endswith(b"sent STOP, received: <empty>\n")
+    assert b"has not answered the STOP" in errors and client.returncode == 0
+
+
 def test_a_recording_that_is_submitted(running):
     mark = running.log.mark()
     with running.popen("-f", OUTPUT, "-u", "jane", "--password", "geheim", "-d", "5", "-Z", "7") as client:
