@@ -4,8 +4,7 @@ from dataclasses import dataclass, field
 
 import pytest
 from harness import movie
-from harness.agent import SECRET
-from harness.tunnel_server import TunnelServer
+from harness.tunnel_tool import TunnelTool
 from harness.waiting import wait_until
 
 from test_timed import at, start_parameters, stored
@@ -71,7 +70,7 @@ class Day:
         end()
         self.agent.start()
         self.server.close()
-        self.server = TunnelServer(self.agent, SECRET)
+        self.server = TunnelTool(self.agent)
         self.server.accept()
 
 
@@ -79,7 +78,7 @@ class Day:
 def test_a_scripted_day(agent):
     agent.preferences(RecordingDiskSpaceCutoffInMB="50")
     agent.start()
-    server = TunnelServer(agent, SECRET)
+    server = TunnelTool(agent)
     server.accept()
     day = Day(agent, server)
     day.lecture("L1", 0, 3)

@@ -11,6 +11,7 @@ import pytest
 from harness import movie
 from harness.agent import DEFAULTS, SECRET, exchange
 from harness.tunnel_server import TunnelServer, cipher, in_network_of
+from harness.tunnel_tool import TunnelTool
 from harness.waiting import wait_until
 
 # One line in 256 has a valid padding by chance; what comes out of it is hardly ever text, and never a command.
@@ -25,6 +26,16 @@ def server(agent):
     """A server that the agent has said hello to."""
     agent.start()
     one = TunnelServer(agent, SECRET)
+    one.accept()
+    yield one
+    one.close()
+
+
+@pytest.fixture
+def tool_server(agent):
+    """The same, played by lmx-tunnel."""
+    agent.start()
+    one = TunnelTool(agent)
     one.accept()
     yield one
     one.close()
@@ -45,7 +56,9 @@ def test_the_hello(agent, server):
     agent.log.wait("^Connected to 127.0.0.1:8175$", level=6)
 
 
-def test_a_recording_over_the_tunnel(agent, server):
+@pytest.mark.parametrize("kind", ["server", "tool_server"])
+def test_a_recording_over_the_tunnel(agent, kind, request):
+    server = request.getfixturevalue(kind)
     assert server.command(START.format("A")) == "cmdStatus=0"
     time.sleep(2)
     assert server.command("PAUSE") == "cmdStatus=0"

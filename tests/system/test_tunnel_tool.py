@@ -1,20 +1,9 @@
 """lmx-tunnel, the server's side for people, against the real daemon."""
-import os
 import subprocess
 
 import pytest
-from conftest import ROOT
 from harness.agent import DEFAULTS, SERVER_UUID
-
-TOOL = ROOT / "build/release/lmx-tunnel"
-
-
-def start_tool(agent, *arguments, **streams):
-    secret = agent.path(f"/var/lmx/agent/secrets/{SERVER_UUID}.plist")
-    user = [] if os.geteuid() == 0 else ["--user", "--preserve-credentials"]
-    return subprocess.Popen(["nsenter", "--target", str(agent.sandbox.daemon_pid), *user, "--net", "--", str(TOOL),
-                             "--secret", str(secret), *arguments],
-                            stdout=subprocess.PIPE, stderr=subprocess.PIPE, text=True, **streams)
+from harness.tunnel_tool import TOOL, TunnelTool, start_tool
 
 
 def test_a_script(running, tmp_path):
@@ -50,6 +39,65 @@ def test_lines_from_a_pipe_are_all_answered(running):
         output, _ = tool.communicate("STATUS\n", timeout=30)
     assert tool.returncode == 0
     assert output.splitlines()[-1].startswith("< cmdStatus=0,recordStatus=0,")
+
+
+def still(path):
+    """Makes a JPEG picture."""
+    subprocess.run(["ffmpeg", "-v", "error", "-f", "lavfi", "-i", "testsrc=size=320x180", "-frames:v", "1", str(path)],
+                   check=True)
+
+
+@pytest.fixture
+def with_preview(agent):
+    """An agent that has a picture to show."""
+    agent.preferences(PreviewPath="/var/preview.jpg")
+    agent.start()
+    still(agent.path("/var/preview.jpg"))
+    return agent
+
+
+def test_a_preview_is_saved(with_preview, tmp_path):
+    tool = TunnelTool(with_preview, "--preview", str(tmp_path / "seen.jpg"))
+    tool.accept()
+    reply = tool.command("STATUS include_preview=true")
+    sent = with_preview.path("/var/preview.jpg").read_bytes()
+    characters = (len(sent) + 2) // 3 * 4
+    assert reply.endswith(f",preview-size={characters},preview=({characters} characters)")
+    assert tool.line() == f"preview of {len(sent)} bytes saved to {tmp_path / 'seen.jpg'}"
+    assert (tmp_path / "seen.jpg").read_bytes() == sent
+    tool.close()
+
+
+def test_a_preview_that_cannot_be_saved_is_said(with_preview, tmp_path):
+    (tmp_path / "commands").write_text("STATUS include_preview=true\n")
+    with start_tool(with_preview, "--script", str(tmp_path / "commands"), "--preview", "/nowhere/seen.jpg") as tool:
+        _, errors = tool.communicate(timeout=30)
+    assert errors == "lmx-tunnel: /nowhere/seen.jpg: No such file or directory\n"
+
+
+def test_an_agent_that_takes_leave(running):
+    tool = TunnelTool(running)
+    tool.accept()
+    tool.send("SERVER version=2,server_uuid=" + SERVER_UUID)
+    running.log.wait("^Command: SERVER took")
+    running.sandbox.signal(15)
+    assert tool.accept()["offline"]
+    tool.close()
+
+
+def test_listening_on_v6(agent):
+    agent.preferences(TunnelHost="::1")
+    agent.start()
+    tool = TunnelTool(agent, "--listen", "[::1]:8175")
+    tool.accept()
+    assert tool.command("STATUS").startswith("cmdStatus=0,recordStatus=0,")
+    tool.close()
+
+
+def test_an_address_that_is_none_is_named(running):
+    with start_tool(running, "--listen", "hall:8175") as tool:
+        _, errors = tool.communicate(timeout=30)
+    assert (tool.returncode, errors) == (1, "lmx-tunnel: can't listen on hall:8175: Name or service not known\n")
 
 
 @pytest.mark.parametrize("arguments", [[], ["--secret"], ["--secret", "x", "--listen", "nonsense"], ["--nothing"]])

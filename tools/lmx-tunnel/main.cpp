@@ -1,7 +1,6 @@
 // Plays the server for one agent at a time: shows what it says, sends it what is typed or scripted.
-#include <arpa/inet.h>
 #include <getopt.h>
-#include <netinet/in.h>
+#include <netdb.h>
 #include <poll.h>
 #include <sys/socket.h>
 #include <unistd.h>
@@ -10,7 +9,7 @@
 #include <cstdio>
 #include <cstring>
 #include <fstream>
-#include <iostream>
+#include <memory>
 #include <thread>
 
 #include <editline/readline.h>
@@ -30,7 +29,7 @@ constexpr const char* kUsage =
     "\n"
     "Waits for an agent as its server does, shows what it answers, and sends it what is typed.\n"
     "  --secret FILE    the agent's own secrets file (a property list with lmx_secret)\n"
-    "  --listen A:P     where to listen; 127.0.0.1:8175 when not given\n"
+    "  --listen A:P     where to listen; 127.0.0.1:8175 when not given; IPv6 as [::1]:8175\n"
     "  --script FILE    send the lines of FILE, one after another; \"sleep SECONDS\" waits, \"#\" begins a "
     "comment\n"
     "  --preview FILE   save the picture of a STATUS reply there\n";
@@ -48,6 +47,8 @@ bool readListen(const std::string& text, Options& options) {
   const auto port = colon == std::string::npos ? std::nullopt : scanInteger(text.substr(colon + 1));
   if (!port || *port < 1 || *port > 65535) return false;
   options.address = text.substr(0, colon);
+  if (options.address.starts_with('[') && options.address.ends_with(']'))
+    options.address = options.address.substr(1, options.address.size() - 2);
   options.port = *port;
   return true;
 }
@@ -67,16 +68,30 @@ bool readOptions(int argc, char** argv, Options& options) {
   return optind == argc && !options.secret.empty();
 }
 
-UniqueFd listenOn(const Options& options) {
-  sockaddr_in address{};
-  address.sin_family = AF_INET;
-  address.sin_port = htons(static_cast<std::uint16_t>(options.port));
-  UniqueFd socket(::socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0));
+struct AddressListDeleter {
+  void operator()(addrinfo* list) const noexcept { ::freeaddrinfo(list); }
+};
+
+/// @param problem  gets the reason for an invalid result
+UniqueFd listenOn(const Options& options, std::string& problem) {
+  addrinfo hints{};
+  hints.ai_flags = AI_NUMERICHOST | AI_PASSIVE;
+  hints.ai_socktype = SOCK_STREAM;
+  addrinfo* found = nullptr;
+  const int error =
+      ::getaddrinfo(options.address.c_str(), std::to_string(options.port).c_str(), &hints, &found);
+  if (error != 0) {
+    problem = ::gai_strerror(error);
+    return {};
+  }
+  const std::unique_ptr<addrinfo, AddressListDeleter> address(found);
+  UniqueFd socket(::socket(address->ai_family, SOCK_STREAM | SOCK_CLOEXEC, 0));
   const int on = 1;
-  if (!socket.valid() || inet_pton(AF_INET, options.address.c_str(), &address.sin_addr) != 1) return {};
   ::setsockopt(socket.get(), SOL_SOCKET, SO_REUSEADDR, &on, sizeof on);
-  if (::bind(socket.get(), reinterpret_cast<const sockaddr*>(&address), sizeof address) != 0) return {};
-  if (::listen(socket.get(), 1) != 0) return {};
+  if (::bind(socket.get(), address->ai_addr, address->ai_addrlen) != 0 || ::listen(socket.get(), 1) != 0) {
+    problem = std::strerror(errno);
+    return {};
+  }
   return socket;
 }
 
@@ -117,8 +132,7 @@ class Connection {
     std::printf("< %s\n",
                 reply ? shortened(*reply).c_str() : "(a line that does not decrypt: is the secret right?)");
     if (const auto picture = reply ? previewIn(*reply) : std::nullopt; picture && !options_.preview.empty()) {
-      std::ofstream(options_.preview, std::ios::binary) << *picture;
-      std::printf("preview of %zu bytes saved to %s\n", picture->size(), options_.preview.c_str());
+      savePreview(*picture);
     }
     std::fflush(stdout);
     if (awaited_ > 0) --awaited_;
@@ -129,6 +143,15 @@ class Connection {
   [[nodiscard]] bool hasLine() const { return buffer_.find('\n') != std::string::npos; }
 
  private:
+  void savePreview(const std::string& picture) const {
+    std::ofstream file(options_.preview, std::ios::binary);
+    if (file << picture << std::flush) {
+      std::printf("preview of %zu bytes saved to %s\n", picture.size(), options_.preview.c_str());
+    } else {
+      std::fprintf(stderr, "lmx-tunnel: %s: %s\n", options_.preview.c_str(), std::strerror(errno));
+    }
+  }
+
   std::optional<std::string> readLine(std::chrono::milliseconds patience) {
     const auto deadline = std::chrono::steady_clock::now() + patience;
     while (!hasLine()) {
@@ -250,10 +273,10 @@ int serve(const Options& options) {
     std::fprintf(stderr, "lmx-tunnel: %s: %s\n", options.secret.c_str(), problem.c_str());
     return kExitFailed;
   }
-  const UniqueFd listener = listenOn(options);
+  const UniqueFd listener = listenOn(options, problem);
   if (!listener.valid()) {
     std::fprintf(stderr, "lmx-tunnel: can't listen on %s:%d: %s\n", options.address.c_str(), options.port,
-                 std::strerror(errno));
+                 problem.c_str());
     return kExitFailed;
   }
   std::printf("listening on %s:%d\n", options.address.c_str(), options.port);
