@@ -92,13 +92,16 @@ bool CaptureController::openSource(const LMRRecordingContext& settings) {
 bool CaptureController::openFiles(const LMRRecordingContext& settings) {
   repository_ = settings.captureTempDir;
   folder_ = captureFolderOf(repository_) + "/" + settings.uuid;
-  if (const int error = mkdir_p(folder_.c_str(), 0700)) {
+  // The end of the capture before takes their common folder away when it is empty: it may go in between.
+  int error = ENOENT;
+  for (int attempt = 0; error == ENOENT && attempt < 10; ++attempt) error = mkdir_p(folder_.c_str(), 0700);
+  if (error != 0) {
     return fail({CaptureError::kDomain, kWriteFailed, "can't make " + folder_ + ": " + std::strerror(error)});
   }
   const std::string path = folder_ + "/" + FinishedCapture::kJournalName;
   journal_ = Journal::open(path, false);
   GrowingMovie movie;
-  int error = journal_ ? movie.create(folder_ + "/" + FinishedCapture::kMediaName) : errno;
+  error = journal_ ? movie.create(folder_ + "/" + FinishedCapture::kMediaName) : errno;
   if (error == 0) {
     movie_ = std::move(movie);
     return true;

@@ -257,7 +257,16 @@ void CaptureController::closeMedia() {
   }
   encoder_.reset();
   if (!writer_) return;
-  if (const int error = writer_->finish()) {
+  const int close_error = writer_->finish();
+  if (const int error = writer_->syncError()) {
+    const std::lock_guard lock(mutex_);
+    if (!error_) {
+      error_ = CaptureError{
+          CaptureError::kDomain, kWriteFailed,
+          std::string("the movie may be damaged, the disk has not kept all of it: ") + std::strerror(error)};
+    }
+  }
+  if (const int error = close_error) {
     LMPLogMessage(nullptr, kLogError,
                   "The movie could not be closed in order (%s); it stays readable as it is",
                   std::strerror(error));
@@ -298,7 +307,7 @@ void CaptureController::finishCapture() {
               .runs = frames_->runs(),
               .marks = marks_,
               .movies = {}};
-    record.recordingType = has_video_ ? (has_audio_ ? 2 : 3) : 1;
+    record.recordingType = recordingTypeCode(has_video_, has_audio_);
     video_queue_.clear();
     audio_queue_.clear();
     finished_ = std::make_shared<FinishedCapture>(folder_, journal_, std::move(record), total);

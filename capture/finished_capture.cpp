@@ -10,8 +10,6 @@
 #include <cerrno>
 #include <cmath>
 #include <cstring>
-#include <fstream>
-#include <sstream>
 
 #include "platform/log.h"
 #include "platform/paths.h"
@@ -27,22 +25,34 @@ CaptureError diskError(int error, const std::string& what) {
           what + ": " + std::strerror(error)};
 }
 
-/// `stem` + first free of "", "-1", "-2" … + ".mov".
-std::string freeName(const std::string& stem) {
-  std::string path = stem + ".mov";
-  for (int i = 1; exists(path); ++i) path = stem + "-" + std::to_string(i) + ".mov";
-  return path;
+/// `name` cut to leave room for an ending: file systems take 255 bytes. A character is not cut in two.
+std::string fitting(std::string name) {
+  std::size_t length = std::min<std::size_t>(name.size(), 200);
+  while (length > 0 && length < name.size() && (static_cast<unsigned char>(name[length]) & 0xC0) == 0x80)
+    --length;
+  name.resize(length);
+  return name;
 }
 
-/// An earlier movie of the same name may still wait for its submission: it gets another name, it is not
-/// overwritten.
-void setAside(const std::string& path) {
-  if (!exists(path)) return;
-  const std::string stem = path.size() > 4 && path.ends_with(".mov") ? path.substr(0, path.size() - 4) : path;
-  const std::string aside = freeName(stem + "-replaced");
-  if (rename(path.c_str(), aside.c_str()) == 0) {
-    LMPLogMessage(nullptr, kLogWarning, "%s was there already, it is now %s", path.c_str(), aside.c_str());
-  }
+/// `stem` + first free of "", "-1", "-2" … such that neither a movie nor its document has the name.
+std::string freeStem(const std::string& stem) {
+  std::string free = stem;
+  for (int i = 1; exists(free + ".mov") || exists(free + ".xml"); ++i) free = stem + "-" + std::to_string(i);
+  return free;
+}
+
+/// An earlier movie of the same name may still wait for its submission: it gets another name, and its
+/// document with it. @return 0, or the errno when it stays in the way
+int setAside(const std::string& path) {
+  if (!exists(path)) return 0;
+  const std::string stem = path.ends_with(".mov") ? path.substr(0, path.size() - 4) : path;
+  const std::string directory = directoryOf(path);
+  const std::string aside =
+      freeStem(directory + "/" + fitting(stem.substr(stem.rfind('/') + 1)) + "-replaced");
+  if (rename(path.c_str(), (aside + ".mov").c_str()) != 0) return errno;
+  LMPLogMessage(nullptr, kLogWarning, "%s was there already, it is now %s.mov", path.c_str(), aside.c_str());
+  if (exists(stem + ".xml") && rename((stem + ".xml").c_str(), (aside + ".xml").c_str()) != 0) return errno;
+  return 0;
 }
 
 int moveFile(const std::string& from, const std::string& to) {
@@ -50,21 +60,10 @@ int moveFile(const std::string& from, const std::string& to) {
   return syncDirectory(directoryOf(to));
 }
 
-std::string readAll(const std::string& path) {
-  std::ifstream in(path, std::ios::binary);
-  std::ostringstream out;
-  out << in.rdbuf();
-  return out.str();
-}
-
 std::string fileNameFor(const Request& request) {
   std::string name = lookUp(request.parameters, "RecordingMetadata_RECORDING_UUID").value_or("test");
   std::replace(name.begin(), name.end(), '/', '_');
-  // Room for an ending: file systems take 255 bytes. A character is not cut in two.
-  std::size_t length = std::min<std::size_t>(name.size(), 200);
-  while (length > 0 && length < name.size() && (static_cast<unsigned char>(name[length]) & 0xC0) == 0x80)
-    --length;
-  name.resize(length);
+  name = fitting(std::move(name));
   return name.empty() ? "test" : name;
 }
 
@@ -78,23 +77,6 @@ FinishedCapture::FinishedCapture(std::string folder, std::shared_ptr<Journal> jo
       journal_(std::move(journal)),
       record_(std::move(record)),
       total_frames_(totalFrames) {}
-
-std::shared_ptr<FinishedCapture> FinishedCapture::openAbandoned(const std::string& folder) {
-  const std::string journalPath = folder + "/" + kJournalName;
-  std::shared_ptr<Journal> journal = Journal::open(journalPath, true);
-  if (!journal) return nullptr;
-  CaptureRecord record = parseJournal(readAll(journalPath));
-  const std::string media = folder + "/" + kMediaName;
-  std::uint32_t frames = 0;
-  if (const auto index = readMovieIndex(media); index && !index->tracks.empty() && record.frameSeconds > 0) {
-    frames =
-        static_cast<std::uint32_t>(std::floor(index->tracks.front().seconds() / record.frameSeconds + 1e-3));
-    if (const int error = finishMovieInPlace(media, *index)) {
-      LMPLogMessage(nullptr, kLogWarning, "%s stays fragmented: %s", media.c_str(), std::strerror(error));
-    }
-  }
-  return std::make_shared<FinishedCapture>(folder, std::move(journal), std::move(record), frames);
-}
 
 std::optional<CaptureError> FinishedCapture::makeMovie(const std::string& uuid, const std::string& path) {
   const std::lock_guard lock(mutex_);
@@ -111,8 +93,10 @@ std::optional<CaptureError> FinishedCapture::makeMovieLocked(const Request& requ
     return CaptureError{CaptureError::kDomain, kNoMedia, "nothing was captured for " + path};
   journal_->movie(request.uuid, path);
   journal_->sync();
-  setAside(path);
-  if (coversAll(ranges, total_frames_) && !record_.marks.othersPending(request.uuid)) {
+  if (const int error = setAside(path)) {
+    return diskError(error, "an earlier movie is in the way of " + path);
+  }
+  if (!keep_media_ && coversAll(ranges, total_frames_) && !record_.marks.othersPending(request.uuid)) {
     const int error = moveFile(media(), path);
     if (error == 0) return std::nullopt;
     if (error != EXDEV) return diskError(error, "could not move the movie to " + path);
@@ -174,7 +158,7 @@ std::vector<RecoveredRecording> FinishedCapture::recoverPending(const std::strin
       continue;
     }
     const std::string stem = repository + "/" + fileNameFor(request);
-    const std::string path = exists(stem + ".mov") ? freeName(stem + "-recovered") : stem + ".mov";
+    const std::string path = (exists(stem + ".mov") ? freeStem(stem + "-recovered") : stem) + ".mov";
     if (const auto error = makeMovieLocked(request, path)) {
       const bool nothing = error->code == kNoMedia;
       LMPLogMessage(nullptr, nothing ? kLogWarning : kLogError, "Unfinished recording in %s: %s%s",
@@ -204,7 +188,7 @@ void FinishedCapture::removeIfResolved() {
 }
 
 void FinishedCapture::removeIfResolvedLocked() {
-  if (record_.marks.othersPending({})) return;
+  if (keep_media_ || record_.marks.othersPending({})) return;
   unlink(media().c_str());
   unlink((folder_ + "/" + kPartName).c_str());
   unlink((folder_ + "/" + kJournalName).c_str());

@@ -26,8 +26,8 @@ class FinishedCapture : public std::enable_shared_from_this<FinishedCapture> {
   /// @param totalFrames  frames of the movie's clock that were recorded
   FinishedCapture(std::string folder, std::shared_ptr<Journal> journal, CaptureRecord record,
                   std::uint32_t totalFrames);
-  /// The capture of an earlier process. Null when another process is still recording it, or nothing can be
-  /// read.
+  /// The capture of an earlier process. Null when another process is still recording it, or when it can't be
+  /// read (logged): it is then left as it is. A damaged journal makes all of the media one recording.
   static std::shared_ptr<FinishedCapture> openAbandoned(const std::string& folder);
 
   /// Makes the movie of a request at `path`. When it is all of the media and nobody else needs that, the file
@@ -57,6 +57,7 @@ class FinishedCapture : public std::enable_shared_from_this<FinishedCapture> {
   std::shared_ptr<Journal> journal_;
   CaptureRecord record_;  // guarded by mutex_
   const std::uint32_t total_frames_;
+  bool keep_media_ = false;  ///< a part that can't be read may still be of use to somebody; set before use
 };
 
 }  // namespace lmx

@@ -3,12 +3,15 @@
 
 #include <fcntl.h>
 #include <sys/file.h>
+#include <sys/stat.h>
 #include <unistd.h>
 
 #include <algorithm>
 #include <cerrno>
 #include <cmath>
+#include <cstdio>
 #include <cstdlib>
+#include <cstring>
 #include <sstream>
 
 #include "platform/log.h"
@@ -60,7 +63,8 @@ std::uint32_t count(const std::string& text) {
 
 using Words = std::vector<std::string>;
 
-void applyRequestLine(CaptureRecord& record, const Words& w) {
+/// @return whether the line was understood
+bool applyRequestLine(CaptureRecord& record, const Words& w) {
   if (w[0] == "start" && w.size() >= 3 && w.size() % 2 == 1) {
     auto parameters = std::make_shared<Dictionary>();
     for (std::size_t i = 3; i + 1 < w.size(); i += 2) (*parameters)[w[i]] = w[i + 1];
@@ -73,11 +77,15 @@ void applyRequestLine(CaptureRecord& record, const Words& w) {
     record.marks.markDone(w[1]);
   } else if (w[0] == "movie" && w.size() == 3) {
     record.movies[w[1]] = w[2];
+  } else {
+    return false;
   }
+  return true;
 }
 
-void applyLine(CaptureRecord& record, const Words& w) {
-  if (w.empty()) return;
+/// @return whether the line was understood
+bool applyLine(CaptureRecord& record, const Words& w) {
+  if (w.empty()) return true;
   if (w[0] == "capture" && w.size() == 4) {
     record.recordingType = std::atoi(w[1].c_str());
     record.frameSeconds = real(w[2]);
@@ -89,19 +97,22 @@ void applyLine(CaptureRecord& record, const Words& w) {
   } else if (w[0] == "resume" && w.size() == 2) {
     record.marks.resume(real(w[1]));
   } else {
-    applyRequestLine(record, w);
+    return applyRequestLine(record, w);
   }
+  return true;
 }
 
 }  // namespace
 
 CaptureRecord parseJournal(const std::string& text) {
   CaptureRecord record;
+  bool understood = true;
   std::size_t at = 0;
   // Only lines that end are whole: the last one of a killed writer may be torn.
   for (std::size_t end; (end = text.find('\n', at)) != std::string::npos; at = end + 1) {
-    applyLine(record, wordsOf(text.substr(at, end - at)));
+    understood = applyLine(record, wordsOf(text.substr(at, end - at))) && understood;
   }
+  record.intact = understood && record.frameSeconds > 0 && !record.marks.requests().empty();
   return record;
 }
 
@@ -143,9 +154,18 @@ bool coversAll(const std::vector<FrameRange>& ranges, std::uint32_t totalFrames)
 }
 
 std::unique_ptr<Journal> Journal::open(const std::string& path, bool existing) {
+  // A new one bears its name only once it is locked: the recovery at the start must not take it for a dead
+  // one.
+  const std::string name = existing ? path : path + ".new";
   const int flags = O_RDWR | O_APPEND | O_CLOEXEC | (existing ? 0 : O_CREAT | O_EXCL);
-  UniqueFd file(::open(path.c_str(), flags, 0600));
+  UniqueFd file(::open(name.c_str(), flags, 0600));
   if (!file.valid() || flock(file.get(), LOCK_EX | LOCK_NB) != 0) return nullptr;
+  if (!existing && rename(name.c_str(), path.c_str()) != 0) {
+    const int error = errno;
+    unlink(name.c_str());
+    errno = error;
+    return nullptr;
+  }
   return std::unique_ptr<Journal>(new Journal(std::move(file)));
 }
 
@@ -153,10 +173,17 @@ void Journal::append(const std::vector<std::string>& words) {
   std::string line;
   for (const std::string& word : words) line += (line.empty() ? "" : " ") + escaped(word);
   line += '\n';
-  if (write(file_.get(), line.data(), line.size()) != static_cast<ssize_t>(line.size())) {
-    LMPLogMessage(nullptr, kLogError,
-                  "The capture journal could not be written: errno %d; a crash now would lose marks", errno);
-  }
+  const ssize_t written = write(file_.get(), line.data(), line.size());
+  if (written == static_cast<ssize_t>(line.size())) return;
+  const int error = written < 0 ? errno : ENOSPC;
+  // Half a line must not become one with the next; cutting a file short needs no space.
+  struct stat status {};
+  const bool whole =
+      written <= 0 || (fstat(file_.get(), &status) == 0 &&
+                       ftruncate(file_.get(), status.st_size - static_cast<off_t>(written)) == 0);
+  LMPLogMessage(nullptr, kLogError,
+                "The capture journal could not be written%s: %s; a crash now would lose marks",
+                whole ? "" : " and is damaged", std::strerror(error));
 }
 
 void Journal::capture(int recordingType, double frameSeconds, double wallOffset) {
@@ -181,6 +208,6 @@ void Journal::pause(double t) { append({"pause", number(t)}); }
 void Journal::resume(double t) { append({"resume", number(t)}); }
 void Journal::movie(const std::string& uuid, const std::string& path) { append({"movie", uuid, path}); }
 void Journal::done(const std::string& uuid) { append({"done", uuid}); }
-void Journal::sync() { fdatasync(file_.get()); }
+int Journal::sync() { return fdatasync(file_.get()) == 0 ? 0 : errno; }
 
 }  // namespace lmx

@@ -12,8 +12,12 @@
 
 namespace lmx {
 
+/// The number that stands for the kind of a recording in journals and documents.
+constexpr int recordingTypeCode(bool video, bool audio) { return video ? (audio ? 2 : 3) : 1; }
+
 /// What a journal says, read back. Pure data.
 struct CaptureRecord {
+  bool intact = false;  ///< it names the capture and a request, and every whole line was understood
   int recordingType = 0;
   double frameSeconds = 0;
   double wallOffset = 0;  ///< add it to running time to get seconds since 2001-01-01 UTC
@@ -22,7 +26,7 @@ struct CaptureRecord {
   std::map<std::string, std::string> movies;  ///< request → path it was, or was about to be, given
 };
 
-/// Reads what it understands and skips the rest: a torn last line is no error.
+/// Reads what it understands and skips the rest: a torn last line is no damage, any other is.
 CaptureRecord parseJournal(const std::string& text);
 
 /// The frames of `request` among those of `runs`. Ranges ascend; ranges that touch are joined.
@@ -49,7 +53,8 @@ class Journal {
   void resume(double t);
   void movie(const std::string& uuid, const std::string& path);
   void done(const std::string& uuid);
-  void sync();
+  /// @return 0 or the errno
+  int sync();
 
  private:
   explicit Journal(UniqueFd file) : file_(std::move(file)) {}

@@ -3,6 +3,9 @@
 
 #include <algorithm>
 #include <chrono>
+#include <cstring>
+
+#include "platform/log.h"
 
 namespace lmx {
 
@@ -57,10 +60,19 @@ void MovieWriter::run() {
     const auto now = std::chrono::steady_clock::now();
     if (error_ == 0 && now - lastSync >= 1s) {
       lastSync = now;
-      movie_.sync();
-      journal_.sync();
+      syncToDisk();
     }
   }
+}
+
+void MovieWriter::syncToDisk() {
+  const int movie = movie_.sync();
+  const int journal = journal_.sync();
+  const int error = movie != 0 ? movie : journal;
+  if (error == 0 || sync_error_ != 0) return;
+  sync_error_ = error;
+  LMPLogMessage(nullptr, kLogError, "The disk has not kept what was recorded (%s); the recording goes on",
+                std::strerror(error));
 }
 
 void MovieWriter::writeFragment(std::vector<EncodedSample> samples) {

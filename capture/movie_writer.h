@@ -30,6 +30,9 @@ class MovieWriter {
   void add(EncodedSample sample);
   /// Writes what is left, makes the movie whole and ends the thread. @return 0 or the errno.
   int finish();
+  /// The errno of the first sync that failed, 0 when none has. The disk has then lost something of what it
+  /// was given, and says so only once: later syncs succeed. Thread-safe.
+  [[nodiscard]] int syncError() const { return sync_error_; }
   /// After finish().
   [[nodiscard]] const MovieIndex& index() const { return movie_.index(); }
 
@@ -37,6 +40,7 @@ class MovieWriter {
   static constexpr std::size_t kQueueLimit = 64U << 20;
   void run();
   void writeFragment(std::vector<EncodedSample> samples);
+  void syncToDisk();
   [[nodiscard]] bool fragmentDue() const;
 
   GrowingMovie movie_;  // writer thread, then finish()'s caller
@@ -50,6 +54,7 @@ class MovieWriter {
   std::uint64_t lead_duration_ = 0;                  // guarded by mutex_: of track 0 in the queue
   bool ending_ = false;                              // guarded by mutex_
   std::atomic<int> error_{0};
+  std::atomic<int> sync_error_{0};
   std::thread thread_;
 };
 

@@ -11,6 +11,7 @@
 #include "capture/movie_file.h"
 #include "capture/test_picture.h"
 #include "capture_harness.h"
+#include "tests/unit/doubles/log_capture.h"
 
 namespace lmx {
 namespace {
@@ -267,6 +268,82 @@ TEST(Recovery, WithoutMediaLeavesNothing) {
   std::ofstream(folder + "/media.mov");
   EXPECT_TRUE(FinishedCapture::openAbandoned(folder)->recoverPending(repository.path()).empty());
   EXPECT_TRUE(std::filesystem::is_empty(repository.path()));
+}
+
+TEST(Recovery, ADamagedJournalMakesOneRecordingOfAllTheMedia) {
+  const std::string start = "start R 0.5 RecordingMetadata_RECORDING_UUID LECTURE\n";
+  struct Case {
+    const char* what;
+    std::string journal;
+    std::string name;
+  };
+  const Case cases[] = {
+      {"zeros after a power cut", std::string(200, '\0'), "capture.mov"},
+      {"empty", "", "capture.mov"},
+      {"no run", "capture 2 0.033333333333 1000.0\n" + start, "LECTURE.mov"},
+      {"no capture", start + "run 0.0 0\n", "LECTURE.mov"},
+      {"no request", "capture 2 0.033333333333 1000.0\nrun 0.0 0\n", "capture.mov"},
+      {"a torn line in the middle", std::string(kJournal) + "stostop R 0.5\n", "LECTURE.mov"},
+      {"cancelled, in doubt", std::string(kJournal) + "cancel R\nxyz\n", "LECTURE.mov"},
+  };
+  for (const Case& c : cases) {
+    SCOPED_TRACE(c.what);
+    const Folder repository;
+    const std::string folder = crashedCapture(repository, c.journal, 4);
+    const auto capture = FinishedCapture::openAbandoned(folder);
+    ASSERT_TRUE(capture);
+    const auto recovered = capture->recoverPending(repository.path());
+    ASSERT_EQ(recovered.size(), 1U);
+    EXPECT_EQ(recovered[0].path, repository.file(c.name));
+    EXPECT_NEAR(recovered[0].duration, 2.0, 1e-6);
+    EXPECT_EQ(recovered[0].recordingType, 2);
+    EXPECT_NEAR(recovered[0].stopTime, secondsSinceReferenceDate(), 60) << "when the file was last written";
+    EXPECT_EQ(readMovieIndex(repository.file(c.name))->tracks[0].sizes.size(), 60U);
+    recovered[0].forget();
+    EXPECT_FALSE(std::filesystem::exists(folder));
+  }
+}
+
+TEST(Recovery, MediaWithoutAJournalAreKept) {
+  const Folder repository;
+  const std::string folder = crashedCapture(repository, "", 2);
+  std::filesystem::remove(folder + "/journal");
+  const auto recovered = FinishedCapture::openAbandoned(folder)->recoverPending(repository.path());
+  ASSERT_EQ(recovered.size(), 1U);
+  EXPECT_EQ(recovered[0].path, repository.file("capture.mov"));
+}
+
+TEST(Recovery, WhatCannotBeReadIsLeftAlone) {
+  testing::LogCapture log;
+  const Folder repository;
+  const std::string folder = crashedCapture(repository, kJournal, 2);
+  std::ofstream(folder + "/media.mov") << "no movie at all";
+  EXPECT_FALSE(FinishedCapture::openAbandoned(folder));
+  EXPECT_TRUE(log.waitForPart("media.mov can't be read"));
+  EXPECT_TRUE(std::filesystem::exists(folder + "/media.mov") && std::filesystem::exists(folder + "/journal"));
+}
+
+TEST(Recovery, MediaWithABadBlockInTheMiddleStayAsTheyAre) {
+  const Folder repository;
+  const std::string folder = crashedCapture(repository, kJournal, 4);
+  const auto index = readMovieIndex(folder + "/media.mov");
+  ASSERT_TRUE(index);
+  // The third fragment is unreadable, and a lot stands behind it.
+  const std::uint64_t third = index->tracks[0].chunks[2].offset;
+  std::fstream media(folder + "/media.mov", std::ios::in | std::ios::out | std::ios::binary);
+  media.seekp(static_cast<std::streamoff>(third - 40));  // in its head
+  media << std::string(40, '\0');
+  media.seekp(0, std::ios::end);
+  media << std::string(20U << 20, 'x');
+  media.close();
+  const auto size = std::filesystem::file_size(folder + "/media.mov");
+  const auto recovered = FinishedCapture::openAbandoned(folder)->recoverPending(repository.path());
+  ASSERT_EQ(recovered.size(), 1U);
+  EXPECT_NEAR(recovered[0].duration, 1.0, 1e-6);
+  recovered[0].forget();
+  EXPECT_EQ(std::filesystem::file_size(folder + "/media.mov"), size);
+  const auto kept = std::filesystem::file_size(repository.file("LECTURE.mov"));
+  EXPECT_TRUE(kept > 1000 && kept < third) << kept;
 }
 
 // ---- small pieces

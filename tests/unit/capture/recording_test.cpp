@@ -3,11 +3,14 @@
 
 #include <cmath>
 #include <filesystem>
+#include <fstream>
 #include <thread>
 
 #include "capture_harness.h"
+#include "failing_sync.h"
 #include "movie_check.h"
 #include "support/time_value.h"
+#include "tests/unit/doubles/log_capture.h"
 
 namespace lmx {
 namespace {
@@ -16,6 +19,7 @@ using namespace std::chrono_literals;
 using testing::Capture;
 using testing::decodeMovie;
 using testing::Folder;
+using testing::LogCapture;
 using testing::numberRuns;
 using testing::parametersFor;
 using Kind = testing::Reports::Kind;
@@ -27,7 +31,8 @@ constexpr const char* kFastAudio = "test://audio?speed=max";
 constexpr double kTickLead = 479.0 / 48000.0;
 
 /// Records `spans` (seconds of media) as fast as the machine can. @return the movie's path.
-std::string recordFast(const Folder& folder, Capture& capture, const std::vector<Span>& spans) {
+std::string recordFast(const Folder& folder, Capture& capture, const std::vector<Span>& spans,
+                       const std::string& name = "R") {
   EXPECT_TRUE(capture.prepare());
   const double zero = capture.controller->pipeline()->wallOffset();
   for (const Span& span : spans) {
@@ -38,10 +43,10 @@ std::string recordFast(const Folder& folder, Capture& capture, const std::vector
   capture.controller->stopRecording();
   EXPECT_EQ(capture.reports->wait(600s), Kind::complete);
   EXPECT_FALSE(capture.reports->error());
-  const auto error = capture.controller->processRequestWithUUID("R", folder.file("R.mov"));
+  const auto error = capture.controller->processRequestWithUUID("R", folder.file(name + ".mov"));
   EXPECT_FALSE(error) << error->message;
   capture.controller->requestHandedOver("R");
-  return folder.file("R.mov");
+  return folder.file(name + ".mov");
 }
 
 TEST(Recording, HoldsExactlyItsSpans) {
@@ -155,7 +160,50 @@ TEST(Recording, AFileThatBearsTheNameIsSetAside) {
   EXPECT_EQ(decodeMovie(folder.file("R.mov")).frameNumbers.size(), 30U);
 }
 
+TEST(Recording, AnEarlierMovieGoesAsideWithItsDocument) {
+  const Folder folder;
+  std::ofstream(folder.file("R.mov")) << "earlier";
+  std::ofstream(folder.file("R.xml")) << "its document";
+  std::ofstream(folder.file("R-replaced.xml")) << "of an even earlier one";
+  Capture capture(folder, kFastVideo, kFastAudio);
+  recordFast(folder, capture, {{0.0, 0.5}});
+  std::ifstream document(folder.file("R-replaced-1.xml"));
+  EXPECT_EQ(std::string((std::istreambuf_iterator<char>(document)), {}), "its document");
+  EXPECT_TRUE(std::filesystem::exists(folder.file("R-replaced-1.mov")));
+  EXPECT_FALSE(std::filesystem::exists(folder.file("R.xml")));
+}
+
+TEST(Recording, AnEarlierMovieOfALongNameGoesAside) {
+  const Folder folder;
+  const std::string name(251, 'N');
+  std::ofstream(folder.file(name + ".mov")) << "earlier";
+  Capture capture(folder, kFastVideo, kFastAudio);
+  recordFast(folder, capture, {{0.0, 0.5}}, name);
+  EXPECT_TRUE(std::filesystem::exists(folder.file(std::string(200, 'N') + "-replaced.mov")));
+}
+
 // ---- live
+
+TEST(LiveRecording, ADiskThatLosesDataIsSaid) {
+  LogCapture log;
+  const Folder folder;
+  Capture capture(folder);
+  ASSERT_TRUE(capture.prepare());
+  capture.controller->setStartWithUUID("R", secondsSinceReferenceDate(), parametersFor("R"));
+  ASSERT_TRUE(capture.controller->startRecording());
+  while (capture.controller->elapsedTimeInMilliseconds() < 200) std::this_thread::sleep_for(10ms);
+  testing::failNextSyncs(1);
+  ASSERT_TRUE(log.waitForPart("The disk has not kept what was recorded (Input/output error)"));
+  const auto recorded = capture.controller->elapsedTimeInMilliseconds();
+  while (capture.controller->elapsedTimeInMilliseconds() < recorded + 500) std::this_thread::sleep_for(10ms);
+  capture.controller->stopRecording();
+  ASSERT_EQ(capture.reports->wait(), Kind::complete);
+  ASSERT_TRUE(capture.controller->lastError());
+  EXPECT_EQ(capture.controller->lastError()->code, kWriteFailed);
+  EXPECT_FALSE(capture.controller->processRequestWithUUID("R", folder.file("R.mov")))
+      << "it is kept all the same";
+  EXPECT_GT(decodeMovie(folder.file("R.mov")).frameNumbers.size(), 10U);
+}
 
 TEST(LiveRecording, StoppedAtOnceStillHoldsAFrame) {
   const Folder folder;

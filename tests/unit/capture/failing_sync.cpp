@@ -1,0 +1,29 @@
+// A disk that loses data: fdatasync of this program, which fails on demand.
+#include "failing_sync.h"
+
+#include <sys/syscall.h>
+#include <unistd.h>
+
+#include <atomic>
+#include <cerrno>
+
+namespace {
+
+std::atomic<int> to_fail{0};
+
+}  // namespace
+
+namespace lmx::testing {
+
+void failNextSyncs(int count) { to_fail = count; }
+
+}  // namespace lmx::testing
+
+extern "C" int fdatasync(int fd) {
+  for (int left = to_fail; left > 0;) {
+    if (!to_fail.compare_exchange_weak(left, left - 1)) continue;
+    errno = EIO;
+    return -1;
+  }
+  return static_cast<int>(syscall(SYS_fdatasync, fd));
+}
