@@ -141,6 +141,11 @@ class AgentMain : public AgentActions {
                              std::int64_t elapsedSeconds, std::optional<TimeValue> stoppedTime,
                              bool canceled) override;
 
+  /// What recordDidStopWithFile does. @return false when the recording should have a document and has none
+  bool announceStop(const std::shared_ptr<AgentRecord>& session, const std::string& file,
+                    const SharedDictionary& metadata, std::optional<TimeValue> atTime,
+                    std::int64_t elapsedSeconds, std::optional<TimeValue> stoppedTime, bool canceled);
+
   /// Puts recovered movies' documents beside them and logs one line each; nothing is submitted. Any thread.
   void keepRecovered(const std::vector<RecoveredRecording>& recordings);
 

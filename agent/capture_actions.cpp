@@ -20,6 +20,7 @@ std::shared_ptr<LMRCaptureController> AgentMain::captureController() const {
 void AgentMain::prepareCapture() {
   context_->logDebug("Process prepareCapture");
   const SharedDictionary properties = context_->properties();
+  context_->setStatus(kRecordNotRunning);  // what counts if this ends by an exception
   context_->setStatus(LXAgentRecordPrepareCapture(
       *context_, std::make_shared<const Dictionary>(properties ? *properties : Dictionary{})));
 }

@@ -49,7 +49,12 @@ int AgentMain::clusterInformationFromSpecificHostOnly(const std::string& host, S
                   "Unable to retrieve cluster information (/usr/bin/lumex exit code = %d).", status);
     return status;
   }
-  members = membersOf(parsePropertyList(result.output));
+  const PlistResult answer = parsePropertyList(result.output);
+  if (!answer.value) {
+    LMPLogMessage(context_->log_context(), kLogError,
+                  "The answer of /usr/bin/lumex --listinfo can't be used: %s", answer.problem.c_str());
+  }
+  members = membersOf(answer);
   return 0;
 }
 
@@ -108,13 +113,14 @@ void AgentMain::learnCluster() {
 void AgentMain::refreshClusterInformation() {
   if (cluster_refresh_.exchange(true)) return;  // the last one is still waiting for its tool
   dispatchAsync(WorkPriority::background, [this] {
+    const auto ended = [](std::atomic<bool>* refresh) { *refresh = false; };
+    const std::unique_ptr<std::atomic<bool>, decltype(ended)> end_of_refresh(&cluster_refresh_, ended);
     SharedPlist members;
     if (clusterInformation(context_->tunnel_host(), members) != 0) {
       LMPLogMessage(context_->log_context(), kLogError, "Unable to update cluster information.");
     } else {
       context_->setServer_info(members);
     }
-    cluster_refresh_ = false;
   });
 }
 

@@ -28,6 +28,12 @@ constexpr const char* kOfflineMessage =
     "Unable to acquire the specified video device. The agent will remain offline until the device becomes "
     "available.";
 
+/// Whether the moment `span` seconds after `begin` is still to come. A clock that was set back behind `begin`
+/// knows nothing of it: rather too early than an hour too late.
+constexpr bool isAhead(std::int64_t now, std::int64_t begin, std::int64_t span) {
+  return now >= begin && now - begin < span;
+}
+
 }  // namespace
 
 int AgentMain::appLoop() {
@@ -50,7 +56,7 @@ int AgentMain::appLoop() {
 
 void AgentMain::retryDevice(std::int64_t now) {
   const std::int64_t last = context_->last_device_check();
-  if (last < 1 || now <= last + kDeviceRetrySeconds) return;
+  if (last < 1 || isAhead(now, last, kDeviceRetrySeconds + 1)) return;
   const auto settings = recordingContext();
   if (!settings) {
     context_->setRunning(false);
@@ -91,7 +97,7 @@ void AgentMain::stopForgottenPreview(std::int64_t now) {
   const auto preview = record ? record->previewController() : nullptr;
   if (!preview || !preview->controller().isPreviewRunning()) return;
   const std::int64_t requested = preview->mLastPreviewRequestTime();
-  if (requested == 0 || now - requested < kPreviewTimeOutSeconds) return;
+  if (requested == 0 || isAhead(now, requested, kPreviewTimeOutSeconds)) return;
   stopPreview();
   preview->setMLastPreviewRequestTime(0);
 }
@@ -117,7 +123,7 @@ void AgentMain::reloadChangedPreferences() {
 
 void AgentMain::checkServerRefusal(std::int64_t now) {
   const std::int64_t refused = context_->serverRejectTime();
-  if (context_->adhoc() || refused == 0 || now - refused < kRefusalSeconds) return;
+  if (context_->adhoc() || refused == 0 || isAhead(now, refused, kRefusalSeconds)) return;
   context_->setServerRejectTime(0);
   LMPLogMessage(context_->log_context(), kLogCritical,
                 "Server rejected agent connection, restarting for retry.");

@@ -43,7 +43,11 @@ void AgentMain::loadSchedule() { channelOf(ChannelKind::tunnel).loadTimedCommand
 
 void AgentMain::runDueCommands(std::time_t now) {
   for (const Schedule::Command& command : schedule_.takeDue(now)) {
-    channelOf(command.channel).completeTimedCommand(command.entry);
+    try {
+      channelOf(command.channel).completeTimedCommand(command.entry);
+    } catch (const std::exception& problem) {  // the commands behind it are still to run
+      LMPLogMessage(context_->log_context(), kLogCritical, "A timed command failed: %s", problem.what());
+    }
   }
 }
 

@@ -39,6 +39,18 @@ TimeValue timeValueFrom(double secondsSinceReference) {
   return {whole, static_cast<suseconds_t>((seconds - static_cast<double>(whole)) * 1e6)};
 }
 
+/// Takes one off a counter at its own end, however that comes.
+class CountedDown {
+ public:
+  explicit CountedDown(std::atomic<int>& counter) : counter_(counter) {}
+  ~CountedDown() { --counter_; }
+  CountedDown(const CountedDown&) = delete;
+  CountedDown& operator=(const CountedDown&) = delete;
+
+ private:
+  std::atomic<int>& counter_;
+};
+
 }  // namespace
 
 void AgentMain::rememberStopped(const std::shared_ptr<LMRCaptureController>& controller) {
@@ -108,8 +120,8 @@ void AgentMain::submit(const std::shared_ptr<AgentRecord>& stopped) {
   stopped->setMetadata(withUuid(metadataOf(*context_, *stopped), uuid));
   stopped->setStartTime(stopped->beginning());
   dispatchAsync(WorkPriority::background, [this, stopped, path, elapsed] {
+    const CountedDown end_of_hand_off(hand_offs_);
     handOff(stopped, path, elapsed);
-    --hand_offs_;
   });
 }
 
@@ -135,10 +147,11 @@ void AgentMain::handOff(const std::shared_ptr<AgentRecord>& stopped, const std::
     // A lost device has its own way; what is left is a disk or an encoder that failed.
     if (!meansDeviceLost(cause)) leave_error();
   }
+  bool documented = true;
   if (!error) {
     stopped->setStopTime(shiftedNow(*context_));
-    recordDidStopWithFile(stopped, path, stopped->metadata(), stopped->startTime(),
-                          static_cast<std::int64_t>(elapsed), stopped->stopTime(), false);
+    documented = announceStop(stopped, path, stopped->metadata(), stopped->startTime(),
+                              static_cast<std::int64_t>(elapsed), stopped->stopTime(), false);
   } else {
     LMPLogMessage(context_->log_context(), kLogCritical, "The recording could not be finished: %s",
                   error->message.c_str());
@@ -146,8 +159,9 @@ void AgentMain::handOff(const std::shared_ptr<AgentRecord>& stopped, const std::
     leave_error();
   }
   if (context_->running()) {
-    // A movie that could not be written stays in the capture's folder: the next start tries again.
-    if (!error || error->code == kNoMedia) {
+    // A movie or a document that could not be written stays in the capture's journal: the next start tries
+    // again.
+    if (documented && (!error || error->code == kNoMedia)) {
       controller->requestHandedOver(request);
       keepRecovered(controller->recoverAbandonedRequests());
     }
@@ -159,13 +173,20 @@ void AgentMain::recordDidStopWithFile(const std::shared_ptr<AgentRecord>& sessio
                                       const SharedDictionary& metadata, std::optional<TimeValue> atTime,
                                       std::int64_t elapsedSeconds, std::optional<TimeValue> stoppedTime,
                                       bool canceled) {
-  if (!context_->running()) return;
+  static_cast<void>(announceStop(session, file, metadata, atTime, elapsedSeconds, stoppedTime, canceled));
+}
+
+bool AgentMain::announceStop(const std::shared_ptr<AgentRecord>& session, const std::string& file,
+                             const SharedDictionary& metadata, std::optional<TimeValue> atTime,
+                             std::int64_t elapsedSeconds, std::optional<TimeValue> stoppedTime,
+                             bool canceled) {
+  if (!context_->running()) return true;
   LMPLogMessage(context_->log_context(), kLogNotice, "\"%s\" recording stopped (duration: %ds)", file.c_str(),
                 static_cast<int>(elapsedSeconds));
   const SharedDictionary properties = propertiesOf(*context_, *session);
   if (context_->adhoc() || context_->submit_disabled() ||
       lookUp(properties, "RecordingMetadata_ADHOC_SUBMIT_DISABLED") == "1") {
-    return;
+    return true;
   }
   auto job = std::make_shared<AgentSubmit>();
   job->setRecord(session->copy());
@@ -173,13 +194,15 @@ void AgentMain::recordDidStopWithFile(const std::shared_ptr<AgentRecord>& sessio
     job->setAdhoc_workflow_uuid(workflow);
   }
   job->setPropertyValuesWithContext(context_, file, atTime, stoppedTime, elapsedSeconds, metadata, canceled);
-  if (job->writeProperties() == 0) {
-    context_->postProcessListAddJob(std::move(job));
-  } else {
+  if (job->writeProperties() != 0) {
     LMPLogMessage(context_->log_context(), kLogCritical,
                   "Internal error occurred in did stop with success callback");
     context_->setRunning(false);
+    return true;
   }
+  const bool documented = access(job->properties_file_path().value_or("").c_str(), F_OK) == 0;
+  context_->postProcessListAddJob(std::move(job));
+  return documented;
 }
 
 void AgentMain::keepRecovered(const std::vector<RecoveredRecording>& recordings) {

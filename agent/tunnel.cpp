@@ -9,6 +9,8 @@ using namespace std::chrono_literals;
 
 namespace {
 
+constexpr auto kThreadPatience = 10s;
+
 struct NetworkWatch final : RunLoop::Source {
   NetworkWatcher watcher;
   std::unique_ptr<RunLoop::Source> source;  // last: it goes before the descriptor
@@ -22,11 +24,21 @@ bool AgentMain::openTunnel() {
 }
 
 void AgentMain::closeTunnel() {
-  if (!agentControl_) return;
+  // Taken out first: the turns below may bring another signal, and with it this function again.
+  auto closing = std::exchange(agentControl_, nullptr);
+  if (!closing) return;
   // Its thread may be waiting for this one: the loop goes on until it has ended.
-  agentControl_->askToStop();
-  while (!agentControl_->threadHasEnded()) loop_.run(20ms);
-  agentControl_ = nullptr;
+  closing->askToStop();
+  const auto deadline = std::chrono::steady_clock::now() + kThreadPatience;
+  while (!closing->threadHasEnded() && std::chrono::steady_clock::now() < deadline) loop_.run(20ms);
+  if (closing->threadHasEnded()) return;
+  LMPLogMessage(
+      context_->log_context(), kLogError,
+      "The tunnel's thread has not ended within %d seconds (a file system that does not answer?); it is "
+      "left behind",
+      static_cast<int>(kThreadPatience / 1s));
+  // It still uses the channel whenever it wakes up.
+  [[maybe_unused]] const AgentControl* left_behind = closing.release();
 }
 
 void AgentMain::tellServerOfTheEnd() {

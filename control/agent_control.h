@@ -33,6 +33,7 @@ class AgentControl final : public AgentControlBase {
   int connect() override;
   std::optional<std::string> commandFromReceivedData(const std::string& line) override;
   void sendReply(const std::string& reply) override;
+  void previousPeerSpeaks() override { hello_sent_ = true; }  // on that connection, and with the same vector
 
  private:
   [[nodiscard]] bool wasDroppedAtOnce() const;

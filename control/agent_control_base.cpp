@@ -34,6 +34,10 @@ AgentControlBase::~AgentControlBase() {
 bool AgentControlBase::initWithAgentContext() {
   LMPLogMessage(logContext(), kLogNotice, "Control module is starting...");
   if (registerForNetworkChange() == -1) return false;
+  if (!wake_.valid()) {  // nothing could stop its thread
+    LMPLogMessage(logContext(), kLogError, "Control module cannot be started");
+    return false;
+  }
   if (!clock_.now()) {  // without the time a lost server would never be noticed
     LMPLogMessage(logContext(), kLogCritical, "Internal error occurred");
     return false;

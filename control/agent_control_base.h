@@ -132,6 +132,8 @@ class AgentControlBase {
   virtual int connect() = 0;
   /// Turns one raw line into command text; nothing: the line is ignored.
   virtual std::optional<std::string> commandFromReceivedData(const std::string& line) = 0;
+  /// The connection before has its place again. Channel thread.
+  virtual void previousPeerSpeaks() {}
   /// Sends one reply. A reply that can't be sent is lost (logged).
   virtual void sendReply(const std::string& reply) = 0;
   /// The thread's body: connect, receive, reconnect. @return 0, or -1 when the channel could not be set up.
@@ -182,6 +184,7 @@ class AgentControlBase {
 
   void closeOnce(std::atomic<int>& socket);
   bool takeBackPreviousPeer();
+  [[nodiscard]] int previousPeerIfAlive() const;
 
   std::mutex send_mutex_;
   ChannelClock& clock_;

@@ -3,16 +3,18 @@
 
 #include <poll.h>
 
+#include <array>
+
 namespace lmx {
 namespace {
 
 class SystemChannelClock final : public ChannelClock {
  public:
   std::optional<TimeValue> now() override { return currentTime(); }
-  void sleep(std::chrono::milliseconds span, int wake) override {
-    pollfd waited{wake, POLLIN, 0};
+  void sleep(std::chrono::milliseconds span, int wake, int other) override {
+    std::array<pollfd, 2> waited{{{wake, POLLIN, 0}, {other, POLLIN, 0}}};
     // A signal may end the sleep early: the callers look at their own condition again.
-    ::poll(&waited, 1, static_cast<int>(span.count()));
+    ::poll(waited.data(), waited.size(), static_cast<int>(span.count()));
   }
 };
 

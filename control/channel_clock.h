@@ -13,8 +13,8 @@ class ChannelClock {
   virtual ~ChannelClock() = default;
   /// Wall clock; absent when it can't be read.
   virtual std::optional<TimeValue> now() = 0;
-  /// Sleeps for `span`, less when descriptor `wake` becomes readable (negative: none).
-  virtual void sleep(std::chrono::milliseconds span, int wake) = 0;
+  /// Sleeps for `span`, less when descriptor `wake` or `other` becomes readable (negative: none).
+  virtual void sleep(std::chrono::milliseconds span, int wake, int other = -1) = 0;
 };
 
 /// The real one. Lives as long as the process.

@@ -43,7 +43,8 @@ bool AgentControlBase::connectWithBackOff() {
     if (connect() != 1) continue;
     logInfo(
         formatted("Failed to connect to server, retrying in %d seconds.", static_cast<int>(delay.count())));
-    if (running_) clock_.sleep(delay, wakeDescriptor());  // a stop ends it at once
+    if (running_) clock_.sleep(delay, wakeDescriptor(), previousPeerIfAlive());  // a stop ends it at once
+    if (takeBackPreviousPeer()) break;
     delay = nextBackOff(delay);
   }
   return true;
@@ -104,18 +105,25 @@ bool AgentControlBase::receivePacket(int socket) {
   return true;
 }
 
-/// Puts the previous peer in its place again if it has said something. @return whether it has
+/// The socket of a previous peer that may still say something, else -1.
+int AgentControlBase::previousPeerIfAlive() const {
+  const int socket = serverSocketDumped_;
+  return socket != -1 && peerIsConnected(socket) ? socket : -1;
+}
+
+/// Puts the previous peer in its place again if it has said something: one that lost it to a change of the
+/// network, or to ten minutes without a command, knows nothing of that, and its STOP must not be lost.
+/// @return whether it has
 bool AgentControlBase::takeBackPreviousPeer() {
   char next = 0;
   if (::recv(serverSocketDumped_, &next, 1, MSG_PEEK | MSG_DONTWAIT) <= 0) return false;
+  previousPeerSpeaks();
   logDebug("The previous peer speaks again");
   setServerSocket(serverSocketDumped_.exchange(-1));
   return true;
 }
 
 int AgentControlBase::acceptPeer(int listening) {
-  // A peer that lost its place to a change of the network, or to ten minutes without a command, knows nothing
-  // of that: its STOP must not be lost.
   int previous = serverSocketDumped_;
   Readiness readiness = Readiness::interrupted;
   while (readiness == Readiness::interrupted || readiness == Readiness::otherReadable) {

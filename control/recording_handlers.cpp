@@ -54,7 +54,11 @@ void AgentControlBase::handleSTART(const Dictionary* parameters) {
     return sendReply(kMissingParameter);
   }
   const auto session = context->record_context();
-  if (session && session->status() == kRecorderIdle) session->clearPassedDeadlines();
+  if (session &&
+      session->status() == kRecorderIdle) {  // what an earlier recording has left would end this one
+    session->setHardStopTime(std::nullopt);
+    session->setSoftStopTime(std::nullopt);
+  }
   if (configure(parameters) != 0) return sendReply("cmdStatus=1");
 
   if (session && isTrue(parameters, "RecordingMetadata_AUDIO_ONLY")) {

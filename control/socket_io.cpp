@@ -4,18 +4,22 @@
 #include <poll.h>
 #include <sys/socket.h>
 
+#include <algorithm>
 #include <array>
 #include <cerrno>
 
 namespace lmx {
 namespace {
 
+using Clock = std::chrono::steady_clock;
+
+/// A peer that takes a few bytes now and then may hold its reply up for so many patiences altogether.
+constexpr int kPatiencesInAll = 6;
+
 /// Waits until `socket` takes bytes again. @return 0 or why not.
-int awaitWritable(int socket, std::chrono::milliseconds patience, int wake) {
-  const auto deadline = std::chrono::steady_clock::now() + patience;
+int awaitWritable(int socket, Clock::time_point deadline, int wake) {
   while (true) {
-    const auto left =
-        std::chrono::ceil<std::chrono::milliseconds>(deadline - std::chrono::steady_clock::now());
+    const auto left = std::chrono::ceil<std::chrono::milliseconds>(deadline - Clock::now());
     if (left.count() <= 0) return ETIMEDOUT;
     std::array<pollfd, 2> waited{{{socket, POLLOUT, 0}, {wake, POLLIN, 0}}};
     const int ready = ::poll(waited.data(), waited.size(), static_cast<int>(left.count()));
@@ -29,13 +33,15 @@ int awaitWritable(int socket, std::chrono::milliseconds patience, int wake) {
 }  // namespace
 
 int sendWhole(int socket, std::string_view bytes, std::chrono::milliseconds patience, int wake) {
+  const auto end = Clock::now() + kPatiencesInAll * patience;
   while (true) {
     const ssize_t sent = ::send(socket, bytes.data(), bytes.size(), MSG_NOSIGNAL | MSG_DONTWAIT);
     if (sent >= 0) {
       bytes.remove_prefix(static_cast<std::size_t>(sent));
       if (bytes.empty()) return 0;
     } else if (errno == EAGAIN) {
-      if (const int error = awaitWritable(socket, patience, wake); error != 0) return error;
+      if (const int error = awaitWritable(socket, std::min(Clock::now() + patience, end), wake); error != 0)
+        return error;
     } else if (errno != EINTR) {
       return errno;
     }

@@ -6,7 +6,7 @@
 namespace lmx {
 
 /// Sends all of `bytes` on the stream `socket`, usually with one send. A peer that is gone raises no SIGPIPE.
-/// @param patience  longest wait without the peer taking a single byte
+/// @param patience  longest wait without the peer taking a single byte; six of them is the longest in all
 /// @param wake  descriptor that ends the wait when it becomes readable; negative: none
 /// @return 0, or the errno of the failure: ETIMEDOUT when the patience ran out, ECANCELED when `wake` ended
 /// it.

@@ -1,4 +1,6 @@
 // TIMEDCMD: commands that run later, their list and its file.
+#include <sys/stat.h>
+
 #include <cerrno>
 #include <cstring>
 
@@ -144,7 +146,9 @@ void AgentControlBase::writeTimerListToDisk() {
   const auto context = agentContext();
   if (!context) return;
   const bool written = context->timedCmdList().persist([](const auto& entries) {
-    return writePropertyList(systemPath(kTimersFile), plistFrom(entries), 0600) == 0;
+    const std::string path = systemPath(kTimersFile);
+    ::chmod(path.c_str(), 0600);  // the new file takes over the mode of the old one, and passwords are in it
+    return writePropertyList(path, plistFrom(entries), 0600) == 0;
   });
   if (!written) context->logWarn("Unable to write timer file.");
 }

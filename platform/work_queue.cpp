@@ -7,6 +7,7 @@
 
 #include <condition_variable>
 #include <deque>
+#include <exception>
 #include <memory>
 #include <mutex>
 #include <system_error>
@@ -35,7 +36,7 @@ class Pool {
       item = std::move(items_.back());
       items_.pop_back();
     }
-    item();
+    runGuarded(item);
   }
 
   [[nodiscard]] bool ownsThisThread() const { return pool_of_this_thread == this; }
@@ -74,7 +75,16 @@ class Pool {
         item = std::move(items_.front());
         items_.pop_front();
       }
+      runGuarded(item);
+    }
+  }
+
+  /// A failing item costs itself, not the process and whatever it is recording.
+  static void runGuarded(const std::function<void()>& item) {
+    try {
       item();
+    } catch (const std::exception& error) {
+      LMPLogMessage(nullptr, kLogCritical, "A work item failed: %s", error.what());
     }
   }
 

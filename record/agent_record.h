@@ -3,6 +3,7 @@
 #include <atomic>
 #include <cstdint>
 #include <memory>
+#include <mutex>
 #include <optional>
 #include <string>
 #include <thread>
@@ -136,9 +137,11 @@ class AgentRecord : public RecordingSettings, public std::enable_shared_from_thi
   void updateSoftStopTime();
   /// Sets the hard stop `seconds` from now; 0 or less clears it.
   void setRecordHardStopTimeSeconds(std::int32_t seconds);
-  /// Forgets deadlines that an earlier recording has left behind: they would end the next one at its first
-  /// check.
+  /// Forgets deadlines that have passed: they would end a recording at its first check.
   void clearPassedDeadlines();
+  /// Moves the deadlines along when the wall clock was set since the last call: they say how long a recording
+  /// may last. @param offset  seconds that the wall clock is ahead of the time since the machine started
+  void followWallClock(std::int64_t offset);
   /// When the recording began. The capture thread may not have stamped its start yet when a recording is
   /// stopped at once: then the time at which it was prepared.
   [[nodiscard]] Time beginning() const;
@@ -173,6 +176,8 @@ class AgentRecord : public RecordingSettings, public std::enable_shared_from_thi
   std::atomic<bool> autoShutoffCheckTimer_{false};
   std::atomic<bool> cleaned_up_{false};
   bool is_copy_ = false;
+  std::mutex clock_mutex_;
+  std::optional<std::int64_t> clock_offset_;  // guarded by clock_mutex_; that of the last followWallClock
   RecursiveMutex statusAndTimingLock_;
 };
 

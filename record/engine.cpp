@@ -157,11 +157,12 @@ int LXAgentRecordPrepareCapture(AgentContext& context, SharedDictionary metadata
     LMPLogMessage(context.log_context(), kLogCritical, "Internal error occurred");
     return kRecordInvalidType;
   }
+  const auto unlock = [](AgentContext* held) { held->unlock_control_action_mutex(); };
+  const std::unique_ptr<AgentContext, decltype(unlock)> lock(&context, unlock);
   session->setAudioOnlyMode(movie->audioOnly);
   if (movie->audioOnly) session->setRecordingType(kRecordingTypeAudio);
   const int result = LXAgentRecordPrepareCaptureSync(context, movie->path, std::move(metadata));
   if (result != kRecordSuccess && movie->audioOnly) restoreType(context, *session);
-  context.unlock_control_action_mutex();
   return result;
 }
 

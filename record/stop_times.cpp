@@ -1,11 +1,15 @@
 // The deadlines that end what nobody ended: hard stop and soft stop.
 #include <cinttypes>
+#include <cstdlib>
+#include <ctime>
+#include <mutex>
 
 #include "agent/context/agent_actions.h"
 #include "agent/context/agent_context.h"
 #include "platform/log.h"
 #include "record/agent_record.h"
 #include "record/engine.h"
+#include "record/stop_times.h"
 #include "support/heap_ptr.h"
 
 namespace lmx {
@@ -15,6 +19,10 @@ void logTime(const char* format, const TimeValue& time) {
   const heap_ptr<char> text(lmp_timeval_to_ctime(&time));
   const std::string line = std::string(format) + (text ? text.get() : "?");
   LMPLogMessage(nullptr, kLogInfo, "%s", line.c_str());
+}
+
+bool same(const AgentRecord::Time& a, const AgentRecord::Time& b) {
+  return a.has_value() == b.has_value() && (!a || (a->tv_sec == b->tv_sec && a->tv_usec == b->tv_usec));
 }
 
 /// Now plus `seconds`; absent (logged) when the clock fails.
@@ -30,12 +38,42 @@ AgentRecord::Time deadlineIn(std::int32_t seconds) {
 
 }  // namespace
 
+std::int64_t wallClockOffset() {
+  timespec wall{};
+  timespec boot{};
+  ::clock_gettime(CLOCK_REALTIME, &wall);
+  ::clock_gettime(CLOCK_BOOTTIME, &boot);
+  return wall.tv_sec - boot.tv_sec;
+}
+
 void AgentRecord::updateLastContact() {
   setLastContact(currentTime());
   if (status() != kRecorderIdle) updateSoftStopTime();
 }
 
+void AgentRecord::followWallClock(std::int64_t offset) {
+  constexpr std::int64_t kRounding = 1;  // of two times that are cut to seconds
+  const std::lock_guard lock(clock_mutex_);
+  const std::int64_t step = clock_offset_ ? offset - *clock_offset_ : 0;
+  clock_offset_ = offset;
+  if (std::abs(step) <= kRounding) return;
+  bool moved = false;
+  for (auto* deadline : {&hardStopTime_, &softStopTime_}) {
+    Time time = deadline->get();
+    if (!time) continue;
+    time->tv_sec += step;
+    deadline->set(time);
+    moved = true;
+  }
+  if (moved) {
+    LMPLogMessage(nullptr, kLogNotice,
+                  "The clock was set by %lld s, the stop times of the recording go with it",
+                  static_cast<long long>(step));
+  }
+}
+
 void AgentRecord::updateSoftStopTime() {
+  followWallClock(wallClockOffset());
   setSoftStopTime(std::nullopt);
   const std::int32_t minutes = maxUnattendedRecordingMinutes();
   if (minutes <= 0) return;
@@ -48,6 +86,7 @@ void AgentRecord::updateSoftStopTime() {
 }
 
 void AgentRecord::setRecordHardStopTimeSeconds(std::int32_t seconds) {
+  followWallClock(wallClockOffset());
   setHardStopTime(std::nullopt);
   if (seconds <= 0) return;
   const Time deadline = deadlineIn(seconds);
@@ -72,6 +111,7 @@ AgentRecord::Time AgentRecord::beginning() const {
 }
 
 bool AgentRecord::shouldStopRecording() {
+  followWallClock(wallClockOffset());
   const auto now = currentTime();
   if (!now) return false;
   bool stop = false;
@@ -100,13 +140,16 @@ void AgentRecord::checkForAutoShutoffConditions() {
 int AgentRecord::doAutoShutoff() {
   const EngineEnvironment environment = engineEnvironment();
   if (environment.context && environment.context->adhoc()) std::_Exit(0);
+  const Time hard = hardStopTime();
+  const Time soft = softStopTime();
   if (const auto controller = captureController()) {
     controller->setStopWithUUID(request_uuid(), secondsSinceReferenceDate());
   }
   if (environment.actions != nullptr)
     environment.actions->perform(&AgentActions::stopRecording, Wait::untilDone);
-  setHardStopTime(std::nullopt);
-  setSoftStopTime(std::nullopt);
+  // Meanwhile the session may have gone on to the next recording: its deadlines are not these.
+  if (same(hardStopTime(), hard)) setHardStopTime(std::nullopt);
+  if (same(softStopTime(), soft)) setSoftStopTime(std::nullopt);
   return 0;
 }
 

@@ -95,10 +95,19 @@ int writeFileAtomically(const std::string& path, const std::string& content, mod
 }
 
 std::string keepUnderAnotherName(const std::string& path) {
+  struct stat status {};
   for (int number = 1; number < 1000; ++number) {
     std::string copy = path + ".unreadable-" + std::to_string(number);
     if (link(path.c_str(), copy.c_str()) == 0) return copy;
-    if (errno != EEXIST) break;
+    if (errno == EEXIST) continue;
+    // Some file systems have no second names: there the file moves.
+    const int error = errno;
+    const bool noLinks = error == EPERM || error == EOPNOTSUPP || error == ENOSYS;
+    const bool isFile = lstat(path.c_str(), &status) == 0 && S_ISREG(status.st_mode);
+    if (noLinks && isFile && lstat(copy.c_str(), &status) == 0) continue;
+    if (noLinks && isFile && rename(path.c_str(), copy.c_str()) == 0) return copy;
+    errno = error;
+    break;
   }
   return {};
 }

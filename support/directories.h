@@ -19,7 +19,8 @@ int syncDirectory(const std::string& directory);
 int writeFileAtomically(const std::string& path, const std::string& content, mode_t mode);
 
 /// Gives the file `path` a second name, "PATH.unreadable-N", so that replacing it loses nothing; needs no
-/// right to read it. @return that name, empty when it could not be done (errno tells why)
+/// right to read it. Where a file can have one name only, the second replaces the first. @return that name,
+/// empty when it could not be done (errno tells why)
 std::string keepUnderAnotherName(const std::string& path);
 
 }  // namespace lmx

@@ -101,6 +101,8 @@ TEST_F(StoppedRecording, AMovieThatCannotBeWrittenIsARuntimeErrorAndNoJob) {
   EXPECT_TRUE(log_.waitFor(2, "The recording could not be finished: disk full"));
   EXPECT_TRUE(log_.waitFor(3, "An error occurred during recording (8)"));
   EXPECT_TRUE(testing::waitUntil([&] { return session_->error() == kRecordCannotWrite; }));
+  session_->setCaptureController(nullptr);
+  EXPECT_TRUE(testing::waitUntil([&] { return controller.use_count() == 1; })) << "the hand-off has ended";
   EXPECT_EQ(context_->postProcessListCount(), 0U);
   EXPECT_EQ(journalCount("requestHandedOver request of R1"), 0);
 }

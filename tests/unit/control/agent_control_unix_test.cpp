@@ -237,10 +237,11 @@ TEST_F(LocalSocket, LineAByteAtATimeIsExecutedOnce) {
 
 TEST_F(LocalSocket, APeerThatLostItsPlaceToANetworkChangeIsHeardAgain) {
   Peer peer;
-  actions_.network_changed();
+  peer.send("x\n");
+  ASSERT_TRUE(log_.waitFor(3, "Unknown command [x]"));
   channel_->setNetTransitionTime(1);  // long ago
-  peer.send("ST");                    // the connection in hand is given up behind it
-  peer.send("OP\n");
+  ASSERT_TRUE(log_.waitFor(7, "The connection is made anew after a network change"));
+  peer.send("STOP\n");
   EXPECT_EQ(peer.receiveUpTo("cmdStatus=0"), "cmdStatus=0");
   EXPECT_TRUE(log_.contains(7, "The previous peer speaks again"));
   EXPECT_EQ(journal_.entries(), std::vector<std::string>{"stopRecording"});

@@ -380,7 +380,13 @@ TEST_F(RecordingHandlers, AMovieCannotBeNamedOutOfTheRepository) {
 }
 
 TEST_F(RecordingHandlers, StartForgetsDeadlinesOfAnEarlierRecordingOnly) {
-  session_->setSoftStopTime(TimeValue{1000, 0});
+  const auto inAnHour = std::time(nullptr) + 3600;
+  session_->setSoftStopTime(TimeValue{inAnHour, 0});
+  session_->setHardStopTime(TimeValue{inAnHour, 0});
+  run("START RecordingMetadata_RECORDING_UUID=R,RecordingMetadata_MAX_RECORDING_MINUTES=0,"
+      "RecordingMetadata_UNATTENDED_RECORDING_MINUTES=0\n");
+  EXPECT_FALSE(session_->hardStopTime()) << "that of the recording before";
+  EXPECT_FALSE(session_->softStopTime());
   run(kStart);
   const auto own = session_->hardStopTime();
   EXPECT_TRUE(own);

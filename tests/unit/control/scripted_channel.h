@@ -33,7 +33,11 @@ class TurnedClock : public ChannelClock {
     time->tv_sec += ahead_seconds;
     return time;
   }
-  void sleep(std::chrono::milliseconds span, int) override { sleeps.add(std::to_string(span.count())); }
+  std::atomic<bool> real_sleep{false};
+  void sleep(std::chrono::milliseconds span, int wake, int other) override {
+    sleeps.add(std::to_string(span.count()));
+    if (real_sleep) systemChannelClock().sleep(span, wake, other);
+  }
 };
 
 /// Takes lines as they are and collects replies. Connections come from `on_connect`, set before the thread

@@ -129,19 +129,28 @@ TEST_F(Tunnel, ARefusalCountsOnlyWhenItCameInPieces) {
   const UniqueFd peer = acceptWithHello();
   send(peer, "ERR Unbound agent\n");
   ASSERT_TRUE(log_.waitFor(2, "Internal error occurred during decryption"));
+  // The answer proves that the whole line has been dealt with, and that what came behind its own line waits.
+  send(peer, encrypted("STOP") + "ERR Unb");
+  EXPECT_FALSE(PlayedServer::readLine(peer).empty());
   EXPECT_EQ(context_->serverRejectTime(), 0);
-  send(peer, "ERR Unb");
-  ASSERT_TRUE(testing::waitUntil([&] {  // the first piece has been taken
-    int unread = 0;
-    return ::ioctl(peer.get(), TIOCOUTQ, &unread) == 0 && unread == 0;
-  }));
-  std::this_thread::sleep_for(std::chrono::milliseconds(100));
   send(peer, "ound agent\n");
   ASSERT_TRUE(log_.waitFor(4, "Server rejected agent connection, sleeping for one minute."));
   // The time is set behind the line.
   ASSERT_TRUE(testing::waitUntil([&] { return tunnel_.threadHasEnded(); }));
   EXPECT_NEAR(static_cast<double>(context_->serverRejectTime()), static_cast<double>(std::time(nullptr)),
               2.0);
+}
+
+TEST_F(Tunnel, InItsBackOffItHearsThePreviousConnection) {
+  clock_.real_sleep = true;
+  ASSERT_TRUE(tunnel_.initWithAgentContext());
+  const UniqueFd old = acceptWithHello();
+  context_->setTunnel_port("9");  // nobody there
+  tunnel_.setNetTransitionTime(1);
+  ASSERT_TRUE(log_.waitFor(6, "Failed to connect to server, retrying in 5 seconds."));
+  send(old, encrypted("STOP"));
+  EXPECT_FALSE(PlayedServer::readLine(old).empty());
+  EXPECT_EQ(journal_.entries(), std::vector<std::string>{"stopRecording"});
 }
 
 TEST_F(Tunnel, AReplyBeforeTheHelloIsNotSent) {

@@ -1,4 +1,5 @@
 // The deadlines: setting them, hitting them, what the auto-shutoff does.
+#include "record/stop_times.h"
 #include "support/heap_ptr.h"
 #include "tests/unit/record/engine_fixture.h"
 
@@ -141,6 +142,30 @@ TEST_F(StopTimes, OnlyPassedDeadlinesAreForgotten) {
   session_->setRecordHardStopTimeSeconds(3000);
   session_->clearPassedDeadlines();
   EXPECT_TRUE(session_->hardStopTime());
+}
+
+TEST_F(StopTimes, DeadlinesFollowAClockThatIsSet) {
+  session_->setMaxUnattendedRecordingMinutes(1);
+  session_->updateSoftStopTime();
+  session_->setRecordHardStopTimeSeconds(60);
+  const auto hard = session_->hardStopTime();
+  const auto soft = session_->softStopTime();
+  session_->followWallClock(wallClockOffset() - 3600);
+  EXPECT_EQ(session_->hardStopTime()->tv_sec, hard->tv_sec - 3600);
+  EXPECT_EQ(session_->softStopTime()->tv_sec, soft->tv_sec - 3600);
+  // An hour forward again, which the check itself must notice.
+  EXPECT_FALSE(session_->shouldStopRecording());
+  EXPECT_NEAR(static_cast<double>(session_->hardStopTime()->tv_sec), static_cast<double>(hard->tv_sec), 1);
+  EXPECT_NEAR(static_cast<double>(session_->softStopTime()->tv_sec), static_cast<double>(soft->tv_sec), 1);
+  EXPECT_TRUE(log_.waitForPart("The clock was set by"));
+}
+
+TEST_F(StopTimes, AutoShutoffLeavesTheDeadlinesOfTheNextRecording) {
+  session_->setHardStopTime(TimeValue{1000, 0});
+  actions_.on_stop_recording = [this] { session_->setHardStopTime(TimeValue{2000, 0}); };
+  session_->doAutoShutoff();
+  ASSERT_TRUE(session_->hardStopTime());
+  EXPECT_EQ(session_->hardStopTime()->tv_sec, 2000);
 }
 
 TEST_F(StopTimes, BeginningIsTheStartOrElseThePreparation) {
