@@ -1,5 +1,4 @@
 // The way of a stopped recording: movie, properties document, job.
-#include <unistd.h>
 
 #include "agent/agent_main.h"
 #include "platform/log.h"
@@ -200,7 +199,7 @@ bool AgentMain::announceStop(const std::shared_ptr<AgentRecord>& session, const 
     context_->setRunning(false);
     return true;
   }
-  const bool documented = access(job->properties_file_path().value_or("").c_str(), F_OK) == 0;
+  const bool documented = job->documented();
   context_->postProcessListAddJob(std::move(job));
   return documented;
 }

@@ -59,7 +59,9 @@ class AgentSubmit {
   [[nodiscard]] bool tryWriteProperties() const;
   /// The same for a recording that goes on to the tool. Always 0: a failed write is left to the tool to
   /// complain of.
-  int writeProperties() const;
+  int writeProperties();
+  /// Whether the last writeProperties() has left a document behind.
+  [[nodiscard]] bool documented() const { return documented_; }
 
   /// The submission with its log lines. @return 0 when the job ended normally, -1 when the submission failed.
   int addRecordingWithCommentary(ChildRunner& children);
@@ -78,6 +80,7 @@ class AgentSubmit {
   Text recording_file_path_;
   Text properties_file_path_;
   bool canceled_ = false;
+  bool documented_ = false;
   Text adhoc_workflow_uuid_;
 };
 

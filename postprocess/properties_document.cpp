@@ -47,8 +47,8 @@ bool AgentSubmit::tryWriteProperties() const {
   return true;
 }
 
-int AgentSubmit::writeProperties() const {
-  static_cast<void>(tryWriteProperties());
+int AgentSubmit::writeProperties() {
+  documented_ = tryWriteProperties();
   return 0;
 }
 

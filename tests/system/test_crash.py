@@ -49,6 +49,26 @@ def test_a_killed_daemon_loses_at_most_a_second(running):
     assert running.repository() == ["CRASH.mov", "CRASH.xml"], "nothing else stays"
 
 
+@pytest.mark.parametrize("damage, uuid", [(lambda text: bytes(len(text)), None), (lambda text: b"", None),
+                                          (lambda text: re.sub(rb"run .*\n", b"", text), "CRASH")],
+                         ids=["zeros", "empty", "a line gone"])
+def test_a_damaged_journal_loses_nothing(running, damage, uuid):
+    running.start_recording("CRASH", RecordingMetadata_TITLE="Half a talk")
+    time.sleep(3)
+    running.kill9()
+    (journal,) = running.path(f"{REPOSITORY}/.lmxagentd").glob("*/journal")
+    journal.write_bytes(damage(journal.read_bytes()))
+    mark = running.log.mark()
+    running.start()
+    running.log.wait("^The journal of .* is damaged: all that was captured is kept as one recording$", level=3,
+                     after=mark)
+    document = recovered(running, uuid or journal.parent.name, mark)
+    assert document.get("RecordingMetadata_TITLE") == ("Half a talk" if uuid else None)
+    path = running.movie(uuid or journal.parent.name)
+    movie.decodes(path)
+    assert movie.streams(path)["video"].duration > 1.5
+
+
 def test_a_recovered_recording_is_left_alone_by_the_next_start(running):
     running.start_recording("CRASH")
     time.sleep(2)

@@ -83,3 +83,25 @@ def test_a_repository_that_fills_up_in_the_middle(agent):
     assert recorded.exists(), "what was recorded before the disk was full"
     movie.decodes(recorded)
     assert movie.streams(recorded)["video"].duration > 2
+
+
+def test_a_document_that_finds_no_room_is_written_by_the_next_start(agent):
+    agent.preferences(RecordingDiskSpaceCutoffInMB="0")
+    agent.start()
+    assert agent.start_recording("A", RecordingMetadata_TITLE="A talk").text == "cmdStatus=0"
+    time.sleep(2)
+    blocked = agent.path(f"{REPOSITORY}/A.xml")
+    blocked.mkdir()  # the document can't be renamed over it
+    (blocked / "x").touch()
+    agent.command("STOP")
+    agent.wait_recorded("A")
+    agent.log.wait('^The properties document ".*A.xml" could not be written: ')
+    agent.wait_tool_call("A", event="end")
+    (blocked / "x").unlink()
+    blocked.rmdir()
+    assert agent.stop() == 0
+    mark = agent.log.mark()
+    agent.start()
+    agent.log.wait("^Recovered unfinished recording", after=mark)
+    assert agent.document("A")["RecordingMetadata_TITLE"] == "A talk"
+    movie.decodes(agent.movie("A"))

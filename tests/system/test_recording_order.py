@@ -93,14 +93,16 @@ def test_two_recordings_in_quick_succession(running):
 
 
 def test_the_same_identifier_twice(running):
-    for _ in range(2):
-        assert running.start_recording("AGAIN").text == "cmdStatus=0"
+    for title in ("First", "Second"):
+        assert running.start_recording("AGAIN", RecordingMetadata_TITLE=title).text == "cmdStatus=0"
         time.sleep(1)
         mark = running.log.mark()
         running.command("STOP")
         running.wait_recorded("AGAIN", after=mark)
-    movie.decodes(running.movie("AGAIN"))
     wait_until(lambda: len(running.tool_calls("end")) == 2, 20, "two submissions")
+    for uuid, title in (("AGAIN-replaced", "First"), ("AGAIN", "Second")):
+        movie.decodes(running.movie(uuid))
+        assert running.document(uuid)["RecordingMetadata_TITLE"] == title
 
 
 def test_commands_that_lack_parameters(running):

@@ -52,6 +52,23 @@ TEST_F(MainLoop, AMissedDeviceIsLookedForAfterMoreThanTenSeconds) {
   EXPECT_FALSE(log_.mentions(kOffline));
 }
 
+TEST_F(MainLoop, AClockThatIsSetBackDoesNotKeepTheAgentOffline) {
+  checkedDevice(-3600);
+  EXPECT_TRUE(turn());
+  EXPECT_EQ(context_->last_device_check(), 0);
+}
+
+TEST_F(MainLoop, ASecondSignalWhileTheTunnelClosesIsHarmless) {
+  for (int round = 0; round < 20; ++round) {
+    checkedDevice(11);
+    ASSERT_TRUE(turn());  // opens the tunnel
+    agent_.mainRunLoop().post([&] { agent_.shutDownControl(); }, Wait::no);
+    agent_.shutDownControl();  // turns the loop until the tunnel's thread has ended
+    turnTheLoop();
+  }
+  EXPECT_EQ(log_.count(7, "Process shutDownControl"), 40);
+}
+
 TEST_F(MainLoop, ADeviceThatIsStillMissingEndsTheDaemon) {
   framework_->cameras_attach = false;
   checkedDevice(11);
