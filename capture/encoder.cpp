@@ -133,8 +133,8 @@ Encoder::~Encoder() {
 }
 
 void Encoder::pushVideo(GstBuffer* buffer, std::uint32_t place, bool forceKey) {
+  if (failed()) return;
   if (forceKey) {
-    const GstHandle<GstPad> pad(gst_element_get_static_pad(video_source_.get(), "src"));
     // Sent into the stream behind the frames already queued: appsrc serialises events with its buffers.
     gst_element_send_event(video_source_.get(),
                            gst_video_event_new_downstream_force_key_unit(
@@ -149,6 +149,7 @@ void Encoder::pushVideo(GstBuffer* buffer, std::uint32_t place, bool forceKey) {
 }
 
 void Encoder::pushAudio(const float* samples, std::uint32_t count) {
+  if (failed()) return;
   const std::size_t bytes = std::size_t{count} * static_cast<std::size_t>(audio_->channels) * sizeof(float);
   GstBuffer* buffer = gst_buffer_new_allocate(nullptr, bytes, nullptr);
   if (samples != nullptr) {
@@ -198,16 +199,28 @@ GstBusSyncReply Encoder::onMessage(GstBus* /*bus*/, GstMessage* message, gpointe
     GError* raw = nullptr;
     gst_message_parse_error(message, &raw, nullptr);
     const ErrorHandle error(raw);
-    auto& encoder = *static_cast<Encoder*>(self);
-    {
-      const std::lock_guard lock(encoder.mutex_);
-      encoder.failed_ = true;
-      encoder.changed_.notify_all();
-    }
-    encoder.output_.onError(error ? error->message : "the encoder failed");
+    static_cast<Encoder*>(self)->fail(error ? error->message : "the encoder failed");
   }
   gst_message_unref(message);
   return GST_BUS_DROP;
+}
+
+void Encoder::fail(const std::string& problem) {
+  {
+    const std::lock_guard lock(mutex_);
+    if (std::exchange(failed_, true)) return;
+    changed_.notify_all();
+  }
+  // Nothing empties their queues any more: a feeder that waits for room would wait for ever.
+  for (const auto& source : {&video_source_, &audio_source_}) {
+    if (*source) gst_app_src_set_max_buffers(GST_APP_SRC(source->get()), 0);
+  }
+  output_.onError(problem);
+}
+
+bool Encoder::failed() {
+  const std::lock_guard lock(mutex_);
+  return failed_;
 }
 
 void Encoder::takeVideo(GstSample* sample) {

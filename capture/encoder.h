@@ -56,6 +56,7 @@ class Encoder {
   Encoder& operator=(const Encoder&) = delete;
 
   /// Encodes `buffer` as frame number `place`; blocks while the encoder is more than a few frames behind.
+  /// Does nothing once it has failed.
   void pushVideo(GstBuffer* buffer, std::uint32_t place, bool forceKey);
   /// Encodes `count` samples of all channels from `samples` on; null for silence.
   void pushAudio(const float* samples, std::uint32_t count);
@@ -70,6 +71,8 @@ class Encoder {
   static GstFlowReturn onAudioSample(GstElement* sink, gpointer self) noexcept;
   static void onEos(GstElement* sink, gpointer self) noexcept;
   static GstBusSyncReply onMessage(GstBus* bus, GstMessage* message, gpointer self) noexcept;
+  void fail(const std::string& problem);
+  [[nodiscard]] bool failed();
   void takeVideo(GstSample* sample);
   void takeAudio(GstSample* sample);
 
