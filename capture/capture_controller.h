@@ -82,6 +82,7 @@ class CaptureController : public LMRCaptureController,
 
   // The recorder's thread.
   void run();
+  void recordUntilTheEnd();
   bool takeItems(Items& video, Items& audio);
   [[nodiscard]] bool reachedEnd() const;
   void feedVideo(const Item& item);

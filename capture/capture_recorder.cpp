@@ -2,6 +2,7 @@
 #include <cerrno>
 #include <cmath>
 #include <cstring>
+#include <exception>
 
 #include "capture/capture_controller.h"
 #include "platform/log.h"
@@ -69,6 +70,15 @@ void CaptureController::fatal(const CaptureError& error) {
 // ---- the recorder's thread
 
 void CaptureController::run() {
+  try {
+    recordUntilTheEnd();
+  } catch (const std::exception& problem) {  // no memory, no thread: what there is becomes the movie
+    fatal({CaptureError::kDomain, kEncoderFailed, problem.what()});
+  }
+  finishCapture();
+}
+
+void CaptureController::recordUntilTheEnd() {
   for (;;) {
     Items video;
     Items audio;
@@ -78,7 +88,6 @@ void CaptureController::run() {
     checkLimits();
     if (!more || reachedEnd()) break;
   }
-  finishCapture();
 }
 
 /// Waits for something to do. @return false when the time for the end has run out.

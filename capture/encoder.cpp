@@ -41,6 +41,10 @@ std::string audioDescription(const AudioEncoding& audio) {
       audio.bitRate);
 }
 
+/// What a broken driver gives must not end the recording: the encoder refuses what is no number, and of a
+/// sample far beyond full scale it makes a packet that players can't read.
+float soundLevel(float sample) { return std::isnan(sample) ? 0.0F : std::clamp(sample, -1.0F, 1.0F); }
+
 Bytes codecData(GstSample* sample) {
   const GstStructure* structure = gst_caps_get_structure(gst_sample_get_caps(sample), 0);
   const GValue* value = gst_structure_get_value(structure, "codec_data");
@@ -152,11 +156,17 @@ void Encoder::pushAudio(const float* samples, std::uint32_t count) {
   if (failed()) return;
   const std::size_t bytes = std::size_t{count} * static_cast<std::size_t>(audio_->channels) * sizeof(float);
   GstBuffer* buffer = gst_buffer_new_allocate(nullptr, bytes, nullptr);
-  if (samples != nullptr) {
-    gst_buffer_fill(buffer, 0, samples, bytes);
-  } else {
-    gst_buffer_memset(buffer, 0, 0, bytes);
+  GstMapInfo map;
+  if (gst_buffer_map(buffer, &map, GST_MAP_WRITE) == FALSE) {
+    gst_buffer_unref(buffer);
+    return;
   }
+  if (samples != nullptr) {
+    std::transform(samples, samples + bytes / sizeof(float), reinterpret_cast<float*>(map.data), soundLevel);
+  } else {
+    std::memset(map.data, 0, bytes);
+  }
+  gst_buffer_unmap(buffer, &map);
   const auto time = [this](std::int64_t position) {
     return gst_util_uint64_scale(static_cast<guint64>(position), GST_SECOND,
                                  static_cast<guint64>(audio_->sampleRate));

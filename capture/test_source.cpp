@@ -1,6 +1,7 @@
 // Pad probes behind the synthetic sources.
 #include "capture/test_source.h"
 
+#include <gst/audio/audio.h>
 #include <gst/video/video.h>
 
 #include <cstring>
@@ -66,14 +67,36 @@ void draw(GstBuffer* buffer, const Probe& probe) {
   gst_video_frame_unmap(&frame);
 }
 
+/// Makes silence of what lies between the ticks. The source leaves a tick's first sample as it finds it in
+/// memory, which may be louder than any sound.
+void clearBetweenTicks(GstPad* pad, GstBuffer* buffer) {
+  const CapsHandle caps(gst_pad_get_current_caps(pad));
+  GstAudioInfo format;
+  if (!caps || gst_audio_info_from_caps(&format, caps.get()) == FALSE) return;
+  GstMapInfo map;
+  if (gst_buffer_map(buffer, &map, GST_MAP_WRITE) == FALSE) return;
+  const auto rate = static_cast<std::uint64_t>(format.rate);
+  const auto frameSize = static_cast<std::size_t>(format.bpf);
+  const std::uint64_t first = GST_BUFFER_OFFSET(buffer);
+  for (std::size_t i = 0; (i + 1) * frameSize <= map.size; ++i) {
+    // A tick fills the last hundredth of a second and begins with a zero.
+    if ((first + i) % rate <= rate - rate / 100) std::memset(map.data + i * frameSize, 0, frameSize);
+  }
+  gst_buffer_unmap(buffer, &map);
+}
+
 GstPadProbeReturn onBuffer(GstPad* pad, GstPadProbeInfo* info, gpointer user) noexcept {
   const auto& probe = *static_cast<Probe*>(user);
   GstBuffer* buffer = GST_PAD_PROBE_INFO_BUFFER(info);
   const double seconds = static_cast<double>(GST_BUFFER_PTS(buffer)) / 1e9;
   const GstPadProbeReturn fault = playFault(pad, probe, seconds);
-  if (fault != GST_PAD_PROBE_OK || !probe.video) return fault;
+  if (fault != GST_PAD_PROBE_OK) return fault;
   buffer = gst_buffer_make_writable(buffer);
   GST_PAD_PROBE_INFO_DATA(info) = buffer;
+  if (!probe.video) {
+    clearBetweenTicks(pad, buffer);
+    return GST_PAD_PROBE_OK;
+  }
   Probe timed = probe;
   timed.frameSeconds = static_cast<double>(GST_BUFFER_DURATION(buffer)) / 1e9;
   draw(buffer, timed);

@@ -66,6 +66,7 @@ void AgentControlBase::threadBody() noexcept {
     run();
   } catch (const std::exception& problem) {
     LMPLogMessage(logContext(), kLogCritical, "Control channel has ended: %s", problem.what());
+    closeSockets();  // a peer must not wait for answers that nobody gives
   }
   thread_id_ = std::thread::id();  // the system may give it to another thread from now on
   thread_ended_ = true;

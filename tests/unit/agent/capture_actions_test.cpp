@@ -34,6 +34,16 @@ TEST_F(Actions, PrepareLeavesItsResultInTheStatus) {
   EXPECT_TRUE(log_.contains(3, "An error occurred during recording (1)"));
 }
 
+TEST_F(Actions, APreparationThatRunsOutOfMemoryIsNoRecording) {
+  framework_->on_new_controller = [](auto&) { throw std::bad_alloc(); };
+  context_->setStatus(0);  // what a START sets beforehand
+  agent_.mainRunLoop().adoptThread();
+  EXPECT_TRUE(agent_.perform(&AgentActions::prepareCapture, Wait::untilDone));
+  EXPECT_EQ(context_->status(), kRecordNotRunning);
+  framework_->on_new_controller = nullptr;
+  start("R1");  // finds no lock that was left behind
+}
+
 TEST_F(Actions, PreviewActionsLogAndSucceedAlsoWithoutACamera) {
   context_->setStatus(9);
   agent_.startPreview();

@@ -3,7 +3,10 @@
 
 #include <gtest/gtest.h>
 
+#include <array>
+#include <atomic>
 #include <future>
+#include <limits>
 #include <thread>
 
 #include "capture/gst_handles.h"
@@ -37,6 +40,29 @@ TEST(Encoder, AFailureIsToldOnceAndDoesNotHoldUpItsFeeder) {
   EXPECT_FALSE(encoder->finish(0, 1s));
   if (!ended) _exit(1);  // the feeder can't be joined
   feeder.join();
+}
+
+TEST(Encoder, SoundThatIsNoSoundDoesNotEndIt) {
+  ensureGStreamer();
+  constexpr float kNone = std::numeric_limits<float>::quiet_NaN();
+  constexpr float kEndless = std::numeric_limits<float>::infinity();
+  testing::Journal problems;
+  std::string problem;
+  std::atomic<int> packets{0};
+  EncoderOutput output;
+  output.onFormat = [](std::uint32_t, TrackFormat) {};
+  output.onSample = [&](const EncodedSample&) { ++packets; };
+  output.onError = [&](const std::string& what) { problems.add(what); };
+  const auto encoder = Encoder::create(std::nullopt, AudioEncoding{}, output, &problem);
+  ASSERT_TRUE(encoder) << problem;
+  std::vector<float> samples(2 * 480, 0.1F);
+  for (int i = 0; i < 100; ++i) {
+    samples[static_cast<std::size_t>(i)] = std::array{kNone, kEndless, -kEndless, 1e30F, 153.0F}[i % 5];
+    encoder->pushAudio(samples.data(), 480);
+  }
+  EXPECT_TRUE(encoder->finish(48000, 20s));
+  EXPECT_TRUE(problems.entries().empty());
+  EXPECT_EQ(packets, 47) << "48,000 samples in packets of 1,024, begun ones too";
 }
 
 }  // namespace
