@@ -65,7 +65,7 @@ class AgentTest : public ::testing::Test {
     EXPECT_EQ(context_->status(), 0);
     session_->setRequest_uuid("request of " + uuid);
     session_->setRequest_properties(context_->properties());
-    const Controller made = framework_->controller(framework_->controllersMade() - 1);
+    Controller made = framework_->controller(framework_->controllersMade() - 1);
     made->state = 3;
     return made;
   }

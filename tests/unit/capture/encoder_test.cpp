@@ -55,7 +55,7 @@ TEST(Encoder, SoundThatIsNoSoundDoesNotEndIt) {
   output.onError = [&](const std::string& what) { problems.add(what); };
   const auto encoder = Encoder::create(std::nullopt, AudioEncoding{}, output, &problem);
   ASSERT_TRUE(encoder) << problem;
-  std::vector<float> samples(2 * 480, 0.1F);
+  std::vector<float> samples(std::size_t{2} * 480, 0.1F);
   for (int i = 0; i < 100; ++i) {
     samples[static_cast<std::size_t>(i)] = std::array{kNone, kEndless, -kEndless, 1e30F, 153.0F}[i % 5];
     encoder->pushAudio(samples.data(), 480);

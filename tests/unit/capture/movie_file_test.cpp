@@ -168,7 +168,7 @@ TEST(ReadMovieIndex, AnyCorruptionIsSurvived) {
 
 /// A capture folder as a killed process leaves it: half a second a fragment, marks from 0 on.
 std::string crashedCapture(const Folder& repository, const std::string& journal, std::uint32_t fragments) {
-  const std::string folder = captureFolderOf(repository.path()) + "/capture";
+  std::string folder = captureFolderOf(repository.path()) + "/capture";
   std::filesystem::create_directories(folder);
   std::ofstream(folder + "/journal") << journal;
   write(folder + "/media.mov", fragments, false);
@@ -265,7 +265,7 @@ TEST(Recovery, WithoutMediaLeavesNothing) {
   const std::string folder = captureFolderOf(repository.path()) + "/capture";
   std::filesystem::create_directories(folder);
   std::ofstream(folder + "/journal") << kJournal;
-  std::ofstream(folder + "/media.mov");
+  const std::ofstream empty(folder + "/media.mov");
   EXPECT_TRUE(FinishedCapture::openAbandoned(folder)->recoverPending(repository.path()).empty());
   EXPECT_TRUE(std::filesystem::is_empty(repository.path()));
 }
@@ -371,7 +371,7 @@ TEST(FrameRate, TelevisionRatesAreExact) {
 }
 
 TEST(TestPicture, FrameNumberSurvivesAnyValue) {
-  std::vector<std::uint8_t> bytes(64 * 36, 90);
+  std::vector<std::uint8_t> bytes(std::size_t{64} * 36, 90);
   const LumaPlane plane{bytes, 64, 36, 64};
   for (const std::uint32_t number : {0U, 1U, 0x80000000U, 0xFFFFFFFFU, 123456789U}) {
     drawFrameNumber(plane, number);

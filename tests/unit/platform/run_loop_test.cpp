@@ -372,6 +372,7 @@ TEST(RunLoop, ManyPostersLoseNothing) {
   int total = 0;  // touched on this thread only
   std::atomic<int> running{kThreads};
   std::vector<std::thread> posters;
+  posters.reserve(kThreads);
   for (int t = 0; t < kThreads; ++t) {
     posters.emplace_back([&] {
       for (int i = 0; i < kEach; ++i) {
