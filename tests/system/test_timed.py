@@ -3,6 +3,8 @@ import datetime
 import plistlib
 import time
 
+import pytest
+
 from harness import movie
 from harness.agent import REPOSITORY
 from harness.waiting import wait_until
@@ -111,6 +113,17 @@ def test_a_hard_stop_ends_and_submits(running):
     running.wait_tool_call("A")
     assert 3 <= movie.streams(running.movie("A"))["video"].duration < 20
     assert running.command("STATUS").fields["recordStatus"] == "0"
+
+
+@pytest.mark.limit(150)
+def test_a_minute_without_a_command_ends_and_submits(running):
+    assert running.start_recording("A", minutes="60", unattended="1").text == "cmdStatus=0"
+    begin = time.monotonic()
+    running.log.wait("^Agent recording hit soft stop time: ", level=5, timeout=90)
+    assert 58 < time.monotonic() - begin < 80, "the first check behind the minute"
+    running.log.wait("^Doing Auto-Shutoff: Video$", level=5)
+    running.wait_tool_call("A")
+    assert 58 < movie.streams(running.movie("A"))["video"].duration < 80
 
 
 def test_no_limits_never_end_it(running):

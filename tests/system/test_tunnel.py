@@ -146,6 +146,9 @@ def test_half_a_line_and_silence(agent, server):
     assert agent.command("STATUS").fields["cmdStatus"] == "0"
     server.hang_up()
     server.accept()
+    server.send("STOP")  # joins what was left over, as it would on the same connection
+    agent.log.wait(NO_COMMAND)
+    assert server.command("STOP") == "cmdStatus=0"
 
 
 def test_a_server_killed_in_mid_command(agent, server):
@@ -224,6 +227,17 @@ def test_taking_leave(agent, server, version):
             server.read_line()
     assert agent.wait_exit() == 0
     assert len(agent.log.lines("going offline")) == version - 1
+
+
+def test_a_server_that_hears_no_leave_taking_holds_nobody_up(agent, server):
+    server.send("SERVER version=2,server_uuid=5E1F0A52-6B1D-4E8C-9A52-0F6C4C1B7E11")
+    agent.log.wait("^Command: SERVER took")
+    server.deaf()
+    begin = time.monotonic()
+    agent.sandbox.signal(15)
+    assert agent.wait_exit(30) == 0
+    assert time.monotonic() - begin < 15
+    agent.log.wait("^Notifying the server that the agent is going offline$", level=6)
 
 
 def in_network(agent, *command):

@@ -69,6 +69,10 @@ class TunnelServer:
         self.send(text)
         return self.reply()
 
+    def deaf(self):
+        """New connections find nobody; the one in hand stays."""
+        self._listener.close()
+
     def hang_up(self):
         self.peer.close()
 

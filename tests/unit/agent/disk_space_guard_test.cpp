@@ -31,9 +31,10 @@ class DiskSpaceGuard : public AgentTest {
 };
 
 TEST_F(DiskSpaceGuard, LeavesARecordingAloneWhileThereIsSpace) {
-  start("R1");
+  start("R1")->devices_run = true;
   agent_.checkDiskSpace();
   EXPECT_EQ(journalCount("controller stopRecording"), 0);
+  EXPECT_FALSE(log_.mentions("recording disabled"));
   EXPECT_TRUE(context_->running());
 }
 
