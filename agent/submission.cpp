@@ -1,5 +1,4 @@
 // The way of a stopped recording: movie, properties document, job.
-
 #include "agent/agent_main.h"
 #include "platform/log.h"
 #include "platform/work_queue.h"

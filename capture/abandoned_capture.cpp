@@ -59,6 +59,21 @@ CaptureRecord wholeOf(const CaptureRecord& damaged, const MovieIndex& index, con
   return record;
 }
 
+std::uint32_t framesIn(const MovieIndex& index, double frameSeconds) {
+  return static_cast<std::uint32_t>(std::floor(index.tracks.front().seconds() / frameSeconds + 1e-3));
+}
+
+/// Frames of the movie that all of the media have become, for its document; 0 when there is no such movie.
+std::uint32_t framesOfTheMovie(const CaptureRecord& record) {
+  for (const auto& [uuid, path] : record.movies) {
+    const Request* request = record.marks.find(uuid);
+    if (request == nullptr || !request->pending()) continue;
+    const auto index = readMovieIndex(path);
+    if (index && record.frameSeconds > 0) return framesIn(*index, record.frameSeconds);
+  }
+  return 0;
+}
+
 std::shared_ptr<FinishedCapture> leftAlone(const std::string& path, const char* why) {
   LMPLogMessage(
       nullptr, kLogError,
@@ -87,7 +102,8 @@ std::shared_ptr<FinishedCapture> FinishedCapture::openAbandoned(const std::strin
 
   CaptureRecord record = parseJournal(*text);
   if (!index || index->tracks.front().sizes.empty()) {
-    return std::make_shared<FinishedCapture>(folder, std::move(journal), std::move(record), 0);
+    const std::uint32_t frames = mediaSize == 0 ? framesOfTheMovie(record) : 0;
+    return std::make_shared<FinishedCapture>(folder, std::move(journal), std::move(record), frames);
   }
   if (!record.intact || record.runs.empty()) {
     LMPLogMessage(nullptr, kLogError,
@@ -95,8 +111,7 @@ std::shared_ptr<FinishedCapture> FinishedCapture::openAbandoned(const std::strin
                   folder.c_str());
     record = wholeOf(record, *index, folder);
   }
-  const auto frames =
-      static_cast<std::uint32_t>(std::floor(index->tracks.front().seconds() / record.frameSeconds + 1e-3));
+  const std::uint32_t frames = framesIn(*index, record.frameSeconds);
   const bool torn = mediaSize > index->mediaEnd + kTornTailLimit;
   if (torn) {
     LMPLogMessage(nullptr, kLogError,

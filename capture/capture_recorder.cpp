@@ -279,10 +279,10 @@ void CaptureController::closeMedia() {
           std::string("the movie may be damaged, the disk has not kept all of it: ") + std::strerror(error)};
     }
   }
-  if (const int error = close_error) {
+  if (close_error != 0) {
     LMPLogMessage(nullptr, kLogError,
                   "The movie could not be closed in order (%s); it stays readable as it is",
-                  std::strerror(error));
+                  std::strerror(close_error));
   }
 }
 

@@ -88,6 +88,7 @@ def test_a_repository_that_fills_up_in_the_middle(agent):
 def test_a_document_that_finds_no_room_is_written_by_the_next_start(agent):
     agent.preferences(RecordingDiskSpaceCutoffInMB="0")
     agent.start()
+    started = time.time()
     assert agent.start_recording("A", RecordingMetadata_TITLE="A talk").text == "cmdStatus=0"
     time.sleep(2)
     blocked = agent.path(f"{REPOSITORY}/A.xml")
@@ -103,5 +104,8 @@ def test_a_document_that_finds_no_room_is_written_by_the_next_start(agent):
     mark = agent.log.mark()
     agent.start()
     agent.log.wait("^Recovered unfinished recording", after=mark)
-    assert agent.document("A")["RecordingMetadata_TITLE"] == "A talk"
+    document = agent.document("A")
+    assert document["RecordingMetadata_TITLE"] == "A talk"
+    assert int(document["RecordingMetadata_DURATION"]) in (1, 2, 3)
+    assert abs(int(document["RecordingMetadata_START_DATE"]) - started) < 3
     movie.decodes(agent.movie("A"))

@@ -212,6 +212,8 @@ TEST(Recovery, OfAMovieThatOnlyLacksItsDocument) {
   const auto recovered = FinishedCapture::openAbandoned(folder)->recoverPending(repository.path());
   ASSERT_EQ(recovered.size(), 1U);
   EXPECT_EQ(recovered[0].path, repository.file("LECTURE.mov"));
+  EXPECT_NEAR(recovered[0].duration, 1.0, 1e-6);
+  EXPECT_NEAR(recovered[0].startTime, 1000.0, 1e-6);
 }
 
 TEST(Recovery, CancelledAndHandedOverRequestsDoNotComeBack) {
