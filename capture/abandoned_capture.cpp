@@ -17,6 +17,8 @@ namespace {
 
 /// What a writer that died may have left behind its last whole fragment: one fragment is half a second.
 constexpr std::uint64_t kTornTailLimit = 16U << 20;
+/// The same where there is no whole fragment at all.
+constexpr std::uint64_t kTornStartLimit = 2U << 20;
 
 std::optional<std::string> readAll(const std::string& path) {
   std::ifstream in(path, std::ios::binary);
@@ -59,6 +61,12 @@ CaptureRecord wholeOf(const CaptureRecord& damaged, const MovieIndex& index, con
   return record;
 }
 
+/// Whether `index` can be of a movie whose writer has died, rather than of a file that a disk has damaged.
+bool makesSense(const MovieIndex& index, std::uint64_t fileSize) {
+  const TrackIndex& lead = index.tracks.front();
+  return lead.sizes.empty() ? fileSize <= index.mediaEnd + kTornStartLimit : lead.totalDuration > 0;
+}
+
 std::uint32_t framesIn(const MovieIndex& index, double frameSeconds) {
   return static_cast<std::uint32_t>(std::floor(index.tracks.front().seconds() / frameSeconds + 1e-3));
 }
@@ -99,6 +107,7 @@ std::shared_ptr<FinishedCapture> FinishedCapture::openAbandoned(const std::strin
   if (!text) return leftAlone(journalPath, "input/output error");
   const auto index = readMovieIndex(media);
   if (mediaSize > 0 && !index) return leftAlone(media, "it holds no movie header, or could not be opened");
+  if (index && !makesSense(*index, mediaSize)) return leftAlone(media, "its fragments are damaged");
 
   CaptureRecord record = parseJournal(*text);
   if (!index || index->tracks.front().sizes.empty()) {

@@ -325,6 +325,22 @@ TEST(Recovery, WhatCannotBeReadIsLeftAlone) {
   EXPECT_TRUE(std::filesystem::exists(folder + "/media.mov") && std::filesystem::exists(folder + "/journal"));
 }
 
+TEST(Recovery, MediaWhoseFirstFragmentIsDamagedStay) {
+  testing::LogCapture log;
+  const Folder repository;
+  const std::string folder = crashedCapture(repository, kJournal, 4);
+  const auto first = readMovieIndex(folder + "/media.mov")->tracks[0].chunks[0].offset;
+  std::fstream media(folder + "/media.mov", std::ios::in | std::ios::out | std::ios::binary);
+  media.seekp(static_cast<std::streamoff>(first - 40));  // in its head
+  media << std::string(40, '\0');
+  media.seekp(0, std::ios::end);
+  media << std::string(3U << 20, 'x');
+  media.close();
+  EXPECT_FALSE(FinishedCapture::openAbandoned(folder));
+  EXPECT_TRUE(log.waitForPart("its fragments are damaged"));
+  EXPECT_GT(std::filesystem::file_size(folder + "/media.mov"), 3U << 20);
+}
+
 TEST(Recovery, MediaWithABadBlockInTheMiddleStayAsTheyAre) {
   const Folder repository;
   const std::string folder = crashedCapture(repository, kJournal, 4);
