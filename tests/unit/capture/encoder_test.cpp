@@ -11,6 +11,7 @@
 
 #include "capture/gst_handles.h"
 #include "tests/unit/doubles/journal.h"
+#include "tests/unit/doubles/wait_until.h"
 
 namespace lmx {
 namespace {
@@ -36,10 +37,12 @@ TEST(Encoder, AFailureIsToldOnceAndDoesNotHoldUpItsFeeder) {
   });
   const bool ended = fed.get_future().wait_for(20s) == std::future_status::ready;
   EXPECT_TRUE(ended) << "the feeder waits for an encoder that takes nothing any more";
-  EXPECT_EQ(problems.entries().size(), 1U);
   EXPECT_FALSE(encoder->finish(0, 1s));
   if (!ended) _exit(1);  // the feeder can't be joined
   feeder.join();
+  EXPECT_TRUE(testing::waitUntil([&] { return !problems.entries().empty(); }));
+  encoder = nullptr;  // with its threads: nothing more can be told
+  EXPECT_EQ(problems.entries().size(), 1U);
 }
 
 TEST(Encoder, SoundThatIsNoSoundDoesNotEndIt) {
