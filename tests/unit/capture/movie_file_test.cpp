@@ -325,17 +325,26 @@ TEST(Recovery, WhatCannotBeReadIsLeftAlone) {
   EXPECT_TRUE(std::filesystem::exists(folder + "/media.mov") && std::filesystem::exists(folder + "/journal"));
 }
 
+/// Makes fragment `number` of the media in `folder` unreadable and puts `behind` bytes behind the last one,
+/// as a bad block in the middle of a long recording looks to the reader. @return where the fragment's samples
+/// begin
+std::uint64_t damageFragment(const std::string& folder, std::size_t number, std::size_t behind) {
+  const auto index = readMovieIndex(folder + "/media.mov");
+  if (!index) return 0;
+  const std::uint64_t samples = index->tracks[0].chunks[number].offset;
+  std::fstream media(folder + "/media.mov", std::ios::in | std::ios::out | std::ios::binary);
+  media.seekp(static_cast<std::streamoff>(samples - 40));  // in its head
+  media << std::string(40, '\0');
+  media.seekp(0, std::ios::end);
+  media << std::string(behind, 'x');
+  return samples;
+}
+
 TEST(Recovery, MediaWhoseFirstFragmentIsDamagedStay) {
   testing::LogCapture log;
   const Folder repository;
   const std::string folder = crashedCapture(repository, kJournal, 4);
-  const auto first = readMovieIndex(folder + "/media.mov")->tracks[0].chunks[0].offset;
-  std::fstream media(folder + "/media.mov", std::ios::in | std::ios::out | std::ios::binary);
-  media.seekp(static_cast<std::streamoff>(first - 40));  // in its head
-  media << std::string(40, '\0');
-  media.seekp(0, std::ios::end);
-  media << std::string(3U << 20, 'x');
-  media.close();
+  ASSERT_GT(damageFragment(folder, 0, 3U << 20), 0U);
   EXPECT_FALSE(FinishedCapture::openAbandoned(folder));
   EXPECT_TRUE(log.waitForPart("its fragments are damaged"));
   EXPECT_GT(std::filesystem::file_size(folder + "/media.mov"), 3U << 20);
@@ -344,16 +353,8 @@ TEST(Recovery, MediaWhoseFirstFragmentIsDamagedStay) {
 TEST(Recovery, MediaWithABadBlockInTheMiddleStayAsTheyAre) {
   const Folder repository;
   const std::string folder = crashedCapture(repository, kJournal, 4);
-  const auto index = readMovieIndex(folder + "/media.mov");
-  ASSERT_TRUE(index);
-  // The third fragment is unreadable, and a lot stands behind it.
-  const std::uint64_t third = index->tracks[0].chunks[2].offset;
-  std::fstream media(folder + "/media.mov", std::ios::in | std::ios::out | std::ios::binary);
-  media.seekp(static_cast<std::streamoff>(third - 40));  // in its head
-  media << std::string(40, '\0');
-  media.seekp(0, std::ios::end);
-  media << std::string(20U << 20, 'x');
-  media.close();
+  const std::uint64_t third = damageFragment(folder, 2, 20U << 20);
+  ASSERT_GT(third, 0U);
   const auto size = std::filesystem::file_size(folder + "/media.mov");
   const auto recovered = FinishedCapture::openAbandoned(folder)->recoverPending(repository.path());
   ASSERT_EQ(recovered.size(), 1U);
