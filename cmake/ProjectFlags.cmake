@@ -2,7 +2,7 @@
 add_library(project_flags INTERFACE)
 target_compile_options(project_flags INTERFACE
   -Wall -Wextra -Wpedantic -Wshadow -Wconversion -Wnon-virtual-dtor -Wformat=2 -Wno-missing-field-initializers -Werror)
-target_include_directories(project_flags INTERFACE ${CMAKE_SOURCE_DIR})
+target_include_directories(project_flags INTERFACE ${CMAKE_SOURCE_DIR}/src ${CMAKE_SOURCE_DIR})
 target_link_libraries(project_flags INTERFACE Threads::Threads)
 if(LMX_SANITIZE)
   target_compile_options(project_flags INTERFACE -fsanitize=${LMX_SANITIZE} -fno-omit-frame-pointer -O1)

@@ -17,7 +17,7 @@
 #include <string>
 #include <vector>
 
-#include "control/agent_control.h"
+#include "control/tunnel/agent_control.h"
 #include "record/agent_record.h"
 #include "support/unique_fd.h"
 

@@ -10,8 +10,8 @@ from pathlib import Path
 HERE = Path(__file__).resolve().parent
 TOP = HERE.parents[1]
 # What the daemon's synthetic camera is made of.
-CAMERA_SOURCES = ("capture/test_source.cpp", "capture/test_picture.cpp", "capture/device_id.cpp",
-                  "capture/gst_handles.cpp", "support/format.cpp")
+CAMERA_SOURCES = ("src/capture/source/test_source.cpp", "src/capture/source/test_picture.cpp", "src/capture/source/device_id.cpp",
+                  "src/capture/gst/gst_handles.cpp", "src/support/format.cpp")
 X264 = re.compile(rb"x264 - core [^\0]*?options: ([^\0]+)\0")
 
 

@@ -4,8 +4,8 @@
 
 #include <string>
 
-#include "capture/device_id.h"
-#include "capture/test_source.h"
+#include "capture/source/device_id.h"
+#include "capture/source/test_source.h"
 
 namespace {
 

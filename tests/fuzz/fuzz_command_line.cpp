@@ -5,9 +5,9 @@
 #include <cstdlib>
 #include <string_view>
 
-#include "control/command_parser.h"
-#include "control/command_text.h"
-#include "control/line_assembler.h"
+#include "control/protocol/command_parser.h"
+#include "control/protocol/command_text.h"
+#include "control/protocol/line_assembler.h"
 #include "support/utf8.h"
 
 namespace {

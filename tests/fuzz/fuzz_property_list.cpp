@@ -5,7 +5,7 @@
 #include <cstdlib>
 #include <string>
 
-#include "platform/property_list.h"
+#include "platform/plist/property_list.h"
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
   const lmx::PlistResult result = lmx::parsePropertyList({reinterpret_cast<const char*>(data), size});

@@ -5,7 +5,7 @@
 #include <cstdlib>
 #include <string>
 
-#include "control/message_cipher.h"
+#include "control/tunnel/message_cipher.h"
 #include "support/base64.h"
 #include "support/heap_ptr.h"
 

@@ -22,7 +22,7 @@ def complete(*words):
 
 
 def test_these_are_all_options():
-    source = (ROOT / "agent/command_line.cpp").read_text()
+    source = (ROOT / "src/cli/command_line.cpp").read_text()
     assert sorted(re.findall(r'\{"(\w+)", (?:required|no)_argument', source)) == sorted(name[2:] for name in LONG)
     letters = re.search(r'kShortOptions = "([^"]+)"', source)[1].replace(":", "")
     assert sorted(f"-{letter}" for letter in letters) == sorted(SHORT)

@@ -5,8 +5,8 @@
 #include <map>
 #include <string_view>
 
-#include "control/message_cipher.h"
-#include "platform/property_list.h"
+#include "control/tunnel/message_cipher.h"
+#include "platform/plist/property_list.h"
 #include "support/base64.h"
 #include "support/heap_ptr.h"
 

@@ -1,5 +1,5 @@
 // A disk that loses data: fdatasync of this program, which fails on demand.
-#include "failing_sync.h"
+#include "tests/unit/capture/failing_sync.h"
 
 #include <sys/syscall.h>
 #include <unistd.h>

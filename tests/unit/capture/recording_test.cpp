@@ -7,10 +7,10 @@
 #include <fstream>
 #include <thread>
 
-#include "capture_harness.h"
-#include "failing_sync.h"
-#include "movie_check.h"
 #include "support/time_value.h"
+#include "tests/unit/capture/capture_harness.h"
+#include "tests/unit/capture/failing_sync.h"
+#include "tests/unit/capture/movie/movie_check.h"
 #include "tests/unit/doubles/log_capture.h"
 
 namespace lmx {

@@ -7,7 +7,7 @@
 #include <utility>
 #include <vector>
 
-#include "agent/context/agent_actions.h"
+#include "model/agent_actions.h"
 #include "tests/unit/doubles/journal.h"
 
 namespace lmx::testing {

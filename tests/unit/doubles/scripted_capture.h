@@ -9,7 +9,7 @@
 #include <utility>
 #include <vector>
 
-#include "record/capture_framework.h"
+#include "capture/api/capture_framework.h"
 #include "tests/unit/doubles/journal.h"
 
 namespace lmx::testing {

@@ -8,7 +8,7 @@
 #include <string>
 
 #include "platform/paths.h"
-#include "platform/property_list.h"
+#include "platform/plist/property_list.h"
 #include "tests/unit/doubles/temporary_directory.h"
 
 namespace lmx::testing {

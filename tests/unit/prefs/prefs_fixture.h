@@ -12,7 +12,7 @@
 
 #include "platform/log.h"
 #include "platform/paths.h"
-#include "platform/property_list.h"
+#include "platform/plist/property_list.h"
 #include "prefs/agent_preferences.h"
 #include "tests/unit/doubles/log_capture.h"
 #include "tests/unit/prefs/temporary_root.h"

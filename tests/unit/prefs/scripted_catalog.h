@@ -5,7 +5,7 @@
 #include <set>
 #include <string>
 
-#include "prefs/capture_settings.h"
+#include "capture/api/capture_settings.h"
 
 namespace lmx::testing {
 

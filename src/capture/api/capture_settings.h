@@ -1,0 +1,74 @@
+// What a capture is to be: the recording context, and the catalogue of devices and compressions it is built
+// from.
+#pragma once
+#include <cstdint>
+#include <memory>
+#include <optional>
+#include <string>
+
+#include "model/agent_context.h"
+#include "support/dictionary.h"
+
+namespace lmx {
+
+/// The capture framework's numbering of what is recorded; not that of the recording types.
+enum class CaptureType { audioAndVideo = 0, audio = 1, video = 2, file = 3 };
+enum class MediaType { audio = 0, video = 1 };
+enum class RecordingQuality { good = 0, better = 1, best = 2 };
+
+/// How one medium is encoded.
+struct LMRCompressionOptions {
+  MediaType media = MediaType::video;
+  RecordingQuality quality = RecordingQuality::better;
+  int sampleRate = 48000;  ///< Hz, audio
+  int channels = 2;        ///< audio
+  bool operator==(const LMRCompressionOptions&) const = default;
+};
+
+/// The settings of one capture. Filled by AgentPreferences, completed by the engine, read by the framework.
+struct LMRRecordingContext {
+  std::string uuid;
+  CaptureType captureType = CaptureType::audioAndVideo;
+  bool audioEnabled = false;
+  bool videoEnabled = false;
+  bool previewEnabled = false;
+  std::optional<std::string> videoDeviceID;
+  std::optional<std::string> audioDeviceID;  ///< absent: the framework's default device
+  std::optional<LMRCompressionOptions> videoCompressionOptions;
+  std::optional<LMRCompressionOptions> audioCompressionOptions;
+  std::string captureTempDir;  ///< the recording repository
+  std::int64_t diskSpaceCutoffInMB = 0;
+  std::int64_t previewIntervalInMilliseconds = 0;
+  std::string previewImagePath;
+  LMRContinuousRecordingInfo continuous;
+  // Set by the engine:
+  std::string outputPath;                ///< final name of the movie
+  std::uint32_t maxDurationMinutes = 0;  ///< 0: no limit
+  double maximumFrameRate = 30.0;        ///< frames per second
+};
+
+/// One line in words, for the log and the -i option.
+std::string describe(const LMRRecordingContext& context);
+
+/// The capture framework's device information and compression settings. Thread-safe.
+class CaptureCatalog {
+ public:
+  virtual ~CaptureCatalog() = default;
+  /// Unique identifier of the machine's default camera, real hardware only; nothing when there is none.
+  virtual std::optional<std::string> defaultVideoDevice() = 0;
+  /// The same for devices that carry picture and sound in one stream.
+  virtual std::optional<std::string> defaultMuxedDevice() = 0;
+  virtual bool hasDevice(const std::string& uniqueID) = 0;
+  struct PreferredAudio {
+    std::optional<std::string> uniqueID;
+    bool isMuxedAudioOfVideoDevice = false;
+  };
+  /// The microphone that belongs to `videoDevice`.
+  virtual PreferredAudio preferredAudioDevice(const std::string& videoDevice) = 0;
+  /// Whether `audioDevice` names a usable device; absent asks for the default one.
+  virtual bool audioDeviceUsable(const std::optional<std::string>& audioDevice) = 0;
+  virtual std::optional<LMRCompressionOptions> compressionOptions(MediaType media,
+                                                                  RecordingQuality quality) = 0;
+};
+
+}  // namespace lmx

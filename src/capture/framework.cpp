@@ -1,0 +1,129 @@
+// Devices, compressions, controllers and the recovery of unfinished captures.
+#include "capture/framework.h"
+
+#include <dirent.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <iterator>
+
+#include "capture/capture_controller.h"
+#include "capture/preview_controller.h"
+#include "capture/source/device_list.h"
+#include "capture/source/devices.h"
+#include "capture/store/finished_capture.h"
+#include "platform/log.h"
+#include "platform/paths.h"
+
+namespace lmx {
+namespace {
+
+std::vector<std::string> subfolders(const std::string& folder) {
+  std::vector<std::string> names;
+  DIR* directory = opendir(folder.c_str());
+  if (directory == nullptr) return names;
+  while (const dirent* entry = readdir(directory)) {
+    if (entry->d_name[0] != '.') names.push_back(folder + "/" + entry->d_name);
+  }
+  closedir(directory);
+  return names;
+}
+
+class GstCaptureFramework : public CaptureFramework {
+ public:
+  std::optional<std::string> defaultVideoDevice() override { return identifierOfFirst(true); }
+  // Devices that carry both are cameras with a microphone of their own here; files and streams are never a
+  // default.
+  std::optional<std::string> defaultMuxedDevice() override { return std::nullopt; }
+
+  bool hasDevice(const std::string& uniqueID) override {
+    const DeviceID id = parseDeviceID(uniqueID);
+    switch (id.kind) {
+      case DeviceKind::test:
+      case DeviceKind::network:
+        return true;
+      case DeviceKind::file:
+        return access(id.name.c_str(), R_OK) == 0;
+      case DeviceKind::hardware:
+        return findHardware(uniqueID).has_value();
+      case DeviceKind::unknown:
+        break;
+    }
+    return false;
+  }
+
+  PreferredAudio preferredAudioDevice(const std::string& videoDevice) override {
+    const DeviceID id = parseDeviceID(videoDevice);
+    if (id.kind == DeviceKind::test) {
+      return {id.asFastAsPossible() ? "test://audio?speed=max" : "test://audio", false};
+    }
+    if (id.kind == DeviceKind::file || id.kind == DeviceKind::network) return {videoDevice, true};
+    return microphoneFor(listHardware(), videoDevice);
+  }
+
+  bool audioDeviceUsable(const std::optional<std::string>& audioDevice) override {
+    return audioDevice ? hasDevice(*audioDevice) : identifierOfFirst(false).has_value();
+  }
+
+  std::optional<LMRCompressionOptions> compressionOptions(MediaType media,
+                                                          RecordingQuality quality) override {
+    return LMRCompressionOptions{.media = media, .quality = quality};
+  }
+
+  std::shared_ptr<LMRCaptureController> newCaptureController() override {
+    return std::make_shared<CaptureController>([] { return identifierOfFirst(false); });
+  }
+
+  std::unique_ptr<LMRPreviewController> newPreviewController(
+      std::shared_ptr<CaptureSession> session) override {
+    return std::make_unique<PreviewController>(std::move(session));
+  }
+
+  void warmUp() override;
+  std::string deviceInformation() override { return deviceListText(listHardware()); }
+  std::vector<RecoveredRecording> recoverUnfinished(const std::string& repository) override;
+
+ private:
+  static std::optional<std::string> identifierOfFirst(bool video) {
+    const auto devices = listHardware();
+    const HardwareDevice* device = firstDevice(devices, video);
+    return device == nullptr ? std::nullopt : std::optional(device->uniqueID);
+  }
+};
+
+void GstCaptureFramework::warmUp() {
+  // The first use of the plug-ins loads their libraries: a recording should not wait for that.
+  ensureGStreamer();
+  for (const char* name : {"x264enc", "avenc_aac", "appsrc", "appsink", "videoconvert", "videoscale",
+                           "videorate", "audioconvert", "audioresample", "decodebin"}) {
+    const GstHandle<GstElementFactory> factory(gst_element_factory_find(name));
+    if (!factory) {
+      LMPLogMessage(nullptr, kLogError,
+                    "The GStreamer element %s is missing: recordings will fail; install its package", name);
+      continue;
+    }
+    if (GstElement* element = gst_element_factory_create(factory.get(), nullptr)) {
+      gst_object_ref_sink(element);
+      gst_element_set_state(element, GST_STATE_READY);
+      gst_element_set_state(element, GST_STATE_NULL);
+      gst_object_unref(element);
+    }
+  }
+}
+
+std::vector<RecoveredRecording> GstCaptureFramework::recoverUnfinished(const std::string& repository) {
+  std::vector<RecoveredRecording> all;
+  for (const std::string& folder : subfolders(captureFolderOf(repository))) {
+    const std::shared_ptr<FinishedCapture> capture = FinishedCapture::openAbandoned(folder);
+    if (!capture) continue;  // still being recorded by another process, or nothing of ours
+    auto recordings = capture->recoverPending(repository);
+    std::move(recordings.begin(), recordings.end(), std::back_inserter(all));
+  }
+  return all;
+}
+
+}  // namespace
+
+std::shared_ptr<CaptureFramework> newCaptureFramework() { return std::make_shared<GstCaptureFramework>(); }
+
+}  // namespace lmx

@@ -1,0 +1,61 @@
+// Opening a camera for a look.
+#include "capture/preview_controller.h"
+
+#include "capture/source/devices.h"
+#include "platform/log.h"
+
+namespace lmx {
+
+bool PreviewController::attachIOWithDevice(const std::string& device, CaptureError* error) {
+  CaptureSource source;
+  source.videoDevice = device;
+  const auto lease = CapturePipeline::acquire(source, error);
+  if (!lease) return false;
+  const auto hardware = findHardware(device);
+  const std::lock_guard lock(mutex_);
+  source_ = source;
+  name_ = hardware ? hardware->name : device;
+  return true;
+}
+
+void PreviewController::addAudioDeviceWithID(const std::optional<std::string>& device) {
+  const std::lock_guard lock(mutex_);
+  source_.audioDevice = device;
+}
+
+std::string PreviewController::videoDeviceLocalizedDisplayName() const {
+  const std::lock_guard lock(mutex_);
+  return name_;
+}
+
+void PreviewController::setDelegate(std::shared_ptr<LMRPreviewControllerDelegate> delegate) {
+  const std::lock_guard lock(mutex_);
+  delegate_ = std::move(delegate);
+}
+
+std::shared_ptr<CaptureSession> PreviewController::session() const {
+  const std::lock_guard lock(mutex_);
+  if (lease_) return lease_;
+  return session_;
+}
+
+void PreviewController::startPreview() {
+  const std::lock_guard lock(mutex_);
+  if (lease_) return;
+  CaptureError error;
+  lease_ = CapturePipeline::acquire(source_, &error);
+  if (!lease_)
+    LMPLogMessage(nullptr, kLogError, "The preview could not be started: %s", error.message.c_str());
+}
+
+void PreviewController::stopPreview() {
+  const std::lock_guard lock(mutex_);
+  lease_ = nullptr;
+}
+
+bool PreviewController::isPreviewRunning() const {
+  const std::lock_guard lock(mutex_);
+  return lease_ != nullptr;
+}
+
+}  // namespace lmx

@@ -1,0 +1,32 @@
+// A camera looked at without recording: proves that it can be had, and holds it open while a preview runs.
+#pragma once
+#include <mutex>
+#include <string>
+
+#include "capture/source/capture_pipeline.h"
+
+namespace lmx {
+
+/// The device is open only while a preview runs: a lit lamp in an empty room is a complaint. Thread-safe.
+class PreviewController : public LMRPreviewController {
+ public:
+  explicit PreviewController(std::shared_ptr<CaptureSession> session) : session_(std::move(session)) {}
+  bool attachIOWithDevice(const std::string& device, CaptureError* error) override;
+  void addAudioDeviceWithID(const std::optional<std::string>& device) override;
+  [[nodiscard]] std::string videoDeviceLocalizedDisplayName() const override;
+  void setDelegate(std::shared_ptr<LMRPreviewControllerDelegate> delegate) override;
+  [[nodiscard]] std::shared_ptr<CaptureSession> session() const override;
+  void startPreview() override;
+  void stopPreview() override;
+  [[nodiscard]] bool isPreviewRunning() const override;
+
+ private:
+  mutable std::mutex mutex_;
+  std::shared_ptr<CaptureSession> session_;                 // guarded by mutex_
+  std::shared_ptr<LMRPreviewControllerDelegate> delegate_;  // guarded by mutex_
+  CaptureSource source_;                                    // guarded by mutex_
+  std::string name_;                                        // guarded by mutex_
+  CapturePipeline::Lease lease_;                            // guarded by mutex_
+};
+
+}  // namespace lmx

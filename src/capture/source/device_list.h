@@ -1,0 +1,26 @@
+// The machine's capture devices: which one is the default, which microphone goes with a camera, and all of
+// them in words.
+#pragma once
+#include <string>
+#include <vector>
+
+#include "capture/api/capture_settings.h"
+#include "capture/source/devices.h"
+
+namespace lmx {
+
+/// What "Automatic" takes: the first camera or the first microphone.
+const HardwareDevice* firstDevice(const std::vector<HardwareDevice>& devices, bool video);
+
+/// The camera's own microphone, else the first one.
+CaptureCatalog::PreferredAudio microphoneFor(const std::vector<HardwareDevice>& devices,
+                                             const std::string& cameraID);
+
+/// For people: by media type, each device's identifier as the preferences want it, its name, its formats,
+/// which one "Automatic" takes and a camera's microphone; last the devices that need no hardware.
+std::string deviceListText(const std::vector<HardwareDevice>& devices);
+
+/// Picture sizes with their frame rates, or sample rates with their channels, the largest first.
+std::string formatsText(const GstCaps* caps, bool video);
+
+}  // namespace lmx

@@ -1,0 +1,115 @@
+// Fragments to the disk.
+#include "capture/store/movie_writer.h"
+
+#include <algorithm>
+#include <chrono>
+#include <cstring>
+
+#include "platform/log.h"
+
+namespace lmx {
+
+using namespace std::chrono_literals;
+
+MovieWriter::MovieWriter(GrowingMovie movie, std::size_t trackCount, Journal& journal,
+                         std::function<void(int)> onError)
+    : movie_(std::move(movie)), journal_(journal), on_error_(std::move(onError)), formats_(trackCount) {
+  thread_ = std::thread([this] { run(); });
+}
+
+MovieWriter::~MovieWriter() { finish(); }
+
+void MovieWriter::setFormat(std::uint32_t track, TrackFormat format) {
+  const std::lock_guard lock(mutex_);
+  formats_[track] = std::move(format);
+  changed_.notify_all();
+}
+
+void MovieWriter::add(EncodedSample sample) {
+  std::unique_lock lock(mutex_);
+  changed_.wait(lock, [this] { return queued_bytes_ < kQueueLimit || ending_ || error_ != 0; });
+  if (error_ != 0) return;
+  queued_bytes_ += sample.data.size();
+  if (sample.track == 0) lead_duration_ += sample.duration;
+  queue_.push_back(std::move(sample));
+  if (fragmentDue()) changed_.notify_all();
+}
+
+bool MovieWriter::fragmentDue() const {
+  if (!std::all_of(formats_.begin(), formats_.end(), [](const auto& f) { return f.has_value(); }))
+    return false;
+  return lead_duration_ * 2 >= formats_.front()->timescale;  // half a second
+}
+
+void MovieWriter::run() {
+  auto lastSync = std::chrono::steady_clock::now();
+  for (;;) {
+    std::vector<EncodedSample> samples;
+    bool last = false;
+    {
+      std::unique_lock lock(mutex_);
+      changed_.wait(lock, [this] { return ending_ || fragmentDue(); });
+      last = ending_;
+      samples.swap(queue_);
+      queued_bytes_ = 0;
+      lead_duration_ = 0;
+      changed_.notify_all();
+    }
+    if (error_ == 0) writeFragment(std::move(samples));
+    if (last) return;
+    const auto now = std::chrono::steady_clock::now();
+    if (error_ == 0 && now - lastSync >= 1s) {
+      lastSync = now;
+      syncToDisk();
+    }
+  }
+}
+
+void MovieWriter::syncToDisk() {
+  const int movie = movie_.sync();
+  const int journal = journal_.sync();
+  const int error = movie != 0 ? movie : journal;
+  if (error == 0 || sync_error_ != 0) return;
+  sync_error_ = error;
+  LMPLogMessage(nullptr, kLogError, "The disk has not kept what was recorded (%s); the recording goes on",
+                std::strerror(error));
+}
+
+void MovieWriter::writeFragment(std::vector<EncodedSample> samples) {
+  if (samples.empty()) return;
+  int error = 0;
+  if (!movie_.begun()) {
+    std::vector<TrackFormat> formats;
+    {
+      const std::lock_guard lock(mutex_);
+      for (const auto& format : formats_) {
+        if (!format) return;  // ended before every track had begun: there is no movie
+        formats.push_back(*format);
+      }
+    }
+    error = movie_.begin(formats);
+  }
+  if (error == 0) error = movie_.append(samples);
+  if (error == 0) return;
+  error_ = error;
+  {
+    const std::lock_guard lock(mutex_);
+    changed_.notify_all();
+  }
+  on_error_(error);
+}
+
+int MovieWriter::finish() {
+  if (!thread_.joinable()) return error_;
+  {
+    const std::lock_guard lock(mutex_);
+    ending_ = true;
+    changed_.notify_all();
+  }
+  thread_.join();
+  if (!movie_.begun()) return error_;
+  const int error = movie_.finish();
+  return error_ != 0 ? error_.load() : error;
+}
+
+}  // namespace lmx

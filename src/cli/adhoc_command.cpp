@@ -1,0 +1,46 @@
+// Building the ad-hoc client's commands.
+#include "cli/adhoc_command.h"
+
+namespace lmx {
+namespace {
+
+/// The same for every ad-hoc start: a client knows no server that could have given out others.
+constexpr const char* kRecordingUUID = "90201534-37B5-482F-AD57-C3762F5020E1";
+constexpr const char* kWorkflowUUID = "DEFA1587-A650-426E-92DA-01C5EB811705";
+
+std::string startParameters(const AgentContext& context) {
+  std::string text = std::string("RecordingMetadata_RECORDING_UUID=") + kRecordingUUID;
+  const auto add = [&text](const char* key, const std::string& value) {
+    text.append(",").append(key).append("=").append(value);
+  };
+  const auto addIfSet = [&add](const char* key, const AgentContext::Text& value) {
+    if (value) add(key, *value);
+  };
+  add("RecordingMetadata_MAX_RECORDING_MINUTES", std::to_string(context.duration()));
+  add("RecordingMetadata_UNATTENDED_RECORDING_MINUTES", std::to_string(context.unattended()));
+  add("RecordingMetadata_ADHOC_WORKFLOW_UUID", kWorkflowUUID);
+  if (context.submit_disabled()) add("RecordingMetadata_ADHOC_SUBMIT_DISABLED", "1");
+  addIfSet("RecordingMetadata_AGENT_USERNAME", context.user());
+  addIfSet("RecordingMetadata_AGENT_PASSWORD", context.password());
+  addIfSet("RecordingMetadata_ADHOC_FILE_PATH", context.adhoc_output_file());
+  return text;
+}
+
+}  // namespace
+
+std::string adHocCommand(const AgentContext& context) {
+  switch (context.adhoc_request_type()) {
+    case kAdHocStatus:
+      return "STATUS include_preview=true\n";
+    case kAdHocTimerList:
+      return "TIMEDCMD command=TIMERLIST\n";
+    case kAdHocTimerRevoke:
+      return "TIMEDCMD command=TIMERREVOKE,TimerID=" + context.timer_id().value_or("") + "\n";
+    default:
+      break;
+  }
+  const auto time = context.start_timer();
+  return (time ? "TIMEDCMD time=" + *time + ",command=START," : "START ") + startParameters(context) + "\n";
+}
+
+}  // namespace lmx

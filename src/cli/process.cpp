@@ -1,0 +1,54 @@
+// From main to the exit status.
+#include "cli/process.h"
+
+#include <malloc.h>
+
+#include <clocale>
+#include <memory>
+
+#include "agent/agent_main.h"
+#include "platform/log.h"
+#include "platform/notifications.h"
+#include "platform/paths.h"
+#include "support/heap_ptr.h"
+
+namespace lmx {
+namespace {
+
+constexpr int kExitOperatingSystem = 71;
+
+std::shared_ptr<ServiceManager> newServiceManager() {
+  return systemPath("").empty() ? newSystemServiceManager() : newPrivateServiceManager();
+}
+
+int runAgent(int argc, char** argv, std::shared_ptr<CaptureFramework> framework) {
+  // The character type alone: numbers in replies must keep their decimal point.
+  if (std::setlocale(LC_CTYPE, "C.UTF-8") == nullptr) return kExitOperatingSystem;
+  // Never destroyed: it lives until the process ends.
+  static AgentMain& agent =
+      *std::make_unique<AgentMain>(
+           newAgentContext(),
+           AgentEnvironment{std::move(framework), newServiceManager(), &systemChildRunner()})
+           .release();
+  const heap_ptr<TimeValue> launched(lmp_gettimeofday());
+  if (!launched) return kExitOperatingSystem;
+  agent.agentContext()->setLaunch_time(*launched);
+  agent.agentContext()->setRunning(true);
+  int exitCode = 0;
+  return agent.parseArgs(argv, argc, &exitCode) ? agent.startup() : exitCode;
+}
+
+}  // namespace
+
+int runAgentProcess(int argc, char** argv, std::shared_ptr<CaptureFramework> framework) {
+  // Many short-lived threads touch the heap: with an arena each, memory would grow from recording to
+  // recording.
+  mallopt(M_ARENA_MAX, 2);
+  const int status = runAgent(argc, argv, std::move(framework));
+  notify_post("com.zandor.lmxagentd.stopped");
+  postDistributedNotification("com.zandor.lmxagentd.stopped");
+  LMPLogMessage(nullptr, kLogInfo, "lmxagentd stopped");
+  return status;
+}
+
+}  // namespace lmx

@@ -1,0 +1,84 @@
+// STATUS: what the recorder does, with the camera's profile and a preview image when asked for.
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include "control/channel/agent_control_base.h"
+#include "control/protocol/audio_levels.h"
+#include "control/protocol/command_parser.h"
+#include "control/protocol/status_reply.h"
+#include "record/agent_record.h"
+#include "record/engine.h"
+#include "support/base64.h"
+#include "support/heap_ptr.h"
+
+namespace lmx {
+namespace {
+
+/// A preview is a still image: more than this is another file by mistake, and would fill the memory and the
+/// line.
+constexpr off_t kLargestPreview = 16 << 20;
+
+/// The file's bytes in Base64; nothing when there are none to be had.
+std::optional<std::string> base64OfFile(const std::string& path) {
+  struct stat file {};
+  if (::stat(path.c_str(), &file) != 0 || file.st_size < 1 || file.st_size > kLargestPreview)
+    return std::nullopt;
+  const UniqueFd descriptor(::open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK));
+  if (!descriptor.valid()) return std::nullopt;
+  std::string bytes(static_cast<std::size_t>(file.st_size), '\0');
+  const ssize_t length = ::read(descriptor.get(), bytes.data(), bytes.size());
+  if (length < 1) return std::nullopt;
+  const heap_ptr<char> text(lmp_encode_base64(bytes.data(), static_cast<std::size_t>(length), nullptr));
+  if (!text) return std::nullopt;
+  return text.get();
+}
+
+std::optional<std::string> previewImage(const AgentContext& context) {
+  const auto file = context.preview_file();
+  return file ? base64OfFile(*file) : std::nullopt;
+}
+
+/// Levels of the running recording; an idle recorder listens to nothing.
+std::vector<double> powerLevels(const AgentRecord* session, int recordStatus) {
+  const auto capture =
+      session != nullptr && recordStatus != kRecorderIdle ? session->captureController() : nullptr;
+  return capture ? capture->audioAveragePowerLevels() : std::vector<double>();
+}
+
+bool recordingTypeSupportsVideoPreview(const AgentRecord* session) {
+  return session != nullptr && (session->recordingType() == kRecordingTypeAudioVideo ||
+                                session->recordingType() == kRecordingTypeVideo);
+}
+
+}  // namespace
+
+void AgentControlBase::handleSTATUS(const Dictionary* parameters) {
+  const auto context = agentContext();
+  if (!context) {
+    LMPLogMessage(nullptr, kLogError, "No agent context");
+    return;
+  }
+  const bool include_preview = isTrue(parameters, "include_preview");
+  const auto session = context->record_context();
+  const auto preview = include_preview ? previewImage(*context) : std::nullopt;
+
+  RecordStatus status;
+  const int cmdStatus = LXAgentRecordGetStatus(session, &status);
+  std::string reply = statusFields(cmdStatus, status);
+  if (reply.empty()) {
+    LMPLogMessage(context->log_context(), kLogError, "Could not build a response string");
+    return;
+  }
+  if (isTrue(parameters, "include_profile")) {
+    reply += "," + profileFields(context->machine_name(), context->tunnel_host(), context->capture_preset());
+  }
+  if (preview) {
+    reply += "," + previewFields(audioLevels(powerLevels(session.get(), status.recordStatus)), *preview);
+  } else if (include_preview && recordingTypeSupportsVideoPreview(session.get())) {
+    LMPLogMessage(context->log_context(), kLogDebug, "preview buffer is NULL");
+  }
+  sendReply(reply);
+}
+
+}  // namespace lmx

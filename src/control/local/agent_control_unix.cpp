@@ -1,0 +1,75 @@
+// The local control socket: commands of local tools, in plain text, from one peer at a time.
+#include "control/local/agent_control_unix.h"
+
+#include <sys/socket.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <cstring>
+
+#include "control/channel/plain_text.h"
+#include "platform/net/local_socket.h"
+#include "platform/paths.h"
+#include "support/format.h"
+
+namespace lmx {
+namespace {
+
+constexpr int kBacklog = 1024;
+
+}  // namespace
+
+AgentControlUnix::~AgentControlUnix() {
+  cleanup();
+  stop();
+  cleanup();  // the thread may have made the file only now
+}
+
+void AgentControlUnix::cleanup() {
+  const std::string path = socket_path_.exchange({});
+  if (!path.empty()) ::unlink(path.c_str());
+}
+
+int AgentControlUnix::run() {
+  const int listening = localConnect();
+  if (listening != 0 && running()) {
+    LMPLogMessage(logContext(), kLogError, "The local control socket %s could not be set up: %s",
+                  systemPath(kLocalSocket).c_str(), std::strerror(listening));
+  }
+  const int result = listening == 0 ? AgentControlBase::run() : -1;
+  localDomainSocket_.reset();
+  return result;
+}
+
+/// Sets up the listener and waits for the first peer. @return 0, or the errno of the set-up.
+int AgentControlUnix::localConnect() {
+  logInfo("Connecting local pipe");
+  const std::string path = systemPath(kLocalSocket);
+  const auto address = localSocketAddress(path);
+  if (!address) return ENAMETOOLONG;
+  localDomainSocket_.reset(::socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC | SOCK_NONBLOCK, 0));
+  if (!localDomainSocket_.valid()) return errno;
+  const int on = 1;
+  ::setsockopt(localDomainSocket_.get(), SOL_SOCKET, SO_REUSEADDR, &on, sizeof on);
+  ::setsockopt(localDomainSocket_.get(), SOL_SOCKET, SO_REUSEPORT, &on, sizeof on);
+
+  ::unlink(path.c_str());  // left by an agent that was killed
+  if (::bind(localDomainSocket_.get(), reinterpret_cast<const sockaddr*>(&*address), sizeof *address) != 0)
+    return errno;
+  socket_path_.set(path);
+  if (::listen(localDomainSocket_.get(), kBacklog) != 0) return errno;
+  localAccept();  // a peer that could not be taken on is the next turn's business
+  return 0;
+}
+
+std::optional<std::string> AgentControlUnix::commandFromReceivedData(const std::string& line) {
+  return plainCommand(line, logContext());
+}
+
+void AgentControlUnix::sendReply(const std::string& reply) {
+  const std::lock_guard lock(sendMutex());
+  const int error = sendPlainReply(serverSocket(), reply, wakeDescriptor());
+  if (error != 0) logDebug(formatted("Could not answer to tunnel (errno = %d)", error));
+}
+
+}  // namespace lmx

@@ -1,0 +1,54 @@
+// Small text rules of the command protocol: what is trimmed, what is counted, what is hidden from the log.
+#include "control/protocol/command_text.h"
+
+#include <algorithm>
+#include <array>
+#include <cstdlib>
+#include <limits>
+
+namespace lmx {
+namespace {
+
+using namespace std::string_view_literals;
+
+constexpr std::array kLineBreaks{"\n"sv, "\v"sv, "\f"sv, "\r"sv, "\u0085"sv, "\u2028"sv, "\u2029"sv};
+
+}  // namespace
+
+std::string_view trimLineBreaks(std::string_view text) {
+  const auto cutFront = [&](std::string_view end) {
+    const bool found = text.starts_with(end);
+    if (found) text.remove_prefix(end.size());
+    return found;
+  };
+  const auto cutBack = [&](std::string_view end) {
+    const bool found = text.ends_with(end);
+    if (found) text.remove_suffix(end.size());
+    return found;
+  };
+  while (std::any_of(kLineBreaks.begin(), kLineBreaks.end(), cutFront)) {
+  }
+  while (std::any_of(kLineBreaks.begin(), kLineBreaks.end(), cutBack)) {
+  }
+  return text;
+}
+
+std::int32_t decimalValue(const std::string& text) {
+  using Limits = std::numeric_limits<std::int32_t>;
+  const long long value = std::strtoll(text.c_str(), nullptr, 10);
+  return static_cast<std::int32_t>(std::clamp<long long>(value, Limits::min(), Limits::max()));
+}
+
+std::string withoutSecrets(std::string_view command) {
+  constexpr auto kKey = "RecordingMetadata_AGENT_PASSWORD="sv;
+  std::string shown;
+  for (auto found = command.find(kKey); found != std::string_view::npos; found = command.find(kKey)) {
+    shown.append(command.substr(0, found + kKey.size())).append("****");
+    command.remove_prefix(found + kKey.size());
+    // A value ends at the next comma, whatever blanks or equals signs it holds.
+    command.remove_prefix(std::min(command.find(','), command.size()));
+  }
+  return shown.append(command);
+}
+
+}  // namespace lmx

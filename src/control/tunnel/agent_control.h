@@ -1,0 +1,52 @@
+// The server tunnel: we connect, say who we are in clear, then every line is encrypted.
+#pragma once
+#include <array>
+#include <atomic>
+#include <chrono>
+#include <memory>
+#include <mutex>
+#include <optional>
+#include <string>
+
+#include "control/channel/agent_control_base.h"
+#include "control/tunnel/message_cipher.h"
+
+namespace lmx {
+
+class AgentControl final : public AgentControlBase {
+ public:
+  AgentControl(std::shared_ptr<AgentContext> context, AgentActions* actions,
+               ChannelClock& clock = systemChannelClock());
+  ~AgentControl() override;
+
+  [[nodiscard]] bool requiresAuthentication() const override { return false; }
+  void setAuthenticated(bool) override {}
+  [[nodiscard]] ChannelKind kind() const override { return ChannelKind::tunnel; }
+
+  /// Announces the agent on the connection. @return 0; 24 when it could not be sent, 1 when the vector could
+  /// not be encoded. Channel thread.
+  int sendAGENT();
+  /// The line that announces the agent: who it is, the vector, and whether it can record.
+  [[nodiscard]] static std::string hello(const AgentContext& context, const std::string& vectorText);
+
+ protected:
+  int connect() override;
+  std::optional<std::string> commandFromReceivedData(const std::string& line) override;
+  void sendReply(const std::string& reply) override;
+  void previousPeerSpeaks() override { hello_sent_ = true; }  // on that connection, and with the same vector
+
+ private:
+  [[nodiscard]] bool wasDroppedAtOnce() const;
+  void watchPeer();
+  void logPeer();
+  void serverRejected();
+
+  using Vector = std::array<unsigned char, kCipherBlock>;
+  const std::optional<Vector> initialization_vector_;  ///< absent when there was no memory for it
+  std::atomic<bool> hello_sent_{false};
+  // Channel thread only:
+  std::optional<std::chrono::steady_clock::time_point> connected_at_;  ///< the last connection's
+  bool spoken_to_ = false;                                             ///< a line of it could be decrypted
+};
+
+}  // namespace lmx

@@ -1,0 +1,13 @@
+// The "ContinuousRecording" dictionary of the preferences.
+#pragma once
+#include "model/agent_context.h"
+#include "platform/plist/property_list.h"
+
+namespace lmx {
+
+/// A missing key reads as 0 or false.
+LMRContinuousRecordingInfo continuousInfoFrom(const PlistDictionary& dictionary);
+/// Whether it is off, or on with a cut-off and a segment length; else an error line.
+bool continuousInfoValid(const LMRContinuousRecordingInfo& info);
+
+}  // namespace lmx

@@ -1,0 +1,72 @@
+// An encoder that fails in the middle.
+#include "capture/gst/encoder.h"
+
+#include <gtest/gtest.h>
+
+#include <array>
+#include <atomic>
+#include <future>
+#include <limits>
+#include <thread>
+
+#include "capture/gst/gst_handles.h"
+#include "tests/unit/doubles/journal.h"
+#include "tests/unit/doubles/wait_until.h"
+
+namespace lmx {
+namespace {
+
+using namespace std::chrono_literals;
+
+TEST(Encoder, AFailureIsToldOnceAndDoesNotHoldUpItsFeeder) {
+  ensureGStreamer();
+  testing::Journal problems;
+  std::string problem;
+  EncoderOutput output;
+  output.onFormat = [](std::uint32_t, TrackFormat) {};
+  output.onSample = [](EncodedSample) {};
+  output.onError = [&](const std::string& what) { problems.add(what); };
+  std::shared_ptr<Encoder> encoder =
+      Encoder::create(VideoEncoding{{160, 90}, frameRateFrom(30)}, std::nullopt, output, &problem);
+  ASSERT_TRUE(encoder) << problem;
+  std::promise<void> fed;
+  std::thread feeder([encoder, &fed] {
+    const BufferHandle tooSmall(gst_buffer_new_allocate(nullptr, 16, nullptr));  // no picture fits into it
+    for (std::uint32_t place = 0; place < 200; ++place) encoder->pushVideo(tooSmall.get(), place, place == 0);
+    fed.set_value();
+  });
+  const bool ended = fed.get_future().wait_for(20s) == std::future_status::ready;
+  EXPECT_TRUE(ended) << "the feeder waits for an encoder that takes nothing any more";
+  EXPECT_FALSE(encoder->finish(0, 1s));
+  if (!ended) _exit(1);  // the feeder can't be joined
+  feeder.join();
+  EXPECT_TRUE(testing::waitUntil([&] { return !problems.entries().empty(); }));
+  encoder = nullptr;  // with its threads: nothing more can be told
+  EXPECT_EQ(problems.entries().size(), 1U);
+}
+
+TEST(Encoder, SoundThatIsNoSoundDoesNotEndIt) {
+  ensureGStreamer();
+  constexpr float kNone = std::numeric_limits<float>::quiet_NaN();
+  constexpr float kEndless = std::numeric_limits<float>::infinity();
+  testing::Journal problems;
+  std::string problem;
+  std::atomic<int> packets{0};
+  EncoderOutput output;
+  output.onFormat = [](std::uint32_t, TrackFormat) {};
+  output.onSample = [&](const EncodedSample&) { ++packets; };
+  output.onError = [&](const std::string& what) { problems.add(what); };
+  const auto encoder = Encoder::create(std::nullopt, AudioEncoding{}, output, &problem);
+  ASSERT_TRUE(encoder) << problem;
+  std::vector<float> samples(std::size_t{2} * 480, 0.1F);
+  for (int i = 0; i < 100; ++i) {
+    samples[static_cast<std::size_t>(i)] = std::array{kNone, kEndless, -kEndless, 1e30F, 153.0F}[i % 5];
+    encoder->pushAudio(samples.data(), 480);
+  }
+  EXPECT_TRUE(encoder->finish(48000, 20s));
+  EXPECT_TRUE(problems.entries().empty());
+  EXPECT_EQ(packets, 47) << "48,000 samples in packets of 1,024, begun ones too";
+}
+
+}  // namespace
+}  // namespace lmx

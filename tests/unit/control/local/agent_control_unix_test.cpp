@@ -1,0 +1,414 @@
+// The local socket with real peers.
+#include "control/local/agent_control_unix.h"
+
+#include <gtest/gtest.h>
+#include <poll.h>
+#include <stdlib.h>
+#include <sys/socket.h>
+#include <sys/stat.h>
+#include <sys/un.h>
+#include <unistd.h>
+
+#include <array>
+#include <chrono>
+#include <filesystem>
+#include <fstream>
+#include <latch>
+#include <thread>
+
+#include "platform/paths.h"
+#include "record/agent_record.h"
+#include "tests/unit/doubles/log_capture.h"
+#include "tests/unit/doubles/scripted_actions.h"
+
+namespace lmx {
+namespace {
+
+using namespace std::chrono_literals;
+using testing::Journal;
+using testing::LogCapture;
+using testing::ScriptedActions;
+
+/// Puts a directory of our own in front of the fixed paths, before anything reads where they are.
+class TemporaryRoot {
+ public:
+  TemporaryRoot() {
+    if (::mkdtemp(path_.data()) == nullptr) std::abort();
+    std::filesystem::create_directories(path_ + "/var/run");
+    ::setenv("LMXAGENTD_ROOT", path_.c_str(), 1);
+  }
+  ~TemporaryRoot() {
+    std::error_code ignored;
+    std::filesystem::remove_all(path_, ignored);
+  }
+  TemporaryRoot(const TemporaryRoot&) = delete;
+  TemporaryRoot& operator=(const TemporaryRoot&) = delete;
+
+ private:
+  std::string path_ = "/tmp/unit_control_root_XXXXXX";
+};
+const TemporaryRoot kRoot;
+
+std::string socketPath() { return systemPath(kLocalSocket); }
+
+/// A local tool.
+class Peer {
+ public:
+  /// Connects, waiting for the listener.
+  Peer() {
+    sockaddr_un address{};
+    address.sun_family = AF_UNIX;
+    socketPath().copy(address.sun_path, sizeof address.sun_path - 1);
+    const auto deadline = std::chrono::steady_clock::now() + 30s;
+    do {
+      socket_.reset(::socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0));
+      connected_ = ::connect(socket_.get(), reinterpret_cast<const sockaddr*>(&address), sizeof address) == 0;
+      if (!connected_) std::this_thread::yield();
+    } while (!connected_ && std::chrono::steady_clock::now() < deadline);
+    EXPECT_TRUE(connected_);
+  }
+  void send(std::string_view text) {
+    while (!text.empty()) {
+      const ssize_t sent = ::send(socket_.get(), text.data(), text.size(), MSG_NOSIGNAL);
+      ASSERT_GT(sent, 0);
+      text.remove_prefix(static_cast<std::size_t>(sent));
+    }
+  }
+  /// Reads until what has come ends with `end`; what came, complete or not, after half a minute.
+  std::string receiveUpTo(const std::string& end) {
+    while (!received_.ends_with(end)) {
+      if (!receiveSome(30s)) break;
+    }
+    return std::exchange(received_, {});
+  }
+  /// Whether the channel closes the connection.
+  bool isClosed() {
+    while (receiveSome(30s)) {
+    }
+    return closed_;
+  }
+  bool hasReply(std::chrono::milliseconds limit) { return receiveSome(limit); }
+  void close() { socket_.reset(); }
+  /// Closes so that the other side finds data and the end at once.
+  void closeAbruptly() {
+    const linger now{1, 0};
+    ::setsockopt(socket_.get(), SOL_SOCKET, SO_LINGER, &now, sizeof now);
+    socket_.reset();
+  }
+
+ private:
+  bool receiveSome(std::chrono::milliseconds limit) {
+    pollfd waited{socket_.get(), POLLIN, 0};
+    if (::poll(&waited, 1, static_cast<int>(limit.count())) != 1) return false;
+    std::array<char, 4096> buffer{};
+    const ssize_t length = ::recv(socket_.get(), buffer.data(), buffer.size(), 0);
+    closed_ = length <= 0;
+    if (!closed_) received_.append(buffer.data(), static_cast<std::size_t>(length));
+    return !closed_;
+  }
+  UniqueFd socket_;
+  std::string received_;
+  bool connected_ = false;
+  bool closed_ = false;
+};
+
+class LocalSocket : public ::testing::Test {
+ protected:
+  void SetUp() override {
+    context_->record_context()->setFilename("/tmp/lecture.mov");
+    start();
+  }
+  void start() {
+    channel_ = newControlChannel<AgentControlUnix>(context_, &actions_);
+    ASSERT_NE(channel_, nullptr);
+  }
+
+  LogCapture log_;
+  Journal journal_;
+  ScriptedActions actions_{journal_};
+  std::shared_ptr<AgentContext> context_ = newAgentContext();
+  std::unique_ptr<AgentControlUnix> channel_;
+};
+
+TEST_F(LocalSocket, StatusReplyHasNoLineFeed) {
+  context_->setRecord_context(nullptr);
+  Peer peer;
+  peer.send("STATUS\n");
+  const std::string status = peer.receiveUpTo("totalDiskInMB=0");
+  peer.send("STOP\n");
+  // Had anything stood behind the status, it would stand in front of the next reply.
+  EXPECT_EQ(status + peer.receiveUpTo("cmdStatus=1"),
+            "cmdStatus=2,recordStatus=0,start=0,elapsedTime=0,stop=0,hard_stop=0,lastError=0,"
+            "availDiskInMB=0,totalDiskInMB=0cmdStatus=1");
+}
+
+TEST_F(LocalSocket, SetUpAndPeerAreLogged) {
+  Peer peer;
+  peer.send("STOP\n");
+  peer.receiveUpTo("cmdStatus=0");
+  EXPECT_TRUE(log_.contains(6, "Connecting local pipe"));
+  EXPECT_TRUE(log_.mentions("accepted connection fd = "));
+}
+
+TEST_F(LocalSocket, StaleSocketFileIsReplaced) {
+  channel_.reset();
+  // What a killed agent leaves: a bound socket's file that nobody listens on.
+  sockaddr_un address{};
+  address.sun_family = AF_UNIX;
+  socketPath().copy(address.sun_path, sizeof address.sun_path - 1);
+  {
+    const UniqueFd stale(::socket(AF_UNIX, SOCK_STREAM, 0));
+    ASSERT_EQ(::bind(stale.get(), reinterpret_cast<const sockaddr*>(&address), sizeof address), 0);
+  }
+  ASSERT_TRUE(std::filesystem::exists(socketPath()));
+  start();
+  Peer peer;
+  peer.send("STOP\n");
+  EXPECT_EQ(peer.receiveUpTo("cmdStatus=0"), "cmdStatus=0");
+}
+
+TEST_F(LocalSocket, PlainFileInTheWayIsReplaced) {
+  channel_.reset();
+  std::ofstream(socketPath()) << "left over";
+  start();
+  Peer peer;
+  peer.send("STOP\n");
+  EXPECT_EQ(peer.receiveUpTo("cmdStatus=0"), "cmdStatus=0");
+}
+
+TEST_F(LocalSocket, SecondPeerWaitsUntilTheFirstHasLeft) {
+  Peer first;
+  first.send("STOP\n");
+  ASSERT_EQ(first.receiveUpTo("cmdStatus=0"), "cmdStatus=0");
+  Peer second;
+  second.send("PAUSE\n");
+  first.send("STOP\n");
+  ASSERT_EQ(first.receiveUpTo("cmdStatus=0"), "cmdStatus=0");
+  EXPECT_FALSE(second.hasReply(0ms));
+  EXPECT_FALSE(log_.mentions("Command is [PAUSE]"));
+  first.close();
+  EXPECT_EQ(second.receiveUpTo("cmdStatus=0"), "cmdStatus=0");
+}
+
+TEST_F(LocalSocket, PartialCommandIsJoinedWithTheNextPeersLine) {
+  {
+    Peer first;
+    first.send("ST");
+  }
+  Peer second;
+  second.send("OP\n");
+  EXPECT_EQ(second.receiveUpTo("cmdStatus=0"), "cmdStatus=0");
+}
+
+TEST_F(LocalSocket, PeerThatClosesAbruptlyMakesRoomForTheNext) {
+  for (int i = 0; i < 20; ++i) {
+    Peer rude;
+    rude.send("STATUS\n");
+    rude.closeAbruptly();
+  }
+  Peer peer;
+  peer.send("STOP\n");
+  EXPECT_EQ(peer.receiveUpTo("cmdStatus=0"), "cmdStatus=0");
+}
+
+TEST_F(LocalSocket, ReplyToAPeerThatIsGoneIsADebugLine) {
+  channel_.reset();
+  std::latch executing(1);
+  std::latch peer_gone(1);
+  actions_.on_stop_recording = [&] {
+    executing.count_down();
+    peer_gone.wait();
+  };
+  start();
+  Peer peer;
+  peer.send("STOP\n");
+  executing.wait();
+  peer.close();
+  peer_gone.count_down();
+  EXPECT_TRUE(log_.waitFor(7, "Could not answer to tunnel (errno = 32)"));
+}
+
+TEST_F(LocalSocket, LineAByteAtATimeIsExecutedOnce) {
+  Peer peer;
+  for (const char byte : std::string("STOP\n")) peer.send(std::string_view(&byte, 1));
+  EXPECT_EQ(peer.receiveUpTo("cmdStatus=0"), "cmdStatus=0");
+  EXPECT_EQ(log_.count(7, "Command is [STOP]"), 1);
+}
+
+TEST_F(LocalSocket, APeerThatLostItsPlaceToANetworkChangeIsHeardAgain) {
+  Peer peer;
+  peer.send("x\n");
+  ASSERT_TRUE(log_.waitFor(3, "Unknown command [x]"));
+  channel_->setNetTransitionTime(1);  // long ago
+  ASSERT_TRUE(log_.waitFor(7, "The connection is made anew after a network change"));
+  peer.send("STOP\n");
+  EXPECT_EQ(peer.receiveUpTo("cmdStatus=0"), "cmdStatus=0");
+  EXPECT_TRUE(log_.contains(7, "The previous peer speaks again"));
+  EXPECT_EQ(journal_.entries(), std::vector<std::string>{"stopRecording"});
+}
+
+TEST_F(LocalSocket, APeerThatLostItsPlaceMakesRoomForTheNext) {
+  Peer first;
+  first.send("x\n");
+  ASSERT_TRUE(log_.waitFor(3, "Unknown command [x]"));
+  channel_->setNetTransitionTime(1);
+  ASSERT_TRUE(log_.waitFor(7, "The connection is made anew after a network change"));
+  Peer second;
+  second.send("STOP\n");
+  EXPECT_EQ(second.receiveUpTo("cmdStatus=0"), "cmdStatus=0");
+  EXPECT_TRUE(first.isClosed());
+}
+
+TEST_F(LocalSocket, APeerThatIsGoneWithItsPlaceCostsNothing) {
+  channel_->setNetTransitionTime(1);  // the first peer loses its place as soon as it has it
+  {
+    const Peer first;
+    ASSERT_TRUE(log_.waitFor(7, "The connection is made anew after a network change"));
+  }
+  Peer second;
+  second.send("STOP\n");
+  EXPECT_EQ(second.receiveUpTo("cmdStatus=0"), "cmdStatus=0");
+}
+
+TEST_F(LocalSocket, TenMegabytesWithoutALineFeedLeaveTheChannelUsable) {
+  Peer peer;
+  const std::string block(1U << 20, 'x');
+  for (int i = 0; i < 10; ++i) peer.send(block);
+  ASSERT_TRUE(log_.waitFor(3, "Command of more than 1048576 bytes without an end dropped", 9));
+  peer.send("\n");  // ends what was left of it
+  ASSERT_TRUE(log_.waitForPart("Unknown command [xxx"));
+  peer.send("STOP\n");
+  EXPECT_EQ(peer.receiveUpTo("cmdStatus=0"), "cmdStatus=0");
+}
+
+TEST_F(LocalSocket, ReplyLongerThanTheSocketBufferArrivesWhole) {
+  const std::string image = "/tmp/unit_control_image_" + std::to_string(::getpid());
+  std::ofstream(image, std::ios::binary) << std::string(3U << 20, 'x');
+  context_->setPreview_file(image);
+  Peer peer;
+  peer.send("STATUS include_preview=true\n");
+  const std::string reply = peer.receiveUpTo("eHh4");
+  ::unlink(image.c_str());
+  const std::string size = "preview-size=4194304,preview=";
+  const auto found = reply.find(size);
+  ASSERT_NE(found, std::string::npos);
+  std::string preview = reply.substr(found + size.size());
+  while (preview.size() < 4194304 && peer.hasReply(30s)) preview += peer.receiveUpTo("eHh4");
+  EXPECT_EQ(preview.size(), 4194304U);
+}
+
+TEST_F(LocalSocket, StopReturnsAtOnceWhileWaitingForAPeer) {
+  ASSERT_TRUE(log_.waitFor(6, "Connecting local pipe"));
+  const auto before = std::chrono::steady_clock::now();
+  channel_->stop();
+  EXPECT_LT(std::chrono::steady_clock::now() - before, 1s);
+  EXPECT_TRUE(channel_->threadHasEnded());
+}
+
+TEST_F(LocalSocket, StopReturnsAtOnceWhileAPeerIsConnected) {
+  Peer peer;
+  peer.send("STOP\n");
+  peer.receiveUpTo("cmdStatus=0");
+  const auto before = std::chrono::steady_clock::now();
+  channel_->stop();
+  EXPECT_LT(std::chrono::steady_clock::now() - before, 1s);
+  EXPECT_TRUE(peer.isClosed());
+}
+
+TEST_F(LocalSocket, DestructionRemovesTheSocketFile) {
+  { Peer peer; }
+  ASSERT_TRUE(std::filesystem::exists(socketPath()));
+  channel_.reset();
+  EXPECT_FALSE(std::filesystem::exists(socketPath()));
+}
+
+TEST_F(LocalSocket, SocketFileHasTheProcessesDefaultMode) {
+  Peer peer;
+  const mode_t mask = ::umask(0);
+  ::umask(mask);
+  struct stat file {};
+  ASSERT_EQ(::stat(socketPath().c_str(), &file), 0);
+  EXPECT_EQ(file.st_mode & 0777, 0777U & ~mask);
+}
+
+TEST_F(LocalSocket, ListenerThatCannotBeSetUpLeavesTheChannelWithoutAThread) {
+  channel_.reset();
+  const std::string directory = socketPath().substr(0, socketPath().rfind('/'));
+  std::filesystem::rename(directory, directory + ".away");
+  start();
+  const auto deadline = std::chrono::steady_clock::now() + 30s;
+  while (!channel_->threadHasEnded() && std::chrono::steady_clock::now() < deadline)
+    std::this_thread::yield();
+  EXPECT_TRUE(channel_->threadHasEnded());
+  std::filesystem::rename(directory + ".away", directory);
+}
+
+TEST_F(LocalSocket, RestartBindsAgain) {
+  for (int i = 0; i < 5; ++i) {
+    channel_.reset();
+    start();
+    Peer peer;
+    peer.send("STOP\n");
+    EXPECT_EQ(peer.receiveUpTo("cmdStatus=0"), "cmdStatus=0");
+  }
+}
+
+/// A channel whose waiting for a peer can be called by itself.
+class Acceptor final : public AgentControlBase {
+ public:
+  using AgentControlBase::acceptPeer;
+  using AgentControlBase::AgentControlBase;
+  using AgentControlBase::serverSocket;
+  ~Acceptor() override { stop(); }
+  bool requiresAuthentication() const override { return false; }
+  void setAuthenticated(bool) override {}
+
+ protected:
+  int connect() override { return -1; }
+  std::optional<std::string> commandFromReceivedData(const std::string& line) override { return line; }
+  void sendReply(const std::string&) override {}
+};
+
+class Accepting : public ::testing::Test {
+ protected:
+  static int keepAliveOf(int socket) {
+    int on = -1;
+    socklen_t size = sizeof on;
+    return ::getsockopt(socket, SOL_SOCKET, SO_KEEPALIVE, &on, &size) == 0 ? on : -1;
+  }
+  [[nodiscard]] std::string lineFor(int peer) const {
+    return "accepted connection fd = " + std::to_string(peer) +
+           " from listen fd = " + std::to_string(listening_.get());
+  }
+  LogCapture log_;
+  UniqueFd listening_{::socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0)};
+  Acceptor channel_{newAgentContext(), nullptr};
+};
+
+TEST_F(Accepting, KeepAliveIsSetOnTheListeningSocketNotOnThePeers) {
+  sockaddr_un address{};
+  address.sun_family = AF_UNIX;  // with no path: the system picks a name
+  socklen_t size = sizeof address.sun_family;
+  ASSERT_EQ(::bind(listening_.get(), reinterpret_cast<const sockaddr*>(&address), size), 0);
+  ASSERT_EQ(::listen(listening_.get(), 1), 0);
+  size = sizeof address;
+  ASSERT_EQ(::getsockname(listening_.get(), reinterpret_cast<sockaddr*>(&address), &size), 0);
+  const UniqueFd peer(::socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0));
+  ASSERT_EQ(::connect(peer.get(), reinterpret_cast<const sockaddr*>(&address), size), 0);
+  EXPECT_EQ(channel_.acceptPeer(listening_.get()), 0);
+  EXPECT_GE(channel_.serverSocket(), 0);
+  EXPECT_TRUE(log_.contains(6, lineFor(channel_.serverSocket())));
+  EXPECT_EQ(keepAliveOf(listening_.get()), 1);
+  EXPECT_EQ(keepAliveOf(channel_.serverSocket()), 0);
+}
+
+TEST_F(Accepting, AFailureIsLoggedWithMinusOneAndTriedAgainAtOnce) {
+  const auto before = std::chrono::steady_clock::now();
+  EXPECT_EQ(channel_.acceptPeer(listening_.get()), -1);  // nobody has called listen
+  EXPECT_LT(std::chrono::steady_clock::now() - before, 1s);
+  EXPECT_EQ(channel_.serverSocket(), -1);
+  EXPECT_TRUE(log_.contains(6, lineFor(-1)));
+}
+
+}  // namespace
+}  // namespace lmx

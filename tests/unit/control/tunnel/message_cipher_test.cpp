@@ -1,0 +1,133 @@
+// The tunnel's cipher against answers of the openssl command, and everything that is not one of its messages.
+#include "control/tunnel/message_cipher.h"
+
+#include <gtest/gtest.h>
+
+#include <cstring>
+#include <random>
+#include <string>
+
+#include "control/tunnel/agent_control.h"
+#include "record/agent_record.h"
+#include "support/base64.h"
+#include "support/heap_ptr.h"
+#include "tests/unit/doubles/log_capture.h"
+
+namespace lmx {
+namespace {
+
+constexpr const char* kFailed = "Internal error occurred during decryption";
+
+class MessageCipher : public ::testing::Test {
+ protected:
+  MessageCipher() {
+    for (unsigned i = 0; i < 16; ++i) {
+      key_[i] = static_cast<unsigned char>(i);
+      vector_[i] = static_cast<unsigned char>(0x10 + i);
+    }
+    for (int i = 0; i < 32; ++i) prefix_ += static_cast<char>(i);
+  }
+  std::string encrypt(const std::string& plaintext) {
+    std::uint64_t length = 0;
+    const heap_ptr<char> text(agent_encrypt_message(vector_, key_, plaintext.data(),
+                                                    static_cast<std::uint32_t>(plaintext.size()), &length));
+    EXPECT_TRUE(text);
+    if (!text) return "";
+    EXPECT_EQ(length, std::strlen(text.get()));
+    return text.get();
+  }
+  /// @return the plaintext; "(none)" on failure
+  std::string decrypt(const std::string& text) {
+    std::uint32_t length = 99;
+    const heap_ptr<unsigned char> plaintext(
+        agent_decrypt_message(vector_, key_, text.c_str(), static_cast<std::uint32_t>(text.size()), &length));
+    if (!plaintext) {
+      EXPECT_EQ(length, 0U);
+      return "(none)";
+    }
+    EXPECT_EQ(plaintext.get()[length], 0);
+    return {reinterpret_cast<const char*>(plaintext.get()), length};
+  }
+  unsigned char key_[16];
+  unsigned char vector_[16];
+  std::string prefix_;
+  testing::LogCapture log_;
+};
+
+TEST_F(MessageCipher, GivesTheAnswersOfAnotherImplementation) {
+  const std::pair<const char*, const char*> kKnown[] = {
+      {"", "lU9k8uTobp7ugtICFmhImak7ndsi6KsQTGHnKIMdbVq5kd/tmhOBTaNJ/QCHzZgN"},
+      {"cmdStatus=0", "lU9k8uTobp7ugtICFmhImak7ndsi6KsQTGHnKIMdbVr9nLt8tAOCiPLLBejXMPtI"},
+      {"exactly16bytes!!",
+       "lU9k8uTobp7ugtICFmhImak7ndsi6KsQTGHnKIMdbVpX8v4Iw1N+rM3FWmqEp7Z9mn19eFQkPOulKt3OIB5YTA=="}};
+  for (const auto& [text, ciphertext] : kKnown) {
+    EXPECT_EQ(encrypt(prefix_ + text), ciphertext);
+    EXPECT_EQ(decrypt(ciphertext), prefix_ + text);
+  }
+}
+
+TEST_F(MessageCipher, LongTextsHaveNoLineBreaks) {
+  const std::string text(100000, 'x');
+  const std::string line = encrypt(text);
+  EXPECT_EQ(line.find('\n'), std::string::npos);
+  EXPECT_EQ(decrypt(line), text);
+}
+
+TEST_F(MessageCipher, ALineFeedAtTheEndIsSkipped) {
+  const std::string line = encrypt(prefix_ + "STOP");
+  EXPECT_EQ(decrypt(line + "\n"), prefix_ + "STOP");
+  EXPECT_EQ(decrypt(line + "\r\n"), prefix_ + "STOP");
+}
+
+TEST_F(MessageCipher, WhatIsNoMessageIsRefusedWithALine) {
+  const std::string good = encrypt(prefix_ + "STOP");
+  const std::string bad_padding = encrypt(prefix_).substr(0, 40) + "====";
+  for (const std::string& text :
+       {std::string("no base64!"), std::string("QUJD"), std::string(), good.substr(4), good.substr(0, 20),
+        std::string("AAAAAAAAAAAAAAAAAAAAAA=="), bad_padding, std::string("ERR Unbound agent")}) {
+    const auto before = log_.count(2, kFailed);
+    EXPECT_EQ(decrypt(text), "(none)") << text;
+    EXPECT_EQ(log_.count(2, kFailed), before + 1) << text;
+  }
+}
+
+TEST_F(MessageCipher, AShortPlaintextIsZeroBeyondItsEnd) {
+  const std::string line = encrypt("short");
+  std::uint32_t length = 0;
+  const heap_ptr<unsigned char> plaintext(agent_decrypt_message(vector_, key_, line.c_str(), 0, &length));
+  ASSERT_TRUE(plaintext);
+  EXPECT_EQ(length, 5U);
+  for (std::size_t i = 5; i <= kRandomPrefix; ++i) EXPECT_EQ(plaintext.get()[i], 0) << i;
+}
+
+TEST_F(MessageCipher, AnyNoiseIsSurvived) {
+  std::mt19937 random(7);  // NOLINT: the same numbers every time
+  for (int round = 0; round < 2000; ++round) {
+    std::string bytes(random() % 200, '\0');
+    for (char& c : bytes) c = static_cast<char>(random());
+    const heap_ptr<char> text(lmp_encode_base64(bytes.data(), bytes.size(), nullptr));
+    decrypt(text.get());
+    decrypt(bytes);
+  }
+}
+
+TEST(RandomBytes, AreNotTheSameTwice) {
+  const heap_ptr<unsigned char> one(agent_random_bytes(32));
+  const heap_ptr<unsigned char> other(agent_random_bytes(32));
+  EXPECT_NE(std::memcmp(one.get(), other.get(), 32), 0);
+  EXPECT_TRUE(heap_ptr<unsigned char>(agent_random_bytes(0)));
+}
+
+TEST(Hello, TellsWhoAndWhetherItCanRecord) {
+  const auto context = newAgentContext();
+  context->setMachine_uuid("C-1");
+  context->setRunning(true);
+  EXPECT_EQ(AgentControl::hello(*context, "dmVjdG9y"),
+            "AGENT protocol=1,agent_uuid=C-1,iv=dmVjdG9y,version=100\n");
+  context->setRunning(false);
+  EXPECT_EQ(AgentControl::hello(*context, "*"),
+            "AGENT protocol=1,agent_uuid=C-1,iv=*,version=100,agent_recording_status=offline\n");
+}
+
+}  // namespace
+}  // namespace lmx
