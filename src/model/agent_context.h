@@ -11,6 +11,7 @@
 #include <thread>
 #include <vector>
 
+#include "model/continuous_recording.h"
 #include "model/recording_settings.h"
 #include "model/timed_command_list.h"
 #include "platform/log.h"
@@ -25,15 +26,6 @@ namespace lmx {
 class AgentActions;
 class AgentRecord;
 class AgentSubmit;
-
-/// Continuous recording as the capture framework takes it.
-struct LMRContinuousRecordingInfo {
-  double cutoffPercentLeft = 0;     ///< free space in percent below which old segments go
-  std::uint64_t segmentLength = 0;  ///< minutes
-  bool upload = false;
-  bool enabled = false;
-  bool operator==(const LMRContinuousRecordingInfo&) const = default;
-};
 
 /// Shared by the main thread, the channel threads, the capture thread and the post-process thread. Every
 /// accessor is thread-safe: values are copied in and out. Texts that nobody has set are absent, which is not

@@ -9,6 +9,7 @@
 #include <thread>
 
 #include "capture/api/capture_framework.h"
+#include "model/codes.h"
 #include "model/recording_settings.h"
 #include "platform/run_loop.h"
 #include "support/dictionary.h"
@@ -23,32 +24,6 @@ class AgentContext;
 class CaptureThread;
 class LMRCaptureDelegate;
 class MyLMRPreviewController;
-
-/// Recording types.
-enum RecordingTypeCode : std::int32_t {
-  kRecordingTypeNone = 0,
-  kRecordingTypeAudio = 1,
-  kRecordingTypeAudioVideo = 2,
-  kRecordingTypeVideo = 3,
-  kRecordingTypeFile = 4,
-};
-
-/// Recorder status.
-enum RecorderStatus : std::int32_t { kRecorderIdle = 0, kRecorderPaused = 1, kRecorderRecording = 2 };
-
-/// Results of the engine's entry points.
-enum RecordError : std::int32_t {
-  kRecordSuccess = 0,
-  kRecordInvalidType = 1,  ///< also: agent not running, no path, control-action mutex not to be had
-  kRecordInvalidArguments = 2,
-  kRecordNotRunning = 3,  ///< also: the framework refused to prepare
-  kRecordNotIdle = 4,
-  kRecordLockFailed = 6,
-  kRecordCannotWrite = 8,
-  kRecordNoInput = 9,
-  kRecordAcceptedAtStop = 26,
-  kRecordNoDiskSpace = 30,
-};
 
 /// Compression context of the video, read and written as a whole.
 struct LXAgentRecordVideoContext {

@@ -6,7 +6,7 @@
 #include <optional>
 #include <string>
 
-#include "model/agent_context.h"
+#include "model/continuous_recording.h"
 #include "support/dictionary.h"
 
 namespace lmx {

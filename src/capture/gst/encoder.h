@@ -10,9 +10,9 @@
 #include <string>
 
 #include "capture/api/capture_settings.h"
+#include "capture/api/picture.h"
 #include "capture/gst/gst_handles.h"
 #include "capture/movie/movie_file.h"
-#include "capture/source/device_id.h"
 
 namespace lmx {
 

@@ -4,6 +4,8 @@
 #include <optional>
 #include <string>
 
+#include "capture/api/picture.h"
+
 namespace lmx {
 
 enum class DeviceKind { hardware, file, network, test, unknown };
@@ -21,20 +23,7 @@ struct DeviceID {
 };
 DeviceID parseDeviceID(const std::string& text);
 
-struct PictureSize {
-  int width = 1280;
-  int height = 720;
-};
 /// The "size" option of a synthetic camera, forced to even numbers between 64 and 4096; 1280x720 without one.
 PictureSize pictureSize(const DeviceID& id);
-
-/// A frame rate as a fraction: 29.97 is 30000/1001, whole numbers n/1, others in thousandths.
-struct FrameRate {
-  int numerator = 30;
-  int denominator = 1;
-  [[nodiscard]] double frameSeconds() const { return static_cast<double>(denominator) / numerator; }
-  bool operator==(const FrameRate&) const = default;
-};
-FrameRate frameRateFrom(double framesPerSecond);
 
 }  // namespace lmx

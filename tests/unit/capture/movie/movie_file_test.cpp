@@ -10,6 +10,7 @@
 #include "capture/source/device_id.h"
 #include "capture/source/test_picture.h"
 #include "capture/store/finished_capture.h"
+#include "support/time_value.h"
 #include "tests/unit/capture/capture_harness.h"
 #include "tests/unit/doubles/log_capture.h"
 

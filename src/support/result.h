@@ -1,0 +1,48 @@
+// A value, or why there is none.
+#pragma once
+#include <cerrno>
+#include <cstring>
+#include <string>
+#include <utility>
+#include <variant>
+
+namespace lmx {
+
+/// Why something failed. The message is complete: it names what failed and the reason.
+struct Error {
+  std::string message;
+  int systemError = 0;  ///< errno where the system gave the reason, else 0
+
+  /// "WHAT: reason", with the system's words for `systemError`.
+  static Error fromSystem(const std::string& what, int systemError = errno) {
+    return {what + ": " + std::strerror(systemError), systemError};
+  }
+};
+
+/// Holds either a value or an error, never neither. Expected failure is a value: look before you take.
+template <class T, class E = Error>
+class [[nodiscard]] Result {
+ public:
+  Result(T value)
+      : state_(std::in_place_index<0>, std::move(value)) {}  // NOLINT: implicit, as a return wants it
+  Result(E error) : state_(std::in_place_index<1>, std::move(error)) {}  // NOLINT
+
+  [[nodiscard]] bool ok() const { return state_.index() == 0; }
+  explicit operator bool() const { return ok(); }
+
+  // Undefined without a value.
+  [[nodiscard]] T& operator*() & { return *std::get_if<0>(&state_); }
+  [[nodiscard]] const T& operator*() const& { return *std::get_if<0>(&state_); }
+  [[nodiscard]] T&& operator*() && { return std::move(*std::get_if<0>(&state_)); }
+  [[nodiscard]] T* operator->() { return std::get_if<0>(&state_); }
+  [[nodiscard]] const T* operator->() const { return std::get_if<0>(&state_); }
+
+  // Undefined with a value.
+  [[nodiscard]] const E& error() const& { return *std::get_if<1>(&state_); }
+  [[nodiscard]] E&& error() && { return std::move(*std::get_if<1>(&state_)); }
+
+ private:
+  std::variant<T, E> state_;
+};
+
+}  // namespace lmx
