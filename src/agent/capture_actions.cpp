@@ -2,9 +2,12 @@
 #include <ctime>
 
 #include "agent/agent_main.h"
+#include "capture/api/capture_framework.h"
+#include "model/codes.h"
 #include "platform/log.h"
-#include "record/engine.h"
+#include "record/prepare_capture.h"
 #include "record/preview_controller.h"
+#include "record/stop_capture.h"
 
 namespace lmx {
 
@@ -14,31 +17,31 @@ bool AgentMain::perform(Action action, Wait wait) {
 
 std::shared_ptr<LMRCaptureController> AgentMain::captureController() const {
   const auto record = session();
-  return record ? record->captureController() : nullptr;
+  return record ? record->captureController.get() : nullptr;
 }
 
 void AgentMain::prepareCapture() {
   context_->logDebug("Process prepareCapture");
-  const SharedDictionary properties = context_->properties();
-  context_->setStatus(kRecordNotRunning);  // what counts if this ends by an exception
-  context_->setStatus(LXAgentRecordPrepareCapture(
+  const SharedDictionary properties = context_->state.properties.get();
+  context_->state.status.set(kRecordNotRunning);  // what counts if this ends by an exception
+  context_->state.status.set(LXAgentRecordPrepareCapture(
       *context_, std::make_shared<const Dictionary>(properties ? *properties : Dictionary{})));
 }
 
 void AgentMain::startPreview() {
   context_->logDebug("Process startPreview");
   const auto record = session();
-  if (const auto preview = record ? record->previewController() : nullptr)
+  if (const auto preview = record ? record->previewController.get() : nullptr)
     preview->controller().startPreview();
-  context_->setStatus(0);
+  context_->state.status.set(0);
 }
 
 void AgentMain::stopPreview() {
   context_->logDebug("Process stopPreview");
   const auto record = session();
-  if (const auto preview = record ? record->previewController() : nullptr)
+  if (const auto preview = record ? record->previewController.get() : nullptr)
     preview->controller().stopPreview();
-  context_->setStatus(0);
+  context_->state.status.set(0);
 }
 
 void AgentMain::pauseCapture() {
@@ -49,7 +52,7 @@ void AgentMain::pauseCapture() {
   controller->pauseRecording();
   if (!wasRecording) return;
   const auto record = session();
-  recordDidPauseWithFile(record->filename().value_or(""), record->metadata(),
+  recordDidPauseWithFile(record->filename.get().value_or(""), record->metadata.get(),
                          controller->elapsedTimeInMilliseconds() / 1000);
 }
 
@@ -61,7 +64,7 @@ void AgentMain::resumeCapture() {
   controller->resumeRecording();
   if (!wasPaused) return;
   const auto record = session();
-  recordDidResumeWithFile(record->filename().value_or(""), record->metadata());
+  recordDidResumeWithFile(record->filename.get().value_or(""), record->metadata.get());
 }
 
 void AgentMain::stopCapture() {
@@ -77,21 +80,21 @@ void AgentMain::cancelCapture() {
 void AgentMain::stopOrCancelCapture(bool cancel) {
   const auto controller = captureController();
   const auto record = session();
-  if (context_->adhoc()) {
+  if (context_->options.adhoc.get()) {
     if (!record) return;
     if (cancel) {
-      if (controller) controller->cancelRequestWithUUID(record->recording_uuid());
+      if (controller) controller->cancelRequestWithUUID(record->recording_uuid.get());
       return;
     }
     if (controller) {
-      controller->setStopWithUUID(record->recording_uuid(),
-                                  secondsSinceReferenceDate() - context_->timeshift_seconds());
+      controller->setStopWithUUID(record->recording_uuid.get(),
+                                  secondsSinceReferenceDate() - context_->state.timeshift_seconds.get());
     }
     stopRecording();
     return;
   }
   const bool isFile =
-      record && record->status() != kRecorderIdle && record->recordedType() == kRecordingTypeFile;
+      record && record->status.get() != kRecorderIdle && record->recordedType() == kRecordingTypeFile;
   if (isFile && !cancel) {
     // No capture will report the end of a "File" recording: the engine's own stop does, and so makes its job.
     LXAgentRecordStopCapture(record);
@@ -100,64 +103,64 @@ void AgentMain::stopOrCancelCapture(bool cancel) {
     cancel ? controller->cancelRecording() : controller->stopRecording();
   }
   setRecorderStatusToIdle();
-  context_->setStatus(0);
+  context_->state.status.set(0);
 }
 
 void AgentMain::stopRecording() {
   context_->logDebug("Process stopRecording");
   if (!session()) return;
-  const SharedDictionary properties = context_->properties();
+  const SharedDictionary properties = context_->state.properties.get();
   if (!lookUp(properties, "RecordingMetadata_ADHOC_FILE_PATH") &&
       !lookUp(properties, "RecordingMetadata_RECORDING_UUID")) {
     LMPLogMessage(context_->log_context(), kLogAlert,
                   "Recording canceled, missing RecordingMetadata_RECORDING_UUID.");
     return;
   }
-  const auto continuous = context_->continuous();
+  const auto continuous = context_->recording.continuous.get();
   if (continuous && continuous->enabled) {
     submitStoppedRecording();
-  } else if (!context_->adhoc()) {  // there stopCapture is what has called
+  } else if (!context_->options.adhoc.get()) {  // there stopCapture is what has called
     stopCapture();
   }
 }
 
 void AgentMain::setRecorderStatusToIdle() {
-  if (const auto record = session()) record->setStatus(kRecorderIdle);
+  if (const auto record = session()) record->status.set(kRecorderIdle);
 }
 
 void AgentMain::shutDownControl() {
   context_->logDebug("Process shutDownControl");
   cancelCapture();
-  if (context_->adhoc()) return;
+  if (context_->options.adhoc.get()) return;
   closeTunnel();
-  context_->setLast_device_check(std::time(nullptr));
+  context_->state.last_device_check.set(std::time(nullptr));
 }
 
 void AgentMain::shutDownControlBecauseDeviceFailed() {
-  if (!context_->adhoc()) shouldDisplayOfflineMessage_ = true;
+  if (!context_->options.adhoc.get()) shouldDisplayOfflineMessage_ = true;
   shutDownControl();
 }
 
 void AgentMain::recordDidStartWithFile(const std::string& file, const SharedDictionary& /*metadata*/,
                                        std::optional<TimeValue> /*atTime*/) {
-  if (!context_->running()) return;
+  if (!context_->state.running.get()) return;
   LMPLogMessage(context_->log_context(), kLogNotice, "\"%s\" recording started", file.c_str());
 }
 
 void AgentMain::recordDidPauseWithFile(const std::string& file, const SharedDictionary& /*metadata*/,
                                        std::int64_t elapsedSeconds) {
-  if (!context_->running()) return;
+  if (!context_->state.running.get()) return;
   LMPLogMessage(context_->log_context(), kLogNotice, "\"%s\" recording paused (current duration: %ds)",
                 file.c_str(), static_cast<int>(elapsedSeconds));
 }
 
 void AgentMain::recordDidResumeWithFile(const std::string& file, const SharedDictionary& /*metadata*/) {
-  if (!context_->running()) return;
+  if (!context_->state.running.get()) return;
   LMPLogMessage(context_->log_context(), kLogNotice, "\"%s\" recording resumed", file.c_str());
 }
 
 void AgentMain::recordRuntimeErrorCallback(int code) {
-  if (!context_->running()) return;
+  if (!context_->state.running.get()) return;
   LMPLogMessage(context_->log_context(), kLogError, "An error occurred during recording (%d)", code);
 }
 

@@ -99,10 +99,10 @@ int AgentMain::clusterInformation(const std::optional<std::string>& host, Shared
 
 void AgentMain::learnCluster() {
   SharedPlist members;
-  if (clusterInformation(context_->tunnel_host(), members) == -1) {
+  if (clusterInformation(context_->server.tunnel_host.get(), members) == -1) {
     LMPLogMessage(context_->log_context(), kLogCritical, "Unable to retrieve cluster information");
   }
-  context_->setServer_info(members);
+  context_->server_info.set(members);
   std::string joined;
   const auto hosts = clusterHostArray(members.get());
   for (const std::string& host : hosts) joined += (joined.empty() ? "" : ", ") + host;
@@ -116,10 +116,10 @@ void AgentMain::refreshClusterInformation() {
     const auto ended = [](std::atomic<bool>* refresh) { *refresh = false; };
     const std::unique_ptr<std::atomic<bool>, decltype(ended)> end_of_refresh(&cluster_refresh_, ended);
     SharedPlist members;
-    if (clusterInformation(context_->tunnel_host(), members) != 0) {
+    if (clusterInformation(context_->server.tunnel_host.get(), members) != 0) {
       LMPLogMessage(context_->log_context(), kLogError, "Unable to update cluster information.");
     } else {
-      context_->setServer_info(members);
+      context_->server_info.set(members);
     }
   });
 }

@@ -1,5 +1,6 @@
 // Start-up and shut-down of the daemon.
 #include <syslog.h>
+
 #include <csignal>
 #include <cstdio>
 #include <ctime>
@@ -10,7 +11,9 @@
 #include "platform/notifications.h"
 #include "platform/paths.h"
 #include "platform/work_queue.h"
-#include "record/engine.h"
+#include "prefs/agent_settings.h"
+#include "record/create_preview.h"
+#include "record/engine_environment.h"
 #include "record/preview_controller.h"
 
 namespace lmx {
@@ -31,11 +34,11 @@ AgentMain::~AgentMain() {
   setEngineEnvironment({});
 }
 
-int AgentMain::startup() { return context_->adhoc() ? startupAdHoc() : startupDaemon(); }
+int AgentMain::startup() { return context_->options.adhoc.get() ? startupAdHoc() : startupDaemon(); }
 
 bool AgentMain::setupLoggingContext() {
   LMPLogContext log = LMPLogCreateContext("lmxagentd", "com.zandor.lumex");
-  context_->setLog_context(log);
+  context_->open(log);
   if (log != nullptr) return true;
   syslog(LOG_ALERT, "LMPLogCreateContext failed, ZSL uninitialized.");
   std::fputs("LMPLogCreateContext failed, ZSL uninitialized.\n", stderr);
@@ -62,11 +65,11 @@ int AgentMain::startupDaemon() {
 }
 
 AgentMain::Start AgentMain::loadSettings() {
-  context_->setPreview_directory(std::string(kStateDirectory));
+  context_->recording.preview_directory.set(std::string(kStateDirectory));
   start_settings_ = recordingContext();
   if (!start_settings_) return Start::fatalAndDisable;
-  agentPrefs_ = std::make_unique<AgentPreferences>(environment_.framework);
-  return agentPrefs_->setAgentPreferencesInContext(*context_) ? Start::ok : Start::fatalAndDisable;
+  agentPrefs_ = std::make_unique<AgentPreferences>();
+  return setAgentPreferencesInContext(*agentPrefs_, *context_) ? Start::ok : Start::fatalAndDisable;
 }
 
 AgentMain::Start AgentMain::prepareGround() {
@@ -88,7 +91,7 @@ void AgentMain::probeDevice(const LMRRecordingContext& settings) {
       context_->log_context(), kLogAlert,
       "Unable to acquire the specified video device. The agent will remain offline until the device becomes "
       "available.");
-  context_->setLast_device_check(std::time(nullptr));
+  context_->state.last_device_check.set(std::time(nullptr));
   device_offline_ = true;
 }
 
@@ -103,7 +106,7 @@ AgentMain::Start AgentMain::startServices() {
   if (!agentControlLocal_) {
     LMPLogMessage(context_->log_context(), kLogAlert, "Unable to start listener on named pipe");
   }
-  if (context_->tcp_listener_port() != 0) {
+  if (context_->server.tcp_listener_port.get() != 0) {
     LMPLogMessage(context_->log_context(), kLogAlert, "Unable to start TCP listener");
   }
   // Off this thread: a first recording should find the plug-ins loaded, but nobody should wait for them now.
@@ -136,7 +139,7 @@ void AgentMain::startTimers() {
 void AgentMain::shutdown() {
   clusterInfoTimer_ = nullptr;
   diskSpaceTimer_ = nullptr;
-  context_->setRunning(false);
+  context_->state.running.set(false);
   const auto controller = captureController();
   while (controller && !controller->hasShutDown()) loop_.run(250ms);
   tellServerOfTheEnd();

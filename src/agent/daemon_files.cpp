@@ -23,7 +23,7 @@ int AgentMain::createPIDFile() {
     LMPLogMessage(context_->log_context(), kLogError, "unable to write pid file (EACCES)");
     return 0;
   }
-  const std::string text = formatted("%d\n", static_cast<int>(getpid()));
+  const std::string text = string_with_format("%d\n", static_cast<int>(getpid()));
   const bool written = write(file.get(), text.data(), text.size()) == static_cast<ssize_t>(text.size());
   return written && fchmod(file.get(), 0644) == 0 ? 0 : 1;
 }
@@ -31,7 +31,7 @@ int AgentMain::createPIDFile() {
 void AgentMain::removePIDFile() { unlink(systemPath(kPidFile).c_str()); }
 
 bool AgentMain::setupRecordingRepository() {
-  const std::string path = context_->recording_repository_path().value_or("");
+  const std::string path = context_->recording.recording_repository_path.get().value_or("");
   LMPLogContext log = context_->log_context();
   struct stat info {};
   if (stat(path.c_str(), &info) != 0 && errno == ENOENT) {
@@ -47,7 +47,7 @@ bool AgentMain::setupRecordingRepository() {
 }
 
 void AgentMain::recoverUnfinishedRecordings() {
-  const auto repository = context_->recording_repository_path();
+  const auto repository = context_->recording.recording_repository_path.get();
   if (!repository) return;
   // On a worker: a long recording may have to be copied, and the agent is to be commanded meanwhile.
   dispatchAsync(WorkPriority::background, [this, repository] {

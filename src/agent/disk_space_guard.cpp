@@ -4,9 +4,10 @@
 #include <system_error>
 
 #include "agent/agent_main.h"
+#include "capture/api/capture_framework.h"
 #include "platform/log.h"
 #include "platform/paths.h"
-#include "record/engine.h"
+#include "record/disk_space.h"
 
 namespace lmx {
 namespace {
@@ -18,9 +19,8 @@ struct Measure {
 };
 
 Measure measure(const std::string& volume) {
-  Measure result;
-  result.megabytes = LXAgentFreeKilobytesAtPath(volume, &result.error) >> 10;
-  return result;
+  const VolumeSpace space = measureVolume(volume);
+  return {space.freeKilobytes >> 10, space.error};
 }
 
 void removeIfEmpty(const std::string& directory) {
@@ -46,21 +46,21 @@ Measure freeSpace(LMRCaptureController* controller, const std::string& volume, M
 void AgentMain::checkDiskSpace() {
   const auto record = session();
   if (!record) return;
-  std::string volume = record->volumePath();
+  std::string volume = volumePath(*record);
   Measure space = measure(volume);
   if (space.error == ENOENT) {
     cancelCapture();
     if (setupRecordingRepository()) {
-      volume = context_->recording_repository_path().value_or("");
+      volume = context_->recording.recording_repository_path.get().value_or("");
       space = measure(volume);
     }
   }
   if (space.error != 0) {
     stopCapture();
-    context_->setRunning(false);
+    context_->state.running.set(false);
     return;
   }
-  const std::uint32_t wanted = record->diskSpaceCutoffInMB();
+  const std::uint32_t wanted = record->diskSpaceCutoffInMB.get();
   const auto controller = captureController();
   space = freeSpace(controller.get(), volume, space, wanted);
   if (space.megabytes >= wanted) {
@@ -71,14 +71,14 @@ void AgentMain::checkDiskSpace() {
 }
 
 void AgentMain::recordAgainWithSpace(std::uint64_t megabytes) {
-  const auto continuous = context_->continuous();
+  const auto continuous = context_->recording.continuous.get();
   if (!continuous || !continuous->enabled) return;
   const auto controller = captureController();
   if (controller && !controller->hasShutDown()) return;
   shouldDisplayNoDiskSpaceMessage_ = true;
   LMPLogMessage(nullptr, kLogNotice, "%llu MB is sufficient, starting recorder",
                 static_cast<unsigned long long>(megabytes));
-  session()->clearPassedDeadlines();
+  session()->stop_times.clearPassedDeadlines();
   prepareCapture();
 }
 

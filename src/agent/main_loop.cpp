@@ -7,11 +7,14 @@
 #include <thread>
 
 #include "agent/agent_main.h"
+#include "model/codes.h"
 #include "platform/log.h"
 #include "platform/paths.h"
 #include "platform/plist/property_list.h"
+#include "prefs/agent_settings.h"
+#include "prefs/recording_context.h"
 #include "record/capture_delegate.h"
-#include "record/engine.h"
+#include "record/create_preview.h"
 #include "record/preview_controller.h"
 
 namespace lmx {
@@ -39,7 +42,7 @@ constexpr bool isAhead(std::int64_t now, std::int64_t begin, std::int64_t span) 
 int AgentMain::appLoop() {
   for (;;) {
     if (deviceDisconnected()) {
-      context_->setRunning(false);
+      context_->state.running.set(false);
       return 1;
     }
     const std::int64_t now = std::time(nullptr);
@@ -50,21 +53,21 @@ int AgentMain::appLoop() {
     runDueCommands(std::time(nullptr));
     runLoopRunning_ = loop_.run(timeToNextCommand(250ms)) != RunLoop::Turn::stopped;
     checkServerRefusal(std::time(nullptr));
-    if (!context_->running() || !runLoopRunning_) return 0;
+    if (!context_->state.running.get() || !runLoopRunning_) return 0;
   }
 }
 
 void AgentMain::retryDevice(std::int64_t now) {
-  const std::int64_t last = context_->last_device_check();
+  const std::int64_t last = context_->state.last_device_check.get();
   if (last < 1 || isAhead(now, last, kDeviceRetrySeconds + 1)) return;
   const auto settings = recordingContext();
   if (!settings) {
-    context_->setRunning(false);
+    context_->state.running.set(false);
     return;
   }
   const auto record = session();
-  record->setPreviewController(nullptr);
-  const auto controller = record->captureController();
+  record->previewController.set(nullptr);
+  const auto controller = record->captureController.get();
   // An agent that records no picture has no camera to wait for.
   const auto preview =
       settings->videoEnabled
@@ -72,29 +75,29 @@ void AgentMain::retryDevice(std::int64_t now) {
                 settings->videoDeviceID, settings->audioDeviceID, settings->audioEnabled,
                 settings->previewIntervalInMilliseconds, controller ? controller->session() : nullptr)
           : nullptr;
-  record->setPreviewController(preview);
+  record->previewController.set(preview);
   if (preview || !settings->videoEnabled) {
-    context_->setLast_device_check(0);
+    context_->state.last_device_check.set(0);
     shouldDisplayOfflineMessage_ = false;
     if (openTunnel()) {
       loadSchedule();
     } else {
-      context_->setRunning(false);
+      context_->state.running.set(false);
     }
     return;
   }
-  context_->setLast_device_check(now);
+  context_->state.last_device_check.set(now);
   if (shouldDisplayOfflineMessage_) {
     LMPLogMessage(nullptr, kLogWarning, "%s", kOfflineMessage);
     shouldDisplayOfflineMessage_ = false;
   } else {
-    context_->setRunning(false);
+    context_->state.running.set(false);
   }
 }
 
 void AgentMain::stopForgottenPreview(std::int64_t now) {
   const auto record = session();
-  const auto preview = record ? record->previewController() : nullptr;
+  const auto preview = record ? record->previewController.get() : nullptr;
   if (!preview || !preview->controller().isPreviewRunning()) return;
   const std::int64_t requested = preview->mLastPreviewRequestTime();
   if (requested == 0 || isAhead(now, requested, kPreviewTimeOutSeconds)) return;
@@ -113,18 +116,18 @@ void AgentMain::readTimeShift() {
       if (found != dictionary->end()) seconds = static_cast<std::int32_t>(found->second.asInteger());
     }
   }
-  context_->setTimeshift_seconds(seconds);
+  context_->state.timeshift_seconds.set(seconds);
 }
 
 void AgentMain::reloadChangedPreferences() {
   if (!agentPrefs_ || !agentPrefs_->prefsFileChanged()) return;
-  if (!agentPrefs_->setAgentPreferencesInContext(*context_)) disableService();
+  if (!setAgentPreferencesInContext(*agentPrefs_, *context_)) disableService();
 }
 
 void AgentMain::checkServerRefusal(std::int64_t now) {
-  const std::int64_t refused = context_->serverRejectTime();
-  if (context_->adhoc() || refused == 0 || isAhead(now, refused, kRefusalSeconds)) return;
-  context_->setServerRejectTime(0);
+  const std::int64_t refused = context_->state.serverRejectTime.get();
+  if (context_->options.adhoc.get() || refused == 0 || isAhead(now, refused, kRefusalSeconds)) return;
+  context_->state.serverRejectTime.set(0);
   LMPLogMessage(context_->log_context(), kLogCritical,
                 "Server rejected agent connection, restarting for retry.");
   std::fflush(nullptr);
@@ -132,14 +135,14 @@ void AgentMain::checkServerRefusal(std::int64_t now) {
 }
 
 bool AgentMain::postProcessingIsIdle() const {
-  return hand_offs_ == 0 && context_->postProcessListCount() == 0 && !scheduler_.busy();
+  return hand_offs_ == 0 && context_->post_process_list.postProcessListCount() == 0 && !scheduler_.busy();
 }
 
 bool AgentMain::deviceDisconnected() {
   const auto record = session();
-  const auto delegate = record ? record->captureControllerDelegate() : nullptr;
+  const auto delegate = record ? record->captureControllerDelegate.get() : nullptr;
   if (!delegate || !delegate->deviceDisconnected()) return false;
-  if (context_->adhoc()) {
+  if (context_->options.adhoc.get()) {
     LMPLogMessage(context_->log_context(), kLogCritical, "The capture device has been disconnected.");
     std::fflush(nullptr);
     _exit(kExitDeviceLost);
@@ -153,8 +156,8 @@ bool AgentMain::deviceDisconnected() {
 
 std::shared_ptr<LMRRecordingContext> AgentMain::recordingContext() {
   try {
-    return context_->adhoc() ? AgentPreferences::newRecordingContextForAdHoc(environment_.framework)
-                             : AgentPreferences::newRecordingContextForDaemon(environment_.framework);
+    return context_->options.adhoc.get() ? newRecordingContextForAdHoc(*environment_.framework)
+                                         : newRecordingContextForDaemon(*environment_.framework);
   } catch (const std::exception& error) {
     LMPLogMessage(nullptr, kLogCritical, "Unable to load the recording context, exception = %s",
                   error.what());
@@ -165,13 +168,13 @@ std::shared_ptr<LMRRecordingContext> AgentMain::recordingContext() {
 }
 
 void AgentMain::pauseOrResume(bool pause) {
-  if (!context_->adhoc()) return pause ? pauseCapture() : resumeCapture();
+  if (!context_->options.adhoc.get()) return pause ? pauseCapture() : resumeCapture();
   const auto controller = captureController();
   if (!controller) return;
-  const std::string uuid = session()->recording_uuid();
-  const double now = secondsSinceReferenceDate() - context_->timeshift_seconds();
+  const std::string uuid = session()->recording_uuid.get();
+  const double now = secondsSinceReferenceDate() - context_->state.timeshift_seconds.get();
   pause ? controller->setStopWithUUID(uuid, now)
-        : controller->setStartWithUUID(uuid, now, context_->properties());
+        : controller->setStartWithUUID(uuid, now, context_->state.properties.get());
 }
 
 void AgentMain::signal(int number) {
@@ -182,13 +185,13 @@ void AgentMain::signal(int number) {
       break;
     case SIGINT:
       context_->logDebug("Got Stop Signal (SIGINT)");
-      if (!context_->adhoc()) stopCapture();
-      context_->setRunning(false);
+      if (!context_->options.adhoc.get()) stopCapture();
+      context_->state.running.set(false);
       break;
     case SIGTERM:
       context_->logDebug("Got Termination Signal (SIGTERM)");
       stopCapture();
-      context_->setRunning(false);
+      context_->state.running.set(false);
       break;
     case SIGUSR1:
       context_->logDebug("Got Pause Signal");

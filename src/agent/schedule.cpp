@@ -53,11 +53,11 @@ void AgentMain::runDueCommands(std::time_t now) {
 
 std::chrono::milliseconds AgentMain::timeToNextCommand(std::chrono::milliseconds atMost) const {
   const auto next = schedule_.next();
-  const auto now = currentTime();
+  const auto now = lmp_gettimeofday();
   if (!next || !now) return atMost;
   const TimeValue date{*next, 0};
-  return std::clamp(std::chrono::milliseconds(lmp_diff_timeval(&date, &*now) + 1),
-                    std::chrono::milliseconds(0), atMost);
+  return std::clamp(std::chrono::milliseconds(lmp_diff_timeval(date, *now) + 1), std::chrono::milliseconds(0),
+                    atMost);
 }
 
 AgentControlBase& AgentMain::channelOf(ChannelKind kind) {

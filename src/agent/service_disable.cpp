@@ -4,6 +4,7 @@
 #include <cstdio>
 
 #include "agent/agent_main.h"
+#include "model/codes.h"
 #include "platform/log.h"
 
 namespace lmx {

@@ -1,10 +1,12 @@
 // The way of a stopped recording: movie, properties document, job.
 #include "agent/agent_main.h"
+#include "capture/api/capture_framework.h"
+#include "model/codes.h"
 #include "platform/log.h"
 #include "platform/work_queue.h"
 #include "postprocess/agent_submit.h"
 #include "record/capture_delegate.h"
-#include "record/engine.h"
+#include "record/stop_capture.h"
 
 namespace lmx {
 namespace {
@@ -19,16 +21,16 @@ SharedDictionary withUuid(const SharedDictionary& metadata, const std::optional<
 
 /// The START parameters of what `stopped` recorded.
 SharedDictionary propertiesOf(const AgentContext& context, const AgentRecord& stopped) {
-  const SharedDictionary own = stopped.request_properties();
-  return own ? own : context.properties();
+  const SharedDictionary own = stopped.request_properties.get();
+  return own ? own : context.state.properties.get();
 }
 
 /// What describes it. A START that was refused meanwhile has taken over the request, and with it what is
 /// submitted; the metadata may still be those of the first.
 SharedDictionary metadataOf(const AgentContext& context, const AgentRecord& stopped) {
-  if (SharedDictionary own = stopped.request_properties()) return own;
-  SharedDictionary prepared = stopped.metadata();
-  return prepared ? prepared : context.properties();
+  if (SharedDictionary own = stopped.request_properties.get()) return own;
+  SharedDictionary prepared = stopped.metadata.get();
+  return prepared ? prepared : context.state.properties.get();
 }
 
 TimeValue timeValueFrom(double secondsSinceReference) {
@@ -62,10 +64,10 @@ std::shared_ptr<AgentRecord> AgentMain::takeStopped(const void* controller) {
   if (found != stopped_.end()) {
     stopped = std::move(found->second);
     stopped_.erase(found);
-  } else if (const auto record = session(); record && record->captureController().get() == controller) {
+  } else if (const auto record = session(); record && record->captureController.get().get() == controller) {
     stopped = record->copy();
   }
-  if (stopped) reported_ = stopped->captureController();
+  if (stopped) reported_ = stopped->captureController.get();
   return stopped;
 }
 
@@ -88,9 +90,9 @@ void AgentMain::captureDidCancel(const void* controller) {
       [this, controller] {
         const auto stopped = takeStopped(controller);
         const auto record = session();
-        if (record && record->captureController().get() == controller) setRecorderStatusToIdle();
+        if (record && record->captureController.get().get() == controller) setRecorderStatusToIdle();
         if (!stopped) return;
-        dispatchAsync(WorkPriority::background, [this, capture = stopped->captureController()] {
+        dispatchAsync(WorkPriority::background, [this, capture = stopped->captureController.get()] {
           if (capture) keepRecovered(capture->recoverAbandonedRequests());
         });
       },
@@ -108,15 +110,16 @@ void AgentMain::submitStoppedRecording() {
 
 void AgentMain::submit(const std::shared_ptr<AgentRecord>& stopped) {
   context_->logDebug("Submitting Stopped Recording");
-  const auto controller = stopped->captureController();
-  const double elapsed = controller ? controller->elapsedTimeForRequestWithUUID(stopped->request_uuid()) : 0;
+  const auto controller = stopped->captureController.get();
+  const double elapsed =
+      controller ? controller->elapsedTimeForRequestWithUUID(stopped->request_uuid.get()) : 0;
   const SharedDictionary properties = propertiesOf(*context_, *stopped);
   const auto uuid = lookUp(properties, kUuidKey);
-  const std::string path =
-      lookUp(properties, "RecordingMetadata_ADHOC_FILE_PATH")
-          .value_or(context_->recording_repository_path().value_or("") + "/" + uuid.value_or("") + ".mov");
-  stopped->setMetadata(withUuid(metadataOf(*context_, *stopped), uuid));
-  stopped->setStartTime(stopped->beginning());
+  const std::string path = lookUp(properties, "RecordingMetadata_ADHOC_FILE_PATH")
+                               .value_or(context_->recording.recording_repository_path.get().value_or("") +
+                                         "/" + uuid.value_or("") + ".mov");
+  stopped->metadata.set(withUuid(metadataOf(*context_, *stopped), uuid));
+  stopped->startTime.set(stopped->beginning());
   dispatchAsync(WorkPriority::background, [this, stopped, path, elapsed] {
     const CountedDown end_of_hand_off(hand_offs_);
     handOff(stopped, path, elapsed);
@@ -125,19 +128,19 @@ void AgentMain::submit(const std::shared_ptr<AgentRecord>& stopped) {
 
 void AgentMain::handOff(const std::shared_ptr<AgentRecord>& stopped, const std::string& path,
                         double elapsed) {
-  const auto controller = stopped->captureController();
+  const auto controller = stopped->captureController.get();
   if (!controller) return;
   // An agent that is ending leaves the recording to the next start, which makes movie and document together.
-  if (!context_->running()) return;
-  const std::string request = stopped->request_uuid();
+  if (!context_->state.running.get()) return;
+  const std::string request = stopped->request_uuid.get();
   const auto error = controller->processRequestWithUUID(request, path);
   // The session, unless it has gone on to another capture.
   const auto own_session = [&]() -> std::shared_ptr<AgentRecord> {
     auto record = session();
-    return record && record->captureController() == controller ? record : nullptr;
+    return record && record->captureController.get() == controller ? record : nullptr;
   };
   const auto leave_error = [&] {
-    if (const auto record = own_session()) record->setError(kRecordCannotWrite);
+    if (const auto record = own_session()) record->error.set(kRecordCannotWrite);
   };
   if (const auto cause = controller->lastError()) {
     LMPLogMessage(context_->log_context(), kLogError, "The capture of \"%s\" ended early: %s", path.c_str(),
@@ -147,16 +150,16 @@ void AgentMain::handOff(const std::shared_ptr<AgentRecord>& stopped, const std::
   }
   bool documented = true;
   if (!error) {
-    stopped->setStopTime(shiftedNow(*context_));
-    documented = announceStop(stopped, path, stopped->metadata(), stopped->startTime(),
-                              static_cast<std::int64_t>(elapsed), stopped->stopTime(), false);
+    stopped->stopTime.set(shiftedNow(*context_));
+    documented = announceStop(stopped, path, stopped->metadata.get(), stopped->startTime.get(),
+                              static_cast<std::int64_t>(elapsed), stopped->stopTime.get(), false);
   } else {
     LMPLogMessage(context_->log_context(), kLogCritical, "The recording could not be finished: %s",
                   error->message.c_str());
     recordRuntimeErrorCallback(kRecordCannotWrite);
     leave_error();
   }
-  if (context_->running()) {
+  if (context_->state.running.get()) {
     // A movie or a document that could not be written stays in the capture's journal: the next start tries
     // again.
     if (documented && (!error || error->code == kNoMedia)) {
@@ -178,11 +181,11 @@ bool AgentMain::announceStop(const std::shared_ptr<AgentRecord>& session, const 
                              const SharedDictionary& metadata, std::optional<TimeValue> atTime,
                              std::int64_t elapsedSeconds, std::optional<TimeValue> stoppedTime,
                              bool canceled) {
-  if (!context_->running()) return true;
+  if (!context_->state.running.get()) return true;
   LMPLogMessage(context_->log_context(), kLogNotice, "\"%s\" recording stopped (duration: %ds)", file.c_str(),
                 static_cast<int>(elapsedSeconds));
   const SharedDictionary properties = propertiesOf(*context_, *session);
-  if (context_->adhoc() || context_->submit_disabled() ||
+  if (context_->options.adhoc.get() || context_->options.submit_disabled.get() ||
       lookUp(properties, "RecordingMetadata_ADHOC_SUBMIT_DISABLED") == "1") {
     return true;
   }
@@ -195,11 +198,11 @@ bool AgentMain::announceStop(const std::shared_ptr<AgentRecord>& session, const 
   if (job->writeProperties() != 0) {
     LMPLogMessage(context_->log_context(), kLogCritical,
                   "Internal error occurred in did stop with success callback");
-    context_->setRunning(false);
+    context_->state.running.set(false);
     return true;
   }
   const bool documented = job->documented();
-  context_->postProcessListAddJob(std::move(job));
+  context_->post_process_list.postProcessListAddJob(std::move(job));
   return documented;
 }
 
@@ -207,7 +210,7 @@ void AgentMain::keepRecovered(const std::vector<RecoveredRecording>& recordings)
   for (const RecoveredRecording& recording : recordings) {
     AgentSubmit document;
     auto record = std::make_shared<AgentRecord>();
-    record->setRecordingType(recording.recordingType);
+    record->recordingType.set(recording.recordingType);
     document.setRecord(record);
     document.setPropertyValuesWithContext(
         context_, recording.path, timeValueFrom(recording.startTime), timeValueFrom(recording.stopTime),

@@ -46,9 +46,10 @@ void AgentMain::tellServerOfTheEnd() {
   closeTunnel();
   LMPLogMessage(context_->log_context(), kLogInfo, "Notifying the server that the agent is going offline");
   const auto deadline = std::chrono::steady_clock::now() + 10s;
-  context_->setAgent_sent_or_fail(false);
+  context_->state.agent_sent_or_fail.set(false);
   if (!openTunnel()) return;
-  while (!context_->agent_sent_or_fail() && std::chrono::steady_clock::now() < deadline) loop_.run(100ms);
+  while (!context_->state.agent_sent_or_fail.get() && std::chrono::steady_clock::now() < deadline)
+    loop_.run(100ms);
   closeTunnel();
 }
 

@@ -6,6 +6,7 @@
 #include "agent/agent_main.h"
 #include "cli/adhoc_command.h"
 #include "control/local/client_connect.h"
+#include "model/codes.h"
 #include "platform/log.h"
 
 namespace lmx {
@@ -37,14 +38,14 @@ int AgentMain::startupAdHoc() {
   ClientConnect client;
   if (client.connect() != 0) return 0;
   say("Connected.", "");
-  const std::string command = adHocCommand(*context_);
+  const std::string command = adHocCommand(context_->options);
   say("sending: ", command);
   std::string reply;
   // The daemon serves one peer at a time: behind another one the answer may be far away, and an interrupt
   // must still be heard.
   if (client.execCommand(command, &reply, [this] { return handleSignals(); }) != 0) return 0;
   say("received: ", orEmpty(reply));
-  return context_->adhoc_request_type() == kAdHocRecording ? recordAdHoc(client) : 0;
+  return context_->options.adhoc_request_type.get() == kAdHocRecording ? recordAdHoc(client) : 0;
 }
 
 int AgentMain::recordAdHoc(ClientConnect& client) {
@@ -65,7 +66,7 @@ int AgentMain::recordAdHoc(ClientConnect& client) {
 bool AgentMain::handleSignals() {
   while (loop_.run(0ms) == RunLoop::Turn::handledSource) {
   }
-  return context_->running();
+  return context_->state.running.get();
 }
 
 int AgentMain::appLoopAdHoc() {
@@ -73,7 +74,7 @@ int AgentMain::appLoopAdHoc() {
     if (deviceDisconnected()) return 0;
     readTimeShift();
     runLoopRunning_ = loop_.run(250ms) != RunLoop::Turn::stopped;
-    if (!context_->running() || !runLoopRunning_) return 0;
+    if (!context_->state.running.get() || !runLoopRunning_) return 0;
   }
 }
 

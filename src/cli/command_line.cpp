@@ -7,9 +7,13 @@
 #include <exception>
 
 #include "agent/agent_main.h"
+#include "capture/api/capture_framework.h"
 #include "cli/adhoc_command.h"
 #include "cli/preference_tools.h"
+#include "model/codes.h"
 #include "platform/log.h"
+#include "prefs/preference_dump.h"
+#include "prefs/recording_context.h"
 #include "support/date_text.h"
 #include "support/scan.h"
 #include "support/utf8.h"
@@ -46,7 +50,7 @@ constexpr option kLongOptions[] = {{"unattended_minutes", required_argument, nul
 /// The date that lies `delay` (seconds, positive) ahead, as timers write it.
 std::optional<std::string> dateAfter(const char* delay) {
   const auto seconds = scanReal(delay);
-  const auto now = currentTime();
+  const auto now = lmp_gettimeofday();
   // Beyond ten thousand years no calendar can tell the date.
   if (!now || !seconds || !(*seconds > 0) || *seconds > 1e11) return std::nullopt;
   const double begin = static_cast<double>(now->tv_sec) + static_cast<double>(now->tv_usec) * 1e-6;
@@ -65,11 +69,11 @@ void printContext(const char* kind, const std::shared_ptr<LMRRecordingContext>& 
 int printInformation(const std::string& kind, const std::shared_ptr<CaptureFramework>& framework) {
   try {
     if (kind == "ad-hoc-prefs") {
-      printContext("ad-hoc-prefs", AgentPreferences::newRecordingContextForAdHoc(framework));
-      AgentPreferences::dumpAdHoc();
+      printContext("ad-hoc-prefs", newRecordingContextForAdHoc(*framework));
+      dumpAdHoc();
     } else if (kind == "daemon-prefs") {
-      printContext("daemon-prefs", AgentPreferences::newRecordingContextForDaemon(framework));
-      AgentPreferences::dumpDaemon();
+      printContext("daemon-prefs", newRecordingContextForDaemon(*framework));
+      dumpDaemon();
     } else if (kind == "zq-device-list") {
       std::fputs(framework->deviceInformation().c_str(), stdout);
     }
@@ -156,20 +160,20 @@ bool AgentMain::takeToolOption(int option, ToolRequest& request) {
     case 'd':
       request.durationGiven = true;
       request.number = scanInteger(optarg).value_or(request.number);
-      context_->setDuration(request.number);
+      context_->options.duration.set(request.number);
       return true;
     case 'p':
       request.previewPath = optarg;
       return true;
     case 's':
-      context_->setSubmit_disabled(true);
+      context_->options.submit_disabled.set(true);
       return true;
     case 't':
       request.testPath = optarg;
       return true;
     case 'Z':
       request.number = scanInteger(optarg).value_or(request.number);
-      context_->setUnattended(request.number);
+      context_->options.unattended.set(request.number);
       return true;
     default:
       return false;
@@ -178,20 +182,20 @@ bool AgentMain::takeToolOption(int option, ToolRequest& request) {
 
 bool AgentMain::takeAdHocOption(int option) {
   const auto ask = [this](AdHocRequest type) {
-    context_->setAdhoc(true);
-    context_->setAdhoc_request_type(type);
+    context_->options.adhoc.set(true);
+    context_->options.adhoc_request_type.set(type);
   };
   switch (option) {
     case 'f':
       if (!isUtf8(optarg)) return false;
-      context_->setAdhoc(true);
-      context_->setAdhoc_output_file(optarg);
+      context_->options.adhoc.set(true);
+      context_->options.adhoc_output_file.set(optarg);
       return true;
     case 'u':
-      context_->setUser(optarg);
+      context_->options.user.set(optarg);
       return true;
     case 'P':
-      context_->setPassword(optarg);
+      context_->options.password.set(optarg);
       return true;
     case 'S':
       ask(kAdHocStatus);
@@ -201,13 +205,13 @@ bool AgentMain::takeAdHocOption(int option) {
       return true;
     case 'R':
       ask(kAdHocTimerRevoke);
-      context_->setTimer_id(optarg);
+      context_->options.timer_id.set(optarg);
       return true;
     case 'T':
-      context_->setStart_timer(optarg);
+      context_->options.start_timer.set(optarg);
       return true;
     case 'U':
-      if (const auto start = dateAfter(optarg)) context_->setStart_timer(start);
+      if (const auto start = dateAfter(optarg)) context_->options.start_timer.set(start);
       return true;
     default:
       return false;
@@ -215,12 +219,13 @@ bool AgentMain::takeAdHocOption(int option) {
 }
 
 bool AgentMain::combinationAllowed(const ToolRequest& request) const {
-  if (request.durationGiven && !context_->adhoc()) {
+  if (request.durationGiven && !context_->options.adhoc.get()) {
     std::fputs("The -d option only applies to ad-hoc mode (requires a file path)\n", stderr);
     return false;
   }
-  if (!context_->user() && context_->adhoc() && !context_->submit_disabled() &&
-      context_->adhoc_request_type() == kAdHocRecording) {
+  if (!context_->options.user.get() && context_->options.adhoc.get() &&
+      !context_->options.submit_disabled.get() &&
+      context_->options.adhoc_request_type.get() == kAdHocRecording) {
     std::fputs("A user name is required for ad-hoc file submission.\n", stderr);
     return false;
   }
@@ -229,7 +234,7 @@ bool AgentMain::combinationAllowed(const ToolRequest& request) const {
 
 int AgentMain::runTools(const ToolRequest& request) {
   if (request.testPath != nullptr) {
-    const auto user = context_->user();
+    const auto user = context_->options.user.get();
     const int status = bindTestCamera(request.testPath, user ? user->c_str() : nullptr, request.server,
                                       *environment_.children);
     if (status != 0) return status;

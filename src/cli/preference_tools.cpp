@@ -7,9 +7,11 @@
 #include <string>
 
 #include "cli/bind_command.h"
+#include "model/codes.h"
 #include "platform/directories.h"
 #include "platform/paths.h"
 #include "platform/plist/property_list.h"
+#include "prefs/adhoc_defaults.h"
 #include "prefs/agent_preferences.h"
 
 namespace lmx {
@@ -30,7 +32,7 @@ bool given(const char* argument) { return argument != nullptr && *argument != '\
 std::optional<PlistDictionary> loadToChange(const std::string& path) {
   PlistResult file = readPropertyList(path);
   if (file.value && file.value->dictionary() != nullptr) return *file.value->dictionary();
-  if (file.systemError == ENOENT) return AgentPreferences::adHocDefaults();
+  if (file.systemError == ENOENT) return adHocDefaults();
   const std::string problem = file.value ? "its top level is not a dictionary" : file.problem;
   const std::string copy = keepUnderAnotherName(path);
   if (copy.empty()) {
@@ -41,7 +43,7 @@ std::optional<PlistDictionary> loadToChange(const std::string& path) {
   std::fprintf(stderr,
                "The preferences file %s can't be used: %s. It is kept as %s; defaults take its place.\n",
                path.c_str(), problem.c_str(), copy.c_str());
-  return AgentPreferences::adHocDefaults();
+  return adHocDefaults();
 }
 
 /// @return the exit status

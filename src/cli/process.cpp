@@ -7,10 +7,11 @@
 #include <memory>
 
 #include "agent/agent_main.h"
+#include "capture/api/capture_framework.h"
+#include "model/codes.h"
 #include "platform/log.h"
 #include "platform/notifications.h"
 #include "platform/paths.h"
-#include "support/heap_ptr.h"
 
 namespace lmx {
 namespace {
@@ -30,10 +31,10 @@ int runAgent(int argc, char** argv, std::shared_ptr<CaptureFramework> framework)
            newAgentContext(),
            AgentEnvironment{std::move(framework), newServiceManager(), &systemChildRunner()})
            .release();
-  const heap_ptr<TimeValue> launched(lmp_gettimeofday());
+  const auto launched = lmp_gettimeofday();
   if (!launched) return kExitOperatingSystem;
-  agent.agentContext()->setLaunch_time(*launched);
-  agent.agentContext()->setRunning(true);
+  agent.agentContext()->state.launch_time.set(*launched);
+  agent.agentContext()->state.running.set(true);
   int exitCode = 0;
   return agent.parseArgs(argv, argc, &exitCode) ? agent.startup() : exitCode;
 }

@@ -3,6 +3,7 @@
 
 #include "platform/log.h"
 #include "prefs/agent_preferences.h"
+#include "prefs/recording_types.h"
 #include "support/format.h"
 
 namespace lmx {
@@ -42,27 +43,31 @@ class Gatherer {
   bool addDates(std::optional<TimeValue> started, std::optional<TimeValue> stopped) {
     // A time that nobody has set counts as 0: losing the rest of the document over it would be worse.
     const auto seconds = [](std::optional<TimeValue> time) {
-      return formatted("%d", static_cast<std::int32_t>(time ? time->tv_sec : 0));
+      return string_with_format("%d", static_cast<std::int32_t>(time ? time->tv_sec : 0));
     };
     return job_.addValue(seconds(started), "RecordingMetadata_START_DATE") &&
            job_.addValue(seconds(stopped), "RecordingMetadata_END_DATE");
   }
 
   bool addRecording(const AgentRecord* record, std::int64_t duration) {
-    if (!addIfMissing("RecordingMetadata_DURATION", formatted("%d", static_cast<std::int32_t>(duration))))
+    if (!addIfMissing("RecordingMetadata_DURATION",
+                      string_with_format("%d", static_cast<std::int32_t>(duration))))
       return false;
     return addType(record == nullptr ? 0 : record->recordedType()) &&
            addIfMissing("RecordingMetadata_VIDEO_MAXIMUM_FRAME_RATE",
-                        context_.recording_video_maximum_frame_rate()) &&
+                        context_.recording.recording_video_maximum_frame_rate.get()) &&
            addImageSide("RecordingMetadata_VIDEO_IMAGE_HEIGHT",
-                        record == nullptr ? 0 : record->videoHeight()) &&
-           addImageSide("RecordingMetadata_VIDEO_IMAGE_WIDTH", record == nullptr ? 0 : record->videoWidth());
+                        record == nullptr ? 0 : record->videoHeight.get()) &&
+           addImageSide("RecordingMetadata_VIDEO_IMAGE_WIDTH",
+                        record == nullptr ? 0 : record->videoWidth.get());
   }
 
   bool addAudio() {
-    return addIfMissing("RecordingMetadata_AUDIO_CHANNEL", context_.recording_audio_channel()) &&
-           addIfMissing("RecordingMetadata_AUDIO_SAMPLE_RATE", context_.recording_audio_sample_rate()) &&
-           addIfMissing("RecordingMetadata_AUDIO_INPUT", context_.recording_audio_input());
+    return addIfMissing("RecordingMetadata_AUDIO_CHANNEL",
+                        context_.recording.recording_audio_channel.get()) &&
+           addIfMissing("RecordingMetadata_AUDIO_SAMPLE_RATE",
+                        context_.recording.recording_audio_sample_rate.get()) &&
+           addIfMissing("RecordingMetadata_AUDIO_INPUT", context_.recording.recording_audio_input.get());
   }
 
   bool addExtension(const std::string& movie) {
@@ -75,7 +80,7 @@ class Gatherer {
  private:
   bool addType(std::int32_t code) {
     if (code == 0 || !missing("RecordingMetadata_TYPE")) return true;
-    const char* name = AgentPreferences::recTypeToString(code);
+    const char* name = recTypeToString(code);
     return job_.addValue(name == nullptr ? Text() : Text(name), "RecordingMetadata_TYPE");
   }
 
@@ -83,7 +88,7 @@ class Gatherer {
   /// size itself, and a START that claims one for a picture whose size is known is in error.
   bool addImageSide(const char* name, std::uint32_t pixels) {
     if (missing(name) || pixels == 0) return true;
-    return job_.addValue(formatted("%d", static_cast<int>(pixels)), std::string(name));
+    return job_.addValue(string_with_format("%d", static_cast<int>(pixels)), std::string(name));
   }
 
   AgentSubmit& job_;
@@ -121,7 +126,7 @@ void AgentSubmit::setPropertyValuesWithContext(std::shared_ptr<AgentContext> con
     recording_file_path_ = recording_file_path;
     properties_file_path_ = propertiesPathFor(*recording_file_path, agentContext_->log_context());
     Gatherer gather(*this, *agentContext_);
-    good = gather.addIfMissing("RecordingMetadata_MACHINE_UUID", agentContext_->machine_uuid()) &&
+    good = gather.addIfMissing("RecordingMetadata_MACHINE_UUID", agentContext_->server.machine_uuid.get()) &&
            gather.addDates(started_date, stopped_date) && gather.addRecording(session.get(), duration) &&
            gather.addAudio() && gather.addExtension(*recording_file_path);
   }

@@ -1,6 +1,7 @@
 // The properties document.
-#include <cstring>
 #include <pugixml.hpp>
+
+#include <cstring>
 #include <sstream>
 #include <string_view>
 

@@ -115,12 +115,12 @@ std::vector<std::string> submissionArguments(const Submission& s) {
 
 int AgentSubmit::addRecordingWithCommentary(ChildRunner& children) {
   const LMPLogContext log = agentContext_ ? agentContext_->log_context() : nullptr;
-  const bool disabled = agentContext_ && agentContext_->submit_disabled();
+  const bool disabled = agentContext_ && agentContext_->options.submit_disabled.get();
   LMPLogMessage(log, kLogInfo, "Post-process mechanism is starting...");
   if (!disabled && !canceled_) {
     LMPLogMessage(log, kLogInfo, "Completion in progress...");
     if (addRecording(children) != 0) {
-      const Text server = agentContext_ ? agentContext_->lumex_url() : std::nullopt;
+      const Text server = agentContext_ ? agentContext_->server.lumex_url.get() : std::nullopt;
       LMPLogMessage(log, kLogError, "An error occurred completing recording \"%s\"",
                     server.value_or("(null)").c_str());
       LMPLogMessage(log, kLogCritical, "An internal error occurred during agent post-processing");
@@ -142,15 +142,16 @@ int AgentSubmit::addRecording(ChildRunner& children) {
   const std::string movie = recording_file_path_.value_or("");
   const auto session = record();
   if (session && session->recordedType() == kRecordingTypeFile) {
-    const std::string copy = agentContext_->recording_repository_path().value_or("") + "/" + *uuid;
+    const std::string copy =
+        agentContext_->recording.recording_repository_path.get().value_or("") + "/" + *uuid;
     copyIntoRepository(movie, copy + ".mov");
     copyIntoRepository(movie.substr(0, movie.size() - std::min<std::size_t>(3, movie.size())) + "xml",
                        copy + ".xml");
   }
-  Submission submission{.server = agentContext_->lumex_url().value_or(""), .recordingUUID = *uuid};
+  Submission submission{.server = agentContext_->server.lumex_url.get().value_or(""), .recordingUUID = *uuid};
   if (adhoc_workflow_uuid_) {
-    const auto user = agentContext_->user();
-    const auto password = agentContext_->password();
+    const auto user = agentContext_->options.user.get();
+    const auto password = agentContext_->options.password.get();
     if (!user || !password) return failedBeforeTheTool();
     submission.workflow = *adhoc_workflow_uuid_;
     submission.file = movie;

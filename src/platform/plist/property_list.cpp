@@ -170,6 +170,18 @@ std::string lowered(std::string text) {
 
 }  // namespace
 
+const PlistValue* PlistValue::under(std::string_view key) const {
+  const PlistDictionary* all = dictionary();
+  if (all == nullptr) return nullptr;
+  const auto found = all->find(key);
+  return found == all->end() ? nullptr : &found->second;
+}
+
+const std::string* PlistValue::textUnder(std::string_view key) const {
+  const PlistValue* found = under(key);
+  return found == nullptr ? nullptr : found->string();
+}
+
 double PlistValue::asReal() const {
   if (const auto* v = std::get_if<double>(&value)) return *v;
   if (const auto* v = std::get_if<std::int64_t>(&value)) return static_cast<double>(*v);

@@ -5,6 +5,7 @@
 #include <memory>
 #include <optional>
 #include <string>
+#include <string_view>
 #include <variant>
 #include <vector>
 
@@ -31,6 +32,10 @@ struct PlistValue {
 
   [[nodiscard]] const std::string* string() const { return std::get_if<std::string>(&value); }
   [[nodiscard]] const PlistDictionary* dictionary() const { return std::get_if<PlistDictionary>(&value); }
+  /// The value under `key`; null when this is no dictionary or has no such key.
+  [[nodiscard]] const PlistValue* under(std::string_view key) const;
+  /// The text under `key`; null when there is none.
+  [[nodiscard]] const std::string* textUnder(std::string_view key) const;
   /// Numbers and booleans as one another, as a preferences store converts them; texts as strtod/atoll read
   /// them ("true"/"yes" count as 1 for asBool); anything else is 0.
   [[nodiscard]] double asReal() const;

@@ -15,7 +15,7 @@ class Cluster : public AgentTest {
       std::filesystem::create_directories(directoryOf(systemPath(path)));
       ::unlink(systemPath(path).c_str());
     }
-    context_->setTunnel_host("server");
+    context_->server.tunnel_host.set("server");
   }
   ~Cluster() override {
     for (const auto path : {kServerInformation, kServerInformationOfRoot}) ::unlink(systemPath(path).c_str());
@@ -117,18 +117,18 @@ TEST_F(Cluster, TheSecondCacheCountsOnlyWithoutTheFirst) {
 }
 
 TEST_F(Cluster, ARefreshThatFailsKeepsTheOldInformation) {
-  context_->setServer_info(std::make_shared<const PlistDictionary>(PlistDictionary{{"old", "x"}}));
+  context_->server_info.set(std::make_shared<const PlistDictionary>(PlistDictionary{{"old", "x"}}));
   children_.result = exited(3);
   agent_.refreshClusterInformation();
   EXPECT_TRUE(log_.waitFor(3, "Unable to update cluster information."));
-  EXPECT_TRUE(context_->server_info_retain()->contains("old"));
+  EXPECT_TRUE(context_->server_info.get()->contains("old"));
 }
 
 TEST_F(Cluster, ARefreshStoresTheAnswer) {
   children_.result = exited(0, propertyListXml(members({"a"})));
   agent_.refreshClusterInformation();
   EXPECT_TRUE(testing::waitUntil([&] {
-    const auto now = context_->server_info_retain();
+    const auto now = context_->server_info.get();
     return now && now->contains("a");
   }));
 }

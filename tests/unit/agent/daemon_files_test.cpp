@@ -19,9 +19,9 @@ class DaemonFiles : public AgentTest {
   }
   /// One turn of the main loop, which is where the time shift is read.
   void turn() {
-    agent_.mainRunLoop().post([this] { context_->setRunning(false); }, Wait::no);
+    agent_.mainRunLoop().post([this] { context_->state.running.set(false); }, Wait::no);
     EXPECT_EQ(agent_.appLoop(), 0);
-    context_->setRunning(true);
+    context_->state.running.set(true);
   }
 };
 
@@ -65,7 +65,7 @@ TEST_F(DaemonFiles, RepositoryThatExistsIsTaken) {
 
 TEST_F(DaemonFiles, MissingRepositoryIsMadeWithItsParents) {
   const std::string path = repository_.file("a/b/c");
-  context_->setRecording_repository_path(path);
+  context_->recording.recording_repository_path.set(path);
   EXPECT_TRUE(agent_.setupRecordingRepository());
   EXPECT_TRUE(fs::is_directory(path));
   EXPECT_EQ(fs::status(path).permissions(), fs::perms{0755});
@@ -74,7 +74,7 @@ TEST_F(DaemonFiles, MissingRepositoryIsMadeWithItsParents) {
 
 TEST_F(DaemonFiles, RepositoryThatCannotBeMadeIsAFailure) {
   fs::create_symlink("/no/such/place", repository_.file("link"));
-  context_->setRecording_repository_path(repository_.file("link"));
+  context_->recording.recording_repository_path.set(repository_.file("link"));
   EXPECT_FALSE(agent_.setupRecordingRepository());
   EXPECT_TRUE(log_.contains(2, "Unable to create recording directory"));
 }
@@ -82,7 +82,7 @@ TEST_F(DaemonFiles, RepositoryThatCannotBeMadeIsAFailure) {
 TEST_F(DaemonFiles, RepositoryBelowAFileDoesNotExist) {
   writeFile(repository_.file("plain"), "");
   const std::string path = repository_.file("plain/sub");
-  context_->setRecording_repository_path(path);
+  context_->recording.recording_repository_path.set(path);
   EXPECT_FALSE(agent_.setupRecordingRepository());
   EXPECT_TRUE(log_.contains(2, "Recording repository path \"" + path + "\" does not exist"));
 }
@@ -91,23 +91,23 @@ TEST_F(DaemonFiles, TimeShiftIsReadOnEveryTurn) {
   const std::string path = systemPath(kTimeShiftFile);
   ASSERT_EQ(writePropertyList(path, PlistDictionary{{"TimeShiftSeconds", std::int64_t{20}}}), 0);
   turn();
-  EXPECT_EQ(context_->timeshift_seconds(), 20);
+  EXPECT_EQ(context_->state.timeshift_seconds.get(), 20);
   ASSERT_EQ(writePropertyList(path, PlistDictionary{{"Other", std::int64_t{30}}}), 0);
   turn();
-  EXPECT_EQ(context_->timeshift_seconds(), 0);
+  EXPECT_EQ(context_->state.timeshift_seconds.get(), 0);
 }
 
 TEST_F(DaemonFiles, WithoutAUsableTimeShiftFileThereIsNone) {
   for (const char* content : {"", "not a property list"}) {
-    context_->setTimeshift_seconds(20);
+    context_->state.timeshift_seconds.set(20);
     writeFile(systemPath(kTimeShiftFile), content);
     turn();
-    EXPECT_EQ(context_->timeshift_seconds(), 0);
+    EXPECT_EQ(context_->state.timeshift_seconds.get(), 0);
   }
   fs::remove(systemPath(kTimeShiftFile));
-  context_->setTimeshift_seconds(20);
+  context_->state.timeshift_seconds.set(20);
   turn();
-  EXPECT_EQ(context_->timeshift_seconds(), 0);
+  EXPECT_EQ(context_->state.timeshift_seconds.get(), 0);
 }
 
 }  // namespace

@@ -11,13 +11,13 @@ constexpr std::uint32_t kNeverEnough = 0xFFFFFFFFU;
 class DiskSpaceGuard : public AgentTest {
  protected:
   DiskSpaceGuard() {
-    session_->setDiskSpaceCutoffInMB(1);
+    session_->diskSpaceCutoffInMB.set(1);
     agent_.startTimers();
   }
   void setContinuous(bool enabled) {
     LMRContinuousRecordingInfo info;
     info.enabled = enabled;
-    context_->setContinuous(info);
+    context_->recording.continuous.set(info);
   }
   [[nodiscard]] std::ptrdiff_t disabledLines() const {
     std::ptrdiff_t lines = 0;
@@ -35,13 +35,13 @@ TEST_F(DiskSpaceGuard, LeavesARecordingAloneWhileThereIsSpace) {
   agent_.checkDiskSpace();
   EXPECT_EQ(journalCount("controller stopRecording"), 0);
   EXPECT_FALSE(log_.mentions("recording disabled"));
-  EXPECT_TRUE(context_->running());
+  EXPECT_TRUE(context_->state.running.get());
 }
 
 TEST_F(DiskSpaceGuard, StopsTheRecordingAndSaysSoOnce) {
   const auto controller = start("R1");
   controller->devices_run = true;
-  session_->setDiskSpaceCutoffInMB(kNeverEnough);
+  session_->diskSpaceCutoffInMB.set(kNeverEnough);
   agent_.checkDiskSpace();
   EXPECT_EQ(journalCount("controller stopRecording"), 1);
   controller->devices_run = false;
@@ -55,9 +55,9 @@ TEST_F(DiskSpaceGuard, StopsTheRecordingAndSaysSoOnce) {
 }
 
 TEST_F(DiskSpaceGuard, DoesNotRecordAgainByItselfInPlainMode) {
-  session_->setDiskSpaceCutoffInMB(kNeverEnough);
+  session_->diskSpaceCutoffInMB.set(kNeverEnough);
   agent_.checkDiskSpace();
-  session_->setDiskSpaceCutoffInMB(1);
+  session_->diskSpaceCutoffInMB.set(1);
   agent_.checkDiskSpace();
   EXPECT_EQ(framework_->controllersMade(), 0U);
 }
@@ -77,20 +77,20 @@ TEST_F(DiskSpaceGuard, RecordsAgainInContinuousMode) {
   const auto running = framework_->controller(0);
   ASSERT_NE(running, nullptr);
   running->shut_down = true;
-  session_->setStatus(kRecorderIdle);
+  session_->status.set(kRecorderIdle);
   agent_.checkDiskSpace();
   EXPECT_EQ(framework_->controllersMade(), 2U);
 }
 
 TEST_F(DiskSpaceGuard, TellsOfTheNextShortageOnceThereWasSpaceAgain) {
   setContinuous(true);
-  session_->setDiskSpaceCutoffInMB(kNeverEnough);
+  session_->diskSpaceCutoffInMB.set(kNeverEnough);
   agent_.checkDiskSpace();
   agent_.checkDiskSpace();
   EXPECT_EQ(disabledLines(), 1);
-  session_->setDiskSpaceCutoffInMB(1);
+  session_->diskSpaceCutoffInMB.set(1);
   agent_.checkDiskSpace();
-  session_->setDiskSpaceCutoffInMB(kNeverEnough);
+  session_->diskSpaceCutoffInMB.set(kNeverEnough);
   agent_.checkDiskSpace();
   EXPECT_EQ(disabledLines(), 2);
 }
@@ -101,7 +101,7 @@ TEST_F(DiskSpaceGuard, DeletesSegmentsUntilNothingIsGained) {
     journal_.add("deleteEarliestSegment");
     return std::nullopt;
   };
-  session_->setDiskSpaceCutoffInMB(kNeverEnough);
+  session_->diskSpaceCutoffInMB.set(kNeverEnough);
   agent_.checkDiskSpace();
   EXPECT_GE(journalCount("deleteEarliestSegment"), 1);
   EXPECT_LE(journalCount("deleteEarliestSegment"), 5) << "others may use this disk, but not for ever";
@@ -120,7 +120,7 @@ TEST_F(DiskSpaceGuard, TheDirectoryOfTheLastSegmentGoesWithIt) {
     first = false;
     return directory + "/1.mov";
   };
-  session_->setDiskSpaceCutoffInMB(kNeverEnough);
+  session_->diskSpaceCutoffInMB.set(kNeverEnough);
   agent_.checkDiskSpace();
   agent_.checkDiskSpace();
   EXPECT_TRUE(std::filesystem::exists(full));
@@ -131,24 +131,24 @@ TEST_F(DiskSpaceGuard, AVanishedRepositoryIsMadeAgainAndTheCaptureCancelled) {
   start("R1");
   const std::string lost = movie("below");
   std::filesystem::create_directories(lost);
-  context_->setRecording_repository_path(lost);
-  session_->setFilename(lost + "/R1.mov");
+  context_->recording.recording_repository_path.set(lost);
+  session_->filename.set(lost + "/R1.mov");
   std::filesystem::remove_all(lost);
   agent_.checkDiskSpace();
   EXPECT_EQ(journalCount("cancelRecording"), 1);
   EXPECT_TRUE(std::filesystem::is_directory(lost));
-  EXPECT_TRUE(context_->running());
+  EXPECT_TRUE(context_->state.running.get());
   EXPECT_TRUE(log_.contains(6, "Recording Repository does not exist, creating " + lost + "."));
 }
 
 TEST_F(DiskSpaceGuard, AVolumeThatCannotBeMeasuredEndsTheAgent) {
   const auto controller = start("R1");
   testing::writeFile(movie("file"), "");
-  session_->setFilename(movie("file/below/R1.mov"));  // ENOTDIR
+  session_->filename.set(movie("file/below/R1.mov"));  // ENOTDIR
   agent_.checkDiskSpace();
   EXPECT_EQ(journalCount("controller stopRecording"), 1);
-  EXPECT_FALSE(context_->running());
-  context_->setRunning(true);
+  EXPECT_FALSE(context_->state.running.get());
+  context_->state.running.set(true);
 }
 
 }  // namespace

@@ -4,8 +4,9 @@
 #include <cstdio>
 #include <ctime>
 
+#include "capture/api/capture_framework.h"
 #include "record/capture_delegate.h"
-#include "record/engine.h"
+#include "record/create_preview.h"
 #include "record/preview_controller.h"
 #include "tests/unit/agent/agent_fixture.h"
 
@@ -24,38 +25,40 @@ class MainLoop : public AgentTest {
     bool goesOn = false;
     agent_.mainRunLoop().post(
         [&] {
-          goesOn = context_->running();
-          context_->setRunning(false);
+          goesOn = context_->state.running.get();
+          context_->state.running.set(false);
         },
         Wait::no);
     EXPECT_EQ(agent_.appLoop(), 0);
-    context_->setRunning(true);
+    context_->state.running.set(true);
     return goesOn;
   }
-  void checkedDevice(int secondsAgo) { context_->setLast_device_check(std::time(nullptr) - secondsAgo); }
+  void checkedDevice(int secondsAgo) {
+    context_->state.last_device_check.set(std::time(nullptr) - secondsAgo);
+  }
 };
 
 TEST_F(MainLoop, ADeviceThatIsNotMissedIsNotLookedFor) {
   EXPECT_TRUE(turn());
-  EXPECT_EQ(session_->previewController(), nullptr);
+  EXPECT_EQ(session_->previewController.get(), nullptr);
 }
 
 TEST_F(MainLoop, AMissedDeviceIsLookedForAfterMoreThanTenSeconds) {
   checkedDevice(9);
   EXPECT_TRUE(turn());
-  EXPECT_EQ(session_->previewController(), nullptr);
-  EXPECT_GT(context_->last_device_check(), 0);
+  EXPECT_EQ(session_->previewController.get(), nullptr);
+  EXPECT_GT(context_->state.last_device_check.get(), 0);
   checkedDevice(11);
   EXPECT_TRUE(turn());
-  EXPECT_NE(session_->previewController(), nullptr);
-  EXPECT_EQ(context_->last_device_check(), 0);
+  EXPECT_NE(session_->previewController.get(), nullptr);
+  EXPECT_EQ(context_->state.last_device_check.get(), 0);
   EXPECT_FALSE(log_.mentions(kOffline));
 }
 
 TEST_F(MainLoop, AClockThatIsSetBackDoesNotKeepTheAgentOffline) {
   checkedDevice(-3600);
   EXPECT_TRUE(turn());
-  EXPECT_EQ(context_->last_device_check(), 0);
+  EXPECT_EQ(context_->state.last_device_check.get(), 0);
 }
 
 TEST_F(MainLoop, ASecondSignalWhileTheTunnelClosesIsHarmless) {
@@ -73,7 +76,7 @@ TEST_F(MainLoop, ADeviceThatIsStillMissingEndsTheDaemon) {
   framework_->cameras_attach = false;
   checkedDevice(11);
   EXPECT_FALSE(turn());
-  EXPECT_EQ(session_->previewController(), nullptr);
+  EXPECT_EQ(session_->previewController.get(), nullptr);
   EXPECT_FALSE(log_.mentions(kOffline));
 }
 
@@ -85,7 +88,7 @@ TEST_F(MainLoop, ADeviceThatFailedGetsOneMoreRetryWithAWarning) {
   const std::int64_t before = std::time(nullptr);
   EXPECT_TRUE(turn());
   EXPECT_EQ(log_.count(4, kOffline), 1);
-  EXPECT_GE(context_->last_device_check(), before);
+  EXPECT_GE(context_->state.last_device_check.get(), before);
   checkedDevice(11);
   EXPECT_FALSE(turn());
   EXPECT_EQ(log_.count(4, kOffline), 1);
@@ -113,7 +116,7 @@ TEST_F(MainLoop, PreferencesThatAreGoneAtTheRetryEndTheDaemon) {
 TEST_F(MainLoop, APreviewThatNobodyAsksForIsStoppedAfterSixteenSeconds) {
   const auto preview = LXAgentRecordCreatePreviewController("camera", std::nullopt, false, 400, nullptr);
   ASSERT_NE(preview, nullptr);
-  session_->setPreviewController(preview);
+  session_->previewController.set(preview);
   preview->controller().startPreview();
   preview->setMLastPreviewRequestTime(std::time(nullptr) - 14);
   turn();
@@ -130,16 +133,16 @@ TEST_F(MainLoop, APreviewThatNobodyAsksForIsStoppedAfterSixteenSeconds) {
 
 TEST_F(MainLoop, ALostDeviceEndsItWithOne) {
   const auto delegate = std::make_shared<LMRCaptureDelegate>(nullptr);
-  delegate->setRecordError(CaptureError{CaptureError::kDomain, kDeviceRemoved, "gone"});
-  session_->setCaptureControllerDelegate(delegate);
+  delegate->recordError.set(CaptureError{CaptureError::kDomain, kDeviceRemoved, "gone"});
+  session_->captureControllerDelegate.set(delegate);
   EXPECT_EQ(agent_.appLoop(), 1);
-  EXPECT_FALSE(context_->running());
+  EXPECT_FALSE(context_->state.running.get());
 }
 
 TEST_F(MainLoop, ARunLoopThatWasStoppedEndsItInOrder) {
   agent_.mainRunLoop().stop();
   EXPECT_EQ(agent_.appLoop(), 0);
-  EXPECT_TRUE(context_->running());
+  EXPECT_TRUE(context_->state.running.get());
 }
 
 // The thread sanitizer can't follow the forks of these tests.
@@ -159,7 +162,7 @@ class Refusal : public MainLoop {
   /// One turn, which may end the process; else kWentOn does.
   [[noreturn]] void turnAfter(int seconds) {
     setLogSinkForTesting(tellOnStandardError, nullptr);
-    context_->setServerRejectTime(std::time(nullptr) - seconds);
+    context_->state.serverRejectTime.set(std::time(nullptr) - seconds);
     turn();
     _exit(kWentOn);
   }
@@ -172,24 +175,24 @@ TEST_F(Refusal, EndsTheProcessWithZeroAfterAMinute) {
 TEST_F(Refusal, IsNotActedUponEarlier) { EXPECT_EXIT(turnAfter(57), ::testing::ExitedWithCode(kWentOn), ""); }
 
 TEST_F(Refusal, IsNeverActedUponInAdhocMode) {
-  context_->setAdhoc(true);
+  context_->options.adhoc.set(true);
   EXPECT_EXIT(turnAfter(1000), ::testing::ExitedWithCode(kWentOn), "");
-  context_->setAdhoc(false);
+  context_->options.adhoc.set(false);
 }
 
 TEST_F(MainLoop, ALostDeviceEndsAnAdhocProcessWithSixtyNine) {
   GTEST_FLAG_SET(death_test_style, "threadsafe");
   const auto delegate = std::make_shared<LMRCaptureDelegate>(nullptr);
-  delegate->setRecordError(CaptureError{CaptureError::kDomain, kDeviceRemoved, "gone"});
-  session_->setCaptureControllerDelegate(delegate);
-  context_->setAdhoc(true);
-  context_->postProcessListAddJob(std::make_shared<AgentSubmit>());  // not waited for
+  delegate->recordError.set(CaptureError{CaptureError::kDomain, kDeviceRemoved, "gone"});
+  session_->captureControllerDelegate.set(delegate);
+  context_->options.adhoc.set(true);
+  context_->post_process_list.postProcessListAddJob(std::make_shared<AgentSubmit>());  // not waited for
   const auto ask = [this] {
     setLogSinkForTesting(tellOnStandardError, nullptr);
     agent_.deviceDisconnected();
   };
   EXPECT_EXIT(ask(), ::testing::ExitedWithCode(69), "2 The capture device has been disconnected\\.");
-  context_->setAdhoc(false);
+  context_->options.adhoc.set(false);
 }
 
 #endif

@@ -55,7 +55,7 @@ class TimedCommands : public AgentTest {
   }
   std::vector<std::string> waiting() {
     std::vector<std::string> ids;
-    for (const auto& item : context_->timedCmdList().entries())
+    for (const auto& item : context_->timedCmdList.entries())
       ids.push_back(lookUp(item, "TimerID").value_or("?"));
     return ids;
   }
@@ -127,7 +127,7 @@ TEST_F(TimedCommands, ADueCommandRunsInTheMainLoop) {
   agent_.loadSchedule();
   std::thread ending([&] {
     log_.waitFor(6, "Running deferred command: PAUSE");
-    context_->setRunning(false);
+    context_->state.running.set(false);
   });
   EXPECT_EQ(agent_.appLoop(), 0);
   ending.join();

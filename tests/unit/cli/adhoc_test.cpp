@@ -1,8 +1,8 @@
 // The ad-hoc client against a daemon that the test plays.
+#include <sys/socket.h>
+
 #include <csignal>
 #include <future>
-
-#include <sys/socket.h>
 
 #include "platform/net/local_socket.h"
 #include "support/unique_fd.h"
@@ -46,8 +46,8 @@ class PlayedDaemon {
 
 class AdHocClient : public AgentTest {
  protected:
-  AdHocClient() { context_->setAdhoc(true); }
-  ~AdHocClient() override { context_->setAdhoc(false); }
+  AdHocClient() { context_->options.adhoc.set(true); }
+  ~AdHocClient() override { context_->options.adhoc.set(false); }
 
   /// Runs the client to its end. @return what it printed
   std::string run() {
@@ -58,14 +58,14 @@ class AdHocClient : public AgentTest {
 };
 
 TEST_F(AdHocClient, WithoutADaemonSaysNothing) {
-  context_->setAdhoc_request_type(1);
+  context_->options.adhoc_request_type.set(1);
   EXPECT_EQ(run(), "");
   EXPECT_TRUE(log_.contains(6, "lmxagentd (version 100) starting..."));
 }
 
 TEST_F(AdHocClient, AsksForTheStatusOnce) {
   PlayedDaemon daemon;
-  context_->setAdhoc_request_type(1);
+  context_->options.adhoc_request_type.set(1);
   auto conversation = std::async(std::launch::async, [&] {
     daemon.accept();
     EXPECT_EQ(daemon.receive(), "STATUS include_preview=true\n");
@@ -78,7 +78,7 @@ TEST_F(AdHocClient, AsksForTheStatusOnce) {
 
 TEST_F(AdHocClient, CutsALongReply) {
   PlayedDaemon daemon;
-  context_->setAdhoc_request_type(2);
+  context_->options.adhoc_request_type.set(2);
   auto conversation = std::async(std::launch::async, [&] {
     daemon.accept();
     daemon.receive();
@@ -92,7 +92,7 @@ TEST_F(AdHocClient, CutsALongReply) {
 
 TEST_F(AdHocClient, ADaemonThatHangsUpHasNothingToSay) {
   PlayedDaemon daemon;
-  context_->setAdhoc_request_type(1);
+  context_->options.adhoc_request_type.set(1);
   auto conversation = std::async(std::launch::async, [&] {
     daemon.accept();
     daemon.receive();
@@ -106,8 +106,8 @@ class AdHocRecording : public AdHocClient, public ::testing::WithParamInterface<
 
 TEST_P(AdHocRecording, LastsUntilASignal) {
   PlayedDaemon daemon;
-  context_->setSubmit_disabled(true);
-  context_->setAdhoc_output_file("/tmp/a.mov");
+  context_->options.submit_disabled.set(true);
+  context_->options.adhoc_output_file.set("/tmp/a.mov");
   auto conversation = std::async(std::launch::async, [&] {
     daemon.accept();
     EXPECT_TRUE(daemon.receive().starts_with("START RecordingMetadata_RECORDING_UUID="));
@@ -127,7 +127,7 @@ INSTANTIATE_TEST_SUITE_P(Signals, AdHocRecording, ::testing::Values(SIGINT, SIGT
 
 TEST_F(AdHocClient, AnInterruptIsHeardWhileTheDaemonIsBusy) {
   PlayedDaemon daemon;  // a connection waits in its queue as behind another peer
-  context_->setSubmit_disabled(true);
+  context_->options.submit_disabled.set(true);
   auto conversation = std::async(std::launch::async, [&] {
     daemon.accept();
     daemon.receive();
@@ -143,8 +143,8 @@ TEST_F(AdHocClient, AnInterruptIsHeardWhileTheDaemonIsBusy) {
 
 TEST_F(AdHocClient, AnUnknownRequestStartsButDoesNotStay) {
   PlayedDaemon daemon;
-  context_->setSubmit_disabled(true);
-  context_->setAdhoc_request_type(9);
+  context_->options.submit_disabled.set(true);
+  context_->options.adhoc_request_type.set(9);
   auto conversation = std::async(std::launch::async, [&] {
     daemon.accept();
     EXPECT_TRUE(daemon.receive().starts_with("START "));
@@ -159,15 +159,15 @@ class AdHocMarks : public AgentTest {};
 
 TEST_F(AdHocMarks, PauseAndResumeSignalsMarkTheRecordingWithTheTimeShift) {
   const Controller made = start("R1");
-  session_->setRecording_uuid("R1");
-  context_->setAdhoc(true);
-  context_->setTimeshift_seconds(30);
+  session_->recording_uuid.set("R1");
+  context_->options.adhoc.set(true);
+  context_->state.timeshift_seconds.set(30);
   const std::size_t before = made->marks().size();
   const double from = secondsSinceReferenceDate() - 30;
   agent_.signal(SIGUSR1);
   agent_.signal(SIGUSR2);
   const double to = secondsSinceReferenceDate() - 30;
-  context_->setAdhoc(false);
+  context_->options.adhoc.set(false);
   const auto marks = made->marks();
   ASSERT_EQ(marks.size(), before + 2);
   EXPECT_EQ(marks[before].operation, "setStop");

@@ -52,7 +52,7 @@ TEST_F(CommandLine, WithoutOptionsTheProgramGoesOn) {
   EXPECT_TRUE(outcome.goes_on);
   EXPECT_EQ(outcome.exit_code, 0);
   EXPECT_EQ(outcome.errors, "");
-  EXPECT_FALSE(context_->submit_disabled());
+  EXPECT_FALSE(context_->options.submit_disabled.get());
 }
 
 TEST_F(CommandLine, HelpPrintsTheUsage) {
@@ -73,7 +73,7 @@ TEST_F(CommandLine, VersionIsPrinted) {
 
 TEST_F(CommandLine, SubmissionCanBeDisabled) {
   EXPECT_TRUE(parse({"-s"}).goes_on);
-  EXPECT_TRUE(context_->submit_disabled());
+  EXPECT_TRUE(context_->options.submit_disabled.get());
 }
 
 TEST_F(CommandLine, UnknownOptionIsAUsageError) {
@@ -103,11 +103,11 @@ TEST_F(CommandLine, DurationNeedsAdHocMode) {
 
 TEST_F(CommandLine, AFileToRecordToIsAdHocMode) {
   EXPECT_TRUE(parse({"-f", "out.mov", "-d", "60", "-s"}).goes_on);
-  EXPECT_TRUE(context_->adhoc());
-  EXPECT_EQ(context_->adhoc_request_type(), 0);
-  EXPECT_EQ(context_->adhoc_output_file(), "out.mov");
-  EXPECT_EQ(context_->duration(), 60);
-  EXPECT_EQ(context_->unattended(), 60) << "the default";
+  EXPECT_TRUE(context_->options.adhoc.get());
+  EXPECT_EQ(context_->options.adhoc_request_type.get(), 0);
+  EXPECT_EQ(context_->options.adhoc_output_file.get(), "out.mov");
+  EXPECT_EQ(context_->options.duration.get(), 60);
+  EXPECT_EQ(context_->options.unattended.get(), 60) << "the default";
 }
 
 TEST_F(CommandLine, SubmissionNeedsAUser) {
@@ -116,19 +116,19 @@ TEST_F(CommandLine, SubmissionNeedsAUser) {
   EXPECT_EQ(outcome.exit_code, 64);
   EXPECT_EQ(outcome.errors, "A user name is required for ad-hoc file submission.\n");
   EXPECT_TRUE(parse({"-f", "out.mov", "-u", "jane", "--password", "secret"}).goes_on);
-  EXPECT_EQ(context_->user(), "jane");
-  EXPECT_EQ(context_->password(), "secret");
+  EXPECT_EQ(context_->options.user.get(), "jane");
+  EXPECT_EQ(context_->options.password.get(), "secret");
 }
 
 TEST_F(CommandLine, QuestionsNeedNoUser) {
   EXPECT_TRUE(parse({"--status"}).goes_on);
-  EXPECT_TRUE(context_->adhoc());
-  EXPECT_EQ(context_->adhoc_request_type(), 1);
+  EXPECT_TRUE(context_->options.adhoc.get());
+  EXPECT_EQ(context_->options.adhoc_request_type.get(), 1);
   EXPECT_TRUE(parse({"--timerlist"}).goes_on);
-  EXPECT_EQ(context_->adhoc_request_type(), 2);
+  EXPECT_EQ(context_->options.adhoc_request_type.get(), 2);
   EXPECT_TRUE(parse({"--timerrevoke", "T-1"}).goes_on);
-  EXPECT_EQ(context_->adhoc_request_type(), 3);
-  EXPECT_EQ(context_->timer_id(), "T-1");
+  EXPECT_EQ(context_->options.adhoc_request_type.get(), 3);
+  EXPECT_EQ(context_->options.timer_id.get(), "T-1");
 }
 
 TEST_F(CommandLine, APathThatIsNotUtf8StopsAtOnce) {
@@ -136,31 +136,31 @@ TEST_F(CommandLine, APathThatIsNotUtf8StopsAtOnce) {
   EXPECT_FALSE(outcome.goes_on);
   EXPECT_EQ(outcome.exit_code, 71);
   EXPECT_EQ(outcome.errors, "The -f option requires a path in UTF-8\n");
-  EXPECT_FALSE(context_->adhoc());
+  EXPECT_FALSE(context_->options.adhoc.get());
 }
 
 TEST_F(CommandLine, ANumberThatDoesNotParseLeavesTheLastOne) {
   EXPECT_TRUE(parse({"-f", "a.mov", "-s", "-d", "x"}).goes_on);
-  EXPECT_EQ(context_->duration(), 0);
+  EXPECT_EQ(context_->options.duration.get(), 0);
   EXPECT_TRUE(parse({"-Z", "30", "-d", "x", "-f", "a.mov", "-s"}).goes_on);
-  EXPECT_EQ(context_->unattended(), 30);
-  EXPECT_EQ(context_->duration(), 30);
+  EXPECT_EQ(context_->options.unattended.get(), 30);
+  EXPECT_EQ(context_->options.duration.get(), 30);
   EXPECT_TRUE(parse({"--max_duration", "45", "--unattended_minutes", "", "-f", "a.mov", "-s"}).goes_on);
-  EXPECT_EQ(context_->duration(), 45);
-  EXPECT_EQ(context_->unattended(), 45);
+  EXPECT_EQ(context_->options.duration.get(), 45);
+  EXPECT_EQ(context_->options.unattended.get(), 45);
 }
 
 TEST_F(CommandLine, TimerStartIsTakenAsGiven) {
   EXPECT_TRUE(parse({"--timerstart", "tomorrow"}).goes_on);
-  EXPECT_EQ(context_->start_timer(), "tomorrow");
-  EXPECT_FALSE(context_->adhoc());
+  EXPECT_EQ(context_->options.start_timer.get(), "tomorrow");
+  EXPECT_FALSE(context_->options.adhoc.get());
 }
 
 TEST_F(CommandLine, TimerDelayBecomesADate) {
   const std::time_t before = std::time(nullptr);
   EXPECT_TRUE(parse({"--timerdelay", "90"}).goes_on);
-  EXPECT_FALSE(context_->adhoc());
-  const auto start = context_->start_timer();
+  EXPECT_FALSE(context_->options.adhoc.get());
+  const auto start = context_->options.start_timer.get();
   ASSERT_TRUE(start);
   bool found = false;
   for (std::time_t at = before + 90; at <= std::time(nullptr) + 91; ++at) found |= start == dateText(at);
@@ -172,14 +172,14 @@ TEST_F(CommandLine, ATimerDelayThatIsNoneIsIgnored) {
     const Outcome outcome = parse({"--timerdelay", delay});
     EXPECT_TRUE(outcome.goes_on) << delay;
     EXPECT_EQ(outcome.errors, "") << delay;
-    EXPECT_EQ(context_->start_timer(), std::nullopt) << delay;
+    EXPECT_EQ(context_->options.start_timer.get(), std::nullopt) << delay;
   }
 }
 
 TEST_F(CommandLine, AStoppingOptionHidesWhatFollows) {
   EXPECT_EQ(parse({"-v", "-d", "60"}).exit_code, 0);
   EXPECT_EQ(parse({"-d", "60", "-h"}).exit_code, 0);
-  EXPECT_EQ(context_->duration(), 60);
+  EXPECT_EQ(context_->options.duration.get(), 60);
   EXPECT_EQ(parse({"-x", "-v"}).exit_code, 64);
 }
 

@@ -18,9 +18,9 @@ constexpr TimeValue kStop{1700000060, 5};
 class Gathering : public testing::SubmitFixture {
  protected:
   Gathering() {
-    context_->setMachine_uuid("CAMERA-1");
-    context_->setRecording_video_maximum_frame_rate("25");
-    context_->record_context()->setRecordingType(kRecordingTypeAudioVideo);
+    context_->server.machine_uuid.set("CAMERA-1");
+    context_->recording.recording_video_maximum_frame_rate.set("25");
+    context_->record_context()->recordingType.set(kRecordingTypeAudioVideo);
   }
   const Dictionary& gather(const SharedDictionary& parameters,
                            const std::optional<std::string>& movie = "/r/ABC.mov", bool canceled = false) {
@@ -76,9 +76,9 @@ TEST_F(Gathering, EveryOtherValueOfTheStartIsKeptToo) {
                        {"RecordingMetadata_AUDIO_SAMPLE_RATE", "x"},
                        {"RecordingMetadata_AUDIO_INPUT", "x"},
                        {"RecordingMetadata_DATA_MEDIA_EXTENSION", ".x"}};
-  context_->setRecording_audio_channel("Stereo");
-  context_->setRecording_audio_sample_rate("44");
-  context_->setRecording_audio_input("Automatic");
+  context_->recording.recording_audio_channel.set("Stereo");
+  context_->recording.recording_audio_sample_rate.set("44");
+  context_->recording.recording_audio_input.set("Automatic");
   EXPECT_EQ(gather(shared(own)), completeWith(own));
   EXPECT_THAT(log_.entries(), IsEmpty());
 }
@@ -100,7 +100,7 @@ TEST_F(Gathering, AnEndDateOfTheStartEndsTheGathering) {
 }
 
 TEST_F(Gathering, AnImageSideOfTheStartEndsTheGatheringWhenTheRecordersIsKnown) {
-  context_->record_context()->setVideoWidth(1280);
+  context_->record_context()->videoWidth.set(1280);
   EXPECT_EQ(gather(shared({{"RecordingMetadata_VIDEO_IMAGE_WIDTH", "640"}})),
             completeWith({{"RecordingMetadata_VIDEO_IMAGE_WIDTH", "640"}},
                          {"RecordingMetadata_DATA_MEDIA_EXTENSION"}));
@@ -108,7 +108,7 @@ TEST_F(Gathering, AnImageSideOfTheStartEndsTheGatheringWhenTheRecordersIsKnown) 
 }
 
 TEST_F(Gathering, AnImageHeightOfTheStartEndsTheGatheringWhenTheRecordersIsKnown) {
-  context_->record_context()->setVideoHeight(720);
+  context_->record_context()->videoHeight.set(720);
   EXPECT_EQ(gather(shared({{"RecordingMetadata_VIDEO_IMAGE_HEIGHT", "360"}})),
             completeWith({{"RecordingMetadata_VIDEO_IMAGE_HEIGHT", "360"}},
                          {"RecordingMetadata_DATA_MEDIA_EXTENSION"}));
@@ -116,8 +116,8 @@ TEST_F(Gathering, AnImageHeightOfTheStartEndsTheGatheringWhenTheRecordersIsKnown
 }
 
 TEST_F(Gathering, TheAgentWritesNoImageSizeOfItsOwn) {
-  context_->record_context()->setVideoWidth(1280);
-  context_->record_context()->setVideoHeight(720);
+  context_->record_context()->videoWidth.set(1280);
+  context_->record_context()->videoHeight.set(720);
   EXPECT_EQ(gather(nullptr), complete());
 }
 
@@ -129,7 +129,7 @@ TEST_F(Gathering, AnImageSizeOfTheStartIsKeptWhenTheRecordersIsUnknown) {
 }
 
 TEST_F(Gathering, AnEmptyImageSizeOfTheStartIsNoSize) {
-  context_->record_context()->setVideoWidth(1280);
+  context_->record_context()->videoWidth.set(1280);
   EXPECT_EQ(gather(shared({{"RecordingMetadata_VIDEO_IMAGE_WIDTH", ""}})),
             completeWith({{"RecordingMetadata_VIDEO_IMAGE_WIDTH", ""}}));
 }
@@ -147,36 +147,36 @@ TEST_F(Gathering, AnEmptyExtensionOfTheStartEndsTheGathering) {
 }
 
 TEST_F(Gathering, WhatTheAgentDoesNotKnowIsLeftOut) {
-  context_->setMachine_uuid("");
-  context_->setRecording_video_maximum_frame_rate(std::nullopt);
-  context_->record_context()->setRecordingType(kRecordingTypeNone);
+  context_->server.machine_uuid.set("");
+  context_->recording.recording_video_maximum_frame_rate.set(std::nullopt);
+  context_->record_context()->recordingType.set(kRecordingTypeNone);
   EXPECT_EQ(gather(nullptr),
             completeWith({}, {"RecordingMetadata_MACHINE_UUID", "RecordingMetadata_VIDEO_MAXIMUM_FRAME_RATE",
                               "RecordingMetadata_TYPE"}));
 }
 
 TEST_F(Gathering, WithoutASessionThereIsNoType) {
-  context_->setRecord_context(nullptr);
+  context_->releaseRecord();
   EXPECT_EQ(gather(nullptr), completeWith({}, {"RecordingMetadata_TYPE"}));
 }
 
 TEST_F(Gathering, ATypeWithoutANameEndsTheGathering) {
-  context_->record_context()->setRecordingType(9);
+  context_->record_context()->recordingType.set(9);
   gather(nullptr);
   EXPECT_THAT(log_.entries(), ElementsAre(kFailed));
 }
 
 TEST_F(Gathering, TheJobsOwnSessionDecidesTheType) {
   auto own = std::make_shared<AgentRecord>();
-  own->setRecordingType(kRecordingTypeAudio);
+  own->recordingType.set(kRecordingTypeAudio);
   job_.setRecord(own);
   EXPECT_EQ(gather(nullptr), completeWith({{"RecordingMetadata_TYPE", "Audio"}}));
 }
 
 TEST_F(Gathering, TheSoundSettingsAreAdded) {
-  context_->setRecording_audio_channel("Stereo");
-  context_->setRecording_audio_sample_rate("44");
-  context_->setRecording_audio_input("Automatic");
+  context_->recording.recording_audio_channel.set("Stereo");
+  context_->recording.recording_audio_sample_rate.set("44");
+  context_->recording.recording_audio_input.set("Automatic");
   EXPECT_EQ(gather(nullptr), completeWith({{"RecordingMetadata_AUDIO_CHANNEL", "Stereo"},
                                            {"RecordingMetadata_AUDIO_SAMPLE_RATE", "44"},
                                            {"RecordingMetadata_AUDIO_INPUT", "Automatic"}}));

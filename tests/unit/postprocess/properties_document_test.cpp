@@ -1,7 +1,6 @@
 // The properties document's text and its file.
 #include <gmock/gmock.h>
 #include <sys/stat.h>
-
 #include <pugixml.hpp>
 
 #include "tests/unit/postprocess/submit_fixture.h"

@@ -139,8 +139,8 @@ TEST_F(SubmissionJob, WithoutAContextTheToolNeverRuns) {
 
 TEST_F(SubmissionJob, AWorkflowIsSubmittedWithUserAndPassword) {
   job_.setAdhoc_workflow_uuid("W-1");
-  context_->setUser("ada");
-  context_->setPassword("secret");
+  context_->options.user.set("ada");
+  context_->options.password.set("secret");
   EXPECT_EQ(job_.addRecordingWithCommentary(children_), 0);
   EXPECT_THAT(children_.runs(),
               ElementsAre(Words{systemPath("/usr/bin/lumex"), "--server", "https://lumex.example", "--submit",
@@ -153,8 +153,8 @@ TEST_F(SubmissionJob, AWorkflowIsSubmittedWithUserAndPassword) {
 
 TEST_F(SubmissionJob, ThePasswordStandsInTheCommandLineOnly) {
   job_.setAdhoc_workflow_uuid("W-1");
-  context_->setUser("ada");
-  context_->setPassword("secret");
+  context_->options.user.set("ada");
+  context_->options.password.set("secret");
   children_.results = {{End::notStarted, ENOENT, {}}};
   job_.addRecordingWithCommentary(children_);
   for (const Entry& entry : log_.entries()) {
@@ -165,7 +165,7 @@ TEST_F(SubmissionJob, ThePasswordStandsInTheCommandLineOnly) {
 
 TEST_F(SubmissionJob, AWorkflowWithoutPasswordFailsBeforeTheTool) {
   job_.setAdhoc_workflow_uuid("W-1");
-  context_->setUser("ada");
+  context_->options.user.set("ada");
   EXPECT_EQ(job_.addRecordingWithCommentary(children_), -1);
   EXPECT_THAT(children_.runs(), IsEmpty());
   EXPECT_THAT(log_.entries(), ElementsAre(kStarting, kInProgress, kUnable, kIncomplete, kInternal));
@@ -173,14 +173,14 @@ TEST_F(SubmissionJob, AWorkflowWithoutPasswordFailsBeforeTheTool) {
 
 TEST_F(SubmissionJob, AWorkflowWithoutUserFailsBeforeTheTool) {
   job_.setAdhoc_workflow_uuid("");
-  context_->setPassword("secret");
+  context_->options.password.set("secret");
   EXPECT_EQ(job_.addRecording(children_), 1);
   EXPECT_THAT(children_.runs(), IsEmpty());
   EXPECT_THAT(log_.entries(), ElementsAre(kUnable));
 }
 
 TEST_F(SubmissionJob, DisabledSubmissionDoesNothing) {
-  context_->setSubmit_disabled(true);
+  context_->options.submit_disabled.set(true);
   EXPECT_EQ(job_.addRecordingWithCommentary(children_), 0);
   EXPECT_THAT(children_.runs(), IsEmpty());
   EXPECT_THAT(log_.entries(), ElementsAre(kStarting, kDone));
@@ -192,7 +192,7 @@ TEST_F(SubmissionJob, DisabledSubmissionDoesNothing) {
 class CanceledJob : public SubmissionJob, public ::testing::WithParamInterface<bool> {};
 
 TEST_P(CanceledJob, RemovesBothFilesWhetherSubmissionIsDisabledOrNot) {
-  context_->setSubmit_disabled(GetParam());
+  context_->options.submit_disabled.set(GetParam());
   job_.setCanceled(true);
   EXPECT_EQ(job_.addRecordingWithCommentary(children_), 0);
   EXPECT_THAT(children_.runs(), IsEmpty());
@@ -227,7 +227,7 @@ class FileRecording : public SubmissionJob {
     job_.setRecording_file_path(elsewhere() + "/talk.mov");
     job_.setProperties_file_path(elsewhere() + "/talk.xml");
     job_.setProperties({{"RecordingMetadata_RECORDING_UUID", "NEW"}});
-    context_->record_context()->setRecordingType(kRecordingTypeFile);
+    context_->record_context()->recordingType.set(kRecordingTypeFile);
   }
   static std::string elsewhere() { return kRoot_ + "/elsewhere"; }
 
@@ -285,7 +285,7 @@ TEST_F(FileRecording, AMovieThatCannotBeReadLeavesNoHalfCopy) {
 }
 
 TEST_F(FileRecording, AnUnwritableRepositoryIsADebugLineEach) {
-  context_->setRecording_repository_path(kRoot_ + "/missing");
+  context_->recording.recording_repository_path.set(kRoot_ + "/missing");
   EXPECT_EQ(job_.addRecording(children_), 0);
   EXPECT_EQ(children_.runs().size(), 1U);
   EXPECT_EQ(log_.entries().size(), 3U);
@@ -293,7 +293,7 @@ TEST_F(FileRecording, AnUnwritableRepositoryIsADebugLineEach) {
 
 TEST_F(FileRecording, TheJobsOwnSessionDecidesWhatIsCopied) {
   auto own = std::make_shared<AgentRecord>();
-  own->setRecordingType(kRecordingTypeVideo);
+  own->recordingType.set(kRecordingTypeVideo);
   job_.setRecord(own);
   EXPECT_EQ(job_.addRecording(children_), 0);
   EXPECT_FALSE(std::filesystem::exists(inRepository("NEW.mov")));

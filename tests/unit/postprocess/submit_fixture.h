@@ -55,9 +55,9 @@ class SubmitFixture : public ::testing::Test {
   SubmitFixture() {
     kRoot.clear();
     std::filesystem::create_directories(repository());
-    context_->setLumex_url("https://lumex.example");
-    context_->setRecording_repository_path(repository());
-    context_->setRunning(true);
+    context_->server.lumex_url.set("https://lumex.example");
+    context_->recording.recording_repository_path.set(repository());
+    context_->state.running.set(true);
   }
   /// The list and the jobs in it hold the context.
   ~SubmitFixture() override { context_->cleanup(); }
