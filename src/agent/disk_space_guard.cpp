@@ -1,9 +1,11 @@
-// The watch over the free space of the volume that movies are written to.
+// Measuring, freeing, stopping and starting again.
+#include "agent/disk_space_guard.h"
+
 #include <cerrno>
 #include <filesystem>
 #include <system_error>
 
-#include "agent/agent_main.h"
+#include "agent/recording_repository.h"
 #include "capture/api/capture_framework.h"
 #include "platform/log.h"
 #include "platform/paths.h"
@@ -43,25 +45,26 @@ Measure freeSpace(LMRCaptureController* controller, const std::string& volume, M
 
 }  // namespace
 
-void AgentMain::checkDiskSpace() {
-  const auto record = session();
+void DiskSpaceGuard::checkDiskSpace() {
+  const auto record = context_.record_context();
   if (!record) return;
   std::string volume = volumePath(*record);
   Measure space = measure(volume);
   if (space.error == ENOENT) {
-    cancelCapture();
-    if (setupRecordingRepository()) {
-      volume = context_->recording.recording_repository_path.get().value_or("");
+    capture_.cancelCapture();
+    const std::string repository = context_.recording.recording_repository_path.get().value_or("");
+    if (setupRecordingRepository(context_, repository)) {
+      volume = repository;
       space = measure(volume);
     }
   }
   if (space.error != 0) {
-    stopCapture();
-    context_->state.running.set(false);
+    capture_.stopCapture();
+    context_.state.running.set(false);
     return;
   }
   const std::uint32_t wanted = record->diskSpaceCutoffInMB.get();
-  const auto controller = captureController();
+  const auto controller = capture_.captureController();
   space = freeSpace(controller.get(), volume, space, wanted);
   if (space.megabytes >= wanted) {
     recordAgainWithSpace(space.megabytes);
@@ -70,28 +73,27 @@ void AgentMain::checkDiskSpace() {
   }
 }
 
-void AgentMain::recordAgainWithSpace(std::uint64_t megabytes) {
-  const auto continuous = context_->recording.continuous.get();
-  if (!continuous || !continuous->enabled) return;
-  const auto controller = captureController();
+void DiskSpaceGuard::recordAgainWithSpace(std::uint64_t megabytes) {
+  if (!context_.recording.isContinuous()) return;
+  const auto controller = capture_.captureController();
   if (controller && !controller->hasShutDown()) return;
   shouldDisplayNoDiskSpaceMessage_ = true;
   LMPLogMessage(nullptr, kLogNotice, "%llu MB is sufficient, starting recorder",
                 static_cast<unsigned long long>(megabytes));
-  session()->stop_times.clearPassedDeadlines();
-  prepareCapture();
+  context_.record_context()->stop_times.clearPassedDeadlines();
+  capture_.prepareCapture();
 }
 
-void AgentMain::stopForLackOfSpace(std::uint64_t megabytes, std::uint32_t wanted) {
+void DiskSpaceGuard::stopForLackOfSpace(std::uint64_t megabytes, std::uint32_t wanted) {
   if (shouldDisplayNoDiskSpaceMessage_) {
     LMPLogMessage(nullptr, kLogWarning,
                   "%llu MB is below threshold %u MB, unable to free space, recording disabled",
                   static_cast<unsigned long long>(megabytes), wanted);
     shouldDisplayNoDiskSpaceMessage_ = false;
   }
-  const auto controller = captureController();
+  const auto controller = capture_.captureController();
   const auto capture = controller ? controller->session() : nullptr;
-  if (capture && capture->isRunning()) stopCapture();
+  if (capture && capture->isRunning()) capture_.stopCapture();
 }
 
 }  // namespace lmx

@@ -17,10 +17,6 @@
 namespace lmx {
 namespace {
 
-constexpr int kExitUsage = 64;
-constexpr int kExitOperatingSystem = 71;
-constexpr int kExitCannotCreate = 73;
-constexpr int kExitProtocol = 76;
 constexpr int kShellNotFound = 127;
 constexpr int kShellNotExecutable = 126;
 constexpr int kShellSignalled = 128;
@@ -50,13 +46,13 @@ std::optional<PlistDictionary> loadToChange(const std::string& path) {
 int changePreferences(const PlistDictionary& always, const PlistDictionary& whereAbsent) {
   const std::string path = systemPath(kPreferencesFile);
   auto preferences = loadToChange(path);
-  if (!preferences) return kExitCannotCreate;
+  if (!preferences) return exitStatus(ProcessEnd::cannotCreate);
   for (const auto& [key, value] : always) preferences->insert_or_assign(key, value);
   preferences->insert(whereAbsent.begin(), whereAbsent.end());
   if (const int error = writePropertyList(path, std::move(*preferences))) {
     std::fprintf(stderr, "The preferences file %s could not be written: %s\n", path.c_str(),
                  std::strerror(error));
-    return kExitCannotCreate;
+    return exitStatus(ProcessEnd::cannotCreate);
   }
   return 0;
 }
@@ -96,7 +92,7 @@ int runBindTool(std::vector<std::string> words, ChildRunner& children, std::stri
   const int status = shellStatus(result);
   if (status < 0) {
     std::fputs("Error: unable to run the `lmx --bind` command\n", stderr);
-    return kExitOperatingSystem;
+    return exitStatus(ProcessEnd::operatingSystem);
   }
   if (status != 0) std::fprintf(stderr, "Error: camera binding failed with exit status %d\n", status);
   output = result.output.c_str();  // up to a first NUL
@@ -108,19 +104,19 @@ int runBindTool(std::vector<std::string> words, ChildRunner& children, std::stri
 int setPreviewPath(const char* path) {
   if (!given(path)) {
     std::fputs("The -p option requires a file path\nUsage: lmxagentd -p <file-path.jpg>\n", stderr);
-    return kExitUsage;
+    return exitStatus(ProcessEnd::usage);
   }
   return changePreferences({{"PreviewPath", std::string(path)}}, {});
 }
 
 int bindTestCamera(const char* path, const char* user, const char* server, ChildRunner& children) {
-  if (!allGiven(path, user, server)) return kExitUsage;
+  if (!allGiven(path, user, server)) return exitStatus(ProcessEnd::usage);
   std::string output;
   if (const int status = runBindTool(bindCommand(user, server), children, output)) return status;
   const auto bound = boundCamera(output);
   if (!bound) {
     std::fprintf(stderr, "Error: unexpected result from `lmx --bind`: %s\n", output.c_str());
-    return kExitProtocol;
+    return exitStatus(ProcessEnd::protocol);
   }
   std::printf("camera UUID: %s\nserver UUID: %s\n", bound->cameraUUID.c_str(), bound->serverUUID.c_str());
   return changePreferences({{"RecordingType", "File"}, {"RecordingPath", std::string(path)}},

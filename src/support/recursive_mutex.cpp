@@ -4,7 +4,6 @@
 #include <sysexits.h>
 #include <unistd.h>
 
-
 namespace lmx {
 
 void agent_init_recursive_mutex(pthread_mutex_t* mutex) {

@@ -277,21 +277,23 @@ TEST_F(Actions, ALostDeviceWaitsForTheQueue) {
   session_->captureControllerDelegate.set(delegate);
   context_->post_process_list.postProcessListAddJob(std::make_shared<AgentSubmit>());
   context_->post_process_list.postProcessListAddJob(std::make_shared<AgentSubmit>());
-  EXPECT_FALSE(agent_.deviceDisconnected());
+  EXPECT_FALSE(agent_.devices().deviceDisconnected());
   context_->post_process_list.postProcessListNext();
-  EXPECT_FALSE(agent_.deviceDisconnected());
+  EXPECT_FALSE(agent_.devices().deviceDisconnected());
   EXPECT_TRUE(log_.entries().empty());
   context_->post_process_list.postProcessListNext();
+  EXPECT_TRUE(agent_.devices().deviceDisconnected());
+  EXPECT_TRUE(log_.entries().empty()) << "asking changes nothing";
   const auto before = std::chrono::steady_clock::now();
-  EXPECT_TRUE(agent_.deviceDisconnected());
+  agent_.devices().announceLostDevice();
   EXPECT_GE(std::chrono::steady_clock::now() - before, std::chrono::milliseconds(1900));
   EXPECT_TRUE(log_.contains(2, "The capture device has been disconnected."));
 }
 
 TEST_F(Actions, ADeviceThatIsThereKeepsTheLoop) {
-  EXPECT_FALSE(agent_.deviceDisconnected());
+  EXPECT_FALSE(agent_.devices().deviceDisconnected());
   start("R1");
-  EXPECT_FALSE(agent_.deviceDisconnected());
+  EXPECT_FALSE(agent_.devices().deviceDisconnected());
 }
 
 }  // namespace

@@ -14,7 +14,7 @@ namespace lmx {
 namespace {
 
 /// The main loop's checks, a turn at a time.
-class MainLoop : public AgentTest {
+class MainLoopTest : public AgentTest {
  protected:
   static constexpr const char* kOffline =
       "Unable to acquire the specified video device. The agent will remain offline until the device becomes "
@@ -29,7 +29,7 @@ class MainLoop : public AgentTest {
           context_->state.running.set(false);
         },
         Wait::no);
-    EXPECT_EQ(agent_.appLoop(), 0);
+    EXPECT_EQ(agent_.mainLoop().appLoop(), 0);
     context_->state.running.set(true);
     return goesOn;
   }
@@ -38,12 +38,12 @@ class MainLoop : public AgentTest {
   }
 };
 
-TEST_F(MainLoop, ADeviceThatIsNotMissedIsNotLookedFor) {
+TEST_F(MainLoopTest, ADeviceThatIsNotMissedIsNotLookedFor) {
   EXPECT_TRUE(turn());
   EXPECT_EQ(session_->previewController.get(), nullptr);
 }
 
-TEST_F(MainLoop, AMissedDeviceIsLookedForAfterMoreThanTenSeconds) {
+TEST_F(MainLoopTest, AMissedDeviceIsLookedForAfterMoreThanTenSeconds) {
   checkedDevice(9);
   EXPECT_TRUE(turn());
   EXPECT_EQ(session_->previewController.get(), nullptr);
@@ -55,13 +55,13 @@ TEST_F(MainLoop, AMissedDeviceIsLookedForAfterMoreThanTenSeconds) {
   EXPECT_FALSE(log_.mentions(kOffline));
 }
 
-TEST_F(MainLoop, AClockThatIsSetBackDoesNotKeepTheAgentOffline) {
+TEST_F(MainLoopTest, AClockThatIsSetBackDoesNotKeepTheAgentOffline) {
   checkedDevice(-3600);
   EXPECT_TRUE(turn());
   EXPECT_EQ(context_->state.last_device_check.get(), 0);
 }
 
-TEST_F(MainLoop, ASecondSignalWhileTheTunnelClosesIsHarmless) {
+TEST_F(MainLoopTest, ASecondSignalWhileTheTunnelClosesIsHarmless) {
   for (int round = 0; round < 20; ++round) {
     checkedDevice(11);
     ASSERT_TRUE(turn());  // opens the tunnel
@@ -72,7 +72,7 @@ TEST_F(MainLoop, ASecondSignalWhileTheTunnelClosesIsHarmless) {
   EXPECT_EQ(log_.count(7, "Process shutDownControl"), 40);
 }
 
-TEST_F(MainLoop, ADeviceThatIsStillMissingEndsTheDaemon) {
+TEST_F(MainLoopTest, ADeviceThatIsStillMissingEndsTheDaemon) {
   framework_->cameras_attach = false;
   checkedDevice(11);
   EXPECT_FALSE(turn());
@@ -80,7 +80,7 @@ TEST_F(MainLoop, ADeviceThatIsStillMissingEndsTheDaemon) {
   EXPECT_FALSE(log_.mentions(kOffline));
 }
 
-TEST_F(MainLoop, ADeviceThatFailedGetsOneMoreRetryWithAWarning) {
+TEST_F(MainLoopTest, ADeviceThatFailedGetsOneMoreRetryWithAWarning) {
   framework_->cameras_attach = false;
   agent_.shutDownControlBecauseDeviceFailed();
   EXPECT_TRUE(log_.contains(7, "Process shutDownControl"));
@@ -94,7 +94,7 @@ TEST_F(MainLoop, ADeviceThatFailedGetsOneMoreRetryWithAWarning) {
   EXPECT_EQ(log_.count(4, kOffline), 1);
 }
 
-TEST_F(MainLoop, ADeviceThatIsBackForgetsTheWarning) {
+TEST_F(MainLoopTest, ADeviceThatIsBackForgetsTheWarning) {
   agent_.shutDownControlBecauseDeviceFailed();
   checkedDevice(11);
   EXPECT_TRUE(turn());
@@ -104,7 +104,7 @@ TEST_F(MainLoop, ADeviceThatIsBackForgetsTheWarning) {
   EXPECT_FALSE(log_.mentions(kOffline));
 }
 
-TEST_F(MainLoop, PreferencesThatAreGoneAtTheRetryEndTheDaemon) {
+TEST_F(MainLoopTest, PreferencesThatAreGoneAtTheRetryEndTheDaemon) {
   framework_->audio_device_usable = false;
   checkedDevice(11);
   EXPECT_FALSE(turn());
@@ -113,7 +113,7 @@ TEST_F(MainLoop, PreferencesThatAreGoneAtTheRetryEndTheDaemon) {
                             "for preference: RecordingAudioInput"));
 }
 
-TEST_F(MainLoop, APreviewThatNobodyAsksForIsStoppedAfterSixteenSeconds) {
+TEST_F(MainLoopTest, APreviewThatNobodyAsksForIsStoppedAfterSixteenSeconds) {
   const auto preview = LXAgentRecordCreatePreviewController("camera", std::nullopt, false, 400, nullptr);
   ASSERT_NE(preview, nullptr);
   session_->previewController.set(preview);
@@ -131,17 +131,17 @@ TEST_F(MainLoop, APreviewThatNobodyAsksForIsStoppedAfterSixteenSeconds) {
   EXPECT_TRUE(log_.contains(7, "Process stopPreview"));
 }
 
-TEST_F(MainLoop, ALostDeviceEndsItWithOne) {
+TEST_F(MainLoopTest, ALostDeviceEndsItWithOne) {
   const auto delegate = std::make_shared<LMRCaptureDelegate>(nullptr);
   delegate->recordError.set(CaptureError{CaptureError::kDomain, kDeviceRemoved, "gone"});
   session_->captureControllerDelegate.set(delegate);
-  EXPECT_EQ(agent_.appLoop(), 1);
+  EXPECT_EQ(agent_.mainLoop().appLoop(), 1);
   EXPECT_FALSE(context_->state.running.get());
 }
 
-TEST_F(MainLoop, ARunLoopThatWasStoppedEndsItInOrder) {
+TEST_F(MainLoopTest, ARunLoopThatWasStoppedEndsItInOrder) {
   agent_.mainRunLoop().stop();
-  EXPECT_EQ(agent_.appLoop(), 0);
+  EXPECT_EQ(agent_.mainLoop().appLoop(), 0);
   EXPECT_TRUE(context_->state.running.get());
 }
 
@@ -153,7 +153,7 @@ void tellOnStandardError(void*, int level, const std::string& text) {
   std::fprintf(stderr, "%d %s\n", level, text.c_str());
 }
 
-class Refusal : public MainLoop {
+class Refusal : public MainLoopTest {
  protected:
   static constexpr const char* kLine = "2 Server rejected agent connection, restarting for retry\\.";
   static constexpr int kWentOn = 7;
@@ -180,7 +180,7 @@ TEST_F(Refusal, IsNeverActedUponInAdhocMode) {
   context_->options.adhoc.set(false);
 }
 
-TEST_F(MainLoop, ALostDeviceEndsAnAdhocProcessWithSixtyNine) {
+TEST_F(MainLoopTest, ALostDeviceEndsAnAdhocProcessWithSixtyNine) {
   GTEST_FLAG_SET(death_test_style, "threadsafe");
   const auto delegate = std::make_shared<LMRCaptureDelegate>(nullptr);
   delegate->recordError.set(CaptureError{CaptureError::kDomain, kDeviceRemoved, "gone"});
@@ -189,7 +189,8 @@ TEST_F(MainLoop, ALostDeviceEndsAnAdhocProcessWithSixtyNine) {
   context_->post_process_list.postProcessListAddJob(std::make_shared<AgentSubmit>());  // not waited for
   const auto ask = [this] {
     setLogSinkForTesting(tellOnStandardError, nullptr);
-    agent_.deviceDisconnected();
+    EXPECT_TRUE(agent_.devices().deviceDisconnected());
+    agent_.devices().announceLostDevice();
   };
   EXPECT_EXIT(ask(), ::testing::ExitedWithCode(69), "2 The capture device has been disconnected\\.");
   context_->options.adhoc.set(false);

@@ -175,7 +175,7 @@ TEST_F(StoppedRecording, ACancelledOneBecomesIdleAndNoJob) {
 TEST_F(StoppedRecording, ALostDeviceStillHandsOverWhatWasRecorded) {
   const auto controller = start("R1");
   reportEnd(controller, CaptureError{CaptureError::kDomain, kDeviceRemoved, "gone"});
-  EXPECT_FALSE(agent_.deviceDisconnected()) << "the recording is on its way";
+  EXPECT_FALSE(agent_.devices().deviceDisconnected()) << "the recording is on its way";
   turnTheLoop();
   EXPECT_NE(nextJob(), nullptr);
 }
@@ -312,7 +312,7 @@ TEST_F(StoppedRecording, RecoveredOnesGetTheirDocumentAndAreNotSubmitted) {
     EXPECT_TRUE(std::filesystem::exists(movie("R9.xml"))) << "forgotten before the document is there";
     forgotten = true;
   };
-  agent_.keepRecovered({recovered});
+  agent_.submission().keepRecovered({recovered});
   EXPECT_TRUE(forgotten);
   EXPECT_EQ(context_->post_process_list.postProcessListCount(), 0U);
   const std::string xml = readFile(movie("R9.xml"));
@@ -329,7 +329,7 @@ TEST_F(StoppedRecording, ARecoveredOneWithoutItsDocumentIsKeptForTheNextStart) {
   RecoveredRecording recovered;
   recovered.path = movie("missing-folder/R9.mov");
   recovered.forget = [&] { forgotten = true; };
-  agent_.keepRecovered({recovered});
+  agent_.submission().keepRecovered({recovered});
   EXPECT_FALSE(forgotten);
 }
 

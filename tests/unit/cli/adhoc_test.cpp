@@ -4,6 +4,7 @@
 #include <csignal>
 #include <future>
 
+#include "cli/adhoc_client.h"
 #include "platform/net/local_socket.h"
 #include "support/unique_fd.h"
 #include "tests/unit/agent/agent_fixture.h"
@@ -44,26 +45,26 @@ class PlayedDaemon {
   UniqueFd peer_;
 };
 
-class AdHocClient : public AgentTest {
+class AdHocMode : public AgentTest {
  protected:
-  AdHocClient() { context_->options.adhoc.set(true); }
-  ~AdHocClient() override { context_->options.adhoc.set(false); }
+  AdHocMode() { context_->options.adhoc.set(true); }
+  ~AdHocMode() override { context_->options.adhoc.set(false); }
 
   /// Runs the client to its end. @return what it printed
   std::string run() {
     ::testing::internal::CaptureStdout();
-    EXPECT_EQ(agent_.startup(), 0);
+    EXPECT_EQ(AdHocClient(agent_).startupAdHoc(), 0);
     return ::testing::internal::GetCapturedStdout();
   }
 };
 
-TEST_F(AdHocClient, WithoutADaemonSaysNothing) {
+TEST_F(AdHocMode, WithoutADaemonSaysNothing) {
   context_->options.adhoc_request_type.set(1);
   EXPECT_EQ(run(), "");
   EXPECT_TRUE(log_.contains(6, "lmxagentd (version 100) starting..."));
 }
 
-TEST_F(AdHocClient, AsksForTheStatusOnce) {
+TEST_F(AdHocMode, AsksForTheStatusOnce) {
   PlayedDaemon daemon;
   context_->options.adhoc_request_type.set(1);
   auto conversation = std::async(std::launch::async, [&] {
@@ -76,7 +77,7 @@ TEST_F(AdHocClient, AsksForTheStatusOnce) {
   conversation.get();
 }
 
-TEST_F(AdHocClient, CutsALongReply) {
+TEST_F(AdHocMode, CutsALongReply) {
   PlayedDaemon daemon;
   context_->options.adhoc_request_type.set(2);
   auto conversation = std::async(std::launch::async, [&] {
@@ -90,7 +91,7 @@ TEST_F(AdHocClient, CutsALongReply) {
   conversation.get();
 }
 
-TEST_F(AdHocClient, ADaemonThatHangsUpHasNothingToSay) {
+TEST_F(AdHocMode, ADaemonThatHangsUpHasNothingToSay) {
   PlayedDaemon daemon;
   context_->options.adhoc_request_type.set(1);
   auto conversation = std::async(std::launch::async, [&] {
@@ -102,7 +103,7 @@ TEST_F(AdHocClient, ADaemonThatHangsUpHasNothingToSay) {
   conversation.get();
 }
 
-class AdHocRecording : public AdHocClient, public ::testing::WithParamInterface<int> {};
+class AdHocRecording : public AdHocMode, public ::testing::WithParamInterface<int> {};
 
 TEST_P(AdHocRecording, LastsUntilASignal) {
   PlayedDaemon daemon;
@@ -125,7 +126,7 @@ TEST_P(AdHocRecording, LastsUntilASignal) {
 
 INSTANTIATE_TEST_SUITE_P(Signals, AdHocRecording, ::testing::Values(SIGINT, SIGTERM));
 
-TEST_F(AdHocClient, AnInterruptIsHeardWhileTheDaemonIsBusy) {
+TEST_F(AdHocMode, AnInterruptIsHeardWhileTheDaemonIsBusy) {
   PlayedDaemon daemon;  // a connection waits in its queue as behind another peer
   context_->options.submit_disabled.set(true);
   auto conversation = std::async(std::launch::async, [&] {
@@ -141,7 +142,7 @@ TEST_F(AdHocClient, AnInterruptIsHeardWhileTheDaemonIsBusy) {
   EXPECT_TRUE(printed.ends_with("received: <empty>\nsent STOP, received: cmdStatus=0\n")) << printed;
 }
 
-TEST_F(AdHocClient, AnUnknownRequestStartsButDoesNotStay) {
+TEST_F(AdHocMode, AnUnknownRequestStartsButDoesNotStay) {
   PlayedDaemon daemon;
   context_->options.submit_disabled.set(true);
   context_->options.adhoc_request_type.set(9);
