@@ -193,10 +193,8 @@ bool Submission::announceStop(const std::shared_ptr<AgentRecord>& session, const
   const SharedDictionary properties = propertiesOf(*context_, *session);
   if (!wantsSubmission(properties)) return true;
   auto job = std::make_shared<AgentSubmit>();
-  job->setRecord(session->copy());
-  if (const auto workflow = lookUp(properties, metadata_key::kAdHocWorkflowUUID)) {
-    job->setAdhoc_workflow_uuid(workflow);
-  }
+  job->recorded = session->copy();
+  job->adhoc_workflow_uuid = lookUp(properties, metadata_key::kAdHocWorkflowUUID);
   job->setPropertyValuesWithContext(context_, file, atTime, stoppedTime, elapsedSeconds, metadata, canceled);
   if (job->writeProperties() != 0) {
     LMPLogMessage(context_->log_context(), kLogCritical,
@@ -223,7 +221,7 @@ void Submission::keepRecovered(const std::vector<RecoveredRecording>& recordings
     AgentSubmit document;
     auto record = std::make_shared<AgentRecord>();
     record->recordingType.set(recording.recordingType);
-    document.setRecord(record);
+    document.recorded = record;
     document.setPropertyValuesWithContext(
         context_, recording.path, timeValueFrom(recording.startTime), timeValueFrom(recording.stopTime),
         static_cast<std::int64_t>(recording.duration), recording.parameters, false);

@@ -1,6 +1,8 @@
 // The way of a stopped recording to its job: movie, document, queue.
 #include "capture/api/capture_framework.h"
 #include "model/codes.h"
+#include "postprocess/properties_document.h"
+#include "postprocess/property_gatherer.h"
 #include "tests/unit/agent/agent_fixture.h"
 
 namespace lmx {
@@ -24,15 +26,15 @@ TEST_F(StoppedRecording, BecomesAMovieADocumentAndAJob) {
   stopAndReport(controller);
   const auto job = nextJob();
   ASSERT_NE(job, nullptr);
-  EXPECT_EQ(job->recording_file_path(), movie("R1.mov"));
-  EXPECT_EQ(job->properties_file_path(), movie("R1.xml"));
-  EXPECT_FALSE(job->canceled());
-  EXPECT_EQ(job->getProperty("RecordingMetadata_RECORDING_UUID"), "R1");
-  EXPECT_EQ(job->getProperty("RecordingMetadata_TITLE"), "Talk");
-  EXPECT_EQ(job->getProperty("RecordingMetadata_DURATION"), "61");
-  EXPECT_EQ(job->getProperty("RecordingMetadata_TYPE"), "Audio+Video");
+  EXPECT_EQ(job->recording_file_path, movie("R1.mov"));
+  EXPECT_EQ(job->properties_file_path, movie("R1.xml"));
+  EXPECT_FALSE(job->canceled);
+  EXPECT_EQ(getProperty(job->properties, "RecordingMetadata_RECORDING_UUID"), "R1");
+  EXPECT_EQ(getProperty(job->properties, "RecordingMetadata_TITLE"), "Talk");
+  EXPECT_EQ(getProperty(job->properties, "RecordingMetadata_DURATION"), "61");
+  EXPECT_EQ(getProperty(job->properties, "RecordingMetadata_TYPE"), "Audio+Video");
   EXPECT_EQ(readFile(movie("R1.mov")), "movie");
-  EXPECT_EQ(readFile(movie("R1.xml")), job->propertiesXml());
+  EXPECT_EQ(readFile(movie("R1.xml")), propertiesXml(job->properties));
   EXPECT_EQ(journalCount("processRequest request of R1 " + movie("R1.mov")), 1);
   EXPECT_TRUE(log_.contains(5, "\"" + movie("R1.mov") + "\" recording stopped (duration: 61s)"));
   EXPECT_TRUE(testing::waitUntil([&] { return journalCount("requestHandedOver request of R1") == 1; }));
@@ -43,7 +45,7 @@ TEST_F(StoppedRecording, EndDateIsNowLessTheTimeShift) {
   stopAndReport(start("R1"));
   const auto job = nextJob();
   ASSERT_NE(job, nullptr);
-  EXPECT_NEAR(std::stod(job->getProperty("RecordingMetadata_END_DATE").value()),
+  EXPECT_NEAR(std::stod(getProperty(job->properties, "RecordingMetadata_END_DATE").value()),
               static_cast<double>(std::time(nullptr) - 1000), 2.0);
 }
 
@@ -52,14 +54,14 @@ TEST_F(StoppedRecording, GoesToTheChosenFile) {
   stopAndReport(controller);
   const auto job = nextJob();
   ASSERT_NE(job, nullptr);
-  EXPECT_EQ(job->recording_file_path(), movie("chosen.mov"));
+  EXPECT_EQ(job->recording_file_path, movie("chosen.mov"));
 }
 
 TEST_F(StoppedRecording, CarriesItsWorkflow) {
   stopAndReport(start("R1", {{"RecordingMetadata_ADHOC_WORKFLOW_UUID", "W"}}));
   const auto job = nextJob();
   ASSERT_NE(job, nullptr);
-  EXPECT_EQ(job->adhoc_workflow_uuid(), "W");
+  EXPECT_EQ(job->adhoc_workflow_uuid, "W");
 }
 
 TEST_F(StoppedRecording, OnlyTheTextOneDisablesItsSubmission) {
@@ -127,14 +129,14 @@ TEST_F(StoppedRecording, ASecondOneThatHasStartedMeanwhileHasItsOwnMovieParamete
   ASSERT_NE(job2, nullptr);
   EXPECT_EQ(session_->recordingType.get(), kRecordingTypeAudioVideo);
 
-  EXPECT_EQ(job1->recording_file_path(), movie("R1.mov"));
-  EXPECT_EQ(job1->getProperty("RecordingMetadata_RECORDING_UUID"), "R1");
-  EXPECT_EQ(job1->getProperty("RecordingMetadata_TITLE"), "First");
-  EXPECT_EQ(job1->getProperty("RecordingMetadata_TYPE"), "Audio+Video");
-  EXPECT_EQ(job2->recording_file_path(), movie("R2.mov"));
-  EXPECT_EQ(job2->getProperty("RecordingMetadata_RECORDING_UUID"), "R2");
-  EXPECT_EQ(job2->getProperty("RecordingMetadata_TITLE"), "Second");
-  EXPECT_EQ(job2->getProperty("RecordingMetadata_TYPE"), "Audio");
+  EXPECT_EQ(job1->recording_file_path, movie("R1.mov"));
+  EXPECT_EQ(getProperty(job1->properties, "RecordingMetadata_RECORDING_UUID"), "R1");
+  EXPECT_EQ(getProperty(job1->properties, "RecordingMetadata_TITLE"), "First");
+  EXPECT_EQ(getProperty(job1->properties, "RecordingMetadata_TYPE"), "Audio+Video");
+  EXPECT_EQ(job2->recording_file_path, movie("R2.mov"));
+  EXPECT_EQ(getProperty(job2->properties, "RecordingMetadata_RECORDING_UUID"), "R2");
+  EXPECT_EQ(getProperty(job2->properties, "RecordingMetadata_TITLE"), "Second");
+  EXPECT_EQ(getProperty(job2->properties, "RecordingMetadata_TYPE"), "Audio");
 }
 
 TEST_F(StoppedRecording, AHandedOverOneDoesNotMakeASessionIdleThatHasGoneOn) {
@@ -190,8 +192,8 @@ TEST_F(StoppedRecording, AFileRecordingMakesItsJobWithoutACapture) {
   agent_.stopRecording();
   const auto job = context_->post_process_list.postProcessListNext();
   ASSERT_NE(job, nullptr);
-  EXPECT_EQ(job->recording_file_path(), movie("in.mov"));
-  EXPECT_EQ(job->getProperty("RecordingMetadata_TYPE"), "File");
+  EXPECT_EQ(job->recording_file_path, movie("in.mov"));
+  EXPECT_EQ(getProperty(job->properties, "RecordingMetadata_TYPE"), "File");
   EXPECT_EQ(session_->status.get(), kRecorderIdle);
 }
 
@@ -229,7 +231,7 @@ TEST_F(StoppedRecording, NewPreferencesDuringItDoNotChangeItsType) {
   const auto job = nextJob();
   ASSERT_NE(job, nullptr);
   EXPECT_EQ(journalCount("controller stopRecording"), 1);
-  EXPECT_EQ(job->getProperty("RecordingMetadata_TYPE"), "Audio+Video");
+  EXPECT_EQ(getProperty(job->properties, "RecordingMetadata_TYPE"), "Audio+Video");
 }
 
 TEST_F(StoppedRecording, OfAFileSurvivesARefusedRequestForSound) {
@@ -248,8 +250,8 @@ TEST_F(StoppedRecording, OfAFileSurvivesARefusedRequestForSound) {
   agent_.stopRecording();
   const auto job = context_->post_process_list.postProcessListNext();
   ASSERT_NE(job, nullptr);
-  EXPECT_EQ(job->getProperty("RecordingMetadata_TYPE"), "File");
-  EXPECT_GE(std::stol(job->getProperty("RecordingMetadata_START_DATE").value()), begun->tv_sec);
+  EXPECT_EQ(getProperty(job->properties, "RecordingMetadata_TYPE"), "File");
+  EXPECT_GE(std::stol(getProperty(job->properties, "RecordingMetadata_START_DATE").value()), begun->tv_sec);
   EXPECT_EQ(session_->recordingType.get(), kRecordingTypeFile);
 }
 
@@ -262,9 +264,9 @@ TEST_F(StoppedRecording, ThatEndedByItselfIsSubmittedThoughItsReportIsStillToCom
   turnTheLoop();
   const auto job = nextJob();
   ASSERT_NE(job, nullptr);
-  EXPECT_EQ(job->getProperty("RecordingMetadata_RECORDING_UUID"), "R1");
+  EXPECT_EQ(getProperty(job->properties, "RecordingMetadata_RECORDING_UUID"), "R1");
   stopAndReport(second);
-  EXPECT_EQ(nextJob()->getProperty("RecordingMetadata_RECORDING_UUID"), "R2");
+  EXPECT_EQ(getProperty(nextJob()->properties, "RecordingMetadata_RECORDING_UUID"), "R2");
 }
 
 TEST_F(StoppedRecording, ThatEndedForWantOfSpaceLeavesItsError) {
@@ -295,8 +297,8 @@ TEST_F(StoppedRecording, IsDescribedByTheRequestThatTookItOver) {
   stopAndReport(controller);
   const auto job = nextJob();
   ASSERT_NE(job, nullptr);
-  EXPECT_EQ(job->getProperty("RecordingMetadata_RECORDING_UUID"), "R2");
-  EXPECT_EQ(job->getProperty("RecordingMetadata_TITLE"), "Second");
+  EXPECT_EQ(getProperty(job->properties, "RecordingMetadata_RECORDING_UUID"), "R2");
+  EXPECT_EQ(getProperty(job->properties, "RecordingMetadata_TITLE"), "Second");
 }
 
 TEST_F(StoppedRecording, RecoveredOnesGetTheirDocumentAndAreNotSubmitted) {

@@ -22,8 +22,8 @@ class Scheduler : public testing::SubmitFixture {
  protected:
   void add(const std::string& uuid) {
     auto job = std::make_shared<AgentSubmit>();
-    job->setAgentContext(context_);
-    job->setProperties({{"RecordingMetadata_RECORDING_UUID", uuid}});
+    job->agentContext = context_;
+    job->properties = {{"RecordingMetadata_RECORDING_UUID", uuid}};
     context_->post_process_list.postProcessListAddJob(std::move(job));
   }
   /// Runs the loop on this thread; `onSleep` comes in place of each sleep.
@@ -115,7 +115,7 @@ TEST_F(Scheduler, IsBusyWhileAJobRunsAndIdleWhileItSleeps) {
 
 TEST_F(Scheduler, ReleasesAJobOnceItHasRun) {
   auto job = std::make_shared<AgentSubmit>();
-  job->setAgentContext(context_);
+  job->agentContext = context_;
   const std::weak_ptr<AgentSubmit> watched = job;
   context_->post_process_list.postProcessListAddJob(std::move(job));
   runLoop([this, &watched] {

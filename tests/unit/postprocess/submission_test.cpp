@@ -53,10 +53,10 @@ TEST(SubmissionArguments, AnEmptyWorkflowIsAWorkflow) {
 class SubmissionJob : public testing::SubmitFixture {
  protected:
   SubmissionJob() {
-    job_.setAgentContext(context_);
-    job_.setProperties({{"RecordingMetadata_RECORDING_UUID", "ABC"}});
-    job_.setRecording_file_path(inRepository("ABC.mov"));
-    job_.setProperties_file_path(inRepository("ABC.xml"));
+    job_.agentContext = context_;
+    job_.properties = {{"RecordingMetadata_RECORDING_UUID", "ABC"}};
+    job_.recording_file_path = inRepository("ABC.mov");
+    job_.properties_file_path = inRepository("ABC.xml");
     write(inRepository("ABC.mov"), "movie");
     write(inRepository("ABC.xml"), "document");
   }
@@ -124,21 +124,21 @@ TEST_F(SubmissionJob, AToolThatCannotBeStartedIsLoggedWithItsPathAndReason) {
 }
 
 TEST_F(SubmissionJob, WithoutARecordingIdentifierTheToolNeverRuns) {
-  job_.setProperties({{"RecordingMetadata_TITLE", "Optics"}});
+  job_.properties = {{"RecordingMetadata_TITLE", "Optics"}};
   EXPECT_EQ(job_.addRecordingWithCommentary(children_), -1);
   EXPECT_THAT(children_.runs(), IsEmpty());
   EXPECT_THAT(log_.entries(), ElementsAre(kStarting, kInProgress, kUnable, kIncomplete, kInternal));
 }
 
 TEST_F(SubmissionJob, WithoutAContextTheToolNeverRuns) {
-  job_.setAgentContext(nullptr);
+  job_.agentContext = nullptr;
   EXPECT_EQ(job_.addRecordingWithCommentary(children_), -1);
   EXPECT_THAT(children_.runs(), IsEmpty());
   EXPECT_TRUE(log_.contains(kUnable.level, kUnable.text));
 }
 
 TEST_F(SubmissionJob, AWorkflowIsSubmittedWithUserAndPassword) {
-  job_.setAdhoc_workflow_uuid("W-1");
+  job_.adhoc_workflow_uuid = "W-1";
   context_->options.user.set("ada");
   context_->options.password.set("secret");
   EXPECT_EQ(job_.addRecordingWithCommentary(children_), 0);
@@ -152,7 +152,7 @@ TEST_F(SubmissionJob, AWorkflowIsSubmittedWithUserAndPassword) {
 }
 
 TEST_F(SubmissionJob, ThePasswordStandsInTheCommandLineOnly) {
-  job_.setAdhoc_workflow_uuid("W-1");
+  job_.adhoc_workflow_uuid = "W-1";
   context_->options.user.set("ada");
   context_->options.password.set("secret");
   children_.results = {{End::notStarted, ENOENT, {}}};
@@ -164,7 +164,7 @@ TEST_F(SubmissionJob, ThePasswordStandsInTheCommandLineOnly) {
 }
 
 TEST_F(SubmissionJob, AWorkflowWithoutPasswordFailsBeforeTheTool) {
-  job_.setAdhoc_workflow_uuid("W-1");
+  job_.adhoc_workflow_uuid = "W-1";
   context_->options.user.set("ada");
   EXPECT_EQ(job_.addRecordingWithCommentary(children_), -1);
   EXPECT_THAT(children_.runs(), IsEmpty());
@@ -172,7 +172,7 @@ TEST_F(SubmissionJob, AWorkflowWithoutPasswordFailsBeforeTheTool) {
 }
 
 TEST_F(SubmissionJob, AWorkflowWithoutUserFailsBeforeTheTool) {
-  job_.setAdhoc_workflow_uuid("");
+  job_.adhoc_workflow_uuid = "";
   context_->options.password.set("secret");
   EXPECT_EQ(job_.addRecording(children_), 1);
   EXPECT_THAT(children_.runs(), IsEmpty());
@@ -193,7 +193,7 @@ class CanceledJob : public SubmissionJob, public ::testing::WithParamInterface<b
 
 TEST_P(CanceledJob, RemovesBothFilesWhetherSubmissionIsDisabledOrNot) {
   context_->options.submit_disabled.set(GetParam());
-  job_.setCanceled(true);
+  job_.canceled = true;
   EXPECT_EQ(job_.addRecordingWithCommentary(children_), 0);
   EXPECT_THAT(children_.runs(), IsEmpty());
   EXPECT_EQ(filesInRepository(), 0U);
@@ -208,7 +208,7 @@ INSTANTIATE_TEST_SUITE_P(Submission, CanceledJob, ::testing::Bool(),
 
 TEST_F(SubmissionJob, ACanceledJobWhoseMovieIsGoneStillRemovesTheDocument) {
   std::filesystem::remove(inRepository("ABC.mov"));
-  job_.setCanceled(true);
+  job_.canceled = true;
   EXPECT_EQ(job_.addRecordingWithCommentary(children_), 0);
   EXPECT_TRUE(
       log_.contains(kLogError, "An error occurred removing file \"" + inRepository("ABC.mov") + "\""));
@@ -224,9 +224,9 @@ class FileRecording : public SubmissionJob {
     std::filesystem::create_directories(elsewhere());
     write(elsewhere() + "/talk.mov", movie_);
     write(elsewhere() + "/talk.xml", "talk's document");
-    job_.setRecording_file_path(elsewhere() + "/talk.mov");
-    job_.setProperties_file_path(elsewhere() + "/talk.xml");
-    job_.setProperties({{"RecordingMetadata_RECORDING_UUID", "NEW"}});
+    job_.recording_file_path = elsewhere() + "/talk.mov";
+    job_.properties_file_path = elsewhere() + "/talk.xml";
+    job_.properties = {{"RecordingMetadata_RECORDING_UUID", "NEW"}};
     context_->record_context()->recordingType.set(kRecordingTypeFile);
   }
   static std::string elsewhere() { return kRoot_ + "/elsewhere"; }
@@ -294,13 +294,13 @@ TEST_F(FileRecording, AnUnwritableRepositoryIsADebugLineEach) {
 TEST_F(FileRecording, TheJobsOwnSessionDecidesWhatIsCopied) {
   auto own = std::make_shared<AgentRecord>();
   own->recordingType.set(kRecordingTypeVideo);
-  job_.setRecord(own);
+  job_.recorded = own;
   EXPECT_EQ(job_.addRecording(children_), 0);
   EXPECT_FALSE(std::filesystem::exists(inRepository("NEW.mov")));
 }
 
 TEST_F(FileRecording, AWorkflowWithoutPasswordIsCopiedAllTheSame) {
-  job_.setAdhoc_workflow_uuid("W-1");
+  job_.adhoc_workflow_uuid = "W-1";
   EXPECT_EQ(job_.addRecording(children_), 1);
   EXPECT_EQ(contentOf(inRepository("NEW.mov")), movie_);
 }
@@ -321,7 +321,7 @@ class RealTool : public SubmissionJob {
 
 TEST_F(RealTool, GetsItsArgumentsAsTheyAre) {
   installTool("exit 0");
-  job_.setProperties({{"RecordingMetadata_RECORDING_UUID", "A B'$(id)\"*"}});
+  job_.properties = {{"RecordingMetadata_RECORDING_UUID", "A B'$(id)\"*"}};
   EXPECT_EQ(job_.addRecordingWithCommentary(systemChildRunner()), 0);
   EXPECT_EQ(contentOf(argumentsFile()),
             "[--server]\n[https://lumex.example]\n[--submit]\n[--recording]\n[A B'$(id)\"*]\n[--delete]\n");
