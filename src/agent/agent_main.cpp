@@ -106,7 +106,7 @@ AgentMain::Start AgentMain::startServices() {
   if (!devices_.deviceIsOffline() && !channels_.tunnel().openTunnel()) return Start::fatal;
   startListeners();
   // Off this thread: a first recording should find the plug-ins loaded, but nobody should wait for them now.
-  dispatchAsync(WorkPriority::background, [framework = environment_.framework] { framework->warmUp(); });
+  dispatchAsync([framework = environment_.framework] { framework->warmUp(); });
   notify_post("com.zandor.lmxagentd.started");
   postDistributedNotification("com.zandor.lmxagentd.started");
   start_settings_ = nullptr;

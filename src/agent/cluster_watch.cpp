@@ -116,7 +116,7 @@ void ClusterWatch::learnCluster() {
 
 void ClusterWatch::refreshClusterInformation() {
   if (refreshing_.exchange(true)) return;  // the last one is still waiting for its tool
-  dispatchAsync(WorkPriority::background, [this] {
+  dispatchAsync([this] {
     const auto ended = [](std::atomic<bool>* refresh) { *refresh = false; };
     const std::unique_ptr<std::atomic<bool>, decltype(ended)> end_of_refresh(&refreshing_, ended);
     SharedPlist members;

@@ -98,7 +98,7 @@ void Submission::captureDidCancel(const void* controller) {
         const auto record = context_->record_context();
         if (record && record->captureController.get().get() == controller) actions_.setRecorderStatusToIdle();
         if (!stopped) return;
-        dispatchAsync(WorkPriority::background, [this, capture = stopped->captureController.get()] {
+        dispatchAsync([this, capture = stopped->captureController.get()] {
           if (capture) keepRecovered(capture->recoverAbandonedRequests());
         });
       },
@@ -126,7 +126,7 @@ void Submission::submit(const std::shared_ptr<AgentRecord>& stopped) {
                                .value_or(repository + "/" + uuid.value_or("") + ".mov");
   stopped->metadata.set(withUuid(metadataOf(*context_, *stopped), uuid));
   stopped->startTime.set(stopped->beginning());
-  dispatchAsync(WorkPriority::background, [this, stopped, path, elapsed] {
+  dispatchAsync([this, stopped, path, elapsed] {
     const CountedDown end_of_hand_off(hand_offs_);
     handOff(stopped, path, elapsed);
   });
@@ -211,7 +211,7 @@ void Submission::recoverUnfinishedRecordings(std::shared_ptr<CaptureFramework> f
   const auto repository = context_->recording.recording_repository_path.get();
   if (!repository) return;
   // On a worker: a long recording may have to be copied, and the agent is to be commanded meanwhile.
-  dispatchAsync(WorkPriority::background, [this, repository, framework = std::move(framework)] {
+  dispatchAsync([this, repository, framework = std::move(framework)] {
     keepRecovered(framework->recoverUnfinished(*repository));
   });
 }

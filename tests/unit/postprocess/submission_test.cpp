@@ -231,7 +231,7 @@ class FileRecording : public SubmissionJob {
   }
   static std::string elsewhere() { return kRoot_ + "/elsewhere"; }
 
-  static inline const std::string kRoot_ = testing::kRoot.path();
+  static inline const std::string kRoot_ = testing::kTestRoot.path();
   const std::string movie_ = std::string(200000, 'm') + "end";  // more than one buffer
 };
 
@@ -310,7 +310,7 @@ TEST_F(FileRecording, AWorkflowWithoutPasswordIsCopiedAllTheSame) {
 class RealTool : public SubmissionJob {
  protected:
   static std::string tool() { return systemPath(kLumexTool); }
-  static std::string argumentsFile() { return testing::kRoot.path() + "/arguments"; }
+  static std::string argumentsFile() { return testing::kTestRoot.path() + "/arguments"; }
   static void installTool(const std::string& end) {
     std::filesystem::create_directories(directoryOf(tool()));
     write(tool(),

@@ -194,7 +194,7 @@ TEST_F(PreferenceStore, WithoutAHomeTheDomainBeginsAtTheSystemsFile) {
   AgentPreferences prefs;
   unsetenv("HOME");
   EXPECT_EQ(text(prefs.get("RecordingType")), "Video");
-  testing::kRoot.setHome();
+  testing::kTestRoot.setHome();
 }
 
 TEST_F(PreferenceStore, TheDefaultsAreTheOnesThatNewFilesStartFrom) {
