@@ -19,7 +19,7 @@ constexpr auto kFirstToolLimit = 20s;
 constexpr const char* kMembers = "cluster_members";
 
 ClusterWatch::SharedPlist membersOf(const PlistResult& information) {
-  const PlistValue* members = information.value ? information.value->under(kMembers) : nullptr;
+  const PlistValue* members = information ? information->under(kMembers) : nullptr;
   if (members == nullptr || members->dictionary() == nullptr) return nullptr;
   return std::make_shared<const PlistDictionary>(*members->dictionary());
 }
@@ -54,9 +54,9 @@ int ClusterWatch::clusterInformationFromSpecificHostOnly(const std::string& host
     return status;
   }
   const PlistResult answer = parsePropertyList(result.output);
-  if (!answer.value) {
+  if (!answer) {
     LMPLogMessage(log_.log_context(), kLogError, "The answer of /usr/bin/lumex --listinfo can't be used: %s",
-                  answer.problem.c_str());
+                  answer.error().message.c_str());
   }
   members = membersOf(answer);
   return 0;
@@ -74,7 +74,7 @@ int ClusterWatch::clusterInformationWithMember(std::size_t index, const std::vec
 ClusterWatch::SharedPlist ClusterWatch::clusterInformationFromDisk() {
   for (const std::string_view path : {kServerInformation, kServerInformationOfRoot}) {
     const PlistResult file = readPropertyList(systemPath(path));
-    if (file.value && file.value->dictionary() != nullptr) return membersOf(file);
+    if (file && file->dictionary() != nullptr) return membersOf(file);
   }
   return nullptr;
 }

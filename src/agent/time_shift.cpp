@@ -13,7 +13,7 @@ void readTimeShift(AgentState& state) {
   std::int32_t seconds = 0;
   if (access(path.c_str(), R_OK) == 0) {
     const PlistResult file = readPropertyList(path);
-    const PlistValue* shift = file.value ? file.value->under("TimeShiftSeconds") : nullptr;
+    const PlistValue* shift = file ? file->under("TimeShiftSeconds") : nullptr;
     if (shift != nullptr) seconds = static_cast<std::int32_t>(shift->asInteger());
   }
   state.timeshift_seconds.set(seconds);

@@ -27,9 +27,9 @@ bool given(const char* argument) { return argument != nullptr && *argument != '\
 /// another name first. @return nothing when that failed.
 std::optional<PlistDictionary> loadToChange(const std::string& path) {
   PlistResult file = readPropertyList(path);
-  if (file.value && file.value->dictionary() != nullptr) return *file.value->dictionary();
-  if (file.systemError == ENOENT) return adHocDefaults();
-  const std::string problem = file.value ? "its top level is not a dictionary" : file.problem;
+  if (file && file->dictionary() != nullptr) return *file->dictionary();
+  if (!file && file.error().systemError == ENOENT) return adHocDefaults();
+  const std::string problem = file ? "its top level is not a dictionary" : file.error().message;
   const std::string copy = keepUnderAnotherName(path);
   if (copy.empty()) {
     std::fprintf(stderr, "The preferences file %s can't be used (%s) nor kept under another name (%s)\n",

@@ -28,12 +28,12 @@ bool missesSilently(const std::string& key) {
 /// @param complained  whether an error line has named the file before; set when this writes one
 std::optional<PlistDictionary> loadFile(const std::string& path, bool& complained) {
   PlistResult file = readPropertyList(path);
-  if (file.value && file.value->dictionary() != nullptr) return *file.value->dictionary();
-  if (file.systemError == ENOENT || complained) return std::nullopt;
+  if (file && file->dictionary() != nullptr) return *file->dictionary();
+  if (complained || (!file && file.error().systemError == ENOENT)) return std::nullopt;
   complained = true;
   LMPLogMessage(nullptr, kLogError,
                 "The preferences file \"%s\" can't be used: %s. Nothing is read from it; correct it.",
-                path.c_str(), file.value ? "its top level is not a dictionary" : file.problem.c_str());
+                path.c_str(), file ? "its top level is not a dictionary" : file.error().message.c_str());
   return std::nullopt;
 }
 

@@ -12,7 +12,7 @@ namespace lmx {
 Result<ServerSettings::Secret> readSharedSecret(const std::string& server_uuid) {
   const std::string path = systemPath(kSecretsDirectory) + "/" + server_uuid + ".plist";
   const PlistResult file = readPropertyList(path);
-  const std::string* text = file.value ? file.value->textUnder("lmx_secret") : nullptr;
+  const std::string* text = file ? file->textUnder("lmx_secret") : nullptr;
   if (text == nullptr) return Error{"Failed to read shared secret from plist: " + path};
   const auto bytes = lmp_decode_base64(*text);
   ServerSettings::Secret secret{};

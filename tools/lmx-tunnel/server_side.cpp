@@ -75,9 +75,8 @@ bool getsReply(const std::string& command) {
 
 Result<CipherBlock> readSecret(const std::string& path) {
   const PlistResult file = readPropertyList(path);
-  const std::string* text = file.value ? file.value->textUnder("lmx_secret") : nullptr;
-  if (text == nullptr)
-    return Error{file.problem.empty() ? "it has no text under \"lmx_secret\"" : file.problem};
+  const std::string* text = file ? file->textUnder("lmx_secret") : nullptr;
+  if (text == nullptr) return file ? Error{"it has no text under \"lmx_secret\""} : file.error();
   const auto key = keyFrom(*text);
   if (!key) return Error{"the text under \"lmx_secret\" is not the Base64 form of 16 bytes"};
   return *key;

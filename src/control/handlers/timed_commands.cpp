@@ -53,11 +53,11 @@ struct TimersFile {
 TimersFile readTimers(const std::string& path) {
   TimersFile result;
   const PlistResult file = readPropertyList(path, kTimersLimits);
-  if (!file.value) {
-    if (file.systemError != ENOENT) result.problem = file.problem;
+  if (!file) {
+    if (file.error().systemError != ENOENT) result.problem = file.error().message;
     return result;
   }
-  const auto* array = std::get_if<PlistArray>(&file.value->value);
+  const auto* array = std::get_if<PlistArray>(&file->value);
   if (array == nullptr) {
     result.problem = "its top level is not an array";
     return result;

@@ -9,6 +9,8 @@
 #include <variant>
 #include <vector>
 
+#include "support/result.h"
+
 namespace lmx {
 
 struct PlistValue;
@@ -53,11 +55,8 @@ struct PlistLimits {
   std::size_t values = kPlistNodeLimit;
 };
 
-struct PlistResult {
-  std::optional<PlistValue> value;
-  int systemError = 0;  ///< errno when the file couldn't be read (ENOENT: no such file)
-  std::string problem;  ///< why there is no value, in words
-};
+/// Why there is no value, in words; with the errno when the file couldn't be read (ENOENT: no such file).
+using PlistResult = Result<PlistValue>;
 
 /// Parses XML or binary bytes. A byte order mark is skipped. Refused before the library sees them: more than
 /// kPlistDepthLimit levels, more than `limits.values` values (shared references of the binary form counted as

@@ -36,7 +36,7 @@ class CommandLineTest : public AgentTest {
 
 std::string storedText(const char* key) {
   const PlistResult read = readPropertyList(systemPath(kPreferencesFile));
-  const auto* dictionary = read.value ? read.value->dictionary() : nullptr;
+  const auto* dictionary = read ? read->dictionary() : nullptr;
   return dictionary != nullptr && dictionary->contains(key) ? *dictionary->at(key).string() : "";
 }
 

@@ -42,7 +42,7 @@ class PreferenceTools : public ::testing::Test {
   static std::string file() { return systemPath(kPreferencesFile); }
   static PlistDictionary stored() {
     const PlistResult read = readPropertyList(file());
-    return read.value && read.value->dictionary() ? *read.value->dictionary() : PlistDictionary();
+    return read && read->dictionary() ? *read->dictionary() : PlistDictionary();
   }
   static std::string text(const PlistDictionary& from, const std::string& key) {
     const auto found = from.find(key);

@@ -342,7 +342,7 @@ TEST_F(Migration, TheObsoleteIntervalBecomesMilliseconds) {
   for (const auto& [seconds, milliseconds] : kIntervals) {
     replace({{"RecordingPreviewIntervalInSeconds", seconds}, {"PreviewIntervalInMilliseconds", "7"}});
     AgentPreferences().migrateOldKeys();
-    EXPECT_EQ(readPropertyList(systemFile()).value,
+    EXPECT_EQ(readPropertyList(systemFile()).value(),
               PlistValue(PlistDictionary{{"PreviewIntervalInMilliseconds", milliseconds}}));
   }
 }
@@ -358,7 +358,7 @@ TEST_F(Migration, TheFileIsRewrittenOnceAndOtherKeysSurvive) {
   prefs.migrateOldKeys();
   AgentPreferences().migrateOldKeys();
   EXPECT_EQ(inodeOf(systemFile()), after);
-  EXPECT_EQ(readPropertyList(systemFile()).value,
+  EXPECT_EQ(readPropertyList(systemFile()).value(),
             PlistValue(PlistDictionary{{"PreviewIntervalInMilliseconds", "2000"}, {"Mine", nested}}));
 }
 

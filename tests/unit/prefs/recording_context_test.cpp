@@ -315,7 +315,7 @@ TEST_F(RecordingContext, TheDaemonsMigratesTheObsoleteIntervalFirst) {
   EXPECT_EQ(context->captureType, CaptureType::video);
   EXPECT_EQ(context->previewIntervalInMilliseconds, 2000);
   const auto file = readPropertyList(systemFile());
-  EXPECT_FALSE(file.value->dictionary()->contains("RecordingPreviewIntervalInSeconds"));
+  EXPECT_FALSE(file->dictionary()->contains("RecordingPreviewIntervalInSeconds"));
 }
 
 TEST_F(RecordingContext, TheDaemonsReadsNoUserFileAndNoDefaults) {

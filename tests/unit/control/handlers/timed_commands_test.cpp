@@ -38,7 +38,7 @@ class TimedCommand : public ::testing::Test {
   /// The file as it is on the disk.
   static PlistArray stored() {
     const PlistResult read = readPropertyList(file());
-    return read.value ? std::get<PlistArray>(read.value->value) : PlistArray();
+    return read ? std::get<PlistArray>(read->value) : PlistArray();
   }
   std::string in(std::time_t seconds) const { return *dateText(now_ + seconds); }
   /// Runs one line. @return its reply
