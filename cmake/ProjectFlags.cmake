@@ -15,7 +15,7 @@ target_compile_options(project_flags INTERFACE -pthread)
 target_include_directories(project_flags INTERFACE ${CMAKE_SOURCE_DIR}/src ${CMAKE_SOURCE_DIR})
 target_link_libraries(project_flags INTERFACE Threads::Threads)
 if(LMX_SANITIZE)
-  target_compile_options(project_flags INTERFACE -fsanitize=${LMX_SANITIZE} -fno-omit-frame-pointer -O1)
+  target_compile_options(project_flags INTERFACE -fsanitize=${LMX_SANITIZE} -fno-omit-frame-pointer -O1 -g1)
   target_link_options(project_flags INTERFACE -fsanitize=${LMX_SANITIZE})
   # GCC 12 reports std::optional members under a sanitizer that it does not report without; release keeps the check.
   target_compile_options(project_flags INTERFACE $<$<CXX_COMPILER_ID:GNU>:-Wno-maybe-uninitialized>)
@@ -23,3 +23,7 @@ if(LMX_SANITIZE)
     target_compile_options(project_flags INTERFACE -fno-sanitize-recover=undefined)
   endif()
 endif()
+
+# For the sources of tests, behind project_flags: they are compiled more often than run, and a stack trace needs lines only.
+add_library(test_flags INTERFACE)
+target_compile_options(test_flags INTERFACE -O0 -g1)
