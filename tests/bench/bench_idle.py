@@ -77,8 +77,8 @@ def idle(ground):
     return Result(rows, [
         f"over {seconds} s, no peer: the limits are absolute (0.1 % of a core, 5 wake-ups a second). Wake-ups are "
         f"voluntary context switches of all threads; {involuntary:.0f} involuntary ones a minute. By thread: {wakers}",
-        f"private (dirty): Private_Dirty of smaps_rollup, {settled} s after the start, plug-ins loaded. Clean pages are those "
-        "of libraries, private only while nobody else has them mapped and dropped when memory is short: they and Pss "
+        f"private (dirty): Private_Dirty of smaps_rollup, {settled} s after the start, plug-ins loaded. Clean pages are "
+        "those of libraries, private only while nobody else has them mapped and dropped when memory is short: they and Pss "
         "depend on what else runs.",
         "No server answers: the tunnel, where it is built in, tries again with growing pauses.",
         f"exec → STATUS: median of {len(starts)}, GStreamer's catalogue of plug-ins warm, asked every 0.3 ms; the "
