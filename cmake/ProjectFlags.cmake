@@ -27,3 +27,6 @@ endif()
 # For the sources of tests, behind project_flags: they are compiled more often than run, and a stack trace needs lines only.
 add_library(test_flags INTERFACE)
 target_compile_options(test_flags INTERFACE -O0 -g1)
+if(LMX_SANITIZE MATCHES undefined)
+  target_compile_options(test_flags INTERFACE -fno-sanitize=undefined)  # a third of their time; the product keeps it
+endif()
