@@ -3,6 +3,7 @@ function(lmx_library name)
   cmake_parse_arguments(arg "" "" "SOURCES;LINK;PRIVATE_LINK" ${ARGN})
   add_library(${name} STATIC ${arg_SOURCES})
   target_link_libraries(${name} PUBLIC project_flags ${arg_LINK} PRIVATE ${arg_PRIVATE_LINK})
+  lmx_precompile(${name} product)
 endfunction()
 
 # lmx_test(NAME SOURCES a.cpp … LINK lib … [TIMEOUT s] [LABELS l …]): one GoogleTest program, one ctest entry.
@@ -12,7 +13,8 @@ function(lmx_test name)
     set(arg_TIMEOUT 120)
   endif()
   add_executable(${name} ${arg_SOURCES})
-  target_link_libraries(${name} PRIVATE project_flags ${arg_LINK} GTest::gmock GTest::gtest_main)
+  target_link_libraries(${name} PRIVATE project_flags test_flags ${arg_LINK} GTest::gmock GTest::gtest_main)
+  lmx_precompile(${name} test)
   add_test(NAME ${name} COMMAND ${name})
   set_tests_properties(${name} PROPERTIES TIMEOUT ${arg_TIMEOUT} LABELS "${arg_LABELS}")
   set_property(TEST ${name} PROPERTY ENVIRONMENT

@@ -10,7 +10,6 @@ from peers import (Picture, Process, ffmpeg_words, file_sources, gst_launch, mak
 from report import Result, Row
 
 PICTURES = (Picture(640, 360), Picture(1280, 720), Picture(1920, 1080))
-WARM_UP = 3.0
 DISTURBED = 0.1  # busy cores of others
 
 
@@ -19,8 +18,9 @@ class Turns:
     happens to each of them; who begins changes from turn to turn."""
 
     def __init__(self, ground):
-        self.count = 2 if ground.quick else 10
-        self.seconds = 4.0 if ground.quick else 10.0
+        self.count = ground.pick(10, 2, 1)
+        self.seconds = ground.pick(10.0, 4.0, 1.0)
+        self.warm_up = ground.pick(3.0, 3.0, 1.0)
         self.shares = []
         self.others = []
         self.thread_seconds = {}
@@ -32,7 +32,7 @@ class Turns:
             with contextlib.ExitStack() as stack:
                 names = list(sides) if turn % 2 == 0 else list(reversed(sides))
                 pids = {name: stack.enter_context(sides[name]()) for name in names}
-                time.sleep(WARM_UP)
+                time.sleep(self.warm_up)
                 before = threads(pids["ours"])
                 shares, others = cpu_shares(pids, self.seconds)
                 self._count_threads(before, threads(pids["ours"]))
@@ -83,7 +83,7 @@ class Ours:
 def check_length(movie, turns):
     """A side that lost media has not done the work."""
     shortest = min(movie_streams(movie).values())
-    assert shortest >= turns.seconds + WARM_UP - 0.5, f"only {shortest} s of {movie.name} were recorded"
+    assert shortest >= turns.seconds + turns.warm_up - 0.5, f"only {shortest} s of {movie.name} were recorded"
 
 
 def peer_side(turns, begin, target):
@@ -109,7 +109,7 @@ def same_settings(ours, theirs):
 def cpu(ground):
     """CPU per recorded second with the synthetic camera at three sizes, against the bare pipeline in gst-launch-1.0."""
     result = Result()
-    for picture in PICTURES:
+    for picture in ground.pick(PICTURES, PICTURES, PICTURES[:1]):
         turns, target, sources = Turns(ground), ground.folder / "peer.mov", synthetic_sources(picture)
         with ground.agent(RecordingVideoInput=f"test://video?size={picture}") as agent:
             ours = Ours(agent, turns, "CPU")
@@ -130,7 +130,7 @@ def cpu(ground):
 def cpu_file(ground):
     """The same with a movie file as the camera: every side gets the same pictures, and ffmpeg can take part."""
     picture, turns = Picture(1280, 720), Turns(ground)
-    movie = make_camera_file(picture, WARM_UP + turns.seconds + 15, ground.folder, ground.environment)
+    movie = make_camera_file(picture, turns.warm_up + turns.seconds + 15, ground.folder, ground.environment)
     gst, ffmpeg = ground.folder / "gst.mov", ground.folder / "ffmpeg.mov"
     with ground.agent(start=False) as agent:
         inside = agent.sandbox.root / "var/lmx/camera.mov"

@@ -53,16 +53,17 @@ def waiting(agent, seconds):
 
 def idle(ground):
     """CPU, wake-ups and memory of the waiting daemon, and exec → first STATUS answered."""
-    seconds = 10 if ground.quick else 60
-    starts = [1000 * seconds_to_first_status(ground) for _ in range(3 if ground.quick else 10)]
+    seconds = ground.pick(60, 10, 1)
+    settled = ground.pick(5, 5, 1)  # plug-ins are warmed up behind the start
+    starts = [1000 * seconds_to_first_status(ground) for _ in range(ground.pick(10, 3, 1))]
     with ground.agent(RecordingVideoInput="test://video?size=1280x720") as agent:
-        time.sleep(5)  # plug-ins are warmed up behind the start
+        time.sleep(settled)
         cpu, voluntary, involuntary, woken = waiting(agent, seconds)
         memory = memory_megabytes(agent.sandbox.daemon_pid)
         with recording(agent, "MEMORY"):
-            time.sleep(3)
+            time.sleep(ground.pick(3, 3, 1))
             while_recording = memory_megabytes(agent.sandbox.daemon_pid)
-        time.sleep(2)
+        time.sleep(ground.pick(2, 2, 1))
         afterwards = memory_megabytes(agent.sandbox.daemon_pid)
     rows = [Row("idle: CPU a minute", cpu, "s", limit=0.06),
             Row("idle: wake-ups a minute", voluntary, "", limit=300),
@@ -76,8 +77,8 @@ def idle(ground):
     return Result(rows, [
         f"over {seconds} s, no peer: the limits are absolute (0.1 % of a core, 5 wake-ups a second). Wake-ups are "
         f"voluntary context switches of all threads; {involuntary:.0f} involuntary ones a minute. By thread: {wakers}",
-        "private (dirty): Private_Dirty of smaps_rollup, 5 s after the start, plug-ins loaded. Clean pages are those "
-        "of libraries, private only while nobody else has them mapped and dropped when memory is short: they and Pss "
+        f"private (dirty): Private_Dirty of smaps_rollup, {settled} s after the start, plug-ins loaded. Clean pages are "
+        "those of libraries, private only while nobody else has them mapped and dropped when memory is short: they and Pss "
         "depend on what else runs.",
         "No server answers: the tunnel, where it is built in, tries again with growing pauses.",
         f"exec → STATUS: median of {len(starts)}, GStreamer's catalogue of plug-ins warm, asked every 0.3 ms; the "

@@ -5,7 +5,7 @@ import subprocess
 from ground import recording
 from harness.waiting import wait_until
 from measuring import median, percentile, threads
-from peers import compile_roundtrip
+from peers import built
 from report import Result, Row
 
 BLOCK = 100
@@ -26,7 +26,7 @@ class Trips:
     """Round trips to the daemon and to the echo server, in turns of a hundred through the same client."""
 
     def __init__(self, ground, agent, echo, echo_path, program):
-        self.blocks = 2 if ground.quick else 10
+        self.blocks = ground.pick(10, 2, 1)
         self.program = program
         self.paths = {"ours": agent.sandbox.root / "var/run/lmxagentd.comm", "peer": echo_path}
         self.servers = {"ours": self._answering_thread(agent.sandbox.daemon_pid), "peer": echo.pid}
@@ -67,7 +67,7 @@ class Trips:
 
 def status(ground):
     """STATUS round trip on the local socket, idle and while recording, against an echo server with the same client."""
-    program = compile_roundtrip(ground.folder)
+    program = built("roundtrip")
     echo_path = ground.folder / "echo.socket"
     with subprocess.Popen([str(program), "serve", str(echo_path)]) as echo:
         try:
@@ -84,7 +84,7 @@ def status(ground):
     count = trips.blocks * BLOCK
     return Result(rows, [
         f"{count} requests each, back to back, in turns of {BLOCK} with the peer; client and echo server are one C "
-        "program, compiled for this run. STATUS: all requests of a turn on one connection. connect + STATUS: a "
+        "program, built with the tests. STATUS: all requests of a turn on one connection. connect + STATUS: a "
         "connection each.",
         "same core, two cores: where the client and the thread that answers are put; everything else runs where it "
         "likes. With two, how fast an idle core wakes up is in every figure.",

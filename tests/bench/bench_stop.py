@@ -103,7 +103,7 @@ def rows_for(name, stopped, path, count):
 
 def live(ground):
     """Recordings of ten seconds in real time."""
-    seconds, count = (5, 1) if ground.quick else (10, 3)
+    seconds, count = ground.pick((10, 3), (5, 1), (1, 1))
     with ground.agent(RecordingVideoInput="test://video?size=640x360") as agent:
         stopped = []
         for turn in range(count):
@@ -158,7 +158,7 @@ class FastHour:
 
 def hour(ground):
     """A long recording, made fast."""
-    wanted = 300 if ground.quick else 3600
+    wanted = ground.pick(3600, 300, 10)
     with ground.agent(RecordingVideoInput="test://video?size=640x360&speed=max",
                       RecordingAudioInput="test://audio?speed=max") as agent:
         fast = FastHour(agent, wanted)
@@ -168,7 +168,7 @@ def hour(ground):
         lengths = movie_streams(path)
         assert min(lengths.values()) >= wanted, lengths
         size = path.stat().st_size
-        rows = rows_for(f"STOP → movie, {wanted // 60} min", [spent], path, 1 if ground.quick else 3)
+        rows = rows_for(f"STOP → movie, {wanted / 60:.3g} min", [spent], path, ground.pick(3, 1, 1))
         with open(path, "rb") as file:
             os.posix_fadvise(file.fileno(), 0, 0, os.POSIX_FADV_DONTNEED)
         left = cached_share(path)

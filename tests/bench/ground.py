@@ -10,8 +10,10 @@ from pathlib import Path
 from harness.agent import Agent, REPOSITORY
 from harness.waiting import wait_until
 from measuring import other_load
-from peers import compile_camera_plugin
+from peers import built
 
+# "full" gives figures to quote, "quick" a look, "smoke" only shows that everything can still be measured.
+LENGTHS = ("full", "quick", "smoke")
 # Seconds between the Unix epoch and that of the daemon's marks, 2001-01-01.
 REFERENCE_DATE = 978307200
 
@@ -23,10 +25,10 @@ def make_catalogue(path, element, **environment):
 
 
 class Ground:
-    """One run of the benchmarks. close() removes everything."""
+    """One run of the benchmarks, of one of LENGTHS. close() removes everything."""
 
-    def __init__(self, binary, quick):
-        self.quick = quick
+    def __init__(self, binary, length):
+        self.length = length
         self.folder = Path(tempfile.mkdtemp(prefix="lmx-bench-", dir="/tmp"))
         # A copy: whoever builds meanwhile must not change what is measured.
         self.binary = self.folder / "lmxagentd"
@@ -35,6 +37,10 @@ class Ground:
         make_catalogue(self.registry, "fakesink")
         self._environment = None
 
+    def pick(self, full, quick, smoke):
+        """How much to measure in a run of this length."""
+        return {"full": full, "quick": quick, "smoke": smoke}[self.length]
+
     def close(self):
         shutil.rmtree(self.folder)
 
@@ -42,7 +48,7 @@ class Ground:
     def environment(self):
         """For the peers: a catalogue of plug-ins as warm as the daemon's, with the synthetic camera in it."""
         if self._environment is None:
-            plugins = {"GST_PLUGIN_PATH": str(compile_camera_plugin(self.folder))}
+            plugins = {"GST_PLUGIN_PATH": str(built("plugins"))}
             catalogue = self.folder / "peers-registry.bin"
             make_catalogue(catalogue, "lmxtestcamera", **plugins)
             self._environment = {**os.environ, **plugins, "GST_REGISTRY": str(catalogue), "GST_REGISTRY_UPDATE": "no"}

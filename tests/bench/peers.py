@@ -1,6 +1,5 @@
 """The peers: bare pipelines in gst-launch-1.0, ffmpeg, and a small echo server."""
 import re
-import shutil
 import signal
 import subprocess
 import time
@@ -9,9 +8,7 @@ from pathlib import Path
 
 HERE = Path(__file__).resolve().parent
 TOP = HERE.parents[1]
-# What the daemon's synthetic camera is made of.
-CAMERA_SOURCES = ("src/capture/source/test_source.cpp", "src/capture/source/test_picture.cpp", "src/capture/source/device_id.cpp",
-                  "src/capture/gst/gst_handles.cpp", "src/support/format.cpp")
+BUILT = TOP / "build/release/tests/bench"
 X264 = re.compile(rb"x264 - core [^\0]*?options: ([^\0]+)\0")
 
 
@@ -132,24 +129,8 @@ def make_camera_file(picture, seconds, folder, environment):
     return path
 
 
-def compile_camera_plugin(folder):
-    """The daemon's synthetic camera as a plug-in for gst-launch-1.0. @return the plug-in's directory"""
-    compiler = shutil.which("c++") or shutil.which("g++") or shutil.which("clang++")
-    assert compiler, "a C++ compiler is needed for the peer's camera"
-    flags = subprocess.run(["pkg-config", "--cflags", "--libs", "gstreamer-1.0", "gstreamer-video-1.0"], check=True,
-                           capture_output=True, text=True).stdout.split()
-    directory = Path(folder) / "plugins"
-    directory.mkdir()
-    subprocess.run([compiler, "-std=c++20", "-O2", "-shared", "-fPIC", f"-I{TOP}", str(HERE / "test_camera_plugin.cpp"),
-                    *(str(TOP / source) for source in CAMERA_SOURCES), *flags, "-o", str(directory / "liblmxbench.so")],
-                   check=True)
-    return directory
-
-
-def compile_roundtrip(folder):
-    """The client and the echo server. @return the program"""
-    compiler = shutil.which("cc") or shutil.which("gcc") or shutil.which("clang")
-    assert compiler, "a C compiler is needed for the echo server"
-    program = Path(folder) / "roundtrip"
-    subprocess.run([compiler, "-O2", "-o", str(program), str(HERE / "roundtrip.c")], check=True)
-    return program
+def built(name):
+    """A peer that was built with the tests: the program `roundtrip`, or the directory `plugins` of the camera."""
+    path = BUILT / name
+    assert path.exists(), f"{path} is not built; scripts/build --tests release does that"
+    return path

@@ -1,0 +1,1 @@
+// Owns the precompiled headers, which all targets share; holds nothing itself.
