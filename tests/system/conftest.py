@@ -12,6 +12,7 @@ import pytest
 sys.path.insert(0, str(Path(__file__).resolve().parent))
 
 from harness.agent import Agent  # noqa: E402
+from harness.tunnel_server import TunnelServer  # noqa: E402
 
 ROOT = Path(__file__).resolve().parents[2]
 BINARY = Path(os.environ.get("LMX_BINARY", ROOT / "build/release/lmxagentd"))
@@ -21,6 +22,12 @@ LIMIT = 120  # seconds a test may take; a test says otherwise with @pytest.mark.
 
 def pytest_configure(config):
     config.addinivalue_line("markers", "limit(seconds): how long the test may take")
+    config.addinivalue_line("markers", "slow: waits for half a minute or more of wall-clock time")
+
+
+def pytest_collection_modifyitems(items):
+    """The slow ones first: begun last, one would keep a single worker busy while the others have nothing to do."""
+    items.sort(key=lambda item: item.get_closest_marker("slow") is None)
 
 
 @pytest.hookimpl(hookwrapper=True)
@@ -61,10 +68,16 @@ def registry(tmp_path_factory):
 
 
 @pytest.fixture
-def agent(request, registry):
+def binary():
+    """The daemon's program; a module that tests another one defines its own."""
+    return BINARY
+
+
+@pytest.fixture
+def agent(request, binary, registry):
     """A daemon's sandbox, not yet started."""
-    assert BINARY.exists(), f"{BINARY} is not built"
-    one = Agent(BINARY, registry)
+    assert binary.exists(), f"{binary} is not built"
+    one = Agent(binary, registry)
     yield one
     report, errors = one.report(), one.errors()
     one.close()
@@ -79,3 +92,12 @@ def agent(request, registry):
 def running(agent):
     """A daemon that answers on its local socket, with the synthetic camera and microphone."""
     return agent.start()
+
+
+@pytest.fixture
+def server(agent):
+    """A server that the running agent has said hello to."""
+    with TunnelServer(agent.prepare()) as one:
+        agent.start()
+        one.accept()
+        yield one

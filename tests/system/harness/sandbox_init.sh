@@ -29,5 +29,8 @@ printf '%s\n' "${LMX_MOUNTS:-}" | while read -r kind first second; do
 done
 ip link set lo up
 unset LMX_MOUNTS
+# Whoever wants to listen in this network before the daemon calls holds it back meanwhile.
+: >"$root/../ready"
+while [ -e "$root/../held" ]; do sleep 0.01; done
 # The shell stays as process 1 and reaps what the daemon leaves behind; its status is the daemon's.
 exec chroot "$root" /bin/sh -c 'cd /; "$@"; exit $?' sandbox "$@"

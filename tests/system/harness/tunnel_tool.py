@@ -1,5 +1,4 @@
 """lmx-tunnel as the server of a test: a well-behaved one, on the wire as people use it."""
-import os
 import queue
 import re
 import subprocess
@@ -7,6 +6,7 @@ import threading
 from pathlib import Path
 
 from .agent import SERVER_UUID
+from .sandbox import Program
 
 TOOL = Path(__file__).resolve().parents[3] / "build/release/lmx-tunnel"
 HELLO = re.compile(r"agent (?P<uuid>[^,]*), version (?P<version>\d+)(?P<offline>, going offline)?$")
@@ -15,10 +15,8 @@ HELLO = re.compile(r"agent (?P<uuid>[^,]*), version (?P<version>\d+)(?P<offline>
 def start_tool(agent, *arguments, **streams):
     """The program, inside the agent's network and with its secret."""
     secret = agent.path(f"/var/lmx/agent/secrets/{SERVER_UUID}.plist")
-    user = [] if os.geteuid() == 0 else ["--user", "--preserve-credentials"]
-    return subprocess.Popen(["nsenter", "--target", str(agent.sandbox.daemon_pid), *user, "--net", "--", str(TOOL),
-                             "--secret", str(secret), *arguments],
-                            stdout=subprocess.PIPE, stderr=subprocess.PIPE, text=True, **streams)
+    return Program([*agent.sandbox.entering("net"), str(TOOL), "--secret", str(secret), *arguments],
+                   stdout=subprocess.PIPE, stderr=subprocess.PIPE, text=True, **streams)
 
 
 class TunnelTool:
@@ -30,6 +28,12 @@ class TunnelTool:
         self._reader = threading.Thread(target=self._read, daemon=True)
         self._reader.start()
         assert self.line().startswith("listening on ")
+
+    def __enter__(self):
+        return self
+
+    def __exit__(self, *details):
+        self.close()
 
     def _read(self):
         for line in self._tool.stdout:
