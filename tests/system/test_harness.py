@@ -17,8 +17,9 @@ def picture(counter, width=320, height=180):
 
 def make_movie(path, numbers):
     frames = b"".join(picture(number) for number in numbers)
-    subprocess.run(["ffmpeg", "-v", "error", "-f", "rawvideo", "-pix_fmt", "gray", "-s", "320x180", "-r", "30", "-i", "-",
-                    "-c:v", "libx264", "-preset", "superfast", "-pix_fmt", "yuv420p", str(path)], input=frames, check=True)
+    subprocess.run(["ffmpeg", "-v", "error", "-f", "rawvideo", "-pix_fmt", "gray", "-s", "320x180", "-r", "30",
+                    "-i", "-", "-c:v", "libx264", "-preset", "superfast", "-pix_fmt", "yuv420p", str(path)],
+                   input=frames, check=True, timeout=60)
 
 
 def test_counters_are_read_back(tmp_path):
