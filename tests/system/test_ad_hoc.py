@@ -3,6 +3,7 @@ import os
 import re
 import signal
 
+import pytest
 from harness import movie
 from harness.agent import REPOSITORY
 from harness.sandbox import children_of
@@ -63,6 +64,7 @@ def test_a_recording_until_an_interrupt(running):
     assert not running.tool_calls(), "the submission was disabled"
 
 
+@pytest.mark.slow
 def test_a_stop_that_nobody_answers_is_said(running):
     mark = running.log.mark()
     with running.popen("-f", OUTPUT, "-s") as client:
