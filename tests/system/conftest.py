@@ -1,4 +1,4 @@
-"""Fixtures of the system tests: an agent in a sandbox, a watchdog, and a look at what is left behind."""
+"""Fixtures of the system tests: an agent in a sandbox, a server for it, and a watchdog over each test."""
 import faulthandler
 import os
 import re
@@ -26,7 +26,7 @@ def pytest_configure(config):
 
 
 def pytest_collection_modifyitems(items):
-    """The slow ones first: begun last, one would keep a single worker busy while the others have nothing to do."""
+    """Runs the slow tests first: started last, one would keep a worker busy while the others are done."""
     items.sort(key=lambda item: item.get_closest_marker("slow") is None)
 
 
@@ -42,7 +42,7 @@ class Hung(Exception):
 
 @pytest.fixture(autouse=True)
 def watchdog(request):
-    """Ends a test that hangs: first with an exception in it, and if that does not help with the whole run."""
+    """Ends a test that hangs with an exception, and if that does not help the whole run."""
     mark = request.node.get_closest_marker("limit")
     limit = mark.args[0] if mark else LIMIT
 
@@ -60,7 +60,7 @@ def watchdog(request):
 
 @pytest.fixture(scope="session")
 def registry(tmp_path_factory):
-    """GStreamer's catalogue of plugins, made once: without it every daemon would search them anew."""
+    """GStreamer's catalogue of plugins, made once: without it every daemon would search for them again."""
     path = tmp_path_factory.mktemp("gstreamer") / "registry.bin"
     subprocess.run(["gst-inspect-1.0", "fakesink"], env={**os.environ, "GST_REGISTRY": str(path)}, check=True,
                    stdout=subprocess.DEVNULL, timeout=120)
@@ -69,7 +69,7 @@ def registry(tmp_path_factory):
 
 @pytest.fixture
 def binary():
-    """The daemon's program; a module that tests another one defines its own."""
+    """The program under test. Modules that test another one override this."""
     return BINARY
 
 

@@ -1,4 +1,4 @@
-"""The cluster's members: asked of the tool, read from the cache, tried in turn."""
+"""Cluster members: queried with the tool, read from the cache, tried in turn."""
 import plistlib
 import time
 

@@ -1,4 +1,4 @@
-"""Recordings that the daemon could not end itself: killed, or ended in the middle of one."""
+"""Recordings that end without a STOP: the daemon is killed or told to end in the middle of one."""
 import re
 import signal
 import time

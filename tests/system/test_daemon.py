@@ -28,12 +28,12 @@ def test_start_and_orderly_end(agent):
 
 
 def notified(agent):
-    """What the agent wanted to tell the buses, in order: there is none in here, so each attempt is a debug line."""
+    """The notifications that the agent tried to send, in order. Without a bus each attempt leaves a debug line."""
     lines = agent.log.lines(r"^Notification com\.zandor\.lmxagentd\.\w+ was not sent on the \w+ bus", level=Level.DEBUG)
     return re.findall(r"lmxagentd\.(\w+) was not sent on the (\w+) bus", "\n".join(line.text for line in lines))
 
 
-def test_the_buses_are_told_of_start_and_end(running):
+def test_start_and_end_are_announced_on_the_buses(running):
     running.log.wait("started was not sent on the session bus", level=Level.DEBUG)
     assert notified(running) == [("started", "system"), ("started", "session")]
     assert running.stop() == 0
@@ -43,7 +43,7 @@ def test_the_buses_are_told_of_start_and_end(running):
 
 @pytest.mark.parametrize("arguments, status, printed", [
     (["-v"], 0, "\nLumex lmxagentd (version 100)\n\n"), (["-i", "nonsense"], 0, ""), (["-Q"], 64, None)])
-def test_the_tool_modes_say_goodbye_too(agent, arguments, status, printed):
+def test_the_tool_modes_log_their_end_too(agent, arguments, status, printed):
     agent.start(wait=False, arguments=arguments)
     assert agent.wait_exit() == status
     agent.log.wait("^lmxagentd stopped$", level=Level.INFO)
@@ -61,7 +61,7 @@ def test_stop_signals(running, number, text):
     running.log.wait(text, level=Level.DEBUG)
 
 
-def test_a_broken_pipe_is_nothing(running):
+def test_a_broken_pipe_does_not_end_the_daemon(running):
     running.sandbox.signal(signal.SIGPIPE)
     with running.connect() as peer:
         peer.sendall(b"STATUS\n")  # closed before the reply is read
@@ -81,7 +81,7 @@ def test_pause_and_resume_by_signals(running):
 
 
 def test_a_hang_up_cancels_and_opens_the_camera_again(running):
-    """What was recorded is kept as a recovered movie: nobody has asked for the recording to be thrown away."""
+    """What was recorded is kept as a recovered movie: nobody asked to discard it."""
     running.start_recording("HUP")
     running.let_record(1)
     mark = running.log.mark()
@@ -108,7 +108,7 @@ def test_a_stale_socket_and_pid_file_do_not_matter(running):
 
 
 def test_a_pid_file_that_may_not_be_written(agent):
-    """Without the right to override permissions, which root has otherwise."""
+    """Runs without the capability that would let root write it all the same."""
     path = agent.path("/var/run/lmxagentd.pid")
     path.write_text("old\n")
     path.chmod(0o444)
@@ -152,7 +152,7 @@ def test_ten_clients_one_after_another_while_recording(running):
             assert (record, stop, error) == (2, 0, 0)
             assert abs(begun - start.received) <= 1.5
             assert abs(hard_stop - (start.received + 5430)) <= 1.5
-            assert abs(elapsed - (reply.received - start.received)) <= 1.1
+            assert 2 <= elapsed <= reply.received - start.sent + 1
             peer.close()
     finally:
         for peer in peers:

@@ -1,4 +1,4 @@
-"""A minute of everything at once: recordings, pauses, cancels, status, preference changes, the tunnel, timed
+"""Everything at once, for a while: recordings, pauses, cancels, status, preference changes, the tunnel, timed
 commands, a slow tool.
 
 With the daemon built for ThreadSanitizer where there is one; a complaint of the sanitizer fails the test.
@@ -18,7 +18,7 @@ from harness.tunnel_server import TunnelServer
 from harness.waiting import let_pass
 
 TSAN_BINARY = ROOT / "build/tsan/lmxagentd"
-PATIENCE = 60  # seconds for what was begun to end
+PATIENCE = 60  # seconds that the threads may take to finish
 
 
 @pytest.fixture(params=["plain", "tsan"])
@@ -91,7 +91,7 @@ def test_everything_at_once(agent, binary, request):
     def guarded(work, *arguments):
         try:
             work(agent, end, *arguments)
-        except BaseException as failure:  # told by the main thread
+        except BaseException as failure:  # the main thread reports it
             failures.append(failure)
 
     server = TunnelServer(agent)

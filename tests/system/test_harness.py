@@ -1,4 +1,4 @@
-"""The readers of the harness, against material that is known: a reader that sees nothing would prove nothing."""
+"""The harness's readers against known material: a reader that finds nothing would prove nothing."""
 import subprocess
 
 import numpy

@@ -1,4 +1,4 @@
-"""What is installed beside the program: man page and completion know its options, and the sample can be used."""
+"""The installed files: man page and completion list the program's options, the sample preferences can be loaded."""
 import re
 import shutil
 import string
@@ -12,7 +12,7 @@ from conftest import ROOT
 def options(agent):
     """The options that the program takes."""
     letters = string.ascii_letters + string.digits
-    each = 'for option; do "$0" "$option" x -h; done'  # the help behind it ends the program at once
+    each = 'for option; do "$0" "$option" x -h; done'  # -h ends the program before it does anything
     refused = agent.run(*(f"-{letter}" for letter in letters), prefix=["sh", "-c", each]).stderr
     short = set(letters) - set(re.findall("invalid option -- '(.)'", refused))
     ambiguous = agent.run("--=").stderr  # an empty name abbreviates every long option: all are named
@@ -28,14 +28,14 @@ def complete(*words):
     return result.stdout.split()
 
 
-def test_the_man_page_knows_the_options(options):
+def test_the_man_page_lists_the_options(options):
     page = (ROOT / "packaging/lmxagentd.8").read_text().replace("\\-", "-")
     section = re.search(r"^\.SH OPTIONS$(.*?)^\.SH ", page, re.MULTILINE | re.DOTALL)[1]
     headings = " ".join(re.findall(r"^\.TP\n(.*)$", section, re.MULTILINE))
     assert set(re.findall(r"(?<![\w-])--?\w+", headings)) == options
 
 
-def test_the_completion_knows_the_options(options):
+def test_the_completion_lists_the_options(options):
     assert sorted(complete("lmxagentd", "")) == sorted(options)
 
 
@@ -51,7 +51,7 @@ def test_completion_of_paths(tmp_path):
 
 
 def test_the_sample_preferences_can_be_used(agent):
-    """But for its devices: what "Automatic" stands for depends on the machine."""
+    """All but its devices: what "Automatic" stands for depends on the machine."""
     sample = (ROOT / "packaging/com.zandor.lmxagentd.sample.plist").read_bytes()
     for device in (b"test://video", b"test://audio"):
         sample = sample.replace(b"<string>Automatic<", b"<string>" + device + b"<", 1)

@@ -131,9 +131,9 @@ def profile(agent):
 
 def test_a_replaced_file_is_noticed(running):
     running.preferences(CameraName="Hall 4")
-    wait_until(lambda: profile(running) == "Hall 4", 5, "the new name")
+    wait_until(lambda: profile(running) == "Hall 4", what="the new name")
     running.preferences(CameraName="Hall 5")
-    wait_until(lambda: profile(running) == "Hall 5", 5, "the next name")
+    wait_until(lambda: profile(running) == "Hall 5", what="the next name")
 
 
 def test_an_edit_in_place_is_noticed_but_not_read(running):
@@ -177,7 +177,7 @@ def test_an_old_preview_interval_is_converted(agent):
     assert "RecordingPreviewIntervalInSeconds" not in content
 
 
-def test_the_listener_port_is_told(agent):
+def test_the_listener_port_is_logged(agent):
     agent.preferences(TCPListenerPort="8170")
     agent.start()
     agent.log.wait("^TCP listener port: 8170$", level=Level.NOTICE)

@@ -1,4 +1,4 @@
-"""A day in the lecture hall, an hour pressed into seconds: what is left in the evening is what a model predicts."""
+"""A day in the lecture hall, compressed into a minute: what is left at its end must match a model's prediction."""
 import contextlib
 import time
 from dataclasses import dataclass, field
@@ -12,7 +12,7 @@ from harness.waiting import let_pass, wait_until
 
 @dataclass
 class Model:
-    """What an agent does with a sequence of events, by the rules of its operator's handbook."""
+    """Predicts which recordings are submitted and which are recovered."""
 
     submitted: list = field(default_factory=list)
     recovered: list = field(default_factory=list)
@@ -37,7 +37,7 @@ class Model:
 
 
 class Day:
-    """Schedules everything in the morning, lives through it, and keeps the model in step."""
+    """Schedules the lectures and keeps the model in step with what happens."""
 
     def __init__(self, agent):
         self.agent, self.server = agent, TunnelTool(agent.prepare())
@@ -60,7 +60,7 @@ class Day:
         self.events.append((stop, self.model.stop))
 
     def until(self, second):
-        """Lets the day go on; `second` lies between two events."""
+        """Waits until `second`, which lies between two events, and tells the model what has happened."""
         let_pass(max(0.0, self.begin + second - time.time()), "the day goes by the wall clock")
         for event in sorted((e for e in self.events if e[0] < second), key=lambda e: e[0]):
             event[1]()

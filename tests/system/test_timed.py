@@ -1,4 +1,4 @@
-"""Timed commands and deadlines: what happens while nobody looks."""
+"""Timed commands and deadlines: what happens with nobody connected."""
 import plistlib
 import time
 

@@ -26,7 +26,7 @@ def test_a_hanging_tool_holds_up_only_the_queue(running):
     running.wait_tool_call("A")
     running.record("B")
     reply = running.command("STATUS")
-    assert reply.fields["cmdStatus"] == "0" and reply.received - reply.sent < 1
+    assert reply.fields["cmdStatus"] == "0" and reply.received - reply.sent < 5
     let_pass(6, SCHEDULER)
     assert running.submitted() == ["A"]
     running.release_tool()

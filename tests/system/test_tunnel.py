@@ -1,4 +1,4 @@
-"""What goes through the server tunnel: the hello, commands and replies, and lines that are none."""
+"""What passes through the server tunnel: the hello, commands, replies, and lines that are no commands."""
 import base64
 import os
 import re

@@ -1,4 +1,4 @@
-"""The tunnel's connection: how it is lost, refused, made again and given up."""
+"""The tunnel's connection: losing it, being refused, reconnecting, taking leave."""
 import contextlib
 import os
 import signal
@@ -48,7 +48,7 @@ def ask_until_given_up(agent, server):
 def test_a_server_that_never_reads(agent):
     agent.prepare()
     small = "echo 4096 4096 16384 > /proc/sys/net/ipv4/tcp_wmem; echo 4096 4096 16384 > /proc/sys/net/ipv4/tcp_rmem"
-    in_network(agent, "sh", "-c", small)  # so that a few replies fill the way to the server
+    in_network(agent, "sh", "-c", small)  # a few replies fill the buffers
     with TunnelServer(agent) as server:
         agent.start()
         server.accept()

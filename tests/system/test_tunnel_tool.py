@@ -9,7 +9,7 @@ from harness.tunnel_tool import TOOL, TunnelTool, start_tool
 
 
 def listening_tool(agent, *arguments, **streams):
-    """The program, as soon as it listens. An agent that starts later finds it at once."""
+    """Starts the program and waits until it listens. An agent that starts later finds it at once."""
     tool = start_tool(agent, *arguments, **streams)
     assert tool.stdout.readline() == "listening on 127.0.0.1:8175\n"
     return tool
@@ -77,7 +77,7 @@ def test_a_preview_is_saved(with_preview, tmp_path):
     assert (tmp_path / "seen.jpg").read_bytes() == sent
 
 
-def test_a_preview_that_cannot_be_saved_is_said(with_preview, tmp_path):
+def test_a_preview_that_cannot_be_saved_is_reported(with_preview, tmp_path):
     (tmp_path / "commands").write_text("STATUS include_preview=true\n")
     script = str(tmp_path / "commands")
     with listening_tool(with_preview, "--script", script, "--preview", "/nowhere/seen.jpg") as tool:

@@ -86,8 +86,8 @@ class Agent:
     # Its life --------------------------------------------------------------------------------------------------
 
     def prepare(self, env=None, **sandbox_options):
-        """Makes the sandbox with its network, but holds the daemon back until start(): a server that listens by then
-        is found at once, one that comes later only five seconds after."""
+        """Sets up the sandbox with its network but holds the daemon back until start(). A server that listens by then
+        is reached at the first attempt, instead of five seconds later."""
         self.sandbox.prepare(env=self._environment(env), **sandbox_options)
         return self
 
@@ -104,7 +104,7 @@ class Agent:
         return self.sandbox.run(*arguments, env=self._environment(env), **options)
 
     def popen(self, *arguments, env=None):
-        """Starts it and lets it run."""
+        """Starts the program with `arguments` and does not wait for its end."""
         return self.sandbox.popen(arguments, env=self._environment(env))
 
     def _environment(self, env):
@@ -190,7 +190,7 @@ class Agent:
         wait_until(lambda: self.command("STATUS").fields["recordStatus"] == "0", 30, "an idle recorder")
 
     def record(self, uuid, seconds=1, **parameters):
-        """Makes a whole recording and waits for its movie. @return the replies to START and STOP"""
+        """Makes a recording from START to STOP and waits for its movie. @return the replies to START and STOP"""
         start = self.start_recording(uuid, **parameters)
         assert start.text == "cmdStatus=0", start.text
         self.let_record(seconds)
@@ -238,7 +238,7 @@ class Agent:
         return wait_until(called, timeout, f"submission of {uuid}; {self.log.tail(40)}")[0]
 
     def wait_recorded(self, uuid, timeout=30.0, after=0):
-        """The line that tells that the movie is in place. @return the seconds that it gives"""
+        """Waits for the line that reports the movie in place. @return the duration in it, seconds"""
         path = re.escape(f"{REPOSITORY}/{uuid}.mov")
         line = self.log.wait(rf'^"{path}" recording stopped \(duration: \d+s\)$', timeout, after, level=Level.NOTICE)
         return int(re.search(r"(\d+)s\)$", line.text)[1])

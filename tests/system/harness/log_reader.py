@@ -9,11 +9,11 @@ from enum import IntEnum
 from .log_socket import log_socket
 
 LINE = re.compile(r"^<(\d+)>.*?\blmxagentd\[(\d+)\]: (.*)$", re.DOTALL)
-DAEMON = 3  # the facility of daemons
+DAEMON = 3  # syslog's facility for daemons
 
 
 class Level(IntEnum):
-    """How grave a message is, as syslog counts. UNKNOWN: the message has no proper head."""
+    """Severity of a message, numbered as in syslog. UNKNOWN: the message has no valid header."""
 
     UNKNOWN = -1
     EMERGENCY = 0

@@ -1,4 +1,4 @@
-"""A datagram socket for a system log that loses nothing when its reader is held up for a while."""
+"""A datagram socket for the system log that loses no message when its reader is slow."""
 import ctypes
 import socket
 import threading
@@ -9,10 +9,10 @@ LENGTH = Path("/proc/sys/net/unix/max_dgram_qlen")
 
 
 def log_socket():
-    """A local datagram socket, not bound yet, that holds as many messages as its memory has room for.
+    """An unbound local datagram socket with room for more than a hundred messages.
 
-    How many may wait is decided when it is made, by the network namespace of the thread that makes it: ten, which a
-    starting daemon sends faster than a busy machine reads them. An ordinary user has to live with that.
+    The limit of queued messages, usually ten, comes from the network namespace of the thread that creates the socket.
+    A starting daemon sends ten faster than a busy machine reads them. Unprivileged users can't raise the limit.
     """
     made = []
     thread = threading.Thread(target=lambda: made.append(_in_namespace_of_its_own()))
@@ -23,7 +23,7 @@ def log_socket():
 
 
 def _in_namespace_of_its_own():
-    """Leaves the process's network with the calling thread only."""
+    """Creates the socket in a new network namespace, which only the calling thread enters."""
     if ctypes.CDLL(None).unshare(CLONE_NEWNET) == 0:
         LENGTH.write_text("4096")
     return socket.socket(socket.AF_UNIX, socket.SOCK_DGRAM)

@@ -1,5 +1,5 @@
 #!/usr/bin/python3
-"""Stands at /usr/bin/lumex: writes down its arguments and does what /var/tool/script.json says."""
+"""Stands in for /usr/bin/lumex: records its arguments and does what /var/tool/script.json says."""
 import json
 import os
 import sys
@@ -11,7 +11,7 @@ PLACE = os.environ.get("LMXAGENTD_ROOT", "") + "/var/tool"
 def script_for(arguments):
     """The last rule whose `when` is among the arguments; queries of the cluster fail unless a rule says otherwise.
 
-    A rule with `after` holds when there were at least so many calls with its `when`.
+    A rule with `after` applies after that many earlier calls with its `when`.
     """
     try:
         with open(PLACE + "/script.json", encoding="utf-8") as file:

@@ -20,7 +20,7 @@ HOST_COMMANDS = ("sh", "dash", "env", "python3", "sleep", "cat", "true", "false"
 
 
 class Program(subprocess.Popen):
-    """A program that does not outlive its block, so that a failed check in there does not wait for it."""
+    """A child process that is killed at the end of its block, so that a failed check inside does not wait for it."""
 
     def __exit__(self, *details):
         self.kill()
@@ -36,7 +36,8 @@ class Sandbox:
         self.base = Path(self._directory.name)
         self.root = self.base / "root"
         self.errors = self.base / "stderr.txt"
-        self._ready, self._held = self.base / "ready", self.base / "held"  # of sandbox_init.sh
+        self._ready = self.base / "ready"  # made by sandbox_init.sh when all is set up
+        self._held = self.base / "held"  # the daemon waits until it is gone
         self.process = None
         self._daemon = None
         self._lay_out()
@@ -62,7 +63,7 @@ class Sandbox:
             (self.root / "usr/bin" / name).symlink_to("/.hostbin/" + name)
 
     def prepare(self, **options):
-        """Makes everything that start() does, with its options, but holds the daemon back until start()."""
+        """Sets up everything, with the options of start(), but holds the daemon back until start()."""
         self._held.touch()
         self._launch(**options)
         wait_until(self._ready.exists, what="the sandbox")
@@ -100,14 +101,14 @@ class Sandbox:
                        stderr=subprocess.PIPE)
 
     def entering(self, *parts):
-        """The words in front of a command that make it run in these parts of the sandbox: "net" for its network,
-        others as nsenter names its options."""
+        """The prefix that runs a command in these parts of the sandbox: "net" for its network, others as nsenter names
+        its options."""
         user = [] if os.geteuid() == 0 else ["--user", "--preserve-credentials"]
         (init,) = children_of(self.process.pid)
         return ["nsenter", "--target", str(self.daemon_pid or init), *user, *(f"--{part}" for part in parts), "--"]
 
     def run(self, *arguments, timeout=30, **options):
-        """The same to its end. @return its status and what it said, as subprocess.run does"""
+        """Runs the program to its end. @return what subprocess.run returns"""
         with self.popen(arguments, **options) as process:
             output, errors = process.communicate(timeout=timeout)
         return subprocess.CompletedProcess(arguments, process.returncode, output.decode(), errors.decode())
@@ -139,8 +140,8 @@ class Sandbox:
         return int(next(l for l in status.splitlines() if l.startswith("NSpid:")).split()[-1])
 
     def path(self, inside):
-        """Where the host sees what the sandbox calls `inside`. Through the daemon while it runs, since a file
-        system mounted in there is not to be seen elsewhere."""
+        """The host's path of what the sandbox calls `inside`. Leads through the daemon while it runs, since file
+        systems mounted in there are visible nowhere else."""
         view = Path(f"/proc/{self.daemon_pid}/root") if self.daemon_pid else self.root
         if not view.exists():
             view = self.root

@@ -3,8 +3,8 @@ import tempfile
 
 
 def short_directory():
-    """A new directory right below /tmp, gone with its cleanup() or the end of its block.
+    """A new directory directly below /tmp, removed by cleanup() or at the end of its block.
 
-    Sockets lie below it, and the path of a socket has at most 107 bytes: pytest's tmp_path may be too long.
+    Sockets are made in it, and the path of a socket has at most 107 bytes: pytest's tmp_path may be too long.
     """
     return tempfile.TemporaryDirectory(prefix="lmx-", dir="/tmp")

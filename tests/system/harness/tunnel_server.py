@@ -76,7 +76,7 @@ class TunnelServer:
         return self.reply()
 
     def deaf(self):
-        """New connections find nobody; the one in hand stays."""
+        """Refuses new connections; the current one stays."""
         self._listener.close()
 
     def hang_up(self):
@@ -89,8 +89,8 @@ class TunnelServer:
 
 
 def in_network_of(agent, host, port):
-    """A socket that listens in the network namespace of the agent's sandbox. A helper enters it, since a thread
-    that did would take the whole test along, and hands the descriptor back."""
+    """A socket that listens in the network namespace of the agent's sandbox. A helper process enters it and hands the
+    descriptor back: a process with threads can't enter a user namespace."""
     ours, theirs = socket.socketpair(socket.AF_UNIX, socket.SOCK_STREAM)
     script = ("import socket, sys\n"
               "family = socket.AF_INET6 if ':' in sys.argv[1] else socket.AF_INET\n"

@@ -1,4 +1,4 @@
-"""lmx-tunnel as the server of a test: a well-behaved one, on the wire as people use it."""
+"""lmx-tunnel as the server of a test, driven as a person would."""
 import queue
 import re
 import subprocess
@@ -20,7 +20,7 @@ def start_tool(agent, *arguments, **streams):
 
 
 class TunnelTool:
-    """What a person at the program's prompt sees and types. Its answers are as the program decrypted them."""
+    """A running lmx-tunnel: what it prints and what a person types. Replies are as the program decrypted them."""
 
     def __init__(self, agent, *arguments):
         self._tool = start_tool(agent, *arguments, stdin=subprocess.PIPE)
@@ -73,7 +73,7 @@ class TunnelTool:
         return self.reply()
 
     def close(self):
-        self._tool.kill()  # with its connection, as a server that dies
+        self._tool.kill()  # the connection goes with it, as when a server dies
         self._tool.wait()
         self._reader.join()
         for stream in (self._tool.stdin, self._tool.stdout, self._tool.stderr):

@@ -1,4 +1,4 @@
-"""What was sent to the daemon and not read yet: a piece sent once the last one is read is a chunk of its own."""
+"""What was sent to the daemon but not read yet. A piece sent after the previous one was read is a chunk of its own."""
 import fcntl
 import socket
 import struct
@@ -10,16 +10,17 @@ from .waiting import wait_until
 
 def all_read(agent, peer):
     """Whether the daemon has read all that was sent on this local socket or IPv4 connection."""
-    unsent = struct.unpack("i", fcntl.ioctl(peer, termios.TIOCOUTQ, bytes(4)))[0]  # a local socket: also unread
+    unsent = struct.unpack("i", fcntl.ioctl(peer, termios.TIOCOUTQ, bytes(4)))[0]  # for a local socket: and unread
     return unsent == 0 and (peer.family == socket.AF_UNIX or _received(agent, peer) == 0)
 
 
 def wait_read(agent, peer, timeout=10.0):
-    wait_until(lambda: all_read(agent, peer), timeout, "the end of reading by the daemon", interval=0.001)
+    """Waits until the daemon has read all that was sent."""
+    wait_until(lambda: all_read(agent, peer), timeout, "the daemon reading what was sent", interval=0.001)
 
 
 def _received(agent, peer):
-    """The bytes that wait in the daemon's end of the connection; none when it has closed it."""
+    """How many bytes wait at the daemon's end of the connection; 0 once it has closed it."""
     ends = [_as_proc_shows(peer.getpeername()), _as_proc_shows(peer.getsockname())]
     for line in Path(f"/proc/{agent.sandbox.daemon_pid}/net/tcp").read_text().splitlines()[1:]:
         words = line.split()

@@ -1,4 +1,4 @@
-"""Waiting: for something to happen, with a limit, and the few waits that are about time itself."""
+"""Waiting for events under a time limit, and the few waits that are about wall-clock time itself."""
 import time
 
 
@@ -14,6 +14,6 @@ def wait_until(condition, timeout=10.0, what="the condition", interval=0.02):
 
 
 def let_pass(seconds, why):
-    """Lets wall-clock time pass, where no event can be waited for: `why` names what the time is for."""
+    """Lets wall-clock time pass where there is no event to wait for; `why` says what the time is for."""
     assert why
     time.sleep(seconds)
