@@ -25,9 +25,16 @@ def pytest_configure(config):
     config.addinivalue_line("markers", "slow: waits for half a minute or more of wall-clock time")
 
 
+@pytest.hookimpl(trylast=True)
 def pytest_collection_modifyitems(items):
-    """Runs the slow tests first: started last, one would keep a worker busy while the others are done."""
-    items.sort(key=lambda item: item.get_closest_marker("slow") is None)
+    """Puts the slow tests first, in turn for each worker: started last, one would be all that is still running."""
+    workers = int(os.environ.get("PYTEST_XDIST_WORKER_COUNT", 1))
+    share = max(len(items) // (4 * workers), 2)  # how many tests in a row xdist hands each worker at first
+    slow = [item for item in items if item.get_closest_marker("slow")]
+    items[:] = [item for item in items if item not in slow]
+    places = ((i % workers) * share + i // workers for i in range(len(slow)))
+    for place, item in sorted(zip(places, slow), key=lambda pair: pair[0]):
+        items.insert(place, item)
 
 
 @pytest.hookimpl(hookwrapper=True)

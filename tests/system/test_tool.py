@@ -7,17 +7,16 @@ SCHEDULER = "the scheduler looks for jobs every five seconds"
 
 
 def test_a_failing_tool(running):
-    running.set_tool({"when": "--submit", "exit": 3})
+    running.set_tool({"when": "A", "exit": 3})
     running.record("A")
+    running.record("B")
     running.log.wait(r"^Error: unable to submit job, /usr/bin/lumex exit code: 3$", level=Level.CRITICAL)
     running.log.wait(f'^An error occurred completing recording "{DEFAULTS["LumexURL"]}"$', level=Level.ERROR)
     running.log.wait("^An internal error occurred during agent post-processing$", level=Level.CRITICAL)
-    assert running.repository() == ["A.mov", "A.xml"]
-    assert not running.log.lines("^Post-process mechanism completed with success$")
-    running.set_tool()
-    running.record("B")
-    running.wait_tool_call("B")
-    assert running.submitted() == ["A", "B"], "nothing is tried again"
+    running.log.wait("^Post-process mechanism completed with success$")
+    assert running.submitted("end") == ["A", "B"], "nothing is tried again"
+    assert len(running.log.lines("^Post-process mechanism completed with success$")) == 1
+    assert running.repository() == ["A.mov", "A.xml", "B.mov", "B.xml"]
 
 
 def test_a_hanging_tool_holds_up_only_the_queue(running):
@@ -79,7 +78,7 @@ def test_a_workflow_needs_user_and_password(running):
     running.record("A", RecordingMetadata_ADHOC_WORKFLOW_UUID="W-1")
     running.log.wait("^Error: unable to submit job$", level=Level.CRITICAL)
     running.record("B", RecordingMetadata_ADHOC_WORKFLOW_UUID="W-1", RecordingMetadata_AGENT_USERNAME="ada",
-           RecordingMetadata_AGENT_PASSWORD="secret")
+                   RecordingMetadata_AGENT_PASSWORD="secret")
     wait_until(lambda: running.tool_calls(), 20, "the submission")
     assert running.tool_calls()[0]["arguments"] == [
         "--server", DEFAULTS["LumexURL"], "--submit", "--file", "/var/lmx/agent/recordings/B.mov",
