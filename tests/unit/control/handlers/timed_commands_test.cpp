@@ -138,14 +138,14 @@ TEST_F(TimedCommand, OffsetsAndLeapDaysAreUnderstood) {
 TEST_F(TimedCommand, AnEmptyListIsAnEmptyArray) {
   const std::string reply = run("TIMEDCMD command=TIMERLIST");
   ASSERT_TRUE(reply.starts_with("cmdStatus=0,timerlist=<?xml")) << reply;
-  EXPECT_EQ(parsePropertyList(reply.substr(22)).value, PlistValue(PlistArray()));
+  EXPECT_EQ(parsePropertyList(reply.substr(22)).value(), PlistValue(PlistArray()));
 }
 
 TEST_F(TimedCommand, TheListIsAPropertyListOfTheEntries) {
   run("TIMEDCMD command=STOP,time=" + in(60) + ",TimerID=A,RecordingMetadata_TITLE=Fish & Chips <1>");
   run("TIMEDCMD command=PAUSE,time=" + in(30) + ",TimerID=B");
   const std::string reply = run("TIMEDCMD command=TIMERLIST");
-  const PlistValue list = *parsePropertyList(reply.substr(22)).value;
+  const PlistValue list = *parsePropertyList(reply.substr(22)).value().value();
   EXPECT_EQ(list, PlistValue(
                       PlistArray{PlistDictionary{{"command", "STOP"},
                                                  {"time", in(60)},

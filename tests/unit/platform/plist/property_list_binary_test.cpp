@@ -107,7 +107,7 @@ TEST(BinaryPropertyList, SharedTextsAreCountedAsOftenAsTheyExpand) {
 }
 
 TEST(BinaryPropertyList, TenThousandValuesAreTheLimit) {
-  EXPECT_TRUE(parsePropertyList(binary({array(std::vector<std::uint64_t>(9999, 1)), kTrue})).value);
+  EXPECT_TRUE(parsePropertyList(binary({array(std::vector<std::uint64_t>(9999, 1)), kTrue})));
   EXPECT_EQ(problemOf(binary({array(std::vector<std::uint64_t>(10000, 1)), kTrue})),
             "more than 10000 values");
 }
@@ -119,7 +119,7 @@ TEST(BinaryPropertyList, SixtyFourLevelsAreTheLimit) {
     objects.push_back(kTrue);
     return binary(objects);
   };
-  EXPECT_TRUE(parsePropertyList(nested(64)).value);
+  EXPECT_TRUE(parsePropertyList(nested(64)));
   EXPECT_EQ(problemOf(nested(65)), "nested more than 64 levels");
 }
 
@@ -144,7 +144,7 @@ TEST(BinaryPropertyList, TextsHoldNoNul) {
   EXPECT_EQ(problemOf(binary({ascii(std::string("a\0b", 3))})), "a NUL character");
   EXPECT_EQ(problemOf(binary({std::string("\x62\x00\x61\x00\x00", 5)})), "a NUL character");
   EXPECT_EQ(problemOf(binary({dictionary({1, 2}), ascii(std::string(1, '\0')), kTrue})), "a NUL character");
-  EXPECT_EQ(parsePropertyList(binary({std::string("\x61\x01\x00", 3)})).value, PlistValue("\xC4\x80"));
+  EXPECT_EQ(parsePropertyList(binary({std::string("\x61\x01\x00", 3)})).value(), PlistValue("\xC4\x80"));
 }
 
 TEST(BinaryPropertyList, DatesMustFit) {

@@ -271,7 +271,7 @@ TEST(PropertyListFile, MissingFileIsNamedByItsError) {
   const TemporaryDirectory directory;
   const PlistResult result = readPropertyList(directory.file("none"));
   EXPECT_FALSE(result.value());
-  EXPECT_EQ(result.error().error().systemError, ENOENT);
+  EXPECT_EQ(result.error().systemError, ENOENT);
   EXPECT_EQ(result.error().message, "No such file or directory");
 }
 
@@ -279,7 +279,7 @@ TEST(PropertyListFile, BrokenFileIsNoSystemError) {
   const TemporaryDirectory directory;
   writeFile(directory.file("broken"), "text");
   const PlistResult result = readPropertyList(directory.file("broken"));
-  EXPECT_EQ(result.error().error().systemError, 0);
+  EXPECT_EQ(result.error().systemError, 0);
   EXPECT_EQ(result.error().message, "neither an XML nor a binary property list");
 }
 
