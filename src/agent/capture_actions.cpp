@@ -1,164 +1,160 @@
-// The actions that touch the capture. Main thread only.
-#include <ctime>
+// Driving the capture as commands and signals ask.
+#include "agent/capture_actions.h"
 
-#include "agent/agent_main.h"
+#include "capture/api/capture_framework.h"
+#include "model/codes.h"
+#include "model/metadata_keys.h"
 #include "platform/log.h"
-#include "record/engine.h"
+#include "record/prepare_capture.h"
 #include "record/preview_controller.h"
+#include "record/stop_capture.h"
 
 namespace lmx {
 
-bool AgentMain::perform(Action action, Wait wait) {
-  return loop_.post([this, action] { (this->*action)(); }, wait);
-}
-
-std::shared_ptr<LMRCaptureController> AgentMain::captureController() const {
+std::shared_ptr<LMRCaptureController> CaptureActions::captureController() const {
   const auto record = session();
-  return record ? record->captureController() : nullptr;
+  return record ? record->captureController.get() : nullptr;
 }
 
-void AgentMain::prepareCapture() {
-  context_->logDebug("Process prepareCapture");
-  const SharedDictionary properties = context_->properties();
-  context_->setStatus(kRecordNotRunning);  // what counts if this ends by an exception
-  context_->setStatus(LXAgentRecordPrepareCapture(
-      *context_, std::make_shared<const Dictionary>(properties ? *properties : Dictionary{})));
+void CaptureActions::prepareCapture() {
+  context_.logDebug("Process prepareCapture");
+  const SharedDictionary properties = context_.state.properties.get();
+  context_.state.status.set(kRecordNotRunning);  // what counts if this ends by an exception
+  context_.state.status.set(LXAgentRecordPrepareCapture(
+      context_, std::make_shared<const Dictionary>(properties ? *properties : Dictionary{})));
 }
 
-void AgentMain::startPreview() {
-  context_->logDebug("Process startPreview");
+void CaptureActions::startPreview() {
+  context_.logDebug("Process startPreview");
+  setPreviewRunning(true);
+}
+
+void CaptureActions::stopPreview() {
+  context_.logDebug("Process stopPreview");
+  setPreviewRunning(false);
+}
+
+void CaptureActions::setPreviewRunning(bool run) {
   const auto record = session();
-  if (const auto preview = record ? record->previewController() : nullptr)
-    preview->controller().startPreview();
-  context_->setStatus(0);
+  if (const auto preview = record ? record->previewController.get() : nullptr) {
+    run ? preview->controller().startPreview() : preview->controller().stopPreview();
+  }
+  context_.state.status.set(kRecordSuccess);
 }
 
-void AgentMain::stopPreview() {
-  context_->logDebug("Process stopPreview");
-  const auto record = session();
-  if (const auto preview = record ? record->previewController() : nullptr)
-    preview->controller().stopPreview();
-  context_->setStatus(0);
-}
-
-void AgentMain::pauseCapture() {
-  context_->logDebug("Process pauseCapture");
+void CaptureActions::pauseCapture() {
+  context_.logDebug("Process pauseCapture");
   const auto controller = captureController();
   if (!controller) return;
-  const bool wasRecording = controller->recordingState() == 3;
+  const bool wasRecording = controller->recordingState() == kCaptureRecording;
   controller->pauseRecording();
-  if (!wasRecording) return;
-  const auto record = session();
-  recordDidPauseWithFile(record->filename().value_or(""), record->metadata(),
-                         controller->elapsedTimeInMilliseconds() / 1000);
+  if (wasRecording) {
+    recordDidPauseWithFile(session()->filename.get().value_or(""),
+                           controller->elapsedTimeInMilliseconds() / 1000);
+  }
 }
 
-void AgentMain::resumeCapture() {
-  context_->logDebug("Process resumeCapture");
+void CaptureActions::resumeCapture() {
+  context_.logDebug("Process resumeCapture");
   const auto controller = captureController();
   if (!controller) return;
-  const bool wasPaused = controller->recordingState() == 4;
+  const bool wasPaused = controller->recordingState() == kCapturePaused;
   controller->resumeRecording();
-  if (!wasPaused) return;
-  const auto record = session();
-  recordDidResumeWithFile(record->filename().value_or(""), record->metadata());
+  if (wasPaused) recordDidResumeWithFile(session()->filename.get().value_or(""));
 }
 
-void AgentMain::stopCapture() {
-  context_->logDebug("Process stopCapture");
+void CaptureActions::stopCapture() {
+  context_.logDebug("Process stopCapture");
   stopOrCancelCapture(false);
 }
 
-void AgentMain::cancelCapture() {
-  context_->logDebug("Process cancelCapture");
+void CaptureActions::cancelCapture() {
+  context_.logDebug("Process cancelCapture");
   stopOrCancelCapture(true);
 }
 
-void AgentMain::stopOrCancelCapture(bool cancel) {
+void CaptureActions::stopOrCancelCapture(bool cancel) {
+  if (context_.options.adhoc.get()) return stopOrCancelAdHoc(cancel);
   const auto controller = captureController();
   const auto record = session();
-  if (context_->adhoc()) {
-    if (!record) return;
-    if (cancel) {
-      if (controller) controller->cancelRequestWithUUID(record->recording_uuid());
-      return;
-    }
-    if (controller) {
-      controller->setStopWithUUID(record->recording_uuid(),
-                                  secondsSinceReferenceDate() - context_->timeshift_seconds());
-    }
-    stopRecording();
-    return;
-  }
   const bool isFile =
-      record && record->status() != kRecorderIdle && record->recordedType() == kRecordingTypeFile;
+      record && record->status.get() != kRecorderIdle && record->recordedType() == kRecordingTypeFile;
   if (isFile && !cancel) {
     // No capture will report the end of a "File" recording: the engine's own stop does, and so makes its job.
     LXAgentRecordStopCapture(record);
   } else if (controller && !isFile) {
-    rememberStopped(controller);
+    submission_.rememberStopped(controller);
     cancel ? controller->cancelRecording() : controller->stopRecording();
   }
   setRecorderStatusToIdle();
-  context_->setStatus(0);
+  context_.state.status.set(kRecordSuccess);
 }
 
-void AgentMain::stopRecording() {
-  context_->logDebug("Process stopRecording");
+void CaptureActions::stopOrCancelAdHoc(bool cancel) {
+  const auto controller = captureController();
+  const auto record = session();
+  if (!record) return;
+  if (cancel) {
+    if (controller) controller->cancelRequestWithUUID(record->recording_uuid.get());
+    return;
+  }
+  if (controller) controller->setStopWithUUID(record->recording_uuid.get(), shiftedReferenceTime());
+  stopRecording();
+}
+
+void CaptureActions::stopRecording() {
+  context_.logDebug("Process stopRecording");
   if (!session()) return;
-  const SharedDictionary properties = context_->properties();
-  if (!lookUp(properties, "RecordingMetadata_ADHOC_FILE_PATH") &&
-      !lookUp(properties, "RecordingMetadata_RECORDING_UUID")) {
-    LMPLogMessage(context_->log_context(), kLogAlert,
+  const SharedDictionary properties = context_.state.properties.get();
+  if (!lookUp(properties, metadata_key::kAdHocFilePath) &&
+      !lookUp(properties, metadata_key::kRecordingUUID)) {
+    LMPLogMessage(context_.log_context(), kLogAlert,
                   "Recording canceled, missing RecordingMetadata_RECORDING_UUID.");
     return;
   }
-  const auto continuous = context_->continuous();
-  if (continuous && continuous->enabled) {
-    submitStoppedRecording();
-  } else if (!context_->adhoc()) {  // there stopCapture is what has called
+  if (context_.recording.isContinuous()) {
+    submission_.submitStoppedRecording();
+  } else if (!context_.options.adhoc.get()) {  // there stopCapture is what has called
     stopCapture();
   }
 }
 
-void AgentMain::setRecorderStatusToIdle() {
-  if (const auto record = session()) record->setStatus(kRecorderIdle);
+void CaptureActions::setRecorderStatusToIdle() {
+  if (const auto record = session()) record->status.set(kRecorderIdle);
 }
 
-void AgentMain::shutDownControl() {
-  context_->logDebug("Process shutDownControl");
-  cancelCapture();
-  if (context_->adhoc()) return;
-  closeTunnel();
-  context_->setLast_device_check(std::time(nullptr));
+double CaptureActions::shiftedReferenceTime() const {
+  return secondsSinceReferenceDate() - context_.state.timeshift_seconds.get();
 }
 
-void AgentMain::shutDownControlBecauseDeviceFailed() {
-  if (!context_->adhoc()) shouldDisplayOfflineMessage_ = true;
-  shutDownControl();
+void CaptureActions::pauseOrResume(bool pause) {
+  if (!context_.options.adhoc.get()) return pause ? pauseCapture() : resumeCapture();
+  const auto controller = captureController();
+  if (!controller) return;
+  const std::string uuid = session()->recording_uuid.get();
+  pause ? controller->setStopWithUUID(uuid, shiftedReferenceTime())
+        : controller->setStartWithUUID(uuid, shiftedReferenceTime(), context_.state.properties.get());
 }
 
-void AgentMain::recordDidStartWithFile(const std::string& file, const SharedDictionary& /*metadata*/,
-                                       std::optional<TimeValue> /*atTime*/) {
-  if (!context_->running()) return;
-  LMPLogMessage(context_->log_context(), kLogNotice, "\"%s\" recording started", file.c_str());
+void CaptureActions::recordDidStartWithFile(const std::string& file) const {
+  if (!context_.state.running.get()) return;
+  LMPLogMessage(context_.log_context(), kLogNotice, "\"%s\" recording started", file.c_str());
 }
 
-void AgentMain::recordDidPauseWithFile(const std::string& file, const SharedDictionary& /*metadata*/,
-                                       std::int64_t elapsedSeconds) {
-  if (!context_->running()) return;
-  LMPLogMessage(context_->log_context(), kLogNotice, "\"%s\" recording paused (current duration: %ds)",
+void CaptureActions::recordDidPauseWithFile(const std::string& file, std::int64_t elapsedSeconds) const {
+  if (!context_.state.running.get()) return;
+  LMPLogMessage(context_.log_context(), kLogNotice, "\"%s\" recording paused (current duration: %ds)",
                 file.c_str(), static_cast<int>(elapsedSeconds));
 }
 
-void AgentMain::recordDidResumeWithFile(const std::string& file, const SharedDictionary& /*metadata*/) {
-  if (!context_->running()) return;
-  LMPLogMessage(context_->log_context(), kLogNotice, "\"%s\" recording resumed", file.c_str());
+void CaptureActions::recordDidResumeWithFile(const std::string& file) const {
+  if (!context_.state.running.get()) return;
+  LMPLogMessage(context_.log_context(), kLogNotice, "\"%s\" recording resumed", file.c_str());
 }
 
-void AgentMain::recordRuntimeErrorCallback(int code) {
-  if (!context_->running()) return;
-  LMPLogMessage(context_->log_context(), kLogError, "An error occurred during recording (%d)", code);
+void CaptureActions::recordRuntimeErrorCallback(int code) const {
+  if (!context_.state.running.get()) return;
+  LMPLogMessage(context_.log_context(), kLogError, "An error occurred during recording (%d)", code);
 }
 
 }  // namespace lmx

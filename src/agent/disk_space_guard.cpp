@@ -1,12 +1,15 @@
-// The watch over the free space of the volume that movies are written to.
+// Measuring, freeing, stopping and starting again.
+#include "agent/disk_space_guard.h"
+
 #include <cerrno>
 #include <filesystem>
 #include <system_error>
 
-#include "agent/agent_main.h"
+#include "agent/recording_repository.h"
+#include "capture/api/capture_framework.h"
 #include "platform/log.h"
 #include "platform/paths.h"
-#include "record/engine.h"
+#include "record/disk_space.h"
 
 namespace lmx {
 namespace {
@@ -18,9 +21,8 @@ struct Measure {
 };
 
 Measure measure(const std::string& volume) {
-  Measure result;
-  result.megabytes = LXAgentFreeKilobytesAtPath(volume, &result.error) >> 10;
-  return result;
+  const VolumeSpace space = measureVolume(volume);
+  return {space.freeKilobytes >> 10, space.error};
 }
 
 void removeIfEmpty(const std::string& directory) {
@@ -43,25 +45,26 @@ Measure freeSpace(LMRCaptureController* controller, const std::string& volume, M
 
 }  // namespace
 
-void AgentMain::checkDiskSpace() {
-  const auto record = session();
+void DiskSpaceGuard::checkDiskSpace() {
+  const auto record = context_.record_context();
   if (!record) return;
-  std::string volume = record->volumePath();
+  std::string volume = volumePath(*record);
   Measure space = measure(volume);
   if (space.error == ENOENT) {
-    cancelCapture();
-    if (setupRecordingRepository()) {
-      volume = context_->recording_repository_path().value_or("");
+    capture_.cancelCapture();
+    const std::string repository = context_.recording.recording_repository_path.get().value_or("");
+    if (setupRecordingRepository(context_, repository)) {
+      volume = repository;
       space = measure(volume);
     }
   }
   if (space.error != 0) {
-    stopCapture();
-    context_->setRunning(false);
+    capture_.stopCapture();
+    context_.state.running.set(false);
     return;
   }
-  const std::uint32_t wanted = record->diskSpaceCutoffInMB();
-  const auto controller = captureController();
+  const std::uint32_t wanted = record->diskSpaceCutoffInMB.get();
+  const auto controller = capture_.captureController();
   space = freeSpace(controller.get(), volume, space, wanted);
   if (space.megabytes >= wanted) {
     recordAgainWithSpace(space.megabytes);
@@ -70,28 +73,27 @@ void AgentMain::checkDiskSpace() {
   }
 }
 
-void AgentMain::recordAgainWithSpace(std::uint64_t megabytes) {
-  const auto continuous = context_->continuous();
-  if (!continuous || !continuous->enabled) return;
-  const auto controller = captureController();
+void DiskSpaceGuard::recordAgainWithSpace(std::uint64_t megabytes) {
+  if (!context_.recording.isContinuous()) return;
+  const auto controller = capture_.captureController();
   if (controller && !controller->hasShutDown()) return;
   shouldDisplayNoDiskSpaceMessage_ = true;
   LMPLogMessage(nullptr, kLogNotice, "%llu MB is sufficient, starting recorder",
                 static_cast<unsigned long long>(megabytes));
-  session()->clearPassedDeadlines();
-  prepareCapture();
+  context_.record_context()->stop_times.clearPassedDeadlines();
+  capture_.prepareCapture();
 }
 
-void AgentMain::stopForLackOfSpace(std::uint64_t megabytes, std::uint32_t wanted) {
+void DiskSpaceGuard::stopForLackOfSpace(std::uint64_t megabytes, std::uint32_t wanted) {
   if (shouldDisplayNoDiskSpaceMessage_) {
     LMPLogMessage(nullptr, kLogWarning,
                   "%llu MB is below threshold %u MB, unable to free space, recording disabled",
                   static_cast<unsigned long long>(megabytes), wanted);
     shouldDisplayNoDiskSpaceMessage_ = false;
   }
-  const auto controller = captureController();
+  const auto controller = capture_.captureController();
   const auto capture = controller ? controller->session() : nullptr;
-  if (capture && capture->isRunning()) stopCapture();
+  if (capture && capture->isRunning()) capture_.stopCapture();
 }
 
 }  // namespace lmx

@@ -1,11 +1,9 @@
-// Commands sorted by their date, and the turn of the main loop that runs them.
+// Commands sorted by their date.
 #include "agent/schedule.h"
 
 #include <algorithm>
 #include <iterator>
 #include <utility>
-
-#include "agent/agent_main.h"
 
 namespace lmx {
 namespace {
@@ -32,38 +30,6 @@ std::optional<std::time_t> Schedule::next() const {
   const std::lock_guard lock(mutex_);
   if (commands_.empty()) return std::nullopt;
   return commands_.front().date;
-}
-
-void AgentMain::scheduleTimedCommand(SharedDictionary entry, std::time_t date, ChannelKind channel) {
-  schedule_.add({std::move(entry), date, channel});
-  loop_.post([] {}, Wait::no);  // the loop may be asleep past that date
-}
-
-void AgentMain::loadSchedule() { channelOf(ChannelKind::tunnel).loadTimedCommands(); }
-
-void AgentMain::runDueCommands(std::time_t now) {
-  for (const Schedule::Command& command : schedule_.takeDue(now)) {
-    try {
-      channelOf(command.channel).completeTimedCommand(command.entry);
-    } catch (const std::exception& problem) {  // the commands behind it are still to run
-      LMPLogMessage(context_->log_context(), kLogCritical, "A timed command failed: %s", problem.what());
-    }
-  }
-}
-
-std::chrono::milliseconds AgentMain::timeToNextCommand(std::chrono::milliseconds atMost) const {
-  const auto next = schedule_.next();
-  const auto now = currentTime();
-  if (!next || !now) return atMost;
-  const TimeValue date{*next, 0};
-  return std::clamp(std::chrono::milliseconds(lmp_diff_timeval(&date, &*now) + 1),
-                    std::chrono::milliseconds(0), atMost);
-}
-
-AgentControlBase& AgentMain::channelOf(ChannelKind kind) {
-  if (kind == ChannelKind::tunnel && agentControl_) return *agentControl_;
-  if (kind == ChannelKind::local && agentControlLocal_) return *agentControlLocal_;
-  return detached_;
 }
 
 }  // namespace lmx

@@ -1,37 +1,36 @@
-// The end of an agent whose configuration can't work.
+// Disabling the service, with the fallback.
+#include "agent/service_disable.h"
+
 #include <unistd.h>
 
 #include <cstdio>
 
-#include "agent/agent_main.h"
+#include "agent/agent_environment.h"
+#include "model/codes.h"
 #include "platform/log.h"
 
 namespace lmx {
-
 namespace {
 
-constexpr int kExitConfiguration = 78;
-constexpr int kExitOperatingSystem = 71;
-
 /// Threads are running: no destructor may.
-[[noreturn]] void endProcess(int status) {
+[[noreturn]] void endProcess(ProcessEnd end) {
   std::fflush(nullptr);
-  _exit(status);
+  _exit(exitStatus(end));
 }
 
 }  // namespace
 
-void AgentMain::disableService() {
+void disableService(ServiceManager& manager) {
   LMPLogMessage(nullptr, kLogNotice, "Disabling lmxagentd with keeperd...");
-  if (environment_.serviceManager->authorize()) {
-    const auto error = environment_.serviceManager->disable(kServiceJob);
-    if (!error) endProcess(kExitConfiguration);
+  if (manager.authorize()) {
+    const auto error = manager.disable(kServiceJob);
+    if (!error) endProcess(ProcessEnd::misconfigured);
     LMPLogMessage(nullptr, kLogCritical, "Unable to disable lmxagentd. KeeperToggle: error: %s\n",
                   error->c_str());
   }
   LMPLogMessage(nullptr, kLogCritical, "Removing job from keeperd.");
-  environment_.serviceManager->runShellCommand("/bin/keeperctl -1 remove com.zandor.lmxagentd");
-  endProcess(kExitOperatingSystem);
+  manager.runShellCommand("/bin/keeperctl -1 remove com.zandor.lmxagentd");
+  endProcess(ProcessEnd::operatingSystem);
 }
 
 }  // namespace lmx

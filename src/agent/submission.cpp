@@ -1,34 +1,37 @@
-// The way of a stopped recording: movie, properties document, job.
-#include "agent/agent_main.h"
+// From the end of a capture to the queue.
+#include "agent/submission.h"
+
+#include "capture/api/capture_framework.h"
+#include "model/agent_actions.h"
+#include "model/codes.h"
+#include "model/metadata_keys.h"
 #include "platform/log.h"
 #include "platform/work_queue.h"
 #include "postprocess/agent_submit.h"
 #include "record/capture_delegate.h"
-#include "record/engine.h"
+#include "record/stop_capture.h"
 
 namespace lmx {
 namespace {
 
-constexpr const char* kUuidKey = "RecordingMetadata_RECORDING_UUID";
-
 SharedDictionary withUuid(const SharedDictionary& metadata, const std::optional<std::string>& uuid) {
   Dictionary all = metadata ? *metadata : Dictionary{};
-  if (uuid) all[kUuidKey] = *uuid;
+  if (uuid) all[metadata_key::kRecordingUUID] = *uuid;
   return std::make_shared<const Dictionary>(std::move(all));
 }
 
 /// The START parameters of what `stopped` recorded.
 SharedDictionary propertiesOf(const AgentContext& context, const AgentRecord& stopped) {
-  const SharedDictionary own = stopped.request_properties();
-  return own ? own : context.properties();
+  const SharedDictionary own = stopped.request_properties.get();
+  return own ? own : context.state.properties.get();
 }
 
 /// What describes it. A START that was refused meanwhile has taken over the request, and with it what is
 /// submitted; the metadata may still be those of the first.
 SharedDictionary metadataOf(const AgentContext& context, const AgentRecord& stopped) {
-  if (SharedDictionary own = stopped.request_properties()) return own;
-  SharedDictionary prepared = stopped.metadata();
-  return prepared ? prepared : context.properties();
+  if (SharedDictionary own = stopped.request_properties.get()) return own;
+  SharedDictionary prepared = stopped.metadata.get();
+  return prepared ? prepared : context.state.properties.get();
 }
 
 TimeValue timeValueFrom(double secondsSinceReference) {
@@ -51,25 +54,30 @@ class CountedDown {
 
 }  // namespace
 
-void AgentMain::rememberStopped(const std::shared_ptr<LMRCaptureController>& controller) {
-  if (reported_.lock() == controller) return;
-  stopped_.try_emplace(controller.get(), session()->copy());
+bool Submission::isIdle() const {
+  return hand_offs_ == 0 && context_->post_process_list.postProcessListCount() == 0 && !scheduler_.busy();
 }
 
-std::shared_ptr<AgentRecord> AgentMain::takeStopped(const void* controller) {
+void Submission::rememberStopped(const std::shared_ptr<LMRCaptureController>& controller) {
+  if (reported_.lock() == controller) return;
+  stopped_.try_emplace(controller.get(), context_->record_context()->copy());
+}
+
+std::shared_ptr<AgentRecord> Submission::takeStopped(const void* controller) {
   std::shared_ptr<AgentRecord> stopped;
   const auto found = stopped_.find(controller);
   if (found != stopped_.end()) {
     stopped = std::move(found->second);
     stopped_.erase(found);
-  } else if (const auto record = session(); record && record->captureController().get() == controller) {
+  } else if (const auto record = context_->record_context();
+             record && record->captureController.get().get() == controller) {
     stopped = record->copy();
   }
-  if (stopped) reported_ = stopped->captureController();
+  if (stopped) reported_ = stopped->captureController.get();
   return stopped;
 }
 
-void AgentMain::captureDidComplete(const void* controller) {
+void Submission::captureDidComplete(const void* controller) {
   ++hand_offs_;
   const bool posted = loop_.post(
       [this, controller] {
@@ -83,132 +91,137 @@ void AgentMain::captureDidComplete(const void* controller) {
   if (!posted) --hand_offs_;
 }
 
-void AgentMain::captureDidCancel(const void* controller) {
+void Submission::captureDidCancel(const void* controller) {
   loop_.post(
       [this, controller] {
         const auto stopped = takeStopped(controller);
-        const auto record = session();
-        if (record && record->captureController().get() == controller) setRecorderStatusToIdle();
+        const auto record = context_->record_context();
+        if (record && record->captureController.get().get() == controller) actions_.setRecorderStatusToIdle();
         if (!stopped) return;
-        dispatchAsync(WorkPriority::background, [this, capture = stopped->captureController()] {
+        dispatchAsync([this, capture = stopped->captureController.get()] {
           if (capture) keepRecovered(capture->recoverAbandonedRequests());
         });
       },
       Wait::no);
 }
 
-void AgentMain::submitStoppedRecording() {
+void Submission::submitStoppedRecording() {
   ++hand_offs_;
-  if (const auto record = session()) {
+  if (const auto record = context_->record_context()) {
     submit(record->copy());
   } else {
     --hand_offs_;
   }
 }
 
-void AgentMain::submit(const std::shared_ptr<AgentRecord>& stopped) {
+void Submission::submit(const std::shared_ptr<AgentRecord>& stopped) {
   context_->logDebug("Submitting Stopped Recording");
-  const auto controller = stopped->captureController();
-  const double elapsed = controller ? controller->elapsedTimeForRequestWithUUID(stopped->request_uuid()) : 0;
+  const auto controller = stopped->captureController.get();
+  const double elapsed =
+      controller ? controller->elapsedTimeForRequestWithUUID(stopped->request_uuid.get()) : 0;
   const SharedDictionary properties = propertiesOf(*context_, *stopped);
-  const auto uuid = lookUp(properties, kUuidKey);
-  const std::string path =
-      lookUp(properties, "RecordingMetadata_ADHOC_FILE_PATH")
-          .value_or(context_->recording_repository_path().value_or("") + "/" + uuid.value_or("") + ".mov");
-  stopped->setMetadata(withUuid(metadataOf(*context_, *stopped), uuid));
-  stopped->setStartTime(stopped->beginning());
-  dispatchAsync(WorkPriority::background, [this, stopped, path, elapsed] {
+  const auto uuid = lookUp(properties, metadata_key::kRecordingUUID);
+  const std::string repository = context_->recording.recording_repository_path.get().value_or("");
+  const std::string path = lookUp(properties, metadata_key::kAdHocFilePath)
+                               .value_or(repository + "/" + uuid.value_or("") + ".mov");
+  stopped->metadata.set(withUuid(metadataOf(*context_, *stopped), uuid));
+  stopped->startTime.set(stopped->beginning());
+  dispatchAsync([this, stopped, path, elapsed] {
     const CountedDown end_of_hand_off(hand_offs_);
     handOff(stopped, path, elapsed);
   });
 }
 
-void AgentMain::handOff(const std::shared_ptr<AgentRecord>& stopped, const std::string& path,
-                        double elapsed) {
-  const auto controller = stopped->captureController();
-  if (!controller) return;
+/// The session, unless it has gone on to another capture.
+std::shared_ptr<AgentRecord> Submission::sessionOf(const LMRCaptureController* controller) const {
+  auto record = context_->record_context();
+  return record && record->captureController.get().get() == controller ? record : nullptr;
+}
+
+void Submission::leaveError(const LMRCaptureController* controller) {
+  if (const auto record = sessionOf(controller)) record->error.set(kRecordCannotWrite);
+}
+
+void Submission::handOff(const std::shared_ptr<AgentRecord>& stopped, const std::string& path,
+                         double elapsed) {
+  const auto controller = stopped->captureController.get();
   // An agent that is ending leaves the recording to the next start, which makes movie and document together.
-  if (!context_->running()) return;
-  const std::string request = stopped->request_uuid();
-  const auto error = controller->processRequestWithUUID(request, path);
-  // The session, unless it has gone on to another capture.
-  const auto own_session = [&]() -> std::shared_ptr<AgentRecord> {
-    auto record = session();
-    return record && record->captureController() == controller ? record : nullptr;
-  };
-  const auto leave_error = [&] {
-    if (const auto record = own_session()) record->setError(kRecordCannotWrite);
-  };
-  if (const auto cause = controller->lastError()) {
+  if (!controller || !context_->state.running.get()) return;
+  const bool settled = finishMovie(stopped, *controller, path, elapsed);
+  if (!context_->state.running.get()) return;
+  // A movie or a document that could not be written stays in the capture's journal: the next start tries
+  // again.
+  if (settled) {
+    controller->requestHandedOver(stopped->request_uuid.get());
+    keepRecovered(controller->recoverAbandonedRequests());
+  }
+  if (sessionOf(controller.get())) actions_.setRecorderStatusToIdle();
+}
+
+bool Submission::finishMovie(const std::shared_ptr<AgentRecord>& stopped, LMRCaptureController& controller,
+                             const std::string& path, double elapsed) {
+  const auto error = controller.processRequestWithUUID(stopped->request_uuid.get(), path);
+  if (const auto cause = controller.lastError()) {
     LMPLogMessage(context_->log_context(), kLogError, "The capture of \"%s\" ended early: %s", path.c_str(),
                   cause->message.c_str());
     // A lost device has its own way; what is left is a disk or an encoder that failed.
-    if (!meansDeviceLost(cause)) leave_error();
+    if (!meansDeviceLost(cause)) leaveError(&controller);
   }
-  bool documented = true;
   if (!error) {
-    stopped->setStopTime(shiftedNow(*context_));
-    documented = announceStop(stopped, path, stopped->metadata(), stopped->startTime(),
-                              static_cast<std::int64_t>(elapsed), stopped->stopTime(), false);
-  } else {
-    LMPLogMessage(context_->log_context(), kLogCritical, "The recording could not be finished: %s",
-                  error->message.c_str());
-    recordRuntimeErrorCallback(kRecordCannotWrite);
-    leave_error();
+    stopped->stopTime.set(shiftedNow(*context_));
+    return announceStop(stopped, path, stopped->metadata.get(), stopped->startTime.get(),
+                        static_cast<std::int64_t>(elapsed), stopped->stopTime.get(), false);
   }
-  if (context_->running()) {
-    // A movie or a document that could not be written stays in the capture's journal: the next start tries
-    // again.
-    if (documented && (!error || error->code == kNoMedia)) {
-      controller->requestHandedOver(request);
-      keepRecovered(controller->recoverAbandonedRequests());
-    }
-    if (own_session()) setRecorderStatusToIdle();
-  }
+  LMPLogMessage(context_->log_context(), kLogCritical, "The recording could not be finished: %s",
+                error->message.c_str());
+  actions_.recordRuntimeErrorCallback(kRecordCannotWrite);
+  leaveError(&controller);
+  return error->code == kNoMedia;
 }
 
-void AgentMain::recordDidStopWithFile(const std::shared_ptr<AgentRecord>& session, const std::string& file,
-                                      const SharedDictionary& metadata, std::optional<TimeValue> atTime,
-                                      std::int64_t elapsedSeconds, std::optional<TimeValue> stoppedTime,
-                                      bool canceled) {
-  static_cast<void>(announceStop(session, file, metadata, atTime, elapsedSeconds, stoppedTime, canceled));
+bool Submission::wantsSubmission(const SharedDictionary& properties) const {
+  return !context_->options.adhoc.get() && !context_->options.submit_disabled.get() &&
+         lookUp(properties, metadata_key::kAdHocSubmitDisabled) != "1";
 }
 
-bool AgentMain::announceStop(const std::shared_ptr<AgentRecord>& session, const std::string& file,
-                             const SharedDictionary& metadata, std::optional<TimeValue> atTime,
-                             std::int64_t elapsedSeconds, std::optional<TimeValue> stoppedTime,
-                             bool canceled) {
-  if (!context_->running()) return true;
+bool Submission::announceStop(const std::shared_ptr<AgentRecord>& session, const std::string& file,
+                              const SharedDictionary& metadata, Time atTime, std::int64_t elapsedSeconds,
+                              Time stoppedTime, bool canceled) {
+  if (!context_->state.running.get()) return true;
   LMPLogMessage(context_->log_context(), kLogNotice, "\"%s\" recording stopped (duration: %ds)", file.c_str(),
                 static_cast<int>(elapsedSeconds));
   const SharedDictionary properties = propertiesOf(*context_, *session);
-  if (context_->adhoc() || context_->submit_disabled() ||
-      lookUp(properties, "RecordingMetadata_ADHOC_SUBMIT_DISABLED") == "1") {
-    return true;
-  }
+  if (!wantsSubmission(properties)) return true;
   auto job = std::make_shared<AgentSubmit>();
-  job->setRecord(session->copy());
-  if (const auto workflow = lookUp(properties, "RecordingMetadata_ADHOC_WORKFLOW_UUID")) {
-    job->setAdhoc_workflow_uuid(workflow);
-  }
+  job->recorded = session->copy();
+  job->adhoc_workflow_uuid = lookUp(properties, metadata_key::kAdHocWorkflowUUID);
   job->setPropertyValuesWithContext(context_, file, atTime, stoppedTime, elapsedSeconds, metadata, canceled);
   if (job->writeProperties() != 0) {
     LMPLogMessage(context_->log_context(), kLogCritical,
                   "Internal error occurred in did stop with success callback");
-    context_->setRunning(false);
+    context_->state.running.set(false);
     return true;
   }
   const bool documented = job->documented();
-  context_->postProcessListAddJob(std::move(job));
+  context_->post_process_list.postProcessListAddJob(std::move(job));
   return documented;
 }
 
-void AgentMain::keepRecovered(const std::vector<RecoveredRecording>& recordings) {
+void Submission::recoverUnfinishedRecordings(std::shared_ptr<CaptureFramework> framework) {
+  const auto repository = context_->recording.recording_repository_path.get();
+  if (!repository) return;
+  // On a worker: a long recording may have to be copied, and the agent is to be commanded meanwhile.
+  dispatchAsync([this, repository, framework = std::move(framework)] {
+    keepRecovered(framework->recoverUnfinished(*repository));
+  });
+}
+
+void Submission::keepRecovered(const std::vector<RecoveredRecording>& recordings) {
   for (const RecoveredRecording& recording : recordings) {
     AgentSubmit document;
     auto record = std::make_shared<AgentRecord>();
-    record->setRecordingType(recording.recordingType);
-    document.setRecord(record);
+    record->recordingType.set(recording.recordingType);
+    document.recorded = record;
     document.setPropertyValuesWithContext(
         context_, recording.path, timeValueFrom(recording.startTime), timeValueFrom(recording.stopTime),
         static_cast<std::int64_t>(recording.duration), recording.parameters, false);

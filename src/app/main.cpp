@@ -3,6 +3,7 @@
 
 #include <cstdio>
 
+#include "capture/api/capture_framework.h"
 #include "capture/framework.h"
 #include "cli/process.h"
 

@@ -2,12 +2,11 @@
 #pragma once
 #include <string>
 
-#include "model/agent_context.h"
-#include "model/codes.h"
+#include "model/run_options.h"
 
 namespace lmx {
 
-/// The command line for the context's request, with its line feed. Values are put in as they are.
-std::string adHocCommand(const AgentContext& context);
+/// The command line for the request in `options`, with its line feed. Values are put in as they are.
+std::string adHocCommand(const RunOptions& options);
 
 }  // namespace lmx

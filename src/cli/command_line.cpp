@@ -1,35 +1,25 @@
-// The options of the command line.
+// Reading options with getopt.
+#include "cli/command_line.h"
+
 #include <getopt.h>
 
 #include <cstdio>
-#include <cstring>
 #include <ctime>
-#include <exception>
+#include <optional>
+#include <string>
 
-#include "agent/agent_main.h"
-#include "cli/adhoc_command.h"
+#include "agent/agent_environment.h"
+#include "cli/information.h"
 #include "cli/preference_tools.h"
-#include "platform/log.h"
+#include "cli/usage.h"
+#include "model/codes.h"
 #include "support/date_text.h"
 #include "support/scan.h"
+#include "support/time_value.h"
 #include "support/utf8.h"
 
 namespace lmx {
-
-/// What the options ask of the tools that change the preferences file. The texts are argv's.
-struct AgentMain::ToolRequest {
-  bool durationGiven = false;
-  int number = 0;  ///< of the last -d or -Z that could be read: a later one that can't repeats it
-  const char* server = nullptr;
-  const char* previewPath = nullptr;
-  const char* testPath = nullptr;
-};
-
 namespace {
-
-constexpr int kExitUsage = 64;
-constexpr int kExitSoftware = 70;
-constexpr int kExitOperatingSystem = 71;
 
 constexpr const char* kShortOptions = "c:d:f:hHi:p:st:u:vZ:";
 constexpr option kLongOptions[] = {{"unattended_minutes", required_argument, nullptr, 'Z'},
@@ -46,152 +36,100 @@ constexpr option kLongOptions[] = {{"unattended_minutes", required_argument, nul
 /// The date that lies `delay` (seconds, positive) ahead, as timers write it.
 std::optional<std::string> dateAfter(const char* delay) {
   const auto seconds = scanReal(delay);
-  const auto now = currentTime();
+  const auto now = lmp_gettimeofday();
   // Beyond ten thousand years no calendar can tell the date.
   if (!now || !seconds || !(*seconds > 0) || *seconds > 1e11) return std::nullopt;
   const double begin = static_cast<double>(now->tv_sec) + static_cast<double>(now->tv_usec) * 1e-6;
   return dateText(static_cast<std::time_t>(begin + *seconds));
 }
 
-void printContext(const char* kind, const std::shared_ptr<LMRRecordingContext>& context) {
-  std::fputs("\n", stdout);
-  const std::string text = context ? describe(*context) : "(null)";
-  LMPLogMessage(nullptr, kLogNotice, "Got recording context (with %s): %s", kind, text.c_str());
-  std::fprintf(stderr, "Got recording context (with %s): %s\n", kind, text.c_str());
-  std::fputs("\n", stdout);
-}
-
-/// @return the exit code.
-int printInformation(const std::string& kind, const std::shared_ptr<CaptureFramework>& framework) {
-  try {
-    if (kind == "ad-hoc-prefs") {
-      printContext("ad-hoc-prefs", AgentPreferences::newRecordingContextForAdHoc(framework));
-      AgentPreferences::dumpAdHoc();
-    } else if (kind == "daemon-prefs") {
-      printContext("daemon-prefs", AgentPreferences::newRecordingContextForDaemon(framework));
-      AgentPreferences::dumpDaemon();
-    } else if (kind == "zq-device-list") {
-      std::fputs(framework->deviceInformation().c_str(), stdout);
-    }
-  } catch (const std::exception& error) {
-    LMPLogMessage(nullptr, kLogCritical, "Exception caught: %s", error.what());
-    std::fprintf(stderr, "Exception caught: %s\n", error.what());
-    return kExitSoftware;
-  }
-  return 0;
-}
-
 }  // namespace
 
-std::string AgentMain::toolNameFromPathArg(const char* argument) {
-  const char* slash = argument == nullptr ? nullptr : std::strrchr(argument, '/');
-  return slash != nullptr ? slash + 1 : argument != nullptr ? argument : "";
-}
-
-void AgentMain::usageForTool(const std::string& tool) {
-  const char* name = tool.c_str();
-  std::fprintf(stderr, "\n%s (version %.0f)\n\n", name, kVersion);
-  std::fprintf(
-      stderr,
-      "usage: %s [-dhsv] [-i [ad-hoc-prefs | daemon-prefs | zq-device-list]] [-f file_output_path]\n\n",
-      name);
-  std::fputs(
-      "\t    -h (help usage)\n"
-      "\t    -v (print version and application validity)\n"
-      "\t    -d (duration in seconds of an ad-hoc recording)\n"
-      "\t    -i (print the requested type of information)\n"
-      "\t    -s (disables submission post-process step, enabled by default)\n"
-      "\t    -f file_output_path (runs an ad-hoc capture on this machine)\n",
-      stderr);
-  std::fprintf(stderr, "\nexample: %s -s\n\n", name);
-}
-
-bool AgentMain::parseArgs(char* const* argv, int count, int* exitCode) {
+bool CommandLine::parseArgs(char* const* argv, int count, int* exitCode) {
   int code = 0;
   const bool goOn = readOptions(argv, count, code);
   if (exitCode != nullptr) *exitCode = code;
   return goOn;
 }
 
-bool AgentMain::readOptions(char* const* argv, int count, int& exitCode) {
-  const std::string tool = toolNameFromPathArg(count > 0 ? argv[0] : nullptr);
-  ToolRequest request;
+bool CommandLine::readOptions(char* const* argv, int count, int& exitCode) {
   optind = 0;  // GNU's way to begin anew
   opterr = 1;
   for (int option = 0; (option = getopt_long(count, argv, kShortOptions, kLongOptions, nullptr)) != -1;) {
-    if (takeToolOption(option, request) || takeAdHocOption(option)) continue;
-    exitCode = stopAtOption(option, tool);
+    if (takeToolOption(option) || takeAdHocOption(option)) continue;
+    exitCode = exitStatus(stopAtOption(option, count > 0 ? argv[0] : nullptr));
     return false;
   }
-  if (!combinationAllowed(request)) {
-    exitCode = kExitUsage;
+  if (!combinationAllowed()) {
+    exitCode = exitStatus(ProcessEnd::usage);
     return false;
   }
-  if (request.testPath == nullptr && request.previewPath == nullptr) return true;
-  exitCode = runTools(request);
+  if (test_path_ == nullptr && preview_path_ == nullptr) return true;
+  exitCode = runTools();
   return false;
 }
 
-int AgentMain::stopAtOption(int option, const std::string& tool) {
+ProcessEnd CommandLine::stopAtOption(int option, const char* program) {
   switch (option) {
     case 'f':
       std::fputs("The -f option requires a path in UTF-8\n", stderr);
-      return kExitOperatingSystem;
+      return ProcessEnd::operatingSystem;
     case 'i':
-      return printInformation(optarg, environment_.framework);
+      return printInformation(optarg, framework_);
     case 'v':
       std::fprintf(stderr, "\nLumex lmxagentd (version %.0f)\n\n", kVersion);
-      return 0;
+      return ProcessEnd::orderly;
     default:
-      usageForTool(tool);
-      return option == 'h' || option == 'H' ? 0 : kExitUsage;
+      usageForTool(toolNameFromPathArg(program));
+      return option == 'h' || option == 'H' ? ProcessEnd::orderly : ProcessEnd::usage;
   }
 }
 
-bool AgentMain::takeToolOption(int option, ToolRequest& request) {
+bool CommandLine::takeToolOption(int option) {
   switch (option) {
     case 'c':
-      request.server = optarg;
+      server_ = optarg;
       return true;
     case 'd':
-      request.durationGiven = true;
-      request.number = scanInteger(optarg).value_or(request.number);
-      context_->setDuration(request.number);
+      duration_given_ = true;
+      number_ = scanInteger(optarg).value_or(number_);
+      options_.duration.set(number_);
       return true;
     case 'p':
-      request.previewPath = optarg;
+      preview_path_ = optarg;
       return true;
     case 's':
-      context_->setSubmit_disabled(true);
+      options_.submit_disabled.set(true);
       return true;
     case 't':
-      request.testPath = optarg;
+      test_path_ = optarg;
       return true;
     case 'Z':
-      request.number = scanInteger(optarg).value_or(request.number);
-      context_->setUnattended(request.number);
+      number_ = scanInteger(optarg).value_or(number_);
+      options_.unattended.set(number_);
       return true;
     default:
       return false;
   }
 }
 
-bool AgentMain::takeAdHocOption(int option) {
-  const auto ask = [this](AdHocRequest type) {
-    context_->setAdhoc(true);
-    context_->setAdhoc_request_type(type);
-  };
+void CommandLine::ask(AdHocRequest request) {
+  options_.adhoc.set(true);
+  options_.adhoc_request_type.set(request);
+}
+
+bool CommandLine::takeAdHocOption(int option) {
   switch (option) {
     case 'f':
       if (!isUtf8(optarg)) return false;
-      context_->setAdhoc(true);
-      context_->setAdhoc_output_file(optarg);
+      options_.adhoc.set(true);
+      options_.adhoc_output_file.set(optarg);
       return true;
     case 'u':
-      context_->setUser(optarg);
+      options_.user.set(optarg);
       return true;
     case 'P':
-      context_->setPassword(optarg);
+      options_.password.set(optarg);
       return true;
     case 'S':
       ask(kAdHocStatus);
@@ -201,40 +139,39 @@ bool AgentMain::takeAdHocOption(int option) {
       return true;
     case 'R':
       ask(kAdHocTimerRevoke);
-      context_->setTimer_id(optarg);
+      options_.timer_id.set(optarg);
       return true;
     case 'T':
-      context_->setStart_timer(optarg);
+      options_.start_timer.set(optarg);
       return true;
     case 'U':
-      if (const auto start = dateAfter(optarg)) context_->setStart_timer(start);
+      if (const auto start = dateAfter(optarg)) options_.start_timer.set(start);
       return true;
     default:
       return false;
   }
 }
 
-bool AgentMain::combinationAllowed(const ToolRequest& request) const {
-  if (request.durationGiven && !context_->adhoc()) {
+bool CommandLine::combinationAllowed() const {
+  if (duration_given_ && !options_.adhoc.get()) {
     std::fputs("The -d option only applies to ad-hoc mode (requires a file path)\n", stderr);
     return false;
   }
-  if (!context_->user() && context_->adhoc() && !context_->submit_disabled() &&
-      context_->adhoc_request_type() == kAdHocRecording) {
+  if (!options_.user.get() && options_.adhoc.get() && !options_.submit_disabled.get() &&
+      options_.adhoc_request_type.get() == kAdHocRecording) {
     std::fputs("A user name is required for ad-hoc file submission.\n", stderr);
     return false;
   }
   return true;
 }
 
-int AgentMain::runTools(const ToolRequest& request) {
-  if (request.testPath != nullptr) {
-    const auto user = context_->user();
-    const int status = bindTestCamera(request.testPath, user ? user->c_str() : nullptr, request.server,
-                                      *environment_.children);
+int CommandLine::runTools() {
+  if (test_path_ != nullptr) {
+    const auto user = options_.user.get();
+    const int status = bindTestCamera(test_path_, user ? user->c_str() : nullptr, server_, children_);
     if (status != 0) return status;
   }
-  return request.previewPath == nullptr ? 0 : setPreviewPath(request.previewPath);
+  return preview_path_ == nullptr ? 0 : setPreviewPath(preview_path_);
 }
 
 }  // namespace lmx

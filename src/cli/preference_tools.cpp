@@ -7,18 +7,16 @@
 #include <string>
 
 #include "cli/bind_command.h"
+#include "model/codes.h"
 #include "platform/directories.h"
 #include "platform/paths.h"
 #include "platform/plist/property_list.h"
+#include "prefs/adhoc_defaults.h"
 #include "prefs/agent_preferences.h"
 
 namespace lmx {
 namespace {
 
-constexpr int kExitUsage = 64;
-constexpr int kExitOperatingSystem = 71;
-constexpr int kExitCannotCreate = 73;
-constexpr int kExitProtocol = 76;
 constexpr int kShellNotFound = 127;
 constexpr int kShellNotExecutable = 126;
 constexpr int kShellSignalled = 128;
@@ -29,9 +27,9 @@ bool given(const char* argument) { return argument != nullptr && *argument != '\
 /// another name first. @return nothing when that failed.
 std::optional<PlistDictionary> loadToChange(const std::string& path) {
   PlistResult file = readPropertyList(path);
-  if (file.value && file.value->dictionary() != nullptr) return *file.value->dictionary();
-  if (file.systemError == ENOENT) return AgentPreferences::adHocDefaults();
-  const std::string problem = file.value ? "its top level is not a dictionary" : file.problem;
+  if (file && file->dictionary() != nullptr) return *file->dictionary();
+  if (!file && file.error().systemError == ENOENT) return adHocDefaults();
+  const std::string problem = file ? "its top level is not a dictionary" : file.error().message;
   const std::string copy = keepUnderAnotherName(path);
   if (copy.empty()) {
     std::fprintf(stderr, "The preferences file %s can't be used (%s) nor kept under another name (%s)\n",
@@ -41,20 +39,20 @@ std::optional<PlistDictionary> loadToChange(const std::string& path) {
   std::fprintf(stderr,
                "The preferences file %s can't be used: %s. It is kept as %s; defaults take its place.\n",
                path.c_str(), problem.c_str(), copy.c_str());
-  return AgentPreferences::adHocDefaults();
+  return adHocDefaults();
 }
 
 /// @return the exit status
 int changePreferences(const PlistDictionary& always, const PlistDictionary& whereAbsent) {
   const std::string path = systemPath(kPreferencesFile);
   auto preferences = loadToChange(path);
-  if (!preferences) return kExitCannotCreate;
+  if (!preferences) return exitStatus(ProcessEnd::cannotCreate);
   for (const auto& [key, value] : always) preferences->insert_or_assign(key, value);
   preferences->insert(whereAbsent.begin(), whereAbsent.end());
   if (const int error = writePropertyList(path, std::move(*preferences))) {
     std::fprintf(stderr, "The preferences file %s could not be written: %s\n", path.c_str(),
                  std::strerror(error));
-    return kExitCannotCreate;
+    return exitStatus(ProcessEnd::cannotCreate);
   }
   return 0;
 }
@@ -94,7 +92,7 @@ int runBindTool(std::vector<std::string> words, ChildRunner& children, std::stri
   const int status = shellStatus(result);
   if (status < 0) {
     std::fputs("Error: unable to run the `lmx --bind` command\n", stderr);
-    return kExitOperatingSystem;
+    return exitStatus(ProcessEnd::operatingSystem);
   }
   if (status != 0) std::fprintf(stderr, "Error: camera binding failed with exit status %d\n", status);
   output = result.output.c_str();  // up to a first NUL
@@ -106,19 +104,19 @@ int runBindTool(std::vector<std::string> words, ChildRunner& children, std::stri
 int setPreviewPath(const char* path) {
   if (!given(path)) {
     std::fputs("The -p option requires a file path\nUsage: lmxagentd -p <file-path.jpg>\n", stderr);
-    return kExitUsage;
+    return exitStatus(ProcessEnd::usage);
   }
   return changePreferences({{"PreviewPath", std::string(path)}}, {});
 }
 
 int bindTestCamera(const char* path, const char* user, const char* server, ChildRunner& children) {
-  if (!allGiven(path, user, server)) return kExitUsage;
+  if (!allGiven(path, user, server)) return exitStatus(ProcessEnd::usage);
   std::string output;
   if (const int status = runBindTool(bindCommand(user, server), children, output)) return status;
   const auto bound = boundCamera(output);
   if (!bound) {
     std::fprintf(stderr, "Error: unexpected result from `lmx --bind`: %s\n", output.c_str());
-    return kExitProtocol;
+    return exitStatus(ProcessEnd::protocol);
   }
   std::printf("camera UUID: %s\nserver UUID: %s\n", bound->cameraUUID.c_str(), bound->serverUUID.c_str());
   return changePreferences({{"RecordingType", "File"}, {"RecordingPath", std::string(path)}},

@@ -7,15 +7,16 @@
 #include <memory>
 
 #include "agent/agent_main.h"
+#include "capture/api/capture_framework.h"
+#include "cli/adhoc_client.h"
+#include "cli/command_line.h"
+#include "model/codes.h"
 #include "platform/log.h"
 #include "platform/notifications.h"
 #include "platform/paths.h"
-#include "support/heap_ptr.h"
 
 namespace lmx {
 namespace {
-
-constexpr int kExitOperatingSystem = 71;
 
 std::shared_ptr<ServiceManager> newServiceManager() {
   return systemPath("").empty() ? newSystemServiceManager() : newPrivateServiceManager();
@@ -23,19 +24,24 @@ std::shared_ptr<ServiceManager> newServiceManager() {
 
 int runAgent(int argc, char** argv, std::shared_ptr<CaptureFramework> framework) {
   // The character type alone: numbers in replies must keep their decimal point.
-  if (std::setlocale(LC_CTYPE, "C.UTF-8") == nullptr) return kExitOperatingSystem;
+  if (std::setlocale(LC_CTYPE, "C.UTF-8") == nullptr) return exitStatus(ProcessEnd::operatingSystem);
   // Never destroyed: it lives until the process ends.
   static AgentMain& agent =
       *std::make_unique<AgentMain>(
            newAgentContext(),
            AgentEnvironment{std::move(framework), newServiceManager(), &systemChildRunner()})
            .release();
-  const heap_ptr<TimeValue> launched(lmp_gettimeofday());
-  if (!launched) return kExitOperatingSystem;
-  agent.agentContext()->setLaunch_time(*launched);
-  agent.agentContext()->setRunning(true);
+  const auto launched = lmp_gettimeofday();
+  if (!launched) return exitStatus(ProcessEnd::operatingSystem);
+  agent.agentContext()->state.launch_time.set(*launched);
+  agent.agentContext()->state.running.set(true);
+  const AgentEnvironment& environment = agent.environment();
+  RunOptions& options = agent.agentContext()->options;
   int exitCode = 0;
-  return agent.parseArgs(argv, argc, &exitCode) ? agent.startup() : exitCode;
+  if (!CommandLine(options, *environment.framework, *environment.children).parseArgs(argv, argc, &exitCode)) {
+    return exitCode;
+  }
+  return options.adhoc.get() ? AdHocClient(agent).startupAdHoc() : agent.startupDaemon();
 }
 
 }  // namespace

@@ -1,7 +1,9 @@
 // The keys of recording parameters and of the properties document that the agent itself reads or writes.
 #pragma once
 
-namespace lmx::metadata {
+#include "model/codes.h"
+
+namespace lmx::metadata_key {
 
 inline constexpr const char* kRecordingUUID = "RecordingMetadata_RECORDING_UUID";
 inline constexpr const char* kMaxRecordingMinutes = "RecordingMetadata_MAX_RECORDING_MINUTES";
@@ -27,4 +29,4 @@ inline constexpr const char* kAudioSampleRate = "RecordingMetadata_AUDIO_SAMPLE_
 inline constexpr const char* kAudioInput = "RecordingMetadata_AUDIO_INPUT";
 inline constexpr const char* kMediaExtension = "RecordingMetadata_DATA_MEDIA_EXTENSION";
 
-}  // namespace lmx::metadata
+}  // namespace lmx::metadata_key

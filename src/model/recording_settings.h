@@ -1,25 +1,20 @@
 // What the preferences set in the recording session; the rest of the session lies in record/.
 #pragma once
-#include <atomic>
 #include <cstdint>
+
+#include "model/codes.h"
+#include "support/shared_value.h"
 
 namespace lmx {
 
-/// Thread-safe.
-class RecordingSettings {
- public:
-  [[nodiscard]] std::int32_t recordingType() const { return recordingType_; }
-  void setRecordingType(std::int32_t v) { recordingType_ = v; }
-  /// Minimum free space on the movie's volume for a start, megabytes.
-  [[nodiscard]] std::uint32_t diskSpaceCutoffInMB() const { return diskSpaceCutoffInMB_; }
-  void setDiskSpaceCutoffInMB(std::uint32_t v) { diskSpaceCutoffInMB_ = v; }
+/// Fields are thread-safe.
+struct RecordingSettings {
+  SharedValue<std::int32_t> recordingType{kRecordingTypeNone};
+  SharedValue<std::uint32_t>
+      diskSpaceCutoffInMB;  ///< free space on the movie's volume that a start needs, megabytes
 
  protected:
   ~RecordingSettings() = default;
-
- private:
-  std::atomic<std::int32_t> recordingType_{0};
-  std::atomic<std::uint32_t> diskSpaceCutoffInMB_{0};
 };
 
 }  // namespace lmx

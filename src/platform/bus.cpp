@@ -53,21 +53,15 @@ void BusClose::operator()(GDBusConnection* bus) const {
   g_object_unref(bus);
 }
 
-BusConnection connectToBus(GBusType type, const BusTimeLimit& limit, std::string* problem) {
+Result<BusConnection> connectToBus(GBusType type, const BusTimeLimit& limit) {
   const auto address = type == G_BUS_TYPE_SYSTEM ? systemBusAddress() : sessionBusAddress();
-  if (!address) {
-    *problem = "there is none";
-    return nullptr;
-  }
+  if (!address) return Error{"there is none"};
   constexpr auto kFlags = static_cast<GDBusConnectionFlags>(G_DBUS_CONNECTION_FLAGS_AUTHENTICATION_CLIENT |
                                                             G_DBUS_CONNECTION_FLAGS_MESSAGE_BUS_CONNECTION);
   GError* error = nullptr;
   BusConnection bus(
       g_dbus_connection_new_for_address_sync(address->c_str(), kFlags, nullptr, limit.cancellable(), &error));
-  if (!bus) {
-    *problem = takeMessage(error);
-    return nullptr;
-  }
+  if (!bus) return Error{takeMessage(error)};
   // The end of the bus must not be the end of the agent.
   g_dbus_connection_set_exit_on_close(bus.get(), FALSE);
   return bus;

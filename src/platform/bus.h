@@ -7,6 +7,7 @@
 #include <string>
 #include <thread>
 
+#include "support/result.h"
 #include "support/unique_fd.h"
 
 namespace lmx {
@@ -37,9 +38,9 @@ struct BusClose {
 /// A connection of our own, not the one that the library shares: closed with its owner.
 using BusConnection = std::unique_ptr<GDBusConnection, BusClose>;
 
-/// Connects to the system or the session bus. Never starts a bus. Null with `problem` set when there is none
-/// or it does not answer in time.
-BusConnection connectToBus(GBusType type, const BusTimeLimit& limit, std::string* problem);
+/// Connects to the system or the session bus. Never starts a bus. Fails when there is none or it does not
+/// answer in time.
+Result<BusConnection> connectToBus(GBusType type, const BusTimeLimit& limit);
 
 /// Moves the message out of `error`, which may be null, and frees it.
 std::string takeMessage(GError* error);

@@ -107,4 +107,23 @@ bool NetworkWatcher::takeChanges() {
   }
 }
 
+namespace {
+
+struct NetworkWatch final : RunLoop::Source {
+  NetworkWatcher watcher;
+  std::unique_ptr<RunLoop::Source> source;  // last: it goes before the descriptor
+};
+
+}  // namespace
+
+std::unique_ptr<RunLoop::Source> watchNetwork(RunLoop& loop, std::function<void()> changed) {
+  auto watch = std::make_unique<NetworkWatch>();
+  if (watch->watcher.open() != 0) return nullptr;
+  watch->source = loop.watchReadable(watch->watcher.descriptor(),
+                                     [&watcher = watch->watcher, changed = std::move(changed)] {
+                                       if (watcher.takeChanges()) changed();
+                                     });
+  return watch;
+}
+
 }  // namespace lmx

@@ -1,10 +1,13 @@
 // Watches the IPv4 addresses of all network interfaces (rtnetlink, RFC 3549).
 #pragma once
 #include <cstdint>
+#include <functional>
+#include <memory>
 #include <set>
 #include <string_view>
 #include <utility>
 
+#include "platform/run_loop.h"
 #include "support/unique_fd.h"
 
 namespace lmx {
@@ -30,5 +33,10 @@ class NetworkWatcher {
   UniqueFd socket_;
   std::set<InterfaceAddress> known_;
 };
+
+/// Has `changed` called on the thread of `loop` whenever an address comes or goes, for as long as the result
+/// lives.
+/// @return null when the network can't be watched
+std::unique_ptr<RunLoop::Source> watchNetwork(RunLoop& loop, std::function<void()> changed);
 
 }  // namespace lmx

@@ -25,13 +25,12 @@ std::optional<std::string> emitSignal(GBusType type, const std::string& name) {
   const std::string member = memberName(name);
   if (g_dbus_is_member_name(member.c_str()) == FALSE) return "not a name for a signal";
   const BusTimeLimit limit;
-  std::string problem;
-  const BusConnection bus = connectToBus(type, limit, &problem);
-  if (!bus) return problem;
+  const auto bus = connectToBus(type, limit);
+  if (!bus) return bus.error().message;
   GError* error = nullptr;
-  const bool sent = g_dbus_connection_emit_signal(bus.get(), nullptr, kObjectPath, kInterface, member.c_str(),
-                                                  nullptr, &error) != FALSE &&
-                    g_dbus_connection_flush_sync(bus.get(), limit.cancellable(), &error) != FALSE;
+  const bool sent = g_dbus_connection_emit_signal(bus->get(), nullptr, kObjectPath, kInterface,
+                                                  member.c_str(), nullptr, &error) != FALSE &&
+                    g_dbus_connection_flush_sync(bus->get(), limit.cancellable(), &error) != FALSE;
   if (!sent) return takeMessage(error);
   return std::nullopt;
 }

@@ -1,4 +1,4 @@
-// "started" and "stopped" told to the rest of the machine.
+// Announces start and stop over D-Bus.
 #pragma once
 #include <string>
 

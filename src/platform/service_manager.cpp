@@ -31,20 +31,19 @@ constexpr Method managerMethod(const char* name) {
 }
 
 /// Calls on a connection of its own, connecting and answering together within the bus's time limit.
-Variant call(const Method& method, GVariant* floating_arguments, std::string* problem) try {
+Result<Variant> call(const Method& method, GVariant* floating_arguments) try {
   const Variant arguments(floating_arguments == nullptr ? nullptr : g_variant_ref_sink(floating_arguments));
   const BusTimeLimit limit;
-  const BusConnection bus = connectToBus(G_BUS_TYPE_SYSTEM, limit, problem);
-  if (!bus) return nullptr;
+  auto bus = connectToBus(G_BUS_TYPE_SYSTEM, limit);
+  if (!bus) return std::move(bus).error();
   GError* error = nullptr;
   Variant reply(g_dbus_connection_call_sync(
-      bus.get(), method.service, method.path, method.interface, method.name, arguments.get(), nullptr,
+      bus->get(), method.service, method.path, method.interface, method.name, arguments.get(), nullptr,
       G_DBUS_CALL_FLAGS_NO_AUTO_START, static_cast<int>(kBusLimit.count()), limit.cancellable(), &error));
-  if (!reply) *problem = takeMessage(error);
+  if (!reply) return Error{takeMessage(error)};
   return reply;
 } catch (const std::exception& error) {  // no thread for the time limit
-  *problem = error.what();
-  return nullptr;
+  return Error{error.what()};
 }
 
 class SystemdServiceManager : public ServiceManager {
@@ -52,34 +51,30 @@ class SystemdServiceManager : public ServiceManager {
   bool authorize() override {
     constexpr Method kHasOwner{"org.freedesktop.DBus", "/org/freedesktop/DBus", "org.freedesktop.DBus",
                                "NameHasOwner"};
-    std::string problem;
-    const Variant reply = call(kHasOwner, g_variant_new("(s)", kService), &problem);
+    const auto reply = call(kHasOwner, g_variant_new("(s)", kService));
     if (!reply) {
-      LMPLogMessage(nullptr, kLogDebug, "The service manager can't be reached: %s", problem.c_str());
+      LMPLogMessage(nullptr, kLogDebug, "The service manager can't be reached: %s",
+                    reply.error().message.c_str());
       return false;
     }
     gboolean owned = FALSE;
-    g_variant_get(reply.get(), "(b)", &owned);
+    g_variant_get(reply->get(), "(b)", &owned);
     return owned != FALSE;
   }
 
   std::optional<std::string> disable(const std::string& job) override {
     const std::string unit = unitOf(job);
     const char* units[] = {unit.c_str(), nullptr};
-    std::string problem;
-    if (!call(managerMethod("DisableUnitFiles"), g_variant_new("(^asb)", units, FALSE), &problem))
-      return problem;
-    if (!call(managerMethod("Reload"), nullptr, &problem)) return problem;
-    return std::nullopt;
+    auto reply = call(managerMethod("DisableUnitFiles"), g_variant_new("(^asb)", units, FALSE));
+    if (reply) reply = call(managerMethod("Reload"), nullptr);
+    return reply ? std::nullopt : std::optional(reply.error().message);
   }
 
   bool isEnabled(const std::string& job) override {
-    std::string problem;
-    const Variant reply =
-        call(managerMethod("GetUnitFileState"), g_variant_new("(s)", unitOf(job).c_str()), &problem);
-    if (!reply || !g_variant_is_of_type(reply.get(), G_VARIANT_TYPE("(s)"))) return false;
+    const auto reply = call(managerMethod("GetUnitFileState"), g_variant_new("(s)", unitOf(job).c_str()));
+    if (!reply || !g_variant_is_of_type(reply->get(), G_VARIANT_TYPE("(s)"))) return false;
     const char* state = nullptr;
-    g_variant_get(reply.get(), "(&s)", &state);
+    g_variant_get(reply->get(), "(&s)", &state);
     return std::string(state).starts_with("enabled");  // "enabled-runtime" too
   }
 

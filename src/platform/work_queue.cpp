@@ -18,13 +18,8 @@
 namespace lmx {
 namespace {
 
-class Pool;
-thread_local const Pool* pool_of_this_thread = nullptr;
-
 class Pool {
  public:
-  explicit Pool(WorkPriority priority) : priority_(priority) {}
-
   void add(std::function<void()> item) {
     {
       const std::lock_guard lock(mutex_);
@@ -38,8 +33,6 @@ class Pool {
     }
     runGuarded(item);
   }
-
-  [[nodiscard]] bool ownsThisThread() const { return pool_of_this_thread == this; }
 
  private:
   static constexpr std::size_t kMaximumWorkers = 4;
@@ -55,12 +48,10 @@ class Pool {
     }
   }
 
-  void prepareThread() const {
-    pool_of_this_thread = this;
-    const bool background = priority_ == WorkPriority::background;
-    pthread_setname_np(pthread_self(), background ? "lmx-background" : "lmx-work");
+  static void prepareThread() {
+    pthread_setname_np(pthread_self(), "lmx-background");
     // Linux takes a thread's identifier here. Without the right to do it the work is still done.
-    if (background) setpriority(PRIO_PROCESS, static_cast<id_t>(gettid()), kNice);
+    setpriority(PRIO_PROCESS, static_cast<id_t>(gettid()), kNice);
   }
 
   [[noreturn]] void work() {
@@ -88,7 +79,6 @@ class Pool {
     }
   }
 
-  const WorkPriority priority_;
   std::mutex mutex_;
   std::condition_variable changed_;
   std::deque<std::function<void()>> items_;  // guarded by mutex_
@@ -97,30 +87,13 @@ class Pool {
 };
 
 /// Never destroyed: workers run until the process has gone.
-Pool& pool(WorkPriority priority) {
-  static Pool& background = *std::make_unique<Pool>(WorkPriority::background).release();
-  static Pool& standard = *std::make_unique<Pool>(WorkPriority::standard).release();
-  return priority == WorkPriority::background ? background : standard;
+Pool& pool() {
+  static Pool& pool = *std::make_unique<Pool>().release();
+  return pool;
 }
 
 }  // namespace
 
-void dispatchAsync(WorkPriority priority, std::function<void()> item) { pool(priority).add(std::move(item)); }
-
-void dispatchSync(WorkPriority priority, const std::function<void()>& item) {
-  // A worker that waited for its own pool could wait for ever.
-  if (pool(priority).ownsThisThread()) return item();
-  std::mutex mutex;
-  std::condition_variable changed;
-  bool done = false;
-  dispatchAsync(priority, [&] {
-    item();
-    const std::lock_guard lock(mutex);
-    done = true;
-    changed.notify_one();
-  });
-  std::unique_lock lock(mutex);
-  changed.wait(lock, [&] { return done; });
-}
+void dispatchAsync(std::function<void()> item) { pool().add(std::move(item)); }
 
 }  // namespace lmx

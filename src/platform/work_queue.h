@@ -1,20 +1,13 @@
-// The shared work queues: one-off work items on worker threads.
+// The shared work queue: one-off work items on worker threads in the background.
 #pragma once
 #include <functional>
 
 namespace lmx {
 
-enum class WorkPriority {
-  background,  ///< niced threads: must not disturb a running capture
-  standard,
-};
-
-/// Runs `item` on a worker of the process-wide pool of that priority; items may run in parallel. Thread-safe.
-/// Workers are started on demand, live until the process ends and are never joined. An exception out of
-/// an item ends the process: items catch their own.
-void dispatchAsync(WorkPriority priority, std::function<void()> item);
-
-/// The same, returning when `item` has run.
-void dispatchSync(WorkPriority priority, const std::function<void()>& item);
+/// Runs `item` on a worker of the process-wide pool; up to four items run in parallel. Workers are niced, so
+/// that they do not disturb a running capture; they are started on demand, live until the process ends and
+/// are never joined. An exception out of an item is a critical log line and ends that item alone.
+/// Thread-safe.
+void dispatchAsync(std::function<void()> item);
 
 }  // namespace lmx

@@ -1,142 +1,138 @@
-// Gathering what goes into the properties document.
+// Describing a recording and submitting it.
 #include "postprocess/agent_submit.h"
 
+#include <unistd.h>
+
+#include <algorithm>
+#include <cstring>
+
+#include "model/codes.h"
+#include "model/metadata_keys.h"
+#include "platform/directories.h"
+#include "platform/file_copy.h"
 #include "platform/log.h"
-#include "prefs/agent_preferences.h"
-#include "support/format.h"
+#include "postprocess/properties_document.h"
+#include "postprocess/property_gatherer.h"
+#include "postprocess/submission.h"
 
 namespace lmx {
 namespace {
 
-/// Every ".mov" becomes ".xml"; a path without one gets ".xml" behind it: the document must not overwrite the
-/// movie.
-std::string propertiesPathFor(const std::string& movie, LMPLogContext log) {
-  std::string path = movie;
-  bool replaced = false;
-  for (std::size_t at = path.find(".mov"); at != std::string::npos; at = path.find(".mov", at + 4)) {
-    path.replace(at, 4, ".xml");
-    replaced = true;
+void copyIntoRepository(const std::string& from, const std::string& to) {
+  if (const int error = copyFileToNewName(from, to)) {
+    LMPLogMessage(nullptr, kLogDebug, "\"%s\" was not copied to \"%s\": %s", from.c_str(), to.c_str(),
+                  std::strerror(error));
   }
-  if (replaced) return path;
-  LMPLogMessage(log, kLogWarning, "The movie \"%s\" is not named .mov: its properties go to \"%s.xml\"",
-                movie.c_str(), movie.c_str());
-  return movie + ".xml";
 }
 
-/// The steps that add properties; the first add that fails ends the rest.
-class Gatherer {
- public:
-  Gatherer(AgentSubmit& job, const AgentContext& context) : job_(job), context_(context) {}
-
-  using Text = AgentSubmit::Text;
-
-  [[nodiscard]] bool missing(const char* name) const {
-    return job_.getProperty(std::string(name)).value_or("").empty();
+void removeFile(LMPLogContext log, const std::string& path) {
+  if (unlink(path.c_str()) == 0) {
+    LMPLogMessage(log, kLogInfo, "File \"%s\" was removed", path.c_str());
+  } else {
+    LMPLogMessage(log, kLogError, "An error occurred removing file \"%s\"", path.c_str());
   }
-
-  bool addIfMissing(const char* name, const Text& value) {
-    if (!missing(name) || !value || value->empty()) return true;
-    return job_.addValue(value, std::string(name));
-  }
-
-  bool addDates(std::optional<TimeValue> started, std::optional<TimeValue> stopped) {
-    // A time that nobody has set counts as 0: losing the rest of the document over it would be worse.
-    const auto seconds = [](std::optional<TimeValue> time) {
-      return formatted("%d", static_cast<std::int32_t>(time ? time->tv_sec : 0));
-    };
-    return job_.addValue(seconds(started), "RecordingMetadata_START_DATE") &&
-           job_.addValue(seconds(stopped), "RecordingMetadata_END_DATE");
-  }
-
-  bool addRecording(const AgentRecord* record, std::int64_t duration) {
-    if (!addIfMissing("RecordingMetadata_DURATION", formatted("%d", static_cast<std::int32_t>(duration))))
-      return false;
-    return addType(record == nullptr ? 0 : record->recordedType()) &&
-           addIfMissing("RecordingMetadata_VIDEO_MAXIMUM_FRAME_RATE",
-                        context_.recording_video_maximum_frame_rate()) &&
-           addImageSide("RecordingMetadata_VIDEO_IMAGE_HEIGHT",
-                        record == nullptr ? 0 : record->videoHeight()) &&
-           addImageSide("RecordingMetadata_VIDEO_IMAGE_WIDTH", record == nullptr ? 0 : record->videoWidth());
-  }
-
-  bool addAudio() {
-    return addIfMissing("RecordingMetadata_AUDIO_CHANNEL", context_.recording_audio_channel()) &&
-           addIfMissing("RecordingMetadata_AUDIO_SAMPLE_RATE", context_.recording_audio_sample_rate()) &&
-           addIfMissing("RecordingMetadata_AUDIO_INPUT", context_.recording_audio_input());
-  }
-
-  bool addExtension(const std::string& movie) {
-    if (!missing("RecordingMetadata_DATA_MEDIA_EXTENSION")) return true;
-    const std::size_t dot = movie.rfind('.');
-    return job_.addValue(dot == std::string::npos ? Text() : Text(movie.substr(dot)),
-                         "RecordingMetadata_DATA_MEDIA_EXTENSION");
-  }
-
- private:
-  bool addType(std::int32_t code) {
-    if (code == 0 || !missing("RecordingMetadata_TYPE")) return true;
-    const char* name = AgentPreferences::recTypeToString(code);
-    return job_.addValue(name == nullptr ? Text() : Text(name), "RecordingMetadata_TYPE");
-  }
-
-  /// Only where the property is there already, and then the add must fail: the agent never writes an image
-  /// size itself, and a START that claims one for a picture whose size is known is in error.
-  bool addImageSide(const char* name, std::uint32_t pixels) {
-    if (missing(name) || pixels == 0) return true;
-    return job_.addValue(formatted("%d", static_cast<int>(pixels)), std::string(name));
-  }
-
-  AgentSubmit& job_;
-  const AgentContext& context_;
-};
+}
 
 }  // namespace
 
-AgentSubmit::Text AgentSubmit::getProperty(const Text& name) const {
-  return name ? lookUp(&properties_, *name) : std::nullopt;
+std::shared_ptr<AgentRecord> AgentSubmit::session() const {
+  if (recorded || !agentContext) return recorded;
+  return agentContext->record_context();
 }
 
-bool AgentSubmit::addValue(const Text& value, const Text& name) {
-  if (!value || !name) return false;
-  return properties_.try_emplace(*name, *value).second;
-}
-
-std::shared_ptr<AgentRecord> AgentSubmit::record() const {
-  if (record_ || !agentContext_) return record_;
-  return agentContext_->record_context();
-}
-
-void AgentSubmit::setPropertyValuesWithContext(std::shared_ptr<AgentContext> context,
-                                               const Text& recording_file_path,
+void AgentSubmit::setPropertyValuesWithContext(std::shared_ptr<AgentContext> context, const Text& movie,
                                                std::optional<TimeValue> started_date,
                                                std::optional<TimeValue> stopped_date, std::int64_t duration,
-                                               const SharedDictionary& user_properties, bool canceled) {
-  agentContext_ = std::move(context);
-  const auto session = record();
+                                               const SharedDictionary& user_properties, bool was_canceled) {
+  agentContext = std::move(context);
   if (user_properties) {
-    for (const auto& [name, value] : *user_properties) properties_.insert_or_assign(name, value);
+    for (const auto& [name, value] : *user_properties) properties.insert_or_assign(name, value);
   }
-  bool good = recording_file_path.has_value();
-  if (good) {
-    recording_file_path_ = recording_file_path;
-    properties_file_path_ = propertiesPathFor(*recording_file_path, agentContext_->log_context());
-    Gatherer gather(*this, *agentContext_);
-    good = gather.addIfMissing("RecordingMetadata_MACHINE_UUID", agentContext_->machine_uuid()) &&
-           gather.addDates(started_date, stopped_date) && gather.addRecording(session.get(), duration) &&
-           gather.addAudio() && gather.addExtension(*recording_file_path);
-  }
-  if (!good) {
-    LMPLogMessage(agentContext_->log_context(), kLogCritical,
-                  "Internal error occurred creating recording properties");
+  if (!gather(movie, started_date, stopped_date, duration)) {
+    LMPLogMessage(log(), kLogCritical, "Internal error occurred creating recording properties");
     return;
   }
-  canceled_ = canceled;
+  canceled = was_canceled;
 }
 
-void AgentSubmit::cleanup() {
-  properties_.clear();
-  agentContext_ = nullptr;
-  record_ = nullptr;
+bool AgentSubmit::gather(const Text& movie, std::optional<TimeValue> started_date,
+                         std::optional<TimeValue> stopped_date, std::int64_t duration) {
+  if (!movie) return false;
+  recording_file_path = movie;
+  properties_file_path = propertiesPathFor(*movie, log());
+  PropertyGatherer gatherer(properties, agentContext->recording);
+  return gatherer.addIfMissing(metadata_key::kMachineUUID, agentContext->server.machine_uuid.get()) &&
+         gatherer.addDates(started_date, stopped_date) && gatherer.addRecording(session().get(), duration) &&
+         gatherer.addAudio() && gatherer.addExtension(*movie);
+}
+
+bool AgentSubmit::tryWriteProperties() const {
+  if (!properties_file_path) return true;
+  const int error = writeFileAtomically(*properties_file_path, propertiesXml(properties), 0644);
+  if (error == 0) return true;
+  LMPLogMessage(log(), kLogWarning, "The properties document \"%s\" could not be written: %s",
+                properties_file_path->c_str(), std::strerror(error));
+  return false;
+}
+
+int AgentSubmit::writeProperties() {
+  documented_ = tryWriteProperties();
+  return 0;
+}
+
+int AgentSubmit::addRecordingWithCommentary(ChildRunner& children) {
+  const bool disabled = agentContext && agentContext->options.submit_disabled.get();
+  LMPLogMessage(log(), kLogInfo, "Post-process mechanism is starting...");
+  if (!disabled && !canceled) {
+    LMPLogMessage(log(), kLogInfo, "Completion in progress...");
+    if (addRecording(children) != 0) {
+      const Text server = agentContext ? agentContext->server.lumex_url.get() : std::nullopt;
+      LMPLogMessage(log(), kLogError, "An error occurred completing recording \"%s\"",
+                    server.value_or("(null)").c_str());
+      LMPLogMessage(log(), kLogCritical, "An internal error occurred during agent post-processing");
+      return -1;
+    }
+    LMPLogMessage(log(), kLogInfo, "Recording completed with success");
+  } else if (canceled) {
+    LMPLogMessage(log(), kLogInfo, "Submission not launched because the recording was canceled");
+    removeFiles();
+  }
+  LMPLogMessage(log(), kLogInfo, "Post-process mechanism completed with success");
+  return 0;
+}
+
+void AgentSubmit::removeFiles() const {
+  removeFile(log(), recording_file_path.value_or(""));
+  removeFile(log(), properties_file_path.value_or(""));
+}
+
+int AgentSubmit::addRecording(ChildRunner& children) {
+  const Text uuid = getProperty(properties, metadata_key::kRecordingUUID);
+  if (!agentContext || !uuid) return failedBeforeTheTool();
+  const auto record = session();
+  if (record && record->recordedType() == kRecordingTypeFile) copyInputFile(*uuid);
+  SubmissionRequest request{.server = agentContext->server.lumex_url.get().value_or(""),
+                            .recordingUUID = *uuid};
+  if (adhoc_workflow_uuid) {
+    const auto user = agentContext->options.user.get();
+    const auto password = agentContext->options.password.get();
+    if (!user || !password) return failedBeforeTheTool();
+    request.workflow = *adhoc_workflow_uuid;
+    request.file = recording_file_path.value_or("");
+    request.user = *user;
+    request.password = *password;
+  }
+  return submitWithTool(children, submissionArguments(request));
+}
+
+/// The tool looks for a recording in the repository: the input file of a "File" recording and its document go
+/// there.
+void AgentSubmit::copyInputFile(const std::string& uuid) const {
+  const std::string movie = recording_file_path.value_or("");
+  const std::string copy = agentContext->recording.recording_repository_path.get().value_or("") + "/" + uuid;
+  copyIntoRepository(movie, copy + ".mov");
+  copyIntoRepository(movie.substr(0, movie.size() - std::min<std::size_t>(3, movie.size())) + "xml",
+                     copy + ".xml");
 }
 
 }  // namespace lmx

@@ -4,7 +4,6 @@
 #include <memory>
 #include <optional>
 #include <string>
-#include <vector>
 
 #include "model/agent_context.h"
 #include "platform/child_process.h"
@@ -20,40 +19,23 @@ class AgentSubmit {
  public:
   using Text = std::optional<std::string>;
 
-  AgentSubmit() = default;
-  ~AgentSubmit() { cleanup(); }
-  AgentSubmit(const AgentSubmit&) = delete;
-  AgentSubmit& operator=(const AgentSubmit&) = delete;
-
-  [[nodiscard]] const Dictionary& properties() const { return properties_; }
-  void setProperties(Dictionary v) { properties_ = std::move(v); }
-  [[nodiscard]] const std::shared_ptr<AgentContext>& agentContext() const { return agentContext_; }
-  void setAgentContext(std::shared_ptr<AgentContext> v) { agentContext_ = std::move(v); }
-  [[nodiscard]] const Text& recording_file_path() const { return recording_file_path_; }
-  void setRecording_file_path(Text v) { recording_file_path_ = std::move(v); }
-  [[nodiscard]] const Text& properties_file_path() const { return properties_file_path_; }
-  void setProperties_file_path(Text v) { properties_file_path_ = std::move(v); }
-  [[nodiscard]] bool canceled() const { return canceled_; }
-  void setCanceled(bool v) { canceled_ = v; }
-  [[nodiscard]] const Text& adhoc_workflow_uuid() const { return adhoc_workflow_uuid_; }
-  void setAdhoc_workflow_uuid(Text v) { adhoc_workflow_uuid_ = std::move(v); }
+  Dictionary properties;
+  std::shared_ptr<AgentContext> agentContext;
   /// The session that recorded (the job's copy): its type goes into the document and decides what is copied,
   /// since the current session may have gone on to another type. Absent: the context's session.
-  void setRecord(std::shared_ptr<AgentRecord> v) { record_ = std::move(v); }
-
-  [[nodiscard]] Text getProperty(const Text& name) const;
-  /// false when either is absent or the name is already there: an existing value is never replaced.
-  bool addValue(const Text& value, const Text& name);
+  std::shared_ptr<AgentRecord> recorded;
+  Text recording_file_path;
+  Text properties_file_path;
+  Text adhoc_workflow_uuid;
+  bool canceled = false;
 
   /// Gathers everything for the properties document. A failure is logged and ends the gathering; what is
   /// there stays.
   /// @param duration  whole seconds of media
-  void setPropertyValuesWithContext(std::shared_ptr<AgentContext> context, const Text& recording_file_path,
+  void setPropertyValuesWithContext(std::shared_ptr<AgentContext> context, const Text& movie,
                                     std::optional<TimeValue> started_date,
                                     std::optional<TimeValue> stopped_date, std::int64_t duration,
-                                    const SharedDictionary& user_properties, bool canceled);
-  /// The document's text: XML 1.0, UTF-8, one property an element.
-  [[nodiscard]] std::string propertiesXml() const;
+                                    const SharedDictionary& user_properties, bool was_canceled);
   /// Writes the document beside the movie, atomically; nothing without a path. @return false when it could
   /// not be written, which is logged
   [[nodiscard]] bool tryWriteProperties() const;
@@ -68,20 +50,15 @@ class AgentSubmit {
   /// Runs the tool. @return 0 when it exited with 0, else 1 (logged).
   int addRecording(ChildRunner& children);
 
-  void cleanup();
-
  private:
-  [[nodiscard]] std::shared_ptr<AgentRecord> record() const;
-  static int runTool(ChildRunner& children, const std::vector<std::string>& arguments);
+  [[nodiscard]] bool gather(const Text& movie, std::optional<TimeValue> started_date,
+                            std::optional<TimeValue> stopped_date, std::int64_t duration);
+  void copyInputFile(const std::string& uuid) const;
+  void removeFiles() const;
+  [[nodiscard]] std::shared_ptr<AgentRecord> session() const;
+  [[nodiscard]] LMPLogContext log() const { return agentContext ? agentContext->log_context() : nullptr; }
 
-  Dictionary properties_;
-  std::shared_ptr<AgentContext> agentContext_;
-  std::shared_ptr<AgentRecord> record_;
-  Text recording_file_path_;
-  Text properties_file_path_;
-  bool canceled_ = false;
   bool documented_ = false;
-  Text adhoc_workflow_uuid_;
 };
 
 }  // namespace lmx

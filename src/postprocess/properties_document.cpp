@@ -1,12 +1,11 @@
-// The properties document.
-#include <cstring>
+// Writing properties as XML.
+#include "postprocess/properties_document.h"
+
 #include <pugixml.hpp>
+
 #include <sstream>
 #include <string_view>
 
-#include "platform/directories.h"
-#include "platform/log.h"
-#include "postprocess/agent_submit.h"
 #include "support/utf8.h"
 
 namespace lmx {
@@ -23,33 +22,30 @@ void elementWithKey(pugi::xml_node parent, const std::string& key, const std::st
 
 }  // namespace
 
-std::string AgentSubmit::propertiesXml() const {
+std::string propertiesXml(const Dictionary& properties) {
   pugi::xml_document document;
   pugi::xml_node declaration = document.append_child(pugi::node_declaration);
   declaration.append_attribute("version") = "1.0";
   declaration.append_attribute("encoding") = "UTF-8";
   pugi::xml_node list =
       document.append_child("LumexServerAgentRecordingProperties").append_child("RecordingProperties");
-  for (const auto& [key, value] : properties_) elementWithKey(list, key, value);
+  for (const auto& [key, value] : properties) elementWithKey(list, key, value);
   std::ostringstream out;
   document.save(out, "    ", pugi::format_default, pugi::encoding_utf8);
   return out.str();
 }
 
-bool AgentSubmit::tryWriteProperties() const {
-  if (!properties_file_path_) return true;
-  if (const int error = writeFileAtomically(*properties_file_path_, propertiesXml(), 0644)) {
-    LMPLogMessage(agentContext_ ? agentContext_->log_context() : nullptr, kLogWarning,
-                  "The properties document \"%s\" could not be written: %s", properties_file_path_->c_str(),
-                  std::strerror(error));
-    return false;
+std::string propertiesPathFor(const std::string& movie, LMPLogContext log) {
+  std::string path = movie;
+  bool replaced = false;
+  for (std::size_t at = path.find(".mov"); at != std::string::npos; at = path.find(".mov", at + 4)) {
+    path.replace(at, 4, ".xml");
+    replaced = true;
   }
-  return true;
-}
-
-int AgentSubmit::writeProperties() {
-  documented_ = tryWriteProperties();
-  return 0;
+  if (replaced) return path;
+  LMPLogMessage(log, kLogWarning, "The movie \"%s\" is not named .mov: its properties go to \"%s.xml\"",
+                movie.c_str(), movie.c_str());
+  return movie + ".xml";
 }
 
 }  // namespace lmx

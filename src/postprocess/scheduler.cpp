@@ -16,9 +16,9 @@ using namespace std::chrono_literals;
 int agentPostProcessSchedulerRunLoop(AgentContext& context, ChildRunner& children,
                                      const SchedulerHooks& hooks) {
   context.logInfo("Post-Process Scheduler starts");
-  while (context.running() && !hooks.cancelled()) {
+  while (context.state.running.get() && !hooks.cancelled()) {
     hooks.setBusy(true);  // before the list is empty: between list and thread a job must not be overlooked
-    if (const auto job = context.postProcessListNext()) {
+    if (const auto job = context.post_process_list.postProcessListNext()) {
       job->addRecordingWithCommentary(children);  // a failure is logged there; the next job has its own luck
       continue;
     }

@@ -7,10 +7,13 @@
 #include <charconv>
 #include <cmath>
 #include <cstdlib>
+#include <cstring>
 #include <mutex>
 
 #include "platform/log.h"
 #include "platform/paths.h"
+#include "prefs/adhoc_defaults.h"
+#include "support/format.h"
 
 namespace lmx {
 namespace {
@@ -25,12 +28,12 @@ bool missesSilently(const std::string& key) {
 /// @param complained  whether an error line has named the file before; set when this writes one
 std::optional<PlistDictionary> loadFile(const std::string& path, bool& complained) {
   PlistResult file = readPropertyList(path);
-  if (file.value && file.value->dictionary() != nullptr) return *file.value->dictionary();
-  if (file.systemError == ENOENT || complained) return std::nullopt;
+  if (file && file->dictionary() != nullptr) return *file->dictionary();
+  if (complained || (!file && file.error().systemError == ENOENT)) return std::nullopt;
   complained = true;
   LMPLogMessage(nullptr, kLogError,
                 "The preferences file \"%s\" can't be used: %s. Nothing is read from it; correct it.",
-                path.c_str(), file.value ? "its top level is not a dictionary" : file.problem.c_str());
+                path.c_str(), file ? "its top level is not a dictionary" : file.error().message.c_str());
   return std::nullopt;
 }
 
@@ -65,25 +68,24 @@ std::string userPreferencesFile() {
 
 }  // namespace
 
-AgentPreferences::AgentPreferences(std::shared_ptr<CaptureCatalog> catalog) : catalog_(std::move(catalog)) {
-  setupPrefsFileWatcher();
+std::optional<std::string> textOf(const std::optional<PlistValue>& value) {
+  if (!value || value->string() == nullptr) return std::nullopt;
+  return *value->string();
 }
 
-AgentPreferences::~AgentPreferences() = default;
+AgentPreferences::AgentPreferences() { setupPrefsFileWatcher(); }
 
 std::optional<PlistDictionary> AgentPreferences::prefsDict() {
   const std::lock_guard lock(prefsCacheMutex_);
   return prefsDict_;
 }
 
-void AgentPreferences::setPrefsDict(std::optional<PlistDictionary> dictionary) {
+void AgentPreferences::resetPrefsCache() {
   const std::lock_guard lock(prefsCacheMutex_);
-  prefsDict_ = std::move(dictionary);
+  prefsDict_ = std::nullopt;
   complained_ = false;
   user_complained_ = false;
 }
-
-void AgentPreferences::resetPrefsCache() { setPrefsDict(std::nullopt); }
 
 std::optional<PlistValue> AgentPreferences::getFromPrefsFile(const std::string& key) {
   std::optional<PlistValue> value;
@@ -142,6 +144,25 @@ bool AgentPreferences::prefsFileChanged() {
     watcher_.close();
   }
   return true;
+}
+
+void AgentPreferences::migrateOldKeys() {
+  const std::lock_guard lock(prefsCacheMutex_);  // recursive: the read below locks it again
+  const auto old = textOf(getFromPrefsFile("RecordingPreviewIntervalInSeconds"));
+  if (!old || !prefsDict_) return;
+  const auto seconds = static_cast<std::uint32_t>(std::atoi(old->c_str()));
+  // The old default of 3 s becomes the new default, not its equivalent.
+  const std::string milliseconds =
+      seconds == 3
+          ? "400"
+          : string_with_format("%lld", static_cast<long long>(static_cast<std::int32_t>(seconds * 1000U)));
+  prefsDict_->insert_or_assign("PreviewIntervalInMilliseconds", PlistValue(milliseconds));
+  prefsDict_->erase("RecordingPreviewIntervalInSeconds");
+  const std::string path = systemPath(kPreferencesFile);
+  if (const int error = writePropertyList(path, *prefsDict_)) {
+    LMPLogMessage(nullptr, kLogWarning, "The obsolete preview interval could not be replaced in %s: %s",
+                  path.c_str(), std::strerror(error));
+  }
 }
 
 }  // namespace lmx

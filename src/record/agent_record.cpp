@@ -4,8 +4,8 @@
 #include "model/agent_context.h"
 #include "record/capture_delegate.h"
 #include "record/capture_thread.h"
-#include "record/engine.h"
 #include "record/preview_controller.h"
+#include "record/stop_capture.h"
 
 namespace lmx {
 
@@ -15,39 +15,50 @@ std::shared_ptr<AgentContext> newAgentContext() {
 
 AgentRecord::~AgentRecord() { cleanup(); }
 
+std::int32_t AgentRecord::recordedType() const {
+  const std::int32_t type = recordedType_.get();
+  return type == kRecordingTypeNone ? recordingType.get() : type;
+}
+
+void AgentRecord::updateLastContact() {
+  lastContact.set(lmp_gettimeofday());
+  if (status.get() != kRecorderIdle) stop_times.updateSoftStopTime();
+}
+
+AgentRecord::Time AgentRecord::beginning() const {
+  const Time start = startTime.get();
+  const Time launch = launchTime.get();
+  if (!start || (launch && lmp_diff_timeval(*start, *launch) < 0)) return launch;
+  return start;
+}
+
 std::shared_ptr<AgentRecord> AgentRecord::copy() const {
   auto other = std::make_shared<AgentRecord>();
   other->is_copy_ = true;
-  other->setFilename(filename());
-  other->setMetadata(metadata());
-  other->setRecording_uuid(recording_uuid());
-  other->setRequest_uuid(request_uuid());
-  other->setRequest_properties(request_properties());
-  other->setRecordingType(recordingType());
-  other->setRecordedType(recordedType_);
-  other->setStatus(status());
-  other->setError(error());
-  other->setDelay(delay());
-  other->setMaxUnattendedRecordingMinutes(maxUnattendedRecordingMinutes());
-  other->setSessions(sessions());
-  other->setVideoPercent(videoPercent());
-  other->setVideoWidth(videoWidth());
-  other->setVideoHeight(videoHeight());
-  other->setAudioSampleRate(audioSampleRate());
-  other->setAudioChannelsNumber(audioChannelsNumber());
-  other->setAudioOnlyMode(audioOnlyMode());
-  other->setDiskSpaceCutoffInMB(diskSpaceCutoffInMB());
-  other->setElapsedTime(elapsedTime());
-  other->setLaunchTime(launchTime());
-  other->setStartTime(startTime());
-  other->setStopTime(stopTime());
-  other->setHardStopTime(hardStopTime());
-  other->setSoftStopTime(softStopTime());
-  other->setLastContact(lastContact());
-  other->setCaptureThread(captureThread());
-  other->setPreviewController(previewController());
-  other->setCaptureController(captureController());
-  other->setCaptureControllerDelegate(captureControllerDelegate());
+  const auto take = [](auto& to, const auto& from) { to.set(from.get()); };
+  take(other->recordingType, recordingType);
+  take(other->diskSpaceCutoffInMB, diskSpaceCutoffInMB);
+  take(other->recordedType_, recordedType_);
+  take(other->filename, filename);
+  take(other->recording_uuid, recording_uuid);
+  take(other->audioOnlyMode, audioOnlyMode);
+  take(other->metadata, metadata);
+  take(other->videoWidth, videoWidth);
+  take(other->videoHeight, videoHeight);
+  take(other->request_uuid, request_uuid);
+  take(other->request_properties, request_properties);
+  take(other->status, status);
+  take(other->error, error);
+  take(other->launchTime, launchTime);
+  take(other->startTime, startTime);
+  take(other->stopTime, stopTime);
+  take(other->elapsedTime, elapsedTime);
+  take(other->lastContact, lastContact);
+  other->stop_times.take(stop_times);
+  take(other->previewController, previewController);
+  take(other->captureController, captureController);
+  take(other->captureControllerDelegate, captureControllerDelegate);
+  take(other->captureThread, captureThread);
   return other;
 }
 
@@ -55,22 +66,19 @@ void AgentRecord::cleanup() {
   if (cleaned_up_.exchange(true)) return;
   // A copy describes a capture that has been stopped already; only the session itself may stop one. The
   // pointer owns nothing: cleanup also runs in the destructor, where no owner is left.
-  if (status() == kRecorderRecording && !is_copy_) {
+  if (status.get() == kRecorderRecording && !is_copy_) {
     LXAgentRecordStopCapture(std::shared_ptr<AgentRecord>(std::shared_ptr<AgentRecord>(), this));
   }
-  setFilename(std::nullopt);
-  setAutoShutoffCheckTimer(false);
-  for (auto set : {&AgentRecord::setElapsedTime, &AgentRecord::setLaunchTime, &AgentRecord::setStartTime,
-                   &AgentRecord::setStopTime, &AgentRecord::setHardStopTime, &AgentRecord::setSoftStopTime,
-                   &AgentRecord::setLastContact}) {
-    (this->*set)(std::nullopt);
-  }
-  setCaptureThread(nullptr);
-  setMetadata(nullptr);
-  setPreviewController(nullptr);
-  setCaptureController(nullptr);
-  setCaptureControllerDelegate(nullptr);
-  setRecording_uuid({});
+  filename.set(std::nullopt);
+  autoShutoffCheckTimer.set(false);
+  for (auto* time : {&elapsedTime, &launchTime, &startTime, &stopTime, &lastContact}) time->set(std::nullopt);
+  stop_times.clear();
+  captureThread.set(nullptr);
+  metadata.set(nullptr);
+  previewController.set(nullptr);
+  captureController.set(nullptr);
+  captureControllerDelegate.set(nullptr);
+  recording_uuid.set({});
 }
 
 }  // namespace lmx

@@ -4,15 +4,18 @@
 #include <algorithm>
 #include <array>
 
+#include "capture/api/capture_framework.h"
 #include "model/agent_actions.h"
 #include "model/agent_context.h"
-#include "prefs/agent_preferences.h"
-#include "record/engine.h"
+#include "prefs/recording_types.h"
+#include "record/agent_record.h"
+#include "record/engine_environment.h"
 
 namespace lmx {
 
 bool meansDeviceLost(const std::optional<CaptureError>& error) {
-  static constexpr std::array kLost{1002, 1003, 1100, 1200, 1201, 1203, 1300, 1302};
+  static constexpr std::array<int, 8> kLost{kDeviceNotFound,     kDeviceRemoved, kDeviceBusy,   kDeviceFailed,
+                                            kDeviceNotPermitted, kStreamEnded,   kDeviceSilent, kAudioSilent};
   return error && error->domain == CaptureError::kDomain &&
          std::find(kLost.begin(), kLost.end(), error->code) != kLost.end();
 }
@@ -21,26 +24,25 @@ void LMRCaptureDelegate::lmrCaptureDidComplete(const std::optional<CaptureError>
   // The agent first: once the error can be seen, the main loop must know that there is still something to
   // submit.
   if (AgentActions* actions = engineEnvironment().actions) actions->captureDidComplete(controller_);
-  if (error) setRecordError(error);
+  if (error) recordError.set(error);
   resetDefaultRecordingType();
 }
 
 void LMRCaptureDelegate::lmrCaptureDidCancel(const std::optional<CaptureError>& error) {
-  if (error) setRecordError(error);
+  if (error) recordError.set(error);
   if (AgentActions* actions = engineEnvironment().actions) actions->captureDidCancel(controller_);
   resetDefaultRecordingType();
 }
 
-bool LMRCaptureDelegate::deviceDisconnected() const { return meansDeviceLost(recordError()); }
+bool LMRCaptureDelegate::deviceDisconnected() const { return meansDeviceLost(recordError.get()); }
 
 void LMRCaptureDelegate::resetDefaultRecordingType() const {
   const auto context = engineEnvironment().context;
   const auto session = context ? context->record_context() : nullptr;
   // A session that records on already has another controller: its type is that of the new recording.
-  if (!session || session->captureController().get() != controller_) return;
-  const auto type = context->recording_type();
-  session->setRecordingType(AgentPreferences::recTypeToCode(type ? type->c_str() : nullptr));
-  session->setAudioOnlyMode(false);
+  if (!session || session->captureController.get().get() != controller_) return;
+  session->recordingType.set(recTypeToCode(context->recording.recording_type.get()));
+  session->audioOnlyMode.set(false);
 }
 
 }  // namespace lmx

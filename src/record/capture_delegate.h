@@ -22,7 +22,7 @@ class LMRCaptureDelegate : public CaptureControllerDelegate {
   /// Puts the configured recording type back after a request for sound only.
   void resetDefaultRecordingType() const;
 
-  LMX_SHARED_FIELD(std::optional<CaptureError>, recordError, setRecordError)
+  SharedValue<std::optional<CaptureError>> recordError;  ///< the last error reported
 
  private:
   const void* controller_;

@@ -6,10 +6,12 @@
 #include <system_error>
 #include <thread>
 
+#include "capture/api/capture_framework.h"
 #include "platform/log.h"
 #include "platform/run_loop.h"
 #include "record/agent_record.h"
-#include "record/engine.h"
+#include "record/auto_shutoff.h"
+#include "record/stop_capture.h"
 
 namespace lmx {
 
@@ -31,19 +33,19 @@ void videoRunLoop(const std::shared_ptr<AgentRecord>& session,
     LXAgentRecordStopCapture(session);
     return;
   }
-  session->setStartTime(currentTime());
+  session->startTime.set(lmp_gettimeofday());
 
   RunLoop loop;
   loop.adoptThread();
-  const auto check = [&] { session->checkForAutoShutoffConditions(); };
+  const auto check = [&] { checkForAutoShutoffConditions(*session); };
   const auto timer = loop.addRepeatingTimer(15s, check);
-  session->setAutoShutoffCheckTimer(true);
+  session->autoShutoffCheckTimer.set(true);
   check();
-  while (!cancelled && controller && session->captureController() == controller &&
+  while (!cancelled && controller && session->captureController.get() == controller &&
          !controller->hasShutDown()) {
     loop.run(250ms);
   }
-  session->setAutoShutoffCheckTimer(false);
+  session->autoShutoffCheckTimer.set(false);
 }
 
 }  // namespace

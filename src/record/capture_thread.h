@@ -2,6 +2,8 @@
 #pragma once
 #include <memory>
 
+#include "capture/api/capture_framework.h"
+
 namespace lmx {
 
 class AgentRecord;

@@ -14,14 +14,14 @@ void MyLMRPreviewControllerDelegate::handleJPEGData(std::vector<std::uint8_t> jp
   mLastJPEGData_.swap(frame);
 }
 
-heap_ptr<char> MyLMRPreviewControllerDelegate::base64PreviewFrameCopy() {
+std::optional<std::string> MyLMRPreviewControllerDelegate::base64PreviewFrameCopy() {
   std::shared_ptr<const std::vector<std::uint8_t>> frame;
   {
     const std::lock_guard lock(mLock_);
     frame = mLastJPEGData_;
   }
-  if (!frame) return nullptr;
-  return heap_ptr<char>(lmp_encode_base64(frame->data(), frame->size(), nullptr));
+  if (!frame) return std::nullopt;
+  return lmp_encode_base64({reinterpret_cast<const char*>(frame->data()), frame->size()});
 }
 
 MyLMRPreviewController::MyLMRPreviewController(std::unique_ptr<LMRPreviewController> controller)
@@ -32,9 +32,9 @@ void MyLMRPreviewController::setDelegate(std::shared_ptr<MyLMRPreviewControllerD
   controller_->setDelegate(delegate_);
 }
 
-heap_ptr<char> MyLMRPreviewController::base64PreviewFrameCopy() {
+std::optional<std::string> MyLMRPreviewController::base64PreviewFrameCopy() {
   last_request_ = std::time(nullptr);
-  return delegate_ ? delegate_->base64PreviewFrameCopy() : nullptr;
+  return delegate_ ? delegate_->base64PreviewFrameCopy() : std::nullopt;
 }
 
 }  // namespace lmx

@@ -8,7 +8,6 @@
 #include <vector>
 
 #include "capture/api/capture_framework.h"
-#include "support/heap_ptr.h"
 #include "support/recursive_mutex.h"
 
 namespace lmx {
@@ -23,8 +22,8 @@ class MyLMRPreviewControllerDelegate : public LMRPreviewControllerDelegate {
   void setFrameGrabInterval(int milliseconds) override { interval_ = milliseconds; }
   [[nodiscard]] int frameGrabInterval() const { return interval_; }
   void handleJPEGData(std::vector<std::uint8_t> jpeg) override;
-  /// The newest frame as Base64 in a block that the caller frees; null before the first frame.
-  [[nodiscard]] heap_ptr<char> base64PreviewFrameCopy();
+  /// The newest frame as Base64; nothing before the first frame.
+  [[nodiscard]] std::optional<std::string> base64PreviewFrameCopy();
 
  private:
   std::atomic<int> interval_;
@@ -46,7 +45,7 @@ class MyLMRPreviewController {
   [[nodiscard]] std::int64_t mLastPreviewRequestTime() const { return last_request_; }
   void setMLastPreviewRequestTime(std::int64_t seconds) { last_request_ = seconds; }
   /// Stamps the request time, then asks the delegate.
-  [[nodiscard]] heap_ptr<char> base64PreviewFrameCopy();
+  [[nodiscard]] std::optional<std::string> base64PreviewFrameCopy();
 
  private:
   std::unique_ptr<LMRPreviewController> controller_;

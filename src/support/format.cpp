@@ -1,37 +1,38 @@
-// printf formatting on top of vasprintf.
+// printf formatting on top of vsnprintf.
 #include "support/format.h"
 
 #include <cstdarg>
 #include <cstdio>
 
-#include "support/heap_ptr.h"
-
 namespace lmx {
 namespace {
 
-__attribute__((format(printf, 1, 0))) heap_ptr<char> format(const char* pattern, va_list arguments) {
-  char* text = nullptr;
-  // On failure the content of `text` is undefined, so it is taken over only on success.
-  if (pattern == nullptr || vasprintf(&text, pattern, arguments) < 0) return nullptr;
-  return heap_ptr<char>(text);
+/// Text into `buffer` of `size` bytes. @return the length that it needs, without the NUL; negative on failure
+__attribute__((format(printf, 3, 0))) int print(char* buffer, std::size_t size, const char* format,
+                                                va_list arguments) {
+  va_list copy;
+  va_copy(copy, arguments);
+  const int length = std::vsnprintf(buffer, size, format, copy);
+  va_end(copy);
+  return length;
 }
 
 }  // namespace
 
-char* string_with_format(const char* format, ...) {
+std::string string_with_format(const char* format, ...) {
+  char small[256];
   va_list arguments;
   va_start(arguments, format);
-  heap_ptr<char> text = lmx::format(format, arguments);
+  const int length = print(small, sizeof small, format, arguments);
+  std::string text;
+  if (length >= 0 && static_cast<std::size_t>(length) < sizeof small) {
+    text.assign(small, static_cast<std::size_t>(length));
+  } else if (length >= 0) {
+    text.resize(static_cast<std::size_t>(length));
+    print(text.data(), text.size() + 1, format, arguments);
+  }
   va_end(arguments);
-  return text.release();
-}
-
-std::string formatted(const char* format, ...) {
-  va_list arguments;
-  va_start(arguments, format);
-  const heap_ptr<char> text = lmx::format(format, arguments);
-  va_end(arguments);
-  return text ? std::string(text.get()) : std::string();
+  return text;
 }
 
 }  // namespace lmx

@@ -1,13 +1,10 @@
-// printf formatting into memory of its own.
+// printf formatting into a string.
 #pragma once
 #include <string>
 
 namespace lmx {
 
-/// @return the formatted text in a new block that the caller frees; null on failure.
-char* string_with_format(const char* format, ...) __attribute__((format(printf, 1, 2)));
-
-/// The same as a string; empty on failure.
-std::string formatted(const char* format, ...) __attribute__((format(printf, 1, 2)));
+/// @return the formatted text; empty when it can't be formatted
+std::string string_with_format(const char* format, ...) __attribute__((format(printf, 1, 2)));
 
 }  // namespace lmx

@@ -2,6 +2,7 @@
 #pragma once
 #include <cerrno>
 #include <cstring>
+#include <optional>
 #include <string>
 #include <utility>
 #include <variant>
@@ -36,6 +37,8 @@ class [[nodiscard]] Result {
   [[nodiscard]] T&& operator*() && { return std::move(*std::get_if<0>(&state_)); }
   [[nodiscard]] T* operator->() { return std::get_if<0>(&state_); }
   [[nodiscard]] const T* operator->() const { return std::get_if<0>(&state_); }
+
+  [[nodiscard]] std::optional<T> value() const { return ok() ? std::optional<T>(**this) : std::nullopt; }
 
   // Undefined with a value.
   [[nodiscard]] const E& error() const& { return *std::get_if<1>(&state_); }

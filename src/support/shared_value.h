@@ -1,6 +1,8 @@
 // A small value that several threads read and one or more replace.
 #pragma once
+#include <atomic>
 #include <mutex>
+#include <type_traits>
 #include <utility>
 
 namespace lmx {
@@ -32,16 +34,24 @@ class SharedValue {
 
  private:
   mutable std::mutex mutex_;
-  T value_{};
+  T value_{};  // guarded by mutex_
+};
+
+/// Numbers, flags and plain pointers need no lock.
+template <class T>
+requires(std::is_arithmetic_v<T> || std::is_enum_v<T> || std::is_pointer_v<T>) class SharedValue<T> {
+ public:
+  SharedValue() = default;
+  explicit SharedValue(T value) : value_(value) {}
+  SharedValue(const SharedValue&) = delete;
+  SharedValue& operator=(const SharedValue&) = delete;
+
+  [[nodiscard]] T get() const { return value_; }
+  void set(T value) { value_ = value; }
+  T exchange(T value) { return value_.exchange(value); }
+
+ private:
+  std::atomic<T> value_{};
 };
 
 }  // namespace lmx
-
-/// Declares a field with its two accessors: `name()` returns a copy, `setter(value)` replaces it.
-#define LMX_SHARED_FIELD(Type, name, setter)                 \
- public:                                                     \
-  [[nodiscard]] Type name() const { return name##_.get(); }  \
-  void setter(Type value) { name##_.set(std::move(value)); } \
-                                                             \
- private:                                                    \
-  ::lmx::SharedValue<Type> name##_;

@@ -1,23 +1,15 @@
-// Time values on the heap, their differences and their text.
+// Differences and text of time values.
 #include "support/time_value.h"
 
-#include <cstdlib>
 #include <ctime>
 #include <limits>
 
 #include "support/format.h"
-#include "support/heap_ptr.h"
 
 namespace lmx {
 namespace {
 
 constexpr std::int64_t kMicrosPerSecond = 1000000;
-
-TimeValue* newTimeValue(const TimeValue& value) {
-  auto* block = static_cast<TimeValue*>(std::malloc(sizeof(TimeValue)));
-  if (block != nullptr) *block = value;
-  return block;
-}
 
 std::int64_t saturated(bool negative) {
   return negative ? std::numeric_limits<std::int64_t>::min() : std::numeric_limits<std::int64_t>::max();
@@ -47,20 +39,15 @@ TimeValue normalised(std::int64_t seconds, std::int64_t micros) {
 
 }  // namespace
 
-std::optional<TimeValue> currentTime() {
+std::optional<TimeValue> lmp_gettimeofday() {
   TimeValue now{};
   if (gettimeofday(&now, nullptr) != 0) return std::nullopt;
   return now;
 }
 
-TimeValue* lmp_gettimeofday() {
-  const auto now = currentTime();
-  return now ? newTimeValue(*now) : nullptr;
-}
-
-std::int64_t lmp_diff_timeval(const TimeValue* a, const TimeValue* b) {
-  const std::int64_t seconds = subtract(a->tv_sec, b->tv_sec);
-  const std::int64_t micros = subtract(a->tv_usec, b->tv_usec);
+std::int64_t lmp_diff_timeval(const TimeValue& a, const TimeValue& b) {
+  const std::int64_t seconds = subtract(a.tv_sec, b.tv_sec);
+  const std::int64_t micros = subtract(a.tv_usec, b.tv_usec);
   std::int64_t total = 0;
   if (!__builtin_mul_overflow(seconds, kMicrosPerSecond, &total) &&
       !__builtin_add_overflow(total, micros, &total)) {
@@ -71,29 +58,32 @@ std::int64_t lmp_diff_timeval(const TimeValue* a, const TimeValue* b) {
   return add(total, micros / 1000);
 }
 
-TimeValue* lmp_timevalptr_from_timeval(const TimeValue* value) {
-  return value != nullptr ? newTimeValue(*value) : nullptr;
-}
-
-char* lmp_timeval_to_ctime(const TimeValue* value) {
+std::string lmp_timeval_to_ctime(const TimeValue& value) {
   // By hand instead of ctime_r, which has no room for years of more than four digits.
   static constexpr const char* kDays[] = {"Sun", "Mon", "Tue", "Wed", "Thu", "Fri", "Sat"};
   static constexpr const char* kMonths[] = {"Jan", "Feb", "Mar", "Apr", "May", "Jun",
                                             "Jul", "Aug", "Sep", "Oct", "Nov", "Dec"};
-  if (value == nullptr) return nullptr;
-  const std::time_t seconds = value->tv_sec;
+  const std::time_t seconds = value.tv_sec;
   std::tm local{};
-  if (localtime_r(&seconds, &local) == nullptr) return nullptr;
+  if (localtime_r(&seconds, &local) == nullptr) return "?";
   return string_with_format("%s %s %2d %02d:%02d:%02d %lld", kDays[local.tm_wday], kMonths[local.tm_mon],
                             local.tm_mday, local.tm_hour, local.tm_min, local.tm_sec, 1900LL + local.tm_year);
 }
 
-TimeValue* LXAgentTimevalAdd(const TimeValue* a, const TimeValue* b) {
-  return newTimeValue(normalised(add(a->tv_sec, b->tv_sec), add(a->tv_usec, b->tv_usec)));
+TimeValue LXAgentTimevalAdd(const TimeValue& a, const TimeValue& b) {
+  return normalised(add(a.tv_sec, b.tv_sec), add(a.tv_usec, b.tv_usec));
 }
 
-TimeValue* LXAgentTimevalSubtract(const TimeValue* a, const TimeValue* b) {
-  return newTimeValue(normalised(subtract(a->tv_sec, b->tv_sec), subtract(a->tv_usec, b->tv_usec)));
+TimeValue LXAgentTimevalSubtract(const TimeValue& a, const TimeValue& b) {
+  return normalised(subtract(a.tv_sec, b.tv_sec), subtract(a.tv_usec, b.tv_usec));
+}
+
+std::int64_t wallClockOffset() {
+  std::timespec wall{};
+  std::timespec boot{};
+  clock_gettime(CLOCK_REALTIME, &wall);
+  clock_gettime(CLOCK_BOOTTIME, &boot);
+  return wall.tv_sec - boot.tv_sec;
 }
 
 double secondsSinceReferenceDate() {

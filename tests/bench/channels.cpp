@@ -92,11 +92,11 @@ void run(std::size_t channels, std::chrono::seconds away) {
   server.open(0);
   const std::uint16_t port = server.port();
   const auto context = newAgentContext();
-  context->setTunnel_host("127.0.0.1");
-  context->setTunnel_port(std::to_string(port));
-  context->setMachine_uuid("bench");
-  context->setShared_secret(std::array<unsigned char, 16>{});
-  context->setRunning(true);
+  context->server.tunnel_host.set("127.0.0.1");
+  context->server.tunnel_port.set(std::to_string(port));
+  context->server.machine_uuid.set("bench");
+  context->server.shared_secret.set(std::array<unsigned char, 16>{});
+  context->state.running.set(true);
 
   const long memory = statusField("VmRSS");
   const long threads = statusField("Threads");

@@ -9,7 +9,7 @@
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
   const lmx::PlistResult result = lmx::parsePropertyList({reinterpret_cast<const char*>(data), size});
-  if (result.value.has_value() == !result.problem.empty()) std::abort();
+  if (!result && result.error().message.empty()) std::abort();
   if (!result.value) return 0;
   const std::string text = lmx::propertyListXml(*result.value);
   if (text.size() < lmx::kPlistFileLimit && !lmx::parsePropertyList(text).value) std::abort();

@@ -1,4 +1,4 @@
-"""Fixtures of the system tests: an agent in a sandbox, a watchdog, and a look at what is left behind."""
+"""Fixtures of the system tests: an agent in a sandbox, a server for it, and a watchdog over each test."""
 import faulthandler
 import os
 import re
@@ -12,6 +12,7 @@ import pytest
 sys.path.insert(0, str(Path(__file__).resolve().parent))
 
 from harness.agent import Agent  # noqa: E402
+from harness.tunnel_server import TunnelServer  # noqa: E402
 
 ROOT = Path(__file__).resolve().parents[2]
 BINARY = Path(os.environ.get("LMX_BINARY", ROOT / "build/release/lmxagentd"))
@@ -21,6 +22,19 @@ LIMIT = 120  # seconds a test may take; a test says otherwise with @pytest.mark.
 
 def pytest_configure(config):
     config.addinivalue_line("markers", "limit(seconds): how long the test may take")
+    config.addinivalue_line("markers", "slow: waits for half a minute or more of wall-clock time")
+
+
+@pytest.hookimpl(trylast=True)
+def pytest_collection_modifyitems(items):
+    """Puts the slow tests first, in turn for each worker: started last, one would be all that is still running."""
+    workers = int(os.environ.get("PYTEST_XDIST_WORKER_COUNT", 1))
+    share = max(len(items) // (4 * workers), 2)  # how many tests in a row xdist hands each worker at first
+    slow = [item for item in items if item.get_closest_marker("slow")]
+    items[:] = [item for item in items if item not in slow]
+    places = ((i % workers) * share + i // workers for i in range(len(slow)))
+    for place, item in sorted(zip(places, slow), key=lambda pair: pair[0]):
+        items.insert(place, item)
 
 
 @pytest.hookimpl(hookwrapper=True)
@@ -35,7 +49,7 @@ class Hung(Exception):
 
 @pytest.fixture(autouse=True)
 def watchdog(request):
-    """Ends a test that hangs: first with an exception in it, and if that does not help with the whole run."""
+    """Ends a test that hangs with an exception, and if that does not help the whole run."""
     mark = request.node.get_closest_marker("limit")
     limit = mark.args[0] if mark else LIMIT
 
@@ -53,7 +67,7 @@ def watchdog(request):
 
 @pytest.fixture(scope="session")
 def registry(tmp_path_factory):
-    """GStreamer's catalogue of plugins, made once: without it every daemon would search them anew."""
+    """GStreamer's catalogue of plugins, made once: without it every daemon would search for them again."""
     path = tmp_path_factory.mktemp("gstreamer") / "registry.bin"
     subprocess.run(["gst-inspect-1.0", "fakesink"], env={**os.environ, "GST_REGISTRY": str(path)}, check=True,
                    stdout=subprocess.DEVNULL, timeout=120)
@@ -61,10 +75,16 @@ def registry(tmp_path_factory):
 
 
 @pytest.fixture
-def agent(request, registry):
+def binary():
+    """The program under test. Modules that test another one override this."""
+    return BINARY
+
+
+@pytest.fixture
+def agent(request, binary, registry):
     """A daemon's sandbox, not yet started."""
-    assert BINARY.exists(), f"{BINARY} is not built"
-    one = Agent(BINARY, registry)
+    assert binary.exists(), f"{binary} is not built"
+    one = Agent(binary, registry)
     yield one
     report, errors = one.report(), one.errors()
     one.close()
@@ -79,3 +99,12 @@ def agent(request, registry):
 def running(agent):
     """A daemon that answers on its local socket, with the synthetic camera and microphone."""
     return agent.start()
+
+
+@pytest.fixture
+def server(agent):
+    """A server that the running agent has said hello to."""
+    with TunnelServer(agent.prepare()) as one:
+        agent.start()
+        one.accept()
+        yield one

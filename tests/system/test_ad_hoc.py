@@ -3,6 +3,7 @@ import os
 import re
 import signal
 
+import pytest
 from harness import movie
 from harness.agent import REPOSITORY
 from harness.sandbox import children_of
@@ -37,7 +38,7 @@ def test_an_interrupt_ends_a_client_that_gets_no_answer(running):
 
 
 def let_it_record(agent, mark):
-    """Waits for some media; the socket can't be asked, the client holds it."""
+    """Waits for some media on the disk. STATUS can't be asked for: the client occupies the local socket."""
     agent.log.wait("recording started$", after=mark)
     wait_until(lambda: sum(p.stat().st_size for p in agent.path(REPOSITORY).rglob("media.mov")) > 60_000, 20, "media")
 
@@ -63,7 +64,8 @@ def test_a_recording_until_an_interrupt(running):
     assert not running.tool_calls(), "the submission was disabled"
 
 
-def test_a_stop_that_nobody_answers_is_said(running):
+@pytest.mark.slow
+def test_a_stop_that_nobody_answers_is_reported(running):
     mark = running.log.mark()
     with running.popen("-f", OUTPUT, "-s") as client:
         let_it_record(running, mark)

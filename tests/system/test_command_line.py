@@ -6,6 +6,7 @@ import stat
 
 import pytest
 from harness.agent import PREFERENCES
+from harness.log_reader import Level
 
 USAGE = """
 lmxagentd (version 100)
@@ -67,12 +68,12 @@ def test_wrong_combinations(agent, arguments, status, errors):
 
 
 @pytest.mark.parametrize("arguments", [("-h",), ("-v",), ("-x",), ("-i", "nonsense"), ("--status",)])
-def test_every_run_says_goodbye(agent, arguments):
+def test_every_run_logs_its_end(agent, arguments):
     agent.run(*arguments)
-    agent.log.wait("^lmxagentd stopped$", level=6)
+    agent.log.wait("^lmxagentd stopped$", level=Level.INFO)
 
 
-def test_unknown_information_is_nothing(agent):
+def test_unknown_information_prints_nothing(agent):
     result = agent.run("-i", "nonsense")
     assert (result.returncode, result.stdout, result.stderr) == (0, "", "")
 

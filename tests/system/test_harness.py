@@ -1,9 +1,11 @@
-"""The readers of the harness, against material that is known: a reader that sees nothing would prove nothing."""
+"""The harness's readers against known material: a reader that finds nothing would prove nothing."""
+import signal
 import subprocess
 
 import numpy
 import pytest
 from harness import movie
+from harness.unread import all_read, wait_read
 
 
 def picture(counter, width=320, height=180):
@@ -17,8 +19,9 @@ def picture(counter, width=320, height=180):
 
 def make_movie(path, numbers):
     frames = b"".join(picture(number) for number in numbers)
-    subprocess.run(["ffmpeg", "-v", "error", "-f", "rawvideo", "-pix_fmt", "gray", "-s", "320x180", "-r", "30", "-i", "-",
-                    "-c:v", "libx264", "-preset", "superfast", "-pix_fmt", "yuv420p", str(path)], input=frames, check=True)
+    subprocess.run(["ffmpeg", "-v", "error", "-f", "rawvideo", "-pix_fmt", "gray", "-s", "320x180", "-r", "30",
+                    "-i", "-", "-c:v", "libx264", "-preset", "superfast", "-pix_fmt", "yuv420p", str(path)],
+                   input=frames, check=True, timeout=60)
 
 
 def test_counters_are_read_back(tmp_path):
@@ -64,3 +67,14 @@ def test_a_broken_movie_is_a_failure(tmp_path):
         movie.streams(tmp_path / "a.mov")
     with pytest.raises(AssertionError):
         movie.discover(tmp_path / "a.mov")
+
+
+@pytest.mark.parametrize("way", ["local socket", "tunnel"])
+def test_what_the_daemon_has_not_read_is_seen(agent, server, way):
+    with agent.connect() if way == "local socket" else server.peer as peer:
+        agent.sandbox.signal(signal.SIGSTOP)
+        peer.sendall(b"STATUS")
+        assert not all_read(agent, peer)
+        agent.sandbox.signal(signal.SIGCONT)
+        wait_read(agent, peer)
+        assert all_read(agent, peer)

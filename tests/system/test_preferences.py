@@ -4,19 +4,22 @@ import plistlib
 
 import pytest
 from harness.agent import DEFAULTS, PREFERENCES, SERVER_UUID
+from harness.log_reader import Level
 from harness.waiting import wait_until
 
-UNBOUND = (3, "lmxagentd cannot run in agent mode without being bound to a Lumex server.")
-INVALID_CONTINUOUS = (2, "Continuous capture is enabled, but the preferences are invalid.")
-NO_SECRET = (3, f"Failed to read shared secret from plist: /var/lmx/agent/secrets/{SERVER_UUID}.plist")
+UNBOUND = (Level.ERROR, "lmxagentd cannot run in agent mode without being bound to a Lumex server.")
+INVALID_CONTINUOUS = (Level.CRITICAL, "Continuous capture is enabled, but the preferences are invalid.")
+NO_INPUT_FILE = (Level.CRITICAL, '"RecordingPath" tag was not found or value is empty, this field is required for the '
+                                 '"File" recording type')
+NO_SECRET = (Level.ERROR, f"Failed to read shared secret from plist: /var/lmx/agent/secrets/{SERVER_UUID}.plist")
 
 
 def required(name):
-    return (2, f'"{name}" tag was not found or value is empty, this field is required')
+    return (Level.CRITICAL, f'"{name}" tag was not found or value is empty, this field is required')
 
 
 def no_context(reason):
-    return (2, f"Unable to load the recording context, exception = {reason}")
+    return (Level.CRITICAL, f"Unable to load the recording context, exception = {reason}")
 
 
 BROKEN = {
@@ -37,9 +40,7 @@ BROKEN = {
                            [no_context("Invalid value: audio for preference: RecordingType")]),
     "no microphone of that name": ({"RecordingAudioInput": "alsa:nowhere"},
                                    [no_context("Unknown device ID: alsa:nowhere for preference: RecordingAudioInput")]),
-    "File without a path": ({"RecordingType": "File"},
-                            [(2, '"RecordingPath" tag was not found or value is empty, this field is required for the '
-                                 '"File" recording type')]),
+    "File without a path": ({"RecordingType": "File"}, [NO_INPUT_FILE]),
     "no cutoff": ({"RecordingDiskSpaceCutoffInMB": None}, [required("RecordingDiskSpaceCutoffInMB")]),
     "empty cutoff": ({"RecordingDiskSpaceCutoffInMB": ""}, [required("RecordingDiskSpaceCutoffInMB")]),
     "no frame rate": ({"RecordingVideoMaximumFrameRate": None}, [required("RecordingVideoMaximumFrameRate")]),
@@ -57,10 +58,10 @@ BROKEN = {
 def disabled(agent):
     """The daemon disables its own service, which it can't in here, and ends."""
     status = agent.wait_exit()
-    agent.log.wait(r"^Disabling lmxagentd with keeperd\.\.\.$", level=5)
+    agent.log.wait(r"^Disabling lmxagentd with keeperd\.\.\.$", level=Level.NOTICE)
     assert status in (78, 71)
     if status == 71:
-        agent.log.wait(r"^Removing job from keeperd\.$", level=2)
+        agent.log.wait(r"^Removing job from keeperd\.$", level=Level.CRITICAL)
     assert not agent.path("/var/run/lmxagentd.pid").exists()
 
 
@@ -70,7 +71,7 @@ def test_broken_preferences(agent, case):
     agent.preferences(**changes)
     agent.start(wait=False)
     disabled(agent)
-    agent.log.wait("^Internal error caused application to stop$", level=2)
+    agent.log.wait("^Internal error caused application to stop$", level=Level.CRITICAL)
     for level, text in lines:
         assert [l for l in agent.log.lines(level=level) if text in l.text], (text, agent.report())
 
@@ -115,7 +116,7 @@ def test_a_malformed_property_list_is_named(agent, data):
     agent.preferences_bytes(data)
     agent.start(wait=False)
     disabled(agent)
-    assert [l for l in agent.log.lines(PREFERENCES) if l.level <= 3], agent.report()
+    assert [l for l in agent.log.lines(PREFERENCES) if l.level <= Level.ERROR], agent.report()
 
 
 def test_a_binary_property_list_is_read(agent):
@@ -130,42 +131,42 @@ def profile(agent):
 
 def test_a_replaced_file_is_noticed(running):
     running.preferences(CameraName="Hall 4")
-    wait_until(lambda: profile(running) == "Hall 4", 5, "the new name")
+    wait_until(lambda: profile(running) == "Hall 4", what="the new name")
     running.preferences(CameraName="Hall 5")
-    wait_until(lambda: profile(running) == "Hall 5", 5, "the next name")
+    wait_until(lambda: profile(running) == "Hall 5", what="the next name")
 
 
 def test_an_edit_in_place_is_noticed_but_not_read(running):
     before = running.log.mark()
     path = running.path(PREFERENCES)
     path.write_bytes(path.read_bytes().replace(b"Hall 3", b"Hall 9"))
-    running.log.wait(r"^Reading preferences\.\.\.$", after=before, level=6)
+    running.log.wait(r"^Reading preferences\.\.\.$", after=before, level=Level.INFO)
     assert profile(running) == "Hall 3"
 
 
 def test_a_file_replaced_by_a_broken_one_disables_the_service(running):
     running.preferences(TunnelHost=None)
     disabled_after_change(running)
-    assert [l for l in running.log.lines(level=2) if l.text == required("TunnelHost")[1]]
+    assert [l for l in running.log.lines(level=Level.CRITICAL) if l.text == required("TunnelHost")[1]]
 
 
 def test_a_file_replaced_by_a_malformed_one_is_named_and_disables_the_service(running):
     mark = running.log.mark()
     running.preferences_bytes(b"no property list")
     disabled_after_change(running)
-    assert [l for l in running.log.lines(PREFERENCES, after=mark) if l.level <= 3], running.report()
+    assert [l for l in running.log.lines(PREFERENCES, after=mark) if l.level <= Level.ERROR], running.report()
 
 
 def test_a_deleted_file_disables_the_service(running):
     running.path(PREFERENCES).unlink()
     disabled_after_change(running)
-    assert len(running.log.lines("^The agent preferences file has been deleted$", level=2)) == 1
-    assert [l for l in running.log.lines(level=3) if l.text == UNBOUND[1]]
+    assert len(running.log.lines("^The agent preferences file has been deleted$", level=Level.CRITICAL)) == 1
+    assert [l for l in running.log.lines(level=Level.ERROR) if l.text == UNBOUND[1]]
 
 
 def disabled_after_change(agent):
     assert agent.wait_exit() in (78, 71)
-    agent.log.wait(r"^Disabling lmxagentd with keeperd\.\.\.$", level=5)
+    agent.log.wait(r"^Disabling lmxagentd with keeperd\.\.\.$", level=Level.NOTICE)
 
 
 def test_an_old_preview_interval_is_converted(agent):
@@ -176,7 +177,7 @@ def test_an_old_preview_interval_is_converted(agent):
     assert "RecordingPreviewIntervalInSeconds" not in content
 
 
-def test_the_listener_port_is_told(agent):
+def test_the_listener_port_is_logged(agent):
     agent.preferences(TCPListenerPort="8170")
     agent.start()
-    agent.log.wait("^TCP listener port: 8170$", level=5)
+    agent.log.wait("^TCP listener port: 8170$", level=Level.NOTICE)

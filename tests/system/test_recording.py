@@ -1,10 +1,11 @@
 """A recording from START to the submitted movie, with the synthetic camera and microphone."""
 import re
-import time
 
 import pytest
 from harness import movie
 from harness.agent import DEFAULTS, REPOSITORY
+from harness.log_reader import Level
+from harness.waiting import let_pass
 
 FPS = 30
 
@@ -12,7 +13,7 @@ FPS = 30
 def test_a_recording_of_ten_seconds(running):
     start = running.start_recording("TALK-1", RecordingMetadata_TITLE="My Talk & <more>")
     assert start.text == "cmdStatus=0"
-    time.sleep(10)
+    running.let_record(10)
     stop = running.command("STOP")
     assert stop.text == "cmdStatus=0"
     wanted = stop.sent - start.received
@@ -21,7 +22,7 @@ def test_a_recording_of_ten_seconds(running):
     assert abs(seconds - wanted) <= 1
     call = running.wait_tool_call("TALK-1")
     assert call["arguments"] == ["--server", DEFAULTS["LumexURL"], "--submit", "--recording", "TALK-1", "--delete"]
-    running.log.wait("^Post-process mechanism completed with success$", level=6)
+    running.log.wait("^Post-process mechanism completed with success$", level=Level.INFO)
 
     path = running.movie("TALK-1")
     streams = movie.streams(path)
@@ -58,30 +59,28 @@ def check_document(document, start, stop, seconds):
 def test_log_lines_of_a_recording(running):
     running.start_recording("TALK-2")
     path = re.escape(f"{REPOSITORY}/TALK-2.mov")
-    running.log.wait(rf'^"{path}" recording started$', level=5)
-    time.sleep(1)
+    running.log.wait(rf'^"{path}" recording started$', level=Level.NOTICE)
+    running.let_record(1)
     running.command("PAUSE")
-    running.log.wait(rf'^"{path}" recording paused \(current duration: [01]s\)$', level=5)
+    running.log.wait(rf'^"{path}" recording paused \(current duration: [12]s\)$', level=Level.NOTICE)
     running.command("RESUME")
-    running.log.wait(rf'^"{path}" recording resumed$', level=5)
+    running.log.wait(rf'^"{path}" recording resumed$', level=Level.NOTICE)
     running.command("STOP")
     running.wait_recorded("TALK-2")
     running.wait_tool_call("TALK-2")
     for text in ("Post-process mechanism is starting...", "Completion in progress...",
                  "Recording completed with success", "Post-process mechanism completed with success"):
-        running.log.wait("^" + re.escape(text) + "$", level=6)
-    running.log.wait("^/usr/bin/lumex --server lumex.example.test --submit --recording TALK-2 --delete $", level=7)
-    assert not running.log.lines(level=2) and not running.log.lines(level=1)
+        running.log.wait("^" + re.escape(text) + "$", level=Level.INFO)
+    running.log.wait("^/usr/bin/lumex --server lumex.example.test --submit --recording TALK-2 --delete $",
+                     level=Level.DEBUG)
+    assert not running.log.lines(level=Level.CRITICAL) and not running.log.lines(level=Level.ALERT)
 
 
 def test_start_at_reference_settings(agent):
     """The default size of the synthetic camera, another frame rate."""
     agent.preferences(RecordingVideoInput="test://video", RecordingVideoMaximumFrameRate="25")
     agent.start()
-    agent.start_recording("HD")
-    time.sleep(3)
-    agent.command("STOP")
-    agent.wait_recorded("HD")
+    agent.record("HD")
     stream = movie.streams(agent.movie("HD"))["video"]
     assert (stream.width, stream.height, stream.rate) == (1280, 720, "25/1")
 
@@ -90,24 +89,20 @@ def test_start_at_reference_settings(agent):
 def test_one_medium_only(agent, kind, kinds):
     agent.preferences(RecordingType=kind)
     agent.start()
-    assert agent.start_recording("ONE").text == "cmdStatus=0"
-    time.sleep(3)
-    agent.command("STOP")
-    agent.wait_recorded("ONE")
+    start, stop = agent.record("ONE", 2)
     agent.wait_tool_call("ONE")
     streams = movie.streams(agent.movie("ONE"))
     assert set(streams) == kinds
-    assert all(2.8 < stream.duration < 3.4 for stream in streams.values())
+    wanted = stop.sent - start.received
+    assert all(abs(stream.duration - wanted) < 0.3 for stream in streams.values()), (streams, wanted)
     assert agent.document("ONE")["RecordingMetadata_TYPE"] == kind
 
 
 def test_audio_only_lasts_one_recording(running):
-    for uuid, extra, kinds in (("A", {"RecordingMetadata_AUDIO_ONLY": "true"}, {"audio"}), ("B", {}, {"audio", "video"})):
-        assert running.start_recording(uuid, **extra).text == "cmdStatus=0"
-        time.sleep(2)
-        running.command("STOP")
-        running.wait_recorded(uuid)
-        assert set(movie.streams(running.movie(uuid))) == kinds
+    running.record("A", RecordingMetadata_AUDIO_ONLY="true")
+    running.record("B")
+    assert set(movie.streams(running.movie("A"))) == {"audio"}
+    assert set(movie.streams(running.movie("B"))) == {"audio", "video"}
     assert running.document("A")["RecordingMetadata_TYPE"] == "Audio"
     assert running.document("B")["RecordingMetadata_TYPE"] == "Audio+Video"
 
@@ -115,10 +110,10 @@ def test_audio_only_lasts_one_recording(running):
 def test_pause_and_resume_twice(running):
     replies = {"start0": running.start_recording("PAUSES")}
     for part in (0, 1, 2):
-        time.sleep(2)
+        running.let_record(2 * (part + 1))
         replies[f"stop{part}"] = running.command("PAUSE" if part < 2 else "STOP")
         if part < 2:
-            time.sleep(1)
+            let_pass(1, "a pause of a second")
             replies[f"start{part + 1}"] = running.command("RESUME")
     assert {reply.text for reply in replies.values()} == {"cmdStatus=0"}
     running.wait_recorded("PAUSES")
@@ -155,13 +150,11 @@ def test_status_in_a_pause(running):
 def test_cancel_leaves_nothing_behind(running):
     before = running.repository()
     running.start_recording("GONE")
-    time.sleep(2)
+    running.let_record(1)
     assert running.command("CANCEL").text == "cmdStatus=0"
-    running.log.wait("Process cancelCapture", level=7)
-    assert running.start_recording("KEPT").text == "cmdStatus=0"
-    time.sleep(1)
-    running.command("STOP")
+    running.log.wait("Process cancelCapture", level=Level.DEBUG)
+    running.record("KEPT")
     running.wait_tool_call("KEPT")
     running.log.wait("^Post-process mechanism completed with success$")
     assert sorted(set(running.repository()) - set(before)) == ["KEPT.mov", "KEPT.xml"]
-    assert [call["arguments"][4] for call in running.tool_calls()] == ["KEPT"]
+    assert running.submitted() == ["KEPT"]

@@ -1,4 +1,5 @@
 // Plays the server for one agent at a time: shows what it says, sends it what is typed or scripted.
+#include <editline/readline.h>
 #include <getopt.h>
 #include <netdb.h>
 #include <poll.h>
@@ -12,8 +13,7 @@
 #include <memory>
 #include <thread>
 
-#include <editline/readline.h>
-
+#include "model/codes.h"
 #include "support/scan.h"
 #include "support/unique_fd.h"
 #include "tools/lmx-tunnel/server_side.h"
@@ -102,7 +102,7 @@ class Connection {
   [[nodiscard]] int descriptor() const { return socket_.get(); }
 
   /// Takes the hello. @return false when there is none
-  bool begin(const TunnelCipher::Key& secret) {
+  bool begin(const CipherBlock& secret) {
     const auto line = readLine(kReplyPatience);
     const auto hello = line ? parseHello(*line) : std::nullopt;
     if (!hello) {
@@ -267,12 +267,12 @@ bool converse(Connection& agent) {
 }
 
 int serve(const Options& options) {
-  std::string problem;
-  const auto secret = readSecret(options.secret, problem);
+  const auto secret = readSecret(options.secret);
   if (!secret) {
-    std::fprintf(stderr, "lmx-tunnel: %s: %s\n", options.secret.c_str(), problem.c_str());
+    std::fprintf(stderr, "lmx-tunnel: %s: %s\n", options.secret.c_str(), secret.error().message.c_str());
     return kExitFailed;
   }
+  std::string problem;
   const UniqueFd listener = listenOn(options, problem);
   if (!listener.valid()) {
     std::fprintf(stderr, "lmx-tunnel: can't listen on %s:%d: %s\n", options.address.c_str(), options.port,

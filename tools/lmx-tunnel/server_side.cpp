@@ -5,22 +5,19 @@
 #include <map>
 #include <string_view>
 
-#include "control/tunnel/message_cipher.h"
 #include "platform/plist/property_list.h"
 #include "support/base64.h"
-#include "support/heap_ptr.h"
 
 namespace lmx {
 namespace {
 
 constexpr std::string_view kPreview = ",preview=";
 
-std::optional<TunnelCipher::Key> keyFrom(const std::string& base64) {
-  std::size_t size = 0;
-  const heap_ptr<unsigned char> bytes(lmp_decode_base64(base64.c_str(), &size));
-  TunnelCipher::Key key{};
-  if (!bytes || size != key.size()) return std::nullopt;
-  std::copy_n(bytes.get(), size, key.begin());
+std::optional<CipherBlock> keyFrom(const std::string& base64) {
+  const auto bytes = lmp_decode_base64(base64);
+  CipherBlock key{};
+  if (!bytes || bytes->size() != key.size()) return std::nullopt;
+  std::copy(bytes->begin(), bytes->end(), key.begin());
   return key;
 }
 
@@ -48,31 +45,21 @@ std::optional<AgentHello> parseHello(const std::string& line) {
 }
 
 std::optional<std::string> TunnelCipher::encrypted(const std::string& command) const {
-  const heap_ptr<unsigned char> random(agent_random_bytes(kRandomPrefix));
-  if (!random) return std::nullopt;
-  const std::string plaintext =
-      std::string(reinterpret_cast<const char*>(random.get()), kRandomPrefix) + command;
-  const heap_ptr<char> text(agent_encrypt_message(vector_.data(), secret_.data(), plaintext.data(),
-                                                  static_cast<std::uint32_t>(plaintext.size()), nullptr));
+  const auto text = agent_encrypt_message(vector_, secret_, agent_random_bytes(kRandomPrefix) + command);
   if (!text) return std::nullopt;
-  return std::string(text.get()) + "\n";
+  return *text + "\n";
 }
 
 std::optional<std::string> TunnelCipher::decrypted(const std::string& line) const {
-  std::uint32_t size = 0;
-  const heap_ptr<unsigned char> plaintext(agent_decrypt_message(
-      vector_.data(), secret_.data(), line.c_str(), static_cast<std::uint32_t>(line.size()), &size));
+  const auto plaintext = agent_decrypt_message(vector_, secret_, line);
   if (!plaintext) return std::nullopt;
-  return std::string(reinterpret_cast<const char*>(plaintext.get()) + kRandomPrefix);
+  return messageIn(*plaintext);
 }
 
 std::optional<std::string> previewIn(const std::string& reply) {
   const auto found = reply.find(kPreview);
   if (found == std::string::npos) return std::nullopt;
-  std::size_t size = 0;
-  const heap_ptr<unsigned char> bytes(lmp_decode_base64(reply.c_str() + found + kPreview.size(), &size));
-  if (!bytes) return std::nullopt;
-  return std::string(reinterpret_cast<const char*>(bytes.get()), size);
+  return lmp_decode_base64(std::string_view(reply).substr(found + kPreview.size()));
 }
 
 std::string shortened(const std::string& reply) {
@@ -86,18 +73,13 @@ bool getsReply(const std::string& command) {
   return !command.starts_with("X-") && !command.starts_with("SERVER") && !command.starts_with("ERR");
 }
 
-std::optional<TunnelCipher::Key> readSecret(const std::string& path, std::string& problem) {
+Result<CipherBlock> readSecret(const std::string& path) {
   const PlistResult file = readPropertyList(path);
-  const PlistDictionary* dictionary = file.value ? file.value->dictionary() : nullptr;
-  const auto found =
-      dictionary == nullptr ? PlistDictionary::const_iterator{} : dictionary->find("lmx_secret");
-  if (dictionary == nullptr || found == dictionary->end() || found->second.string() == nullptr) {
-    problem = file.problem.empty() ? "it has no text under \"lmx_secret\"" : file.problem;
-    return std::nullopt;
-  }
-  auto key = keyFrom(*found->second.string());
-  if (!key) problem = "the text under \"lmx_secret\" is not the Base64 form of 16 bytes";
-  return key;
+  const std::string* text = file ? file->textUnder("lmx_secret") : nullptr;
+  if (text == nullptr) return file ? Error{"it has no text under \"lmx_secret\""} : file.error();
+  const auto key = keyFrom(*text);
+  if (!key) return Error{"the text under \"lmx_secret\" is not the Base64 form of 16 bytes"};
+  return *key;
 }
 
 }  // namespace lmx

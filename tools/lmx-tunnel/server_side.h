@@ -1,10 +1,11 @@
 // The server's side of the tunnel, as far as a person who sets up or debugs an agent needs it. Pure.
 #pragma once
-#include <array>
-#include <cstddef>
 #include <optional>
 #include <string>
 #include <vector>
+
+#include "control/tunnel/message_cipher.h"
+#include "support/result.h"
 
 namespace lmx {
 
@@ -12,7 +13,7 @@ namespace lmx {
 struct AgentHello {
   std::string agentUUID;
   std::string version;
-  std::array<unsigned char, 16> vector{};
+  CipherBlock vector{};
   bool offline = false;
 };
 
@@ -22,8 +23,7 @@ std::optional<AgentHello> parseHello(const std::string& line);
 /// Encrypts and decrypts the lines of one connection.
 class TunnelCipher {
  public:
-  using Key = std::array<unsigned char, 16>;
-  TunnelCipher(const Key& secret, const Key& vector) : secret_(secret), vector_(vector) {}
+  TunnelCipher(const CipherBlock& secret, const CipherBlock& vector) : secret_(secret), vector_(vector) {}
 
   /// The line on the wire for a command, with its line feed; nothing when memory fails.
   [[nodiscard]] std::optional<std::string> encrypted(const std::string& command) const;
@@ -31,8 +31,8 @@ class TunnelCipher {
   [[nodiscard]] std::optional<std::string> decrypted(const std::string& line) const;
 
  private:
-  Key secret_;
-  Key vector_;
+  CipherBlock secret_;
+  CipherBlock vector_;
 };
 
 /// The JPEG picture in a reply to STATUS; nothing when there is none.
@@ -44,7 +44,7 @@ std::string shortened(const std::string& reply);
 /// Whether the agent answers a command of that text.
 bool getsReply(const std::string& command);
 
-/// The 16 bytes under "lmx_secret" in the property list `path`. @param problem  gets the reason for nothing
-std::optional<TunnelCipher::Key> readSecret(const std::string& path, std::string& problem);
+/// The 16 bytes under "lmx_secret" in the property list `path`. The error doesn't name the path.
+Result<CipherBlock> readSecret(const std::string& path);
 
 }  // namespace lmx

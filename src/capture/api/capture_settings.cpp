@@ -7,7 +7,7 @@ namespace lmx {
 
 std::string describe(const LMRRecordingContext& context) {
   static constexpr const char* kTypes[] = {"Audio+Video", "Audio", "Video", "File"};
-  return formatted(
+  return string_with_format(
       "type %s, video %s, audio %s, repository %s, disk cut-off %lld MB, preview every %lld ms, continuous "
       "%s",
       kTypes[static_cast<int>(context.captureType)],

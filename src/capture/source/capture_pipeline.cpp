@@ -54,8 +54,9 @@ void giveBack(const std::string& key) {
 }  // namespace
 
 std::string CaptureSource::key() const {
-  return formatted("%s|%s|%d/%d|%d|%d", videoDevice.value_or("-").c_str(), audioDevice.value_or("-").c_str(),
-                   frameRate.numerator, frameRate.denominator, sampleRate, channels);
+  return string_with_format("%s|%s|%d/%d|%d|%d", videoDevice.value_or("-").c_str(),
+                            audioDevice.value_or("-").c_str(), frameRate.numerator, frameRate.denominator,
+                            sampleRate, channels);
 }
 
 CapturePipeline::Lease CapturePipeline::acquire(const CaptureSource& source, CaptureError* error) {

@@ -45,7 +45,7 @@ double largest(const Numbers& numbers) { return numbers.empty() ? 0 : *numbers.b
 std::string joined(const Numbers& numbers) {
   std::string text;
   for (const double number : numbers) {
-    if (number > 0) text += (text.empty() ? "" : "/") + formatted("%.5g", number);
+    if (number > 0) text += (text.empty() ? "" : "/") + string_with_format("%.5g", number);
   }
   return text;
 }
@@ -72,7 +72,8 @@ std::string formatsText(const GstCaps* caps, bool video) {
   for (const auto& [key, numbers] : rates) {
     const std::string second = joined(numbers);
     if (!text.empty()) text += ", ";
-    text += video ? formatted("%.0fx%.0f", key.first, key.second) : formatted("%.0f Hz", key.first);
+    text += video ? string_with_format("%.0fx%.0f", key.first, key.second)
+                  : string_with_format("%.0f Hz", key.first);
     if (!second.empty()) text += video ? " at " + second + " fps" : " with " + second + " channels";
   }
   return text;

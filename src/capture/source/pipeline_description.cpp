@@ -12,7 +12,7 @@ std::string sink(const std::string& name, bool paced) {
          " max-buffers=0 enable-last-sample=false qos=false ";
 }
 
-std::string rateText(FrameRate rate) { return formatted("%d/%d", rate.numerator, rate.denominator); }
+std::string rateText(FrameRate rate) { return string_with_format("%d/%d", rate.numerator, rate.denominator); }
 
 std::string videoConversion(FrameRate rate) {
   // Up to full HD and even sizes: what every encoder and player takes.
@@ -22,7 +22,7 @@ std::string videoConversion(FrameRate rate) {
 }
 
 std::string audioConversion(int sampleRate, int channels) {
-  return formatted(
+  return string_with_format(
       "audioconvert ! audioresample ! audio/x-raw,format=F32LE,layout=interleaved,rate=%d,channels=%d ! ",
       sampleRate, channels);
 }
@@ -38,7 +38,7 @@ std::string quoted(const std::string& uri) {
 
 std::string testVideo(const DeviceID& id, FrameRate rate) {
   const PictureSize size = pictureSize(id);
-  return formatted(
+  return string_with_format(
              "videotestsrc name=vsource is-live=%s pattern=smpte horizontal-speed=4 ! "
              "video/x-raw,format=I420,width=%d,height=%d,framerate=%s,pixel-aspect-ratio=1/1 ! ",
              id.asFastAsPossible() ? "false" : "true", size.width, size.height, rateText(rate).c_str()) +
@@ -47,7 +47,7 @@ std::string testVideo(const DeviceID& id, FrameRate rate) {
 
 std::string testAudio(const DeviceID& id, int sampleRate, int channels) {
   // A tick every second of running time: with the frame numbers it proves picture and sound to be together.
-  return formatted(
+  return string_with_format(
              "audiotestsrc name=asource is-live=%s wave=ticks freq=1000 samplesperbuffer=%d ! "
              "audio/x-raw,format=F32LE,layout=interleaved,rate=%d,channels=%d ! ",
              id.asFastAsPossible() ? "false" : "true", sampleRate / 100, sampleRate, channels) +

@@ -85,7 +85,8 @@ void drawClock(const LumaPlane& plane, const std::string& text) {
 
 std::string clockText(double seconds) {
   const auto ms = static_cast<long long>(std::llround(seconds * 1000));
-  return formatted("%02lld:%02lld:%02lld.%03lld", ms / 3600000, ms / 60000 % 60, ms / 1000 % 60, ms % 1000);
+  return string_with_format("%02lld:%02lld:%02lld.%03lld", ms / 3600000, ms / 60000 % 60, ms / 1000 % 60,
+                            ms % 1000);
 }
 
 }  // namespace lmx

@@ -25,7 +25,7 @@ std::string escaped(const std::string& word) {
   for (const char c : word) {
     const auto u = static_cast<unsigned char>(c);
     if (u <= ' ' || c == '%' || u == 0x7F) {
-      out += formatted("%%%02X", u);
+      out += string_with_format("%%%02X", u);
     } else {
       out += c;
     }
@@ -55,7 +55,7 @@ std::vector<std::string> wordsOf(const std::string& line) {
   return words;
 }
 
-std::string number(double v) { return formatted("%.7f", v); }
+std::string number(double v) { return string_with_format("%.7f", v); }
 double real(const std::string& text) { return std::strtod(text.c_str(), nullptr); }
 std::uint32_t count(const std::string& text) {
   return static_cast<std::uint32_t>(std::strtoul(text.c_str(), nullptr, 10));
@@ -187,7 +187,8 @@ void Journal::append(const std::vector<std::string>& words) {
 }
 
 void Journal::capture(int recordingType, double frameSeconds, double wallOffset) {
-  append({"capture", std::to_string(recordingType), formatted("%.12f", frameSeconds), number(wallOffset)});
+  append({"capture", std::to_string(recordingType), string_with_format("%.12f", frameSeconds),
+          number(wallOffset)});
 }
 void Journal::run(const MovieRun& r) { append({"run", number(r.sessionTime), std::to_string(r.firstFrame)}); }
 void Journal::start(const std::string& uuid, double t, const SharedDictionary& parameters) {

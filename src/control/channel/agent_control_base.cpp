@@ -22,7 +22,7 @@ AgentControlBase::AgentControlBase(std::shared_ptr<AgentContext> context, AgentA
       actions_(actions),
       agentContext_(std::move(context)),
       wake_(::eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK)) {
-  setProperties(std::make_shared<const Dictionary>());
+  properties.set(std::make_shared<const Dictionary>());
 }
 
 AgentControlBase::~AgentControlBase() {
@@ -107,7 +107,7 @@ void AgentControlBase::stop() {
     return;
   }
   disconnect();
-  setProperties(nullptr);
+  properties.set(nullptr);
   agentContext_.set(nullptr);
 }
 

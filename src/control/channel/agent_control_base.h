@@ -118,8 +118,7 @@ class AgentControlBase {
   void setNetTransitionTime(std::int64_t v) { netTransitionTime_ = v; }
 
   /// Recording properties that came with the last START; null once the channel has stopped itself.
-  LMX_SHARED_FIELD(SharedDictionary, properties, setProperties)
-  LMX_SHARED_FIELD(Text, local_configuration_file_path, setLocal_configuration_file_path)
+  SharedValue<SharedDictionary> properties;
 
  public:
   /// Whether every command but USERAUTH is to be refused.

@@ -10,7 +10,7 @@ namespace {
 
 class SystemChannelClock final : public ChannelClock {
  public:
-  std::optional<TimeValue> now() override { return currentTime(); }
+  std::optional<TimeValue> now() override { return lmp_gettimeofday(); }
   void sleep(std::chrono::milliseconds span, int wake, int other) override {
     std::array<pollfd, 2> waited{{{wake, POLLIN, 0}, {other, POLLIN, 0}}};
     // A signal may end the sleep early: the callers look at their own condition again.

@@ -23,7 +23,7 @@ constexpr auto kReceiveWait = 2s;
 }  // namespace
 
 bool contactIsLost(const TimeValue& now, const TimeValue& lastContact) {
-  return lmp_diff_timeval(&now, &lastContact) >= kContactLostMilliseconds;
+  return lmp_diff_timeval(now, lastContact) >= kContactLostMilliseconds;
 }
 
 int AgentControlBase::run() {
@@ -41,8 +41,8 @@ bool AgentControlBase::connectWithBackOff() {
   for (auto delay = kFirstBackOff; serverSocket_ == -1;) {
     if (!running_) return false;
     if (connect() != 1) continue;
-    logInfo(
-        formatted("Failed to connect to server, retrying in %d seconds.", static_cast<int>(delay.count())));
+    logInfo(string_with_format("Failed to connect to server, retrying in %d seconds.",
+                               static_cast<int>(delay.count())));
     if (running_) clock_.sleep(delay, wakeDescriptor(), previousPeerIfAlive());  // a stop ends it at once
     if (takeBackPreviousPeer()) break;
     delay = nextBackOff(delay);
@@ -74,11 +74,11 @@ bool AgentControlBase::networkHasChanged() {
 
 bool AgentControlBase::lastContactTimedOut() {
   const auto session = this->session();
-  const auto last = session ? session->lastContact() : std::nullopt;
+  const auto last = session ? session->lastContact.get() : std::nullopt;
   if (!last) return false;
   const auto now = clock_.now();
   if (!now || !contactIsLost(*now, *last)) return false;
-  session->setLastContact(std::nullopt);
+  session->lastContact.set(std::nullopt);
   LMPLogMessage(logContext(), kLogNotice, "Too long since last contact from server.  Reconnecting...");
   return true;
 }
@@ -137,7 +137,7 @@ int AgentControlBase::acceptPeer(int listening) {
   const int peer = ::accept4(listening, nullptr, nullptr, SOCK_CLOEXEC);
   const int error = errno;
   setServerSocket(peer);
-  logInfo(formatted("accepted connection fd = %d from listen fd = %d", peer, listening));
+  logInfo(string_with_format("accepted connection fd = %d from listen fd = %d", peer, listening));
   if (peer == -1) {
     // The peer stays in the queue while the machine has no descriptor for it: don't spin on that.
     if (error == EMFILE || error == ENFILE || error == ENOBUFS || error == ENOMEM) {

@@ -23,23 +23,23 @@ std::int32_t hardStopSeconds(const std::string& minutes) {
 int AgentControlBase::configure(const Dictionary* parameters) {
   if (parameters == nullptr) return 1;
   const auto own = std::make_shared<const Dictionary>(*parameters);
-  setProperties(own);
+  properties.set(own);
   const auto context = agentContext();
   const auto session = context ? context->record_context() : nullptr;
   const auto given = [&](const char* key) { return lookUp(own, key).value_or(""); };
 
   if (const auto minutes = given("RecordingMetadata_MAX_RECORDING_MINUTES"); session && !minutes.empty()) {
-    session->setRecordHardStopTimeSeconds(hardStopSeconds(minutes));
+    session->stop_times.setRecordHardStopTimeSeconds(hardStopSeconds(minutes));
   }
   if (const auto minutes = given("RecordingMetadata_UNATTENDED_RECORDING_MINUTES");
       session && !minutes.empty()) {
-    session->setMaxUnattendedRecordingMinutes(decimalValue(minutes));
+    session->stop_times.maxUnattendedRecordingMinutes.set(decimalValue(minutes));
   }
   if (const auto user = given("RecordingMetadata_AGENT_USERNAME"); context && !user.empty()) {
-    context->setUser(user);
+    context->options.user.set(user);
   }
   if (const auto password = given("RecordingMetadata_AGENT_PASSWORD"); context && !password.empty()) {
-    context->setPassword(password);
+    context->options.password.set(password);
   }
   return 0;
 }

@@ -3,6 +3,7 @@
 #include "control/channel/agent_control_base.h"
 #include "control/protocol/command_parser.h"
 #include "control/protocol/command_text.h"
+#include "model/codes.h"
 #include "platform/identifiers.h"
 #include "record/agent_record.h"
 #include "record/preview_controller.h"
@@ -30,14 +31,14 @@ bool AgentControlBase::performOnMain(AgentActions::Action action, Wait wait) {
 /// In continuous mode the capture runs all the time and the commands only mark times.
 bool AgentControlBase::continuous() const {
   const auto context = agentContext();
-  const auto info = context ? context->continuous() : std::nullopt;
+  const auto info = context ? context->recording.continuous.get() : std::nullopt;
   return info && info->enabled;
 }
 
 /// The moment that counts as now, on the scale of the marks.
 double AgentControlBase::shiftedReferenceTime() const {
   const auto context = agentContext();
-  return secondsSinceReferenceDate() - (context ? context->timeshift_seconds() : 0);
+  return secondsSinceReferenceDate() - (context ? context->state.timeshift_seconds.get() : 0);
 }
 
 void AgentControlBase::handleSTART(const Dictionary* parameters) {
@@ -55,41 +56,41 @@ void AgentControlBase::handleSTART(const Dictionary* parameters) {
   }
   const auto session = context->record_context();
   if (session &&
-      session->status() == kRecorderIdle) {  // what an earlier recording has left would end this one
-    session->setHardStopTime(std::nullopt);
-    session->setSoftStopTime(std::nullopt);
+      session->status.get() == kRecorderIdle) {  // what an earlier recording has left would end this one
+    session->stop_times.hardStopTime.set(std::nullopt);
+    session->stop_times.softStopTime.set(std::nullopt);
   }
   if (configure(parameters) != 0) return sendReply("cmdStatus=1");
 
   if (session && isTrue(parameters, "RecordingMetadata_AUDIO_ONLY")) {
-    session->setRecordingType(kRecordingTypeAudio);
+    session->recordingType.set(kRecordingTypeAudio);
     LMPLogMessage(context->log_context(), kLogDebug,
                   "RecordingMetadata_AUDIO_ONLY: switching to audio-only recording type");
   }
-  context->setStatus(0);
-  const SharedDictionary recording_properties = properties();
-  context->setProperties(recording_properties);
+  context->state.status.set(0);
+  const SharedDictionary recording_properties = properties.get();
+  context->state.properties.set(recording_properties);
   if (!continuous() && actions() != nullptr &&
       !performOnMain(&AgentActions::prepareCapture, Wait::untilDone)) {
     // The main loop has ended, so nothing was prepared: the peer must not take this for a recording.
-    context->setStatus(kRecordInvalidType);
+    context->state.status.set(kRecordInvalidType);
   }
   if (session) {
     const std::string request = newUUIDString();
-    session->setRequest_uuid(request);
-    session->setRequest_properties(recording_properties);
-    if (const auto capture = session->captureController()) {
+    session->request_uuid.set(request);
+    session->request_properties.set(recording_properties);
+    if (const auto capture = session->captureController.get()) {
       capture->setStartWithUUID(request, shiftedReferenceTime(), recording_properties);
     }
   }
-  sendReply(formatted("cmdStatus=%i", context->status()));
+  sendReply(string_with_format("cmdStatus=%i", context->state.status.get()));
 }
 
 void AgentControlBase::handleSTOP(const Dictionary*) {
   const auto session = this->session();
   if (!session) return sendReply(kNoSession);
-  if (const auto capture = session->captureController()) {
-    capture->setStopWithUUID(session->request_uuid(), shiftedReferenceTime());
+  if (const auto capture = session->captureController.get()) {
+    capture->setStopWithUUID(session->request_uuid.get(), shiftedReferenceTime());
   }
   performOnMain(&AgentActions::stopRecording, Wait::no);
   sendReply(kDone);
@@ -101,8 +102,8 @@ void AgentControlBase::handleSTOP(const Dictionary*) {
 void AgentControlBase::handlePAUSE(const Dictionary*) {
   const auto session = this->session();
   if (!session) return sendReply(kNoSession);
-  if (const auto capture = session->captureController()) {
-    capture->setStopWithUUID(session->request_uuid(), shiftedReferenceTime());
+  if (const auto capture = session->captureController.get()) {
+    capture->setStopWithUUID(session->request_uuid.get(), shiftedReferenceTime());
   }
   if (!continuous()) performOnMain(&AgentActions::pauseCapture, Wait::untilDone);
   sendReply(kDone);
@@ -112,8 +113,9 @@ void AgentControlBase::handleRESUME(const Dictionary*) {
   const auto session = this->session();
   if (!session) return sendReply(kNoSession);
   if (!continuous()) performOnMain(&AgentActions::resumeCapture, Wait::untilDone);
-  if (const auto capture = session->captureController()) {
-    capture->setStartWithUUID(session->request_uuid(), shiftedReferenceTime(), session->request_properties());
+  if (const auto capture = session->captureController.get()) {
+    capture->setStartWithUUID(session->request_uuid.get(), shiftedReferenceTime(),
+                              session->request_properties.get());
   }
   sendReply(kDone);
 }
@@ -121,8 +123,8 @@ void AgentControlBase::handleRESUME(const Dictionary*) {
 void AgentControlBase::handleCANCEL(const Dictionary*) {
   const auto session = this->session();
   if (!session) return sendReply(kNoSession);
-  if (const auto capture = session->captureController())
-    capture->cancelRequestWithUUID(session->request_uuid());
+  if (const auto capture = session->captureController.get())
+    capture->cancelRequestWithUUID(session->request_uuid.get());
   if (!continuous()) performOnMain(&AgentActions::cancelCapture, Wait::no);
   sendReply(kDone);
 }
@@ -132,7 +134,7 @@ void AgentControlBase::handleSERVER(const Dictionary* parameters) {
   const auto server = lookUp(parameters, "server_uuid");
   if (!version || !server) return sendReply(kMissingParameter);
   const auto context = agentContext();
-  const auto own = context ? context->server_uuid() : std::nullopt;
+  const auto own = context ? context->server.server_uuid.get() : std::nullopt;
   if (own == server) {
     LMPLogMessage(context->log_context(), kLogInfo, "Server is: %s", own->c_str());
   } else {
@@ -145,7 +147,7 @@ void AgentControlBase::handleXCMD(std::string_view verb, const Dictionary* param
   if (verb != "X-PREVIEW") return;
   const auto interval = lookUp(parameters, "refresh_milliseconds");
   const auto session = this->session();
-  const auto controller = session ? session->previewController() : nullptr;
+  const auto controller = session ? session->previewController.get() : nullptr;
   if (!interval || !controller) return;
   const std::shared_ptr<LMRPreviewControllerDelegate> delegate = controller->delegate();
   if (delegate) delegate->setFrameGrabInterval(decimalValue(*interval));

@@ -8,9 +8,8 @@
 #include "control/protocol/command_parser.h"
 #include "control/protocol/status_reply.h"
 #include "record/agent_record.h"
-#include "record/engine.h"
+#include "record/recording_status.h"
 #include "support/base64.h"
-#include "support/heap_ptr.h"
 
 namespace lmx {
 namespace {
@@ -29,26 +28,24 @@ std::optional<std::string> base64OfFile(const std::string& path) {
   std::string bytes(static_cast<std::size_t>(file.st_size), '\0');
   const ssize_t length = ::read(descriptor.get(), bytes.data(), bytes.size());
   if (length < 1) return std::nullopt;
-  const heap_ptr<char> text(lmp_encode_base64(bytes.data(), static_cast<std::size_t>(length), nullptr));
-  if (!text) return std::nullopt;
-  return text.get();
+  return lmp_encode_base64(std::string_view(bytes).substr(0, static_cast<std::size_t>(length)));
 }
 
 std::optional<std::string> previewImage(const AgentContext& context) {
-  const auto file = context.preview_file();
+  const auto file = context.recording.preview_file.get();
   return file ? base64OfFile(*file) : std::nullopt;
 }
 
 /// Levels of the running recording; an idle recorder listens to nothing.
 std::vector<double> powerLevels(const AgentRecord* session, int recordStatus) {
   const auto capture =
-      session != nullptr && recordStatus != kRecorderIdle ? session->captureController() : nullptr;
+      session != nullptr && recordStatus != kRecorderIdle ? session->captureController.get() : nullptr;
   return capture ? capture->audioAveragePowerLevels() : std::vector<double>();
 }
 
 bool recordingTypeSupportsVideoPreview(const AgentRecord* session) {
-  return session != nullptr && (session->recordingType() == kRecordingTypeAudioVideo ||
-                                session->recordingType() == kRecordingTypeVideo);
+  return session != nullptr && (session->recordingType.get() == kRecordingTypeAudioVideo ||
+                                session->recordingType.get() == kRecordingTypeVideo);
 }
 
 }  // namespace
@@ -71,7 +68,8 @@ void AgentControlBase::handleSTATUS(const Dictionary* parameters) {
     return;
   }
   if (isTrue(parameters, "include_profile")) {
-    reply += "," + profileFields(context->machine_name(), context->tunnel_host(), context->capture_preset());
+    reply += "," + profileFields(context->server.machine_name.get(), context->server.tunnel_host.get(),
+                                 context->recording.capture_preset.get());
   }
   if (preview) {
     reply += "," + previewFields(audioLevels(powerLevels(session.get(), status.recordStatus)), *preview);

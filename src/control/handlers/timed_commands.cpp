@@ -53,11 +53,11 @@ struct TimersFile {
 TimersFile readTimers(const std::string& path) {
   TimersFile result;
   const PlistResult file = readPropertyList(path, kTimersLimits);
-  if (!file.value) {
-    if (file.systemError != ENOENT) result.problem = file.problem;
+  if (!file) {
+    if (file.error().systemError != ENOENT) result.problem = file.error().message;
     return result;
   }
-  const auto* array = std::get_if<PlistArray>(&file.value->value);
+  const auto* array = std::get_if<PlistArray>(&file->value);
   if (array == nullptr) {
     result.problem = "its top level is not an array";
     return result;
@@ -85,7 +85,7 @@ void AgentControlBase::handleTIMEDCMD(const Dictionary* parameters) {
   if (command == "TIMERLIST") return sendReply(timerListReply());
   if (command == "TIMERREVOKE") {
     const auto timerID = lookUp(parameters, "TimerID");
-    if (!timerID || !context->timedCmdList().removeTimer(*timerID)) return sendReply(kNoSuchTimer);
+    if (!timerID || !context->timedCmdList.removeTimer(*timerID)) return sendReply(kNoSuchTimer);
     writeTimerListToDisk();
   }
   sendReply(kDone);
@@ -93,7 +93,7 @@ void AgentControlBase::handleTIMEDCMD(const Dictionary* parameters) {
 
 std::string AgentControlBase::timerListReply() {
   const auto context = agentContext();
-  const std::string list = propertyListXml(plistFrom(context->timedCmdList().entries()));
+  const std::string list = propertyListXml(plistFrom(context->timedCmdList.entries()));
   return list.empty() ? std::string(kDone) : std::string(kDone) + ",timerlist=" + list;
 }
 
@@ -121,7 +121,7 @@ bool AgentControlBase::scheduleCommand(const Dictionary* parameters, TimerOrigin
   Dictionary entry = *parameters;
   if (!entry.contains("TimerID")) entry.emplace("TimerID", newUUIDString());
   const auto shared = std::make_shared<const Dictionary>(std::move(entry));
-  if (!context->timedCmdList().append(shared, origin == TimerOrigin::file)) return false;
+  if (!context->timedCmdList.append(shared, origin == TimerOrigin::file)) return false;
   logInfo("Scheduling " + command + " command to run at: " + when);
   if (origin == TimerOrigin::peer) writeTimerListToDisk();
   if (actions_ != nullptr) actions_->scheduleTimedCommand(shared, date.value_or(now), kind());
@@ -132,7 +132,7 @@ bool AgentControlBase::scheduleCommand(const Dictionary* parameters, TimerOrigin
 void AgentControlBase::completeTimedCommand(const SharedDictionary& entry) {
   const auto context = agentContext();
   if (!context) return;
-  if (!context->timedCmdList().takeIfListed(entry)) {
+  if (!context->timedCmdList.takeIfListed(entry)) {
     logInfo("Not running deferred command");
     return sendReply(kRevoked);
   }
@@ -145,7 +145,7 @@ void AgentControlBase::completeTimedCommand(const SharedDictionary& entry) {
 void AgentControlBase::writeTimerListToDisk() {
   const auto context = agentContext();
   if (!context) return;
-  const bool written = context->timedCmdList().persist([](const auto& entries) {
+  const bool written = context->timedCmdList.persist([](const auto& entries) {
     const std::string path = systemPath(kTimersFile);
     ::chmod(path.c_str(), 0600);  // the new file takes over the mode of the old one, and passwords are in it
     return writePropertyList(path, plistFrom(entries), 0600) == 0;

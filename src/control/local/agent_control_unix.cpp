@@ -69,7 +69,7 @@ std::optional<std::string> AgentControlUnix::commandFromReceivedData(const std::
 void AgentControlUnix::sendReply(const std::string& reply) {
   const std::lock_guard lock(sendMutex());
   const int error = sendPlainReply(serverSocket(), reply, wakeDescriptor());
-  if (error != 0) logDebug(formatted("Could not answer to tunnel (errno = %d)", error));
+  if (error != 0) logDebug(string_with_format("Could not answer to tunnel (errno = %d)", error));
 }
 
 }  // namespace lmx

@@ -1,12 +1,13 @@
 // The texts of the STATUS reply.
 #include "control/protocol/status_reply.h"
 
+#include "record/recording_status.h"
 #include "support/format.h"
 
 namespace lmx {
 
 std::string statusFields(int cmdStatus, const RecordStatus& status) {
-  return formatted(
+  return string_with_format(
       "cmdStatus=%i,recordStatus=%i,start=%i,elapsedTime=%lld,stop=%i,hard_stop=%i,lastError=%i,"
       "availDiskInMB=%.0f,totalDiskInMB=%.0f",
       cmdStatus, status.recordStatus, status.start, static_cast<long long>(status.elapsedSeconds),
@@ -21,9 +22,9 @@ std::string profileFields(const std::optional<std::string>& camera,
 }
 
 std::string previewFields(const AudioLevels& levels, const std::string& base64) {
-  return formatted("audio-level-left=%f,audio-level-right=%f,preview-size=%d,preview=",
-                   static_cast<double>(levels.left), static_cast<double>(levels.right),
-                   static_cast<int>(base64.size())) +
+  return string_with_format("audio-level-left=%f,audio-level-right=%f,preview-size=%d,preview=",
+                            static_cast<double>(levels.left), static_cast<double>(levels.right),
+                            static_cast<int>(base64.size())) +
          base64;
 }
 

@@ -4,7 +4,7 @@
 #include <string>
 
 #include "control/protocol/audio_levels.h"
-#include "record/engine.h"
+#include "record/recording_status.h"
 
 namespace lmx {
 

@@ -19,7 +19,6 @@
 #include "platform/net/socket_io.h"
 #include "support/base64.h"
 #include "support/format.h"
-#include "support/heap_ptr.h"
 
 namespace lmx {
 namespace {
@@ -31,21 +30,16 @@ constexpr int kNotConnected = 1;
 /// A server that takes nothing for so long has lost what we say.
 constexpr std::chrono::seconds kSendPatience{5};
 
-std::optional<std::array<unsigned char, kCipherBlock>> newVector() {
-  const heap_ptr<unsigned char> random(agent_random_bytes(kCipherBlock));
-  if (!random) return std::nullopt;
-  std::array<unsigned char, kCipherBlock> vector{};
-  std::copy_n(random.get(), vector.size(), vector.begin());
+CipherBlock newVector() {
+  CipherBlock vector{};
+  const std::string random = agent_random_bytes(vector.size());
+  std::copy(random.begin(), random.end(), vector.begin());
   return vector;
 }
 
-std::vector<std::string> hostsToTry(AgentContext& context) {
-  std::vector<std::string> hosts;
-  if (context.lock_server_info_mutex() == 0) {
-    hosts = clusterHostArray(context.server_info_retain().get());
-    context.unlock_server_info_mutex();
-  }
-  if (hosts.empty()) hosts.push_back(context.tunnel_host().value_or(""));
+std::vector<std::string> hostsToTry(const AgentContext& context) {
+  std::vector<std::string> hosts = clusterHostArray(context.server_info.get().get());
+  if (hosts.empty()) hosts.push_back(context.server.tunnel_host.get().value_or(""));
   return hosts;
 }
 
@@ -83,8 +77,9 @@ int AgentControl::connect() {
     logDebug("The server has closed the last connection without a word");
     return kNotConnected;
   }
-  const std::string port = context->tunnel_port().value_or("");
-  logInfo("Connecting to lmxserverd tunnel at " + context->tunnel_host().value_or("(null)") + ":" + port);
+  const std::string port = context->server.tunnel_port.get().value_or("");
+  logInfo("Connecting to lmxserverd tunnel at " + context->server.tunnel_host.get().value_or("(null)") + ":" +
+          port);
   hello_sent_ = false;
   disconnect();
   int socket = -1;
@@ -109,48 +104,39 @@ void AgentControl::logPeer() {
       peer.sin_family == AF_INET && inet_ntop(AF_INET, &peer.sin_addr, address, sizeof address) != nullptr) {
     LMPLogMessage(logContext(), kLogInfo, "Connected to %s:%d", address, ntohs(peer.sin_port));
   } else {
-    LMPLogMessage(logContext(), kLogInfo, "Connected to %s:%s", context->tunnel_host().value_or("").c_str(),
-                  context->tunnel_port().value_or("").c_str());
+    LMPLogMessage(logContext(), kLogInfo, "Connected to %s:%s",
+                  context->server.tunnel_host.get().value_or("").c_str(),
+                  context->server.tunnel_port.get().value_or("").c_str());
   }
 }
 
 std::string AgentControl::hello(const AgentContext& context, const std::string& vectorText) {
-  return "AGENT protocol=1,agent_uuid=" + context.machine_uuid().value_or("(null)") + ",iv=" + vectorText +
-         formatted(",version=%.0f", kProtocolVersion) +
-         (context.running() ? "" : ",agent_recording_status=offline") + "\n";
+  return "AGENT protocol=1,agent_uuid=" + context.server.machine_uuid.get().value_or("(null)") +
+         ",iv=" + vectorText + string_with_format(",version=%.0f", kProtocolVersion) +
+         (context.state.running.get() ? "" : ",agent_recording_status=offline") + "\n";
 }
 
 int AgentControl::sendAGENT() {
   const auto context = agentContext();
   if (!context) return kNotConnected;
   logDebug("Sending AGENT information...");
-  const heap_ptr<char> vector(
-      initialization_vector_
-          ? lmp_encode_base64(initialization_vector_->data(), initialization_vector_->size(), nullptr)
-          : nullptr);
-  if (!vector) {
-    LMPLogMessage(logContext(), kLogError, "Failed to base64 encode initialization vector");
-    return kNotConnected;
-  }
-  const int error = sendWhole(serverSocket(), hello(*context, vector.get()), kSendPatience, wakeDescriptor());
-  if (error != 0) logDebug(formatted("Could not send AGENT to tunnel (errno = %d)", error));
+  const std::string vector = lmp_encode_base64(
+      {reinterpret_cast<const char*>(initialization_vector_.data()), initialization_vector_.size()});
+  const int error = sendWhole(serverSocket(), hello(*context, vector), kSendPatience, wakeDescriptor());
+  if (error != 0) logDebug(string_with_format("Could not send AGENT to tunnel (errno = %d)", error));
   hello_sent_ = error == 0;
-  context->setAgent_sent_or_fail(true);
+  context->state.agent_sent_or_fail.set(true);
   logInfo("Sent: " + hello(*context, "*"));
   return error == 0 ? 0 : kHelloNotSent;
 }
 
 std::optional<std::string> AgentControl::commandFromReceivedData(const std::string& line) {
   const auto context = agentContext();
-  const auto secret = context ? context->shared_secret() : std::nullopt;
-  if (secret && initialization_vector_) {
-    std::uint32_t length = 0;
-    const heap_ptr<unsigned char> plaintext(
-        agent_decrypt_message(initialization_vector_->data(), secret->data(), line.c_str(),
-                              static_cast<std::uint32_t>(line.size()), &length));
+  const auto secret = context ? context->server.shared_secret.get() : std::nullopt;
+  if (secret) {
+    const auto plaintext = agent_decrypt_message(initialization_vector_, *secret, line);
     spoken_to_ = spoken_to_ || plaintext;
-    if (plaintext)
-      return plainCommand(reinterpret_cast<const char*>(plaintext.get()) + kRandomPrefix, logContext());
+    if (plaintext) return plainCommand(messageIn(*plaintext), logContext());
   }
   // To the byte: a refusal in one piece still has its line feed and is taken for noise. Servers have come to
   // rely on that.
@@ -160,27 +146,22 @@ std::optional<std::string> AgentControl::commandFromReceivedData(const std::stri
 
 void AgentControl::serverRejected() {
   LMPLogMessage(logContext(), kLogWarning, "Server rejected agent connection, sleeping for one minute.");
-  if (const auto context = agentContext()) context->setServerRejectTime(std::time(nullptr));
+  if (const auto context = agentContext()) context->state.serverRejectTime.set(std::time(nullptr));
   askToStop();
 }
 
 void AgentControl::sendReply(const std::string& reply) {
   const auto context = agentContext();
-  const auto secret = context ? context->shared_secret() : std::nullopt;
+  const auto secret = context ? context->server.shared_secret.get() : std::nullopt;
   const std::lock_guard lock(sendMutex());
   if (!hello_sent_) return logDebug("No reply before the hello: " + reply);
-  const heap_ptr<unsigned char> random(agent_random_bytes(kRandomPrefix));
-  if (!secret || !initialization_vector_ || !random) return;
-  std::string plaintext(reinterpret_cast<const char*>(random.get()), kRandomPrefix);
-  plaintext += plainReplyBytes(reply);
-  const heap_ptr<char> text(agent_encrypt_message(initialization_vector_->data(), secret->data(),
-                                                  plaintext.data(),
-                                                  static_cast<std::uint32_t>(plaintext.size()), nullptr));
+  if (!secret) return;
+  const auto text = agent_encrypt_message(initialization_vector_, *secret,
+                                          agent_random_bytes(kRandomPrefix).append(plainReplyBytes(reply)));
   if (!text) return;
-  const int error =
-      sendWhole(serverSocket(), std::string(text.get()) + "\n", kSendPatience, wakeDescriptor());
+  const int error = sendWhole(serverSocket(), *text + "\n", kSendPatience, wakeDescriptor());
   if (error == 0) return;
-  logDebug(formatted("Could not answer to tunnel (errno = %d)", error));
+  logDebug(string_with_format("Could not answer to tunnel (errno = %d)", error));
   // Half a line would garble the next reply: the connection is of no use any more.
   if (error == ETIMEDOUT) ::shutdown(serverSocket(), SHUT_RDWR);
 }

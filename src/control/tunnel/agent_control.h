@@ -23,8 +23,8 @@ class AgentControl final : public AgentControlBase {
   void setAuthenticated(bool) override {}
   [[nodiscard]] ChannelKind kind() const override { return ChannelKind::tunnel; }
 
-  /// Announces the agent on the connection. @return 0; 24 when it could not be sent, 1 when the vector could
-  /// not be encoded. Channel thread.
+  /// Announces the agent on the connection. @return 0; 24 when it could not be sent, 1 without a context.
+  /// Channel thread.
   int sendAGENT();
   /// The line that announces the agent: who it is, the vector, and whether it can record.
   [[nodiscard]] static std::string hello(const AgentContext& context, const std::string& vectorText);
@@ -41,8 +41,7 @@ class AgentControl final : public AgentControlBase {
   void logPeer();
   void serverRejected();
 
-  using Vector = std::array<unsigned char, kCipherBlock>;
-  const std::optional<Vector> initialization_vector_;  ///< absent when there was no memory for it
+  const CipherBlock initialization_vector_;
   std::atomic<bool> hello_sent_{false};
   // Channel thread only:
   std::optional<std::chrono::steady_clock::time_point> connected_at_;  ///< the last connection's

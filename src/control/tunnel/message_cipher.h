@@ -1,31 +1,32 @@
 // Encryption of the server tunnel: AES-128-CBC with PKCS#7 padding (RFC 3602, RFC 5652), as Base64 text.
 #pragma once
+#include <array>
 #include <cstddef>
 #include <cstdint>
+#include <optional>
+#include <string>
+#include <string_view>
 
 namespace lmx {
 
-/// Bytes of key and of initialisation vector.
-inline constexpr std::size_t kCipherBlock = 16;
+/// A key or an initialisation vector.
+using CipherBlock = std::array<unsigned char, 16>;
 /// Random bytes in front of every message: the vector is fixed, so they are what makes equal texts differ.
 inline constexpr std::size_t kRandomPrefix = 32;
 
-/// `count` unpredictable bytes in a new block that the caller frees; null when memory fails. 0 gives an empty
-/// block.
-unsigned char* agent_random_bytes(std::uint32_t count);
+/// `count` unpredictable bytes.
+std::string agent_random_bytes(std::uint32_t count);
 
-/// @param vector, key  16 bytes each
-/// @param resultLength  gets the number of characters, 0 on failure
-/// @return Base64 text without line breaks, NUL-terminated, in a new block that the caller frees; null on
-/// failure (logged)
-char* agent_encrypt_message(const unsigned char* vector, const unsigned char* key, const void* plaintext,
-                            std::uint32_t length, std::uint64_t* resultLength);
+/// @return Base64 text without line breaks; nothing on failure (logged)
+std::optional<std::string> agent_encrypt_message(const CipherBlock& vector, const CipherBlock& key,
+                                                 std::string_view plaintext);
 
-/// @param text  NUL-terminated Base64; line breaks at its end are skipped
-/// @param resultLength  gets the plaintext's bytes, 0 on failure
-/// @return the plaintext, random prefix included, at least 33 bytes and zero beyond its end, in a new block
-/// that the caller frees; null on failure (logged)
-unsigned char* agent_decrypt_message(const unsigned char* vector, const unsigned char* key, const char* text,
-                                     std::uint32_t length, std::uint32_t* resultLength);
+/// @param text  Base64; line breaks at its end are skipped
+/// @return the plaintext, random prefix included; nothing on failure (logged)
+std::optional<std::string> agent_decrypt_message(const CipherBlock& vector, const CipherBlock& key,
+                                                 std::string_view text);
+
+/// The message in a decrypted text: what stands between the random prefix and the first NUL.
+std::string messageIn(const std::string& plaintext);
 
 }  // namespace lmx

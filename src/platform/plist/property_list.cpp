@@ -154,14 +154,7 @@ constexpr std::string_view kByteOrderMark = "\xEF\xBB\xBF";
 /// Far above every limit on files: lengths given to the library are 32 bits wide.
 constexpr std::size_t kParseLimit = 64U << 20;
 
-PlistResult refusal(std::string problem, int systemError = 0) {
-  PlistResult result;
-  result.systemError = systemError;
-  result.problem = std::move(problem);
-  return result;
-}
-
-PlistResult systemFailure(int error) { return refusal(std::strerror(error), error); }
+Error systemFailure(int error) { return {std::strerror(error), error}; }
 
 std::string lowered(std::string text) {
   for (char& c : text) c = static_cast<char>(std::tolower(static_cast<unsigned char>(c)));
@@ -169,6 +162,18 @@ std::string lowered(std::string text) {
 }
 
 }  // namespace
+
+const PlistValue* PlistValue::under(std::string_view key) const {
+  const PlistDictionary* all = dictionary();
+  if (all == nullptr) return nullptr;
+  const auto found = all->find(key);
+  return found == all->end() ? nullptr : &found->second;
+}
+
+const std::string* PlistValue::textUnder(std::string_view key) const {
+  const PlistValue* found = under(key);
+  return found == nullptr ? nullptr : found->string();
+}
 
 double PlistValue::asReal() const {
   if (const auto* v = std::get_if<double>(&value)) return *v;
@@ -196,31 +201,29 @@ bool PlistValue::asBool() const {
 PlistResult parsePropertyList(const std::string& bytes, PlistLimits limits) {
   std::string_view text = bytes;
   if (text.starts_with(kByteOrderMark)) text.remove_prefix(kByteOrderMark.size());
-  if (text.empty()) return refusal("the file is empty");
-  if (text.size() > kParseLimit) return refusal("larger than " + std::to_string(kParseLimit) + " bytes");
+  if (text.empty()) return Error{"the file is empty"};
+  if (text.size() > kParseLimit) return Error{"larger than " + std::to_string(kParseLimit) + " bytes"};
   plist_t root = nullptr;
   if (text.starts_with("bplist00")) {
-    if (auto refused = refuseBinary(text, limits.values)) return refusal(std::move(*refused));
+    if (auto refused = refuseBinary(text, limits.values)) return Error{std::move(*refused)};
     plist_from_bin(text.data(), static_cast<std::uint32_t>(text.size()), &root);
   } else if (text.find('<') != std::string_view::npos) {
     const XmlCheck check = checkXml(text, limits.values);
-    if (check.refused) return refusal(*check.refused);
+    if (check.refused) return Error{*check.refused};
     plist_from_xml(check.clean.c_str(), static_cast<std::uint32_t>(check.clean.size()), &root);
   } else {
-    return refusal("neither an XML nor a binary property list");
+    return Error{"neither an XML nor a binary property list"};
   }
   const Node node(root);
-  if (!node) return refusal("not a well-formed property list");
-  PlistResult result;
-  result.value = valueFrom(node.get());
-  return result;
+  if (!node) return Error{"not a well-formed property list"};
+  return valueFrom(node.get());
 }
 
 PlistResult readPropertyList(const std::string& path, PlistLimits limits) {
   const UniqueFd file(open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK | O_NOCTTY));
   struct stat info {};
   if (!file.valid() || fstat(file.get(), &info) != 0) return systemFailure(errno);
-  if (!S_ISREG(info.st_mode)) return refusal("not a regular file", S_ISDIR(info.st_mode) ? EISDIR : EINVAL);
+  if (!S_ISREG(info.st_mode)) return Error{"not a regular file", S_ISDIR(info.st_mode) ? EISDIR : EINVAL};
   std::string bytes;
   char buffer[16384];
   for (;;) {
@@ -230,7 +233,7 @@ PlistResult readPropertyList(const std::string& path, PlistLimits limits) {
     if (n == 0) return parsePropertyList(bytes, limits);
     bytes.append(buffer, static_cast<std::size_t>(n));
     if (bytes.size() > limits.bytes)
-      return refusal("larger than " + std::to_string(limits.bytes) + " bytes", EFBIG);
+      return Error{"larger than " + std::to_string(limits.bytes) + " bytes", EFBIG};
   }
 }
 

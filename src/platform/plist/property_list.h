@@ -5,8 +5,11 @@
 #include <memory>
 #include <optional>
 #include <string>
+#include <string_view>
 #include <variant>
 #include <vector>
+
+#include "support/result.h"
 
 namespace lmx {
 
@@ -31,6 +34,10 @@ struct PlistValue {
 
   [[nodiscard]] const std::string* string() const { return std::get_if<std::string>(&value); }
   [[nodiscard]] const PlistDictionary* dictionary() const { return std::get_if<PlistDictionary>(&value); }
+  /// The value under `key`; null when this is no dictionary or has no such key.
+  [[nodiscard]] const PlistValue* under(std::string_view key) const;
+  /// The text under `key`; null when there is none.
+  [[nodiscard]] const std::string* textUnder(std::string_view key) const;
   /// Numbers and booleans as one another, as a preferences store converts them; texts as strtod/atoll read
   /// them ("true"/"yes" count as 1 for asBool); anything else is 0.
   [[nodiscard]] double asReal() const;
@@ -48,11 +55,8 @@ struct PlistLimits {
   std::size_t values = kPlistNodeLimit;
 };
 
-struct PlistResult {
-  std::optional<PlistValue> value;
-  int systemError = 0;  ///< errno when the file couldn't be read (ENOENT: no such file)
-  std::string problem;  ///< why there is no value, in words
-};
+/// Why there is no value, in words; with the errno when the file couldn't be read (ENOENT: no such file).
+using PlistResult = Result<PlistValue>;
 
 /// Parses XML or binary bytes. A byte order mark is skipped. Refused before the library sees them: more than
 /// kPlistDepthLimit levels, more than `limits.values` values (shared references of the binary form counted as

@@ -1,1 +1,1 @@
-"""What the system tests stand on: a sandbox for the daemon, its peers, and readers of what it leaves behind."""
+"""Support code of the system tests: a sandbox for the daemon, its peers, readers for its log, movies and documents."""

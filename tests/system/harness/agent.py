@@ -1,22 +1,21 @@
 """The daemon as a test sees it: preferences in, commands over the local socket, log, movies and tool calls out."""
 import base64
 import json
-import os
 import plistlib
 import re
 import signal
 import socket
-import time
-import xml.etree.ElementTree as ElementTree
-from dataclasses import dataclass, field
 from pathlib import Path
 
-from .log_reader import LogReader
+from .commands import exchange, start_line
+from .document import read_document
+from .log_reader import Level, LogReader
 from .sandbox import HARNESS, Sandbox
 from .waiting import wait_until
 
 REPOSITORY = "/var/lmx/agent/recordings"
 PREFERENCES = "/Library/Preferences/com.zandor.lmxagentd.plist"
+TIMERS = "/var/lmx/agent/timers"
 SERVER_UUID = "5E1F0A52-6B1D-4E8C-9A52-0F6C4C1B7E11"
 SECRET = bytes(range(16))
 DEFAULTS = {
@@ -35,19 +34,6 @@ DEFAULTS = {
     "RecordingDiskSpaceCutoffInMB": "1",
     "PreviewIntervalInMilliseconds": "400",
 }
-
-
-@dataclass
-class Reply:
-    """One reply, with the harness's clocks around it: a mark set by the command lies between the two."""
-
-    text: str
-    sent: float
-    received: float
-    fields: dict = field(default_factory=dict)
-
-    def __post_init__(self):
-        self.fields = dict(pair.split("=", 1) for pair in self.text.split(",") if "=" in pair)
 
 
 class Agent:
@@ -99,8 +85,16 @@ class Agent:
 
     # Its life --------------------------------------------------------------------------------------------------
 
+    def prepare(self, env=None, **sandbox_options):
+        """Sets up the sandbox with its network but holds the daemon back until start(). A server that listens by then
+        is reached at the first attempt, instead of five seconds later."""
+        self.sandbox.prepare(env=self._environment(env), **sandbox_options)
+        return self
+
     def start(self, wait=True, env=None, **sandbox_options):
-        self.sandbox.start(env=self._environment(env), **sandbox_options)
+        if not self.sandbox.held():
+            sandbox_options["env"] = self._environment(env)
+        self.sandbox.start(**sandbox_options)
         if wait:
             self.wait_started()
         return self
@@ -110,7 +104,7 @@ class Agent:
         return self.sandbox.run(*arguments, env=self._environment(env), **options)
 
     def popen(self, *arguments, env=None):
-        """Starts it and lets it run."""
+        """Starts the program with `arguments` and does not wait for its end."""
         return self.sandbox.popen(arguments, env=self._environment(env))
 
     def _environment(self, env):
@@ -184,10 +178,27 @@ class Agent:
             return exchange(peer, "STATUS").text
 
     def start_recording(self, uuid, minutes="60", unattended="60", **parameters):
-        parameters = {"RecordingMetadata_RECORDING_UUID": uuid,
-                      "RecordingMetadata_MAX_RECORDING_MINUTES": minutes,
-                      "RecordingMetadata_UNATTENDED_RECORDING_MINUTES": unattended, **parameters}
-        return self.command("START " + ",".join(f"{k}={v}" for k, v in parameters.items()))
+        return self.command(start_line(uuid, minutes, unattended, **parameters))
+
+    def let_record(self, seconds):
+        """Waits until the running recording holds so many whole seconds of media; pauses don't count."""
+        wait_until(lambda: int(self.command("STATUS").fields["elapsedTime"]) >= seconds, seconds + 20,
+                   f"{seconds} s of media", interval=0.1)
+
+    def wait_idle(self):
+        """Waits until no recording runs or is being finished."""
+        wait_until(lambda: self.command("STATUS").fields["recordStatus"] == "0", 30, "an idle recorder")
+
+    def record(self, uuid, seconds=1, **parameters):
+        """Makes a recording from START to STOP and waits for its movie. @return the replies to START and STOP"""
+        start = self.start_recording(uuid, **parameters)
+        assert start.text == "cmdStatus=0", start.text
+        self.let_record(seconds)
+        mark = self.log.mark()
+        stop = self.command("STOP")
+        assert stop.text == "cmdStatus=0", stop.text
+        self.wait_recorded(uuid, after=mark)
+        return start, stop
 
     # What it leaves behind -------------------------------------------------------------------------------------
 
@@ -206,11 +217,19 @@ class Agent:
         """The properties document of a recording."""
         return read_document(self.path(f"{directory}/{uuid}.xml"))
 
+    def timers(self):
+        """The scheduled commands, as they are stored."""
+        return plistlib.loads(self.path(TIMERS).read_bytes())
+
     def tool_calls(self, event="begin", having="--submit"):
         path = self.path("/var/tool/calls.jsonl")
         lines = path.read_text().splitlines() if path.exists() else []
         calls = [json.loads(line) for line in lines]
         return [c for c in calls if c["event"] == event and having in c["arguments"]]
+
+    def submitted(self, event="begin"):
+        """The recordings whose submission has begun or ended, in order."""
+        return [call["arguments"][4] for call in self.tool_calls(event)]
 
     def wait_tool_call(self, uuid, timeout=30.0, event="begin"):
         """The call of the tool that submits recording `uuid`."""
@@ -219,25 +238,7 @@ class Agent:
         return wait_until(called, timeout, f"submission of {uuid}; {self.log.tail(40)}")[0]
 
     def wait_recorded(self, uuid, timeout=30.0, after=0):
-        """The line that tells that the movie is in place. @return the seconds that it gives"""
+        """Waits for the line that reports the movie in place. @return the duration in it, seconds"""
         path = re.escape(f"{REPOSITORY}/{uuid}.mov")
-        line = self.log.wait(rf'^"{path}" recording stopped \(duration: \d+s\)$', timeout, after, level=5)
+        line = self.log.wait(rf'^"{path}" recording stopped \(duration: \d+s\)$', timeout, after, level=Level.NOTICE)
         return int(re.search(r"(\d+)s\)$", line.text)[1])
-
-
-def exchange(peer, line):
-    sent = time.time()
-    peer.sendall(line.encode() + b"\n")
-    data = peer.recv(1 << 20)
-    return Reply(data.decode(), sent, time.time())
-
-
-def read_document(path):
-    """The properties of a document, after checking the shape that every document has."""
-    tree = ElementTree.fromstring(Path(path).read_bytes())
-    assert tree.tag == "LumexServerAgentRecordingProperties" and not tree.attrib
-    (properties,) = tree
-    assert properties.tag == "RecordingProperties" and not properties.attrib
-    for item in properties:
-        assert item.tag == "RecordingProperty" and list(item.attrib) == ["key", "value"] and len(item) == 0
-    return {item.get("key"): item.get("value") for item in properties}

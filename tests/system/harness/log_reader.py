@@ -4,15 +4,33 @@ import socket
 import threading
 import time
 from dataclasses import dataclass
+from enum import IntEnum
+
+from .log_socket import log_socket
 
 LINE = re.compile(r"^<(\d+)>.*?\blmxagentd\[(\d+)\]: (.*)$", re.DOTALL)
+DAEMON = 3  # syslog's facility for daemons
+
+
+class Level(IntEnum):
+    """Severity of a message, numbered as in syslog. UNKNOWN: the message has no valid header."""
+
+    UNKNOWN = -1
+    EMERGENCY = 0
+    ALERT = 1
+    CRITICAL = 2
+    ERROR = 3
+    WARNING = 4
+    NOTICE = 5
+    INFO = 6
+    DEBUG = 7
 
 
 @dataclass(frozen=True)
 class LogLine:
     """One message; `at` is the harness's monotonic clock at its arrival."""
 
-    level: int
+    level: Level
     facility: int
     pid: int
     text: str
@@ -26,8 +44,7 @@ class LogReader:
     def __init__(self, path):
         self._lines = []
         self._arrived = threading.Condition()
-        self._socket = socket.socket(socket.AF_UNIX, socket.SOCK_DGRAM)
-        self._socket.setsockopt(socket.SOL_SOCKET, socket.SO_RCVBUF, 4 << 20)
+        self._socket = log_socket()
         self._socket.bind(str(path))
         self._thread = threading.Thread(target=self._read, daemon=True)
         self._thread.start()
@@ -46,9 +63,9 @@ class LogReader:
     def _parse(raw):
         match = LINE.match(raw)
         if not match:
-            return LogLine(-1, -1, 0, raw, time.monotonic(), raw)
+            return LogLine(Level.UNKNOWN, -1, 0, raw, time.monotonic(), raw)
         priority = int(match[1])
-        return LogLine(priority & 7, priority >> 3, int(match[2]), match[3].rstrip("\n"), time.monotonic(), raw)
+        return LogLine(Level(priority & 7), priority >> 3, int(match[2]), match[3].rstrip("\n"), time.monotonic(), raw)
 
     def close(self):
         address = self._socket.getsockname()
@@ -81,9 +98,9 @@ class LogReader:
                     return found[count - 1]
                 if not self._arrived.wait(max(0.0, end - time.monotonic())) and time.monotonic() >= end:
                     break
-            raise AssertionError(f"no {count}. log line {pattern!r} (level {level}) in {timeout} s; the log:\n"
+            raise AssertionError(f"no {count}. log line {pattern!r} (level {level!r}) in {timeout} s; the log:\n"
                                  + self.tail(60))
 
     def tail(self, count=1000):
         with self._arrived:
-            return "\n".join(f"{l.at:.3f} <{l.level}> {l.text}" for l in self._lines[-count:])
+            return "\n".join(f"{l.at:.3f} <{l.level.name}> {l.text}" for l in self._lines[-count:])

@@ -1,5 +1,5 @@
 #!/usr/bin/python3
-"""Stands at /usr/bin/lumex: writes down its arguments and does what /var/tool/script.json says."""
+"""Stands in for /usr/bin/lumex: records its arguments and does what /var/tool/script.json says."""
 import json
 import os
 import sys
@@ -9,7 +9,10 @@ PLACE = os.environ.get("LMXAGENTD_ROOT", "") + "/var/tool"
 
 
 def script_for(arguments):
-    """The last rule whose `when` is among the arguments; queries of the cluster fail unless a rule says otherwise."""
+    """The last rule whose `when` is among the arguments; queries of the cluster fail unless a rule says otherwise.
+
+    A rule with `after` applies after that many earlier calls with its `when`.
+    """
     try:
         with open(PLACE + "/script.json", encoding="utf-8") as file:
             rules = json.load(file)
@@ -17,9 +20,18 @@ def script_for(arguments):
         rules = []
     chosen = {"exit": 1} if "--listinfo" in arguments else {}
     for rule in rules:
-        if rule["when"] in arguments:
+        if rule["when"] in arguments and earlier_calls(rule["when"]) >= rule.get("after", 0):
             chosen = rule
     return chosen
+
+
+def earlier_calls(word):
+    try:
+        with open(PLACE + "/calls.jsonl", encoding="utf-8") as file:
+            calls = [json.loads(line) for line in file]
+    except FileNotFoundError:
+        return 0
+    return sum(call["event"] == "begin" and word in call["arguments"] for call in calls)
 
 
 def note(entry):

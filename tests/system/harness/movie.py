@@ -85,7 +85,8 @@ def frame_times(path):
 
 def sound(path, rate=8000):
     """The movie's sound, mono, as numbers between -1 and 1."""
-    result = _run(["ffmpeg", "-v", "error", "-i", path, "-map", "0:a:0", "-ac", "1", "-ar", str(rate), "-f", "f32le", "-"])
+    result = _run(["ffmpeg", "-v", "error", "-i", path, "-map", "0:a:0", "-ac", "1", "-ar", str(rate), "-f", "f32le",
+                   "-"])
     return numpy.frombuffer(result.stdout, dtype=numpy.float32).astype(numpy.float64)
 
 

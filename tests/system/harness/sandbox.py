@@ -4,12 +4,11 @@ The files live outside the namespaces, so that tests read and write them, and re
 paths in the host; the mounts exist only while a daemon runs and vanish with it.
 """
 import os
-import shutil
 import signal
 import subprocess
-import tempfile
 from pathlib import Path
 
+from .temporary import short_directory
 from .waiting import wait_until
 
 HARNESS = Path(__file__).resolve().parent
@@ -20,14 +19,25 @@ DIRECTORIES = (
 HOST_COMMANDS = ("sh", "dash", "env", "python3", "sleep", "cat", "true", "false", "setpriv", "kill")
 
 
+class Program(subprocess.Popen):
+    """A child process that is killed at the end of its block, so that a failed check inside does not wait for it."""
+
+    def __exit__(self, *details):
+        self.kill()
+        return super().__exit__(*details)
+
+
 class Sandbox:
     """The directory and the process tree. One tree at a time; the directory outlives it until remove()."""
 
     def __init__(self, binary):
         self.binary = Path(binary)
-        self.base = Path(tempfile.mkdtemp(prefix="lmx-", dir="/tmp"))
+        self._directory = short_directory()
+        self.base = Path(self._directory.name)
         self.root = self.base / "root"
         self.errors = self.base / "stderr.txt"
+        self._ready = self.base / "ready"  # made by sandbox_init.sh when all is set up
+        self._held = self.base / "held"  # the daemon waits until it is gone
         self.process = None
         self._daemon = None
         self._lay_out()
@@ -52,35 +62,55 @@ class Sandbox:
         for name in HOST_COMMANDS:
             (self.root / "usr/bin" / name).symlink_to("/.hostbin/" + name)
 
-    def start(self, arguments=(), env=None, mounts=(), prefix=()):
-        """Starts the daemon: `mounts` as sandbox_init.sh reads them, `prefix` a command in front of the daemon's."""
+    def prepare(self, **options):
+        """Sets up everything, with the options of start(), but holds the daemon back until start()."""
+        self._held.touch()
+        self._launch(**options)
+        wait_until(self._ready.exists, what="the sandbox")
+
+    def held(self):
+        """Whether start() only lets the daemon go."""
+        return self._held.exists()
+
+    def start(self, **options):
+        """Starts the daemon: `arguments` for it, its environment `env`, `mounts` as sandbox_init.sh reads them,
+        `prefix` a command in front of the daemon's."""
+        if self.held():
+            assert not options, "too late: they belong to prepare()"
+            self._held.unlink()
+        else:
+            self._launch(**options)
+        wait_until(lambda: self.daemon_pid or self.process.poll() is not None, what="the daemon's process")
+
+    def _launch(self, arguments=(), env=None, mounts=(), prefix=()):
         assert self.process is None, "a daemon runs already"
         self._daemon = None
+        self._ready.unlink(missing_ok=True)
         with open(self.errors, "ab") as errors:
             self.process = subprocess.Popen(self._command(arguments, prefix), env=self._environment(env, mounts),
                                             stdin=subprocess.DEVNULL, stdout=errors, stderr=errors,
                                             start_new_session=True)
-        wait_until(lambda: self.daemon_pid or self.process.poll() is not None, what="the daemon's process")
 
     def popen(self, arguments, env=None, mounts=(), prefix=()):
-        """Starts the program as a person at a shell does, beside the daemon when one runs. @return the Popen"""
+        """Starts the program as a person at a shell does, beside the daemon when one runs. @return the Program"""
         if self.daemon_pid:
-            user = [] if os.geteuid() == 0 else ["--user", "--preserve-credentials"]
-            command = ["nsenter", "--target", str(self.daemon_pid), *user, "--mount", "--net", "--pid", "--root",
-                       "--wd", "--", *prefix, "/opt/lmxagentd", *arguments]
+            command = [*self.entering("mount", "net", "pid", "root", "wd"), *prefix, "/opt/lmxagentd", *arguments]
         else:
             command = self._command(arguments, prefix)
-        return subprocess.Popen(command, env=self._environment(env, mounts), stdin=subprocess.DEVNULL,
-                                stdout=subprocess.PIPE, stderr=subprocess.PIPE)
+        return Program(command, env=self._environment(env, mounts), stdin=subprocess.DEVNULL, stdout=subprocess.PIPE,
+                       stderr=subprocess.PIPE)
+
+    def entering(self, *parts):
+        """The prefix that runs a command in these parts of the sandbox: "net" for its network, others as nsenter names
+        its options."""
+        user = [] if os.geteuid() == 0 else ["--user", "--preserve-credentials"]
+        (init,) = children_of(self.process.pid)
+        return ["nsenter", "--target", str(self.daemon_pid or init), *user, *(f"--{part}" for part in parts), "--"]
 
     def run(self, *arguments, timeout=30, **options):
-        """The same to its end. @return its status and what it said, as subprocess.run does"""
+        """Runs the program to its end. @return what subprocess.run returns"""
         with self.popen(arguments, **options) as process:
-            try:
-                output, errors = process.communicate(timeout=timeout)
-            except BaseException:
-                process.kill()
-                raise
+            output, errors = process.communicate(timeout=timeout)
         return subprocess.CompletedProcess(arguments, process.returncode, output.decode(), errors.decode())
 
     def _command(self, arguments, prefix):
@@ -110,8 +140,8 @@ class Sandbox:
         return int(next(l for l in status.splitlines() if l.startswith("NSpid:")).split()[-1])
 
     def path(self, inside):
-        """Where the host sees what the sandbox calls `inside`. Through the daemon while it runs, since a file
-        system mounted in there is not to be seen elsewhere."""
+        """The host's path of what the sandbox calls `inside`. Leads through the daemon while it runs, since file
+        systems mounted in there are visible nowhere else."""
         view = Path(f"/proc/{self.daemon_pid}/root") if self.daemon_pid else self.root
         if not view.exists():
             view = self.root
@@ -138,12 +168,13 @@ class Sandbox:
             os.kill(init, signal.SIGKILL)
         self.process.kill()
         self.process.wait(10)
+        self._held.unlink(missing_ok=True)
         self.process = None
         self._daemon = None
 
     def remove(self):
         self.kill()
-        shutil.rmtree(self.base)
+        self._directory.cleanup()
 
 
 def children_of(pid):

@@ -1,5 +1,5 @@
 #!/bin/sh
-# First process of a sandbox: mounts what the daemon needs over the sandbox's root, then runs it in there.
+# First process of a sandbox: mounts what the daemon needs over the sandbox's root, then runs the daemon in it.
 # Arguments: ROOT BINARY COMMAND…; LMX_MOUNTS holds more mounts, one a line: "tmpfs SIZE PATH" or "ro PATH".
 set -eu
 root=$1
@@ -29,5 +29,8 @@ printf '%s\n' "${LMX_MOUNTS:-}" | while read -r kind first second; do
 done
 ip link set lo up
 unset LMX_MOUNTS
+# Held back here, the daemon finds a server that was started in its network meanwhile.
+: >"$root/../ready"
+while [ -e "$root/../held" ]; do sleep 0.01; done
 # The shell stays as process 1 and reaps what the daemon leaves behind; its status is the daemon's.
 exec chroot "$root" /bin/sh -c 'cd /; "$@"; exit $?' sandbox "$@"

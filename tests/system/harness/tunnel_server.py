@@ -8,7 +8,7 @@ import re
 import socket
 import subprocess
 
-from .waiting import wait_until
+from .agent import SECRET
 
 HELLO = re.compile(r"^AGENT protocol=1,agent_uuid=(?P<uuid>[^,]*),iv=(?P<iv>[^,]*),version=100"
                    r"(?P<offline>,agent_recording_status=offline)?\n$")
@@ -21,15 +21,21 @@ def cipher(direction, secret, vector, data):
 
 
 class TunnelServer:
-    """Listens inside the agent's network; one agent at a time."""
+    """Listens inside the agent's network; one agent at a time. It knows the agent's secret."""
 
-    def __init__(self, agent, secret, host="127.0.0.1", port=8175):
-        self.secret = secret
+    def __init__(self, agent, host="127.0.0.1", port=8175):
+        self.secret = SECRET
         self.hello = None
         self.vector = None
         self.peer = None
         self._buffer = b""
         self._listener = in_network_of(agent, host, port)
+
+    def __enter__(self):
+        return self
+
+    def __exit__(self, *details):
+        self.close()
 
     def accept(self, timeout=15.0):
         """The next connection, with its hello. @return the match of the hello"""
@@ -70,7 +76,7 @@ class TunnelServer:
         return self.reply()
 
     def deaf(self):
-        """New connections find nobody; the one in hand stays."""
+        """Refuses new connections; the current one stays."""
         self._listener.close()
 
     def hang_up(self):
@@ -83,9 +89,8 @@ class TunnelServer:
 
 
 def in_network_of(agent, host, port):
-    """A socket that listens in the network namespace of the agent's sandbox. A helper enters it, since a thread
-    that did would take the whole test along, and hands the descriptor back."""
-    wait_until(lambda: agent.sandbox.daemon_pid, 10, "the daemon")
+    """A socket that listens in the network namespace of the agent's sandbox. A helper process enters it and hands the
+    descriptor back: a process with threads can't enter a user namespace."""
     ours, theirs = socket.socketpair(socket.AF_UNIX, socket.SOCK_STREAM)
     script = ("import socket, sys\n"
               "family = socket.AF_INET6 if ':' in sys.argv[1] else socket.AF_INET\n"
@@ -94,10 +99,9 @@ def in_network_of(agent, host, port):
               "listener.bind((sys.argv[1], int(sys.argv[2])))\n"
               "listener.listen(64)\n"
               "socket.send_fds(socket.socket(fileno=int(sys.argv[3])), [b'x'], [listener.fileno()])\n")
-    user = [] if os.geteuid() == 0 else ["--user", "--preserve-credentials"]
     with ours, theirs:
-        subprocess.run(["nsenter", "--target", str(agent.sandbox.daemon_pid), *user, "--net", "--", "/usr/bin/python3",
-                        "-c", script, host, str(port), str(theirs.fileno())],
+        subprocess.run([*agent.sandbox.entering("net"), "/usr/bin/python3", "-c", script, host, str(port),
+                        str(theirs.fileno())],
                        pass_fds=[theirs.fileno()], check=True, timeout=20)
         _, descriptors, _, _ = socket.recv_fds(ours, 1, 1)
     return socket.socket(fileno=descriptors[0])

@@ -1,5 +1,4 @@
-"""lmx-tunnel as the server of a test: a well-behaved one, on the wire as people use it."""
-import os
+"""lmx-tunnel as the server of a test, driven as a person would."""
 import queue
 import re
 import subprocess
@@ -7,6 +6,7 @@ import threading
 from pathlib import Path
 
 from .agent import SERVER_UUID
+from .sandbox import Program
 
 TOOL = Path(__file__).resolve().parents[3] / "build/release/lmx-tunnel"
 HELLO = re.compile(r"agent (?P<uuid>[^,]*), version (?P<version>\d+)(?P<offline>, going offline)?$")
@@ -15,14 +15,12 @@ HELLO = re.compile(r"agent (?P<uuid>[^,]*), version (?P<version>\d+)(?P<offline>
 def start_tool(agent, *arguments, **streams):
     """The program, inside the agent's network and with its secret."""
     secret = agent.path(f"/var/lmx/agent/secrets/{SERVER_UUID}.plist")
-    user = [] if os.geteuid() == 0 else ["--user", "--preserve-credentials"]
-    return subprocess.Popen(["nsenter", "--target", str(agent.sandbox.daemon_pid), *user, "--net", "--", str(TOOL),
-                             "--secret", str(secret), *arguments],
-                            stdout=subprocess.PIPE, stderr=subprocess.PIPE, text=True, **streams)
+    return Program([*agent.sandbox.entering("net"), str(TOOL), "--secret", str(secret), *arguments],
+                   stdout=subprocess.PIPE, stderr=subprocess.PIPE, text=True, **streams)
 
 
 class TunnelTool:
-    """What a person at the program's prompt sees and types. Its answers are as the program decrypted them."""
+    """A running lmx-tunnel: what it prints and what a person types. Replies are as the program decrypted them."""
 
     def __init__(self, agent, *arguments):
         self._tool = start_tool(agent, *arguments, stdin=subprocess.PIPE)
@@ -30,6 +28,12 @@ class TunnelTool:
         self._reader = threading.Thread(target=self._read, daemon=True)
         self._reader.start()
         assert self.line().startswith("listening on ")
+
+    def __enter__(self):
+        return self
+
+    def __exit__(self, *details):
+        self.close()
 
     def _read(self):
         for line in self._tool.stdout:
@@ -69,7 +73,7 @@ class TunnelTool:
         return self.reply()
 
     def close(self):
-        self._tool.kill()  # with its connection, as a server that dies
+        self._tool.kill()  # the connection goes with it, as when a server dies
         self._tool.wait()
         self._reader.join()
         for stream in (self._tool.stdin, self._tool.stdout, self._tool.stderr):

@@ -7,6 +7,7 @@
 #include <string>
 
 #include "agent/agent_main.h"
+#include "capture/api/capture_framework.h"
 #include "postprocess/agent_submit.h"
 #include "tests/unit/doubles/log_capture.h"
 #include "tests/unit/doubles/scripted_framework.h"
@@ -30,14 +31,14 @@ class AgentTest : public ::testing::Test {
         return std::optional<CaptureError>();
       };
     };
-    context_->setRunning(true);
-    context_->setRecording_type("Audio+Video");
-    context_->setRecording_repository_path(repository_.path());
-    session_->setRecordingType(kRecordingTypeAudioVideo);
+    context_->state.running.set(true);
+    context_->recording.recording_type.set("Audio+Video");
+    context_->recording.recording_repository_path.set(repository_.path());
+    session_->recordingType.set(kRecordingTypeAudioVideo);
   }
   /// Ends the captures, then waits until no thread and no work item can reach the agent any more.
   ~AgentTest() override {
-    session_->setStatus(kRecorderIdle);
+    session_->status.set(kRecorderIdle);
     session_ = nullptr;
     context_->cleanup();
     for (std::size_t i = 0; i < framework_->controllersMade(); ++i) {
@@ -55,16 +56,16 @@ class AgentTest : public ::testing::Test {
     }
   }
   void setParameters(Dictionary values) {
-    context_->setProperties(std::make_shared<const Dictionary>(std::move(values)));
+    context_->state.properties.set(std::make_shared<const Dictionary>(std::move(values)));
   }
   /// What a START does: parameters, prepare, mark. @return the capture's controller.
   Controller start(const std::string& uuid, Dictionary more = {}) {
     more["RecordingMetadata_RECORDING_UUID"] = uuid;
     setParameters(std::move(more));
     agent_.prepareCapture();
-    EXPECT_EQ(context_->status(), 0);
-    session_->setRequest_uuid("request of " + uuid);
-    session_->setRequest_properties(context_->properties());
+    EXPECT_EQ(context_->state.status.get(), 0);
+    session_->request_uuid.set("request of " + uuid);
+    session_->request_properties.set(context_->state.properties.get());
     Controller made = framework_->controller(framework_->controllersMade() - 1);
     made->state = 3;
     return made;
@@ -79,7 +80,7 @@ class AgentTest : public ::testing::Test {
   /// Waits for the next job of the list.
   std::shared_ptr<AgentSubmit> nextJob() {
     std::shared_ptr<AgentSubmit> job;
-    testing::waitUntil([&] { return (job = context_->postProcessListNext()) != nullptr; });
+    testing::waitUntil([&] { return (job = context_->post_process_list.postProcessListNext()) != nullptr; });
     return job;
   }
   [[nodiscard]] std::string movie(const std::string& name) const { return repository_.file(name); }

@@ -3,6 +3,8 @@
 #include <csignal>
 #include <ctime>
 
+#include "capture/api/capture_framework.h"
+#include "model/codes.h"
 #include "record/capture_delegate.h"
 #include "tests/unit/agent/agent_fixture.h"
 
@@ -14,43 +16,43 @@ class Actions : public AgentTest {
   void setContinuous() {
     LMRContinuousRecordingInfo info;
     info.enabled = true;
-    context_->setContinuous(info);
+    context_->recording.continuous.set(info);
   }
 };
 
 TEST_F(Actions, PrepareRecordsWithACopyOfTheParameters) {
   start("R1", {{"RecordingMetadata_TITLE", "Talk"}});
   EXPECT_TRUE(log_.contains(7, "Process prepareCapture"));
-  EXPECT_EQ(session_->filename(), movie("R1.mov"));
-  EXPECT_EQ(lookUp(session_->metadata(), "RecordingMetadata_TITLE"), "Talk");
-  EXPECT_NE(session_->metadata(), context_->properties());
+  EXPECT_EQ(session_->filename.get(), movie("R1.mov"));
+  EXPECT_EQ(lookUp(session_->metadata.get(), "RecordingMetadata_TITLE"), "Talk");
+  EXPECT_NE(session_->metadata.get(), context_->state.properties.get());
   EXPECT_TRUE(log_.contains(5, "\"" + movie("R1.mov") + "\" recording started"));
 }
 
 TEST_F(Actions, PrepareLeavesItsResultInTheStatus) {
-  session_->setRecordingType(7);
+  session_->recordingType.set(7);
   agent_.prepareCapture();
-  EXPECT_EQ(context_->status(), 1);
+  EXPECT_EQ(context_->state.status.get(), 1);
   EXPECT_TRUE(log_.contains(3, "An error occurred during recording (1)"));
 }
 
 TEST_F(Actions, APreparationThatRunsOutOfMemoryIsNoRecording) {
   framework_->on_new_controller = [](auto&) { throw std::bad_alloc(); };
-  context_->setStatus(0);  // what a START sets beforehand
+  context_->state.status.set(0);  // what a START sets beforehand
   agent_.mainRunLoop().adoptThread();
   EXPECT_TRUE(agent_.perform(&AgentActions::prepareCapture, Wait::untilDone));
-  EXPECT_EQ(context_->status(), kRecordNotRunning);
+  EXPECT_EQ(context_->state.status.get(), kRecordNotRunning);
   framework_->on_new_controller = nullptr;
   start("R1");  // finds no lock that was left behind
 }
 
 TEST_F(Actions, PreviewActionsLogAndSucceedAlsoWithoutACamera) {
-  context_->setStatus(9);
+  context_->state.status.set(9);
   agent_.startPreview();
-  EXPECT_EQ(context_->status(), 0);
-  context_->setStatus(9);
+  EXPECT_EQ(context_->state.status.get(), 0);
+  context_->state.status.set(9);
   agent_.stopPreview();
-  EXPECT_EQ(context_->status(), 0);
+  EXPECT_EQ(context_->state.status.get(), 0);
   EXPECT_TRUE(log_.contains(7, "Process startPreview"));
   EXPECT_TRUE(log_.contains(7, "Process stopPreview"));
 }
@@ -83,20 +85,20 @@ TEST_F(Actions, ResumeIsReportedOnlyWhenItChangesSomething) {
 
 TEST_F(Actions, PauseAndResumeLeaveTheStatus) {
   start("R1");
-  context_->setStatus(9);
+  context_->state.status.set(9);
   agent_.pauseCapture();
   agent_.resumeCapture();
-  EXPECT_EQ(context_->status(), 9);
+  EXPECT_EQ(context_->state.status.get(), 9);
 }
 
 TEST_F(Actions, StopStopsTheControllerAndMakesIdle) {
   start("R1");
-  context_->setStatus(9);
+  context_->state.status.set(9);
   agent_.stopCapture();
   EXPECT_EQ(journalCount("controller stopRecording"), 1);
   EXPECT_EQ(journalCount("cancelRecording"), 0);
-  EXPECT_EQ(session_->status(), kRecorderIdle);
-  EXPECT_EQ(context_->status(), 0);
+  EXPECT_EQ(session_->status.get(), kRecorderIdle);
+  EXPECT_EQ(context_->state.status.get(), 0);
   EXPECT_TRUE(log_.contains(7, "Process stopCapture"));
 }
 
@@ -105,7 +107,7 @@ TEST_F(Actions, CancelCancelsTheController) {
   agent_.cancelCapture();
   EXPECT_EQ(journalCount("cancelRecording"), 1);
   EXPECT_EQ(journalCount("controller stopRecording"), 0);
-  EXPECT_EQ(session_->status(), kRecorderIdle);
+  EXPECT_EQ(session_->status.get(), kRecorderIdle);
   EXPECT_TRUE(log_.contains(7, "Process cancelCapture"));
 }
 
@@ -114,45 +116,45 @@ TEST_F(Actions, WithoutACaptureTheyDoNothing) {
   agent_.resumeCapture();
   agent_.stopCapture();
   agent_.cancelCapture();
-  EXPECT_EQ(context_->status(), 0);
+  EXPECT_EQ(context_->state.status.get(), 0);
   EXPECT_TRUE(journal_.entries().empty());
 }
 
 TEST_F(Actions, AdhocCancelNamesTheRequestAndNothingElse) {
   const auto controller = start("R1");
-  context_->setAdhoc(true);
+  context_->options.adhoc.set(true);
   agent_.cancelCapture();
   ASSERT_EQ(controller->marks().back().operation, "cancelRequest");
-  EXPECT_EQ(controller->marks().back().uuid, session_->recording_uuid());
-  EXPECT_EQ(session_->status(), kRecorderRecording);
+  EXPECT_EQ(controller->marks().back().uuid, session_->recording_uuid.get());
+  EXPECT_EQ(session_->status.get(), kRecorderRecording);
   EXPECT_EQ(journalCount("cancelRecording"), 0);
-  context_->setAdhoc(false);
+  context_->options.adhoc.set(false);
 }
 
 TEST_F(Actions, AdhocStopMarksTheShiftedStopThenStopsTheRecording) {
   const auto controller = start("R1");
-  context_->setAdhoc(true);
-  context_->setTimeshift_seconds(20);
+  context_->options.adhoc.set(true);
+  context_->state.timeshift_seconds.set(20);
   setContinuous();  // a submission instead of another stop
   const double before = secondsSinceReferenceDate();
   agent_.stopCapture();
   const auto mark = controller->marks().back();
   EXPECT_EQ(mark.operation, "setStop");
-  EXPECT_EQ(mark.uuid, session_->recording_uuid());
+  EXPECT_EQ(mark.uuid, session_->recording_uuid.get());
   EXPECT_NEAR(*mark.time, before - 20, 1.0);
   EXPECT_TRUE(log_.contains(7, "Process stopRecording"));
-  context_->setAdhoc(false);
-  context_->setRunning(false);
+  context_->options.adhoc.set(false);
+  context_->state.running.set(false);
 }
 
 TEST_F(Actions, StopRecordingWithoutParametersIsACancelLineAndNothingElse) {
   start("R1");
   for (const auto& parameters : {SharedDictionary(), std::make_shared<const Dictionary>()}) {
-    context_->setProperties(parameters);
+    context_->state.properties.set(parameters);
     agent_.stopRecording();
   }
   EXPECT_EQ(log_.count(1, "Recording canceled, missing RecordingMetadata_RECORDING_UUID."), 2);
-  EXPECT_EQ(session_->status(), kRecorderRecording);
+  EXPECT_EQ(session_->status.get(), kRecorderRecording);
   EXPECT_EQ(journalCount("controller stopRecording"), 0);
 }
 
@@ -177,7 +179,7 @@ TEST_F(Actions, ShutDownControlCancelsAndAsksForTheDeviceAgain) {
   agent_.shutDownControl();
   EXPECT_TRUE(log_.contains(7, "Process shutDownControl"));
   EXPECT_EQ(journalCount("cancelRecording"), 1);
-  EXPECT_GT(context_->last_device_check(), 0);
+  EXPECT_GT(context_->state.last_device_check.get(), 0);
 }
 
 TEST_F(Actions, SignalsRunTheirActions) {
@@ -187,10 +189,10 @@ TEST_F(Actions, SignalsRunTheirActions) {
   agent_.signal(SIGUSR2);
   EXPECT_EQ(journalCount("pauseRecording"), 1);
   EXPECT_EQ(journalCount("resumeRecording"), 1);
-  EXPECT_TRUE(context_->running());
+  EXPECT_TRUE(context_->state.running.get());
   agent_.signal(SIGTERM);
   EXPECT_EQ(journalCount("controller stopRecording"), 1);
-  EXPECT_FALSE(context_->running());
+  EXPECT_FALSE(context_->state.running.get());
   for (const char* line : {"Got Pause Signal", "Got Resume Signal", "Got Termination Signal (SIGTERM)"}) {
     EXPECT_TRUE(log_.contains(7, line)) << line;
   }
@@ -203,22 +205,22 @@ TEST_F(Actions, AHangUpCancelsTheCaptureAndTheAgentGoesOn) {
   EXPECT_TRUE(log_.contains(7, "Got Signal (SIGHUP)"));
   EXPECT_EQ(journalCount("cancelRecording"), 1);
   EXPECT_EQ(journalCount("controller stopRecording"), 0);
-  EXPECT_GE(context_->last_device_check(), before);
-  EXPECT_TRUE(context_->running());
+  EXPECT_GE(context_->state.last_device_check.get(), before);
+  EXPECT_TRUE(context_->state.running.get());
 }
 
 TEST_F(Actions, AnInterruptStopsTheCaptureOfADaemonOnly) {
   start("R1");
-  context_->setAdhoc(true);
+  context_->options.adhoc.set(true);
   agent_.signal(SIGINT);
   EXPECT_EQ(journalCount("setStop"), 0);
   EXPECT_EQ(journalCount("controller stopRecording"), 0);
-  EXPECT_FALSE(context_->running());
-  context_->setAdhoc(false);
-  context_->setRunning(true);
+  EXPECT_FALSE(context_->state.running.get());
+  context_->options.adhoc.set(false);
+  context_->state.running.set(true);
   agent_.signal(SIGINT);
   EXPECT_EQ(journalCount("controller stopRecording"), 1);
-  EXPECT_FALSE(context_->running());
+  EXPECT_FALSE(context_->state.running.get());
   EXPECT_EQ(log_.count(7, "Got Stop Signal (SIGINT)"), 2);
 }
 
@@ -230,15 +232,15 @@ TEST_F(Actions, OtherSignalNumbersAreIgnored) {
   for (const int number : {0, SIGALRM, SIGCHLD, 99}) agent_.signal(number);
   EXPECT_EQ(journal_.entries(), before);
   EXPECT_EQ(log_.entries().size(), lines);
-  EXPECT_TRUE(context_->running());
+  EXPECT_TRUE(context_->state.running.get());
 }
 
 TEST_F(Actions, PerformedFromAnotherThreadTheyRunInTheLoop) {
-  session_->setStatus(kRecorderRecording);
+  session_->status.set(kRecorderRecording);
   std::atomic<bool> done{false};
   std::thread poster([&] {
     EXPECT_TRUE(agent_.perform(&AgentActions::setRecorderStatusToIdle, Wait::untilDone));
-    EXPECT_EQ(session_->status(), kRecorderIdle);
+    EXPECT_EQ(session_->status.get(), kRecorderIdle);
     done = true;
   });
   while (!done) agent_.mainRunLoop().run(std::chrono::milliseconds(5));
@@ -246,14 +248,14 @@ TEST_F(Actions, PerformedFromAnotherThreadTheyRunInTheLoop) {
 }
 
 TEST_F(Actions, CallbacksLogNothingWhenTheAgentIsNotRunning) {
-  context_->setRunning(false);
+  context_->state.running.set(false);
   agent_.recordDidStartWithFile("/r/A.mov", nullptr, std::nullopt);
   agent_.recordDidPauseWithFile("/r/A.mov", nullptr, 1);
   agent_.recordDidResumeWithFile("/r/A.mov", nullptr);
   agent_.recordRuntimeErrorCallback(4);
   agent_.recordDidStopWithFile(session_, "/r/A.mov", nullptr, std::nullopt, 1, std::nullopt, false);
   EXPECT_TRUE(log_.entries().empty());
-  EXPECT_EQ(context_->postProcessListCount(), 0U);
+  EXPECT_EQ(context_->post_process_list.postProcessListCount(), 0U);
 }
 
 TEST_F(Actions, CallbacksLogTheirLines) {
@@ -271,25 +273,27 @@ TEST_F(Actions, CallbacksLogTheirLines) {
 /// Ends in the two-second pause that is part of the behaviour.
 TEST_F(Actions, ALostDeviceWaitsForTheQueue) {
   const auto delegate = std::make_shared<LMRCaptureDelegate>(nullptr);
-  delegate->setRecordError(CaptureError{CaptureError::kDomain, kDeviceRemoved, "gone"});
-  session_->setCaptureControllerDelegate(delegate);
-  context_->postProcessListAddJob(std::make_shared<AgentSubmit>());
-  context_->postProcessListAddJob(std::make_shared<AgentSubmit>());
-  EXPECT_FALSE(agent_.deviceDisconnected());
-  context_->postProcessListNext();
-  EXPECT_FALSE(agent_.deviceDisconnected());
+  delegate->recordError.set(CaptureError{CaptureError::kDomain, kDeviceRemoved, "gone"});
+  session_->captureControllerDelegate.set(delegate);
+  context_->post_process_list.postProcessListAddJob(std::make_shared<AgentSubmit>());
+  context_->post_process_list.postProcessListAddJob(std::make_shared<AgentSubmit>());
+  EXPECT_FALSE(agent_.devices().deviceDisconnected());
+  context_->post_process_list.postProcessListNext();
+  EXPECT_FALSE(agent_.devices().deviceDisconnected());
   EXPECT_TRUE(log_.entries().empty());
-  context_->postProcessListNext();
+  context_->post_process_list.postProcessListNext();
+  EXPECT_TRUE(agent_.devices().deviceDisconnected());
+  EXPECT_TRUE(log_.entries().empty()) << "asking changes nothing";
   const auto before = std::chrono::steady_clock::now();
-  EXPECT_TRUE(agent_.deviceDisconnected());
+  agent_.devices().announceLostDevice();
   EXPECT_GE(std::chrono::steady_clock::now() - before, std::chrono::milliseconds(1900));
   EXPECT_TRUE(log_.contains(2, "The capture device has been disconnected."));
 }
 
 TEST_F(Actions, ADeviceThatIsThereKeepsTheLoop) {
-  EXPECT_FALSE(agent_.deviceDisconnected());
+  EXPECT_FALSE(agent_.devices().deviceDisconnected());
   start("R1");
-  EXPECT_FALSE(agent_.deviceDisconnected());
+  EXPECT_FALSE(agent_.devices().deviceDisconnected());
 }
 
 }  // namespace

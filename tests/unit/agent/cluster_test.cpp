@@ -15,7 +15,7 @@ class Cluster : public AgentTest {
       std::filesystem::create_directories(directoryOf(systemPath(path)));
       ::unlink(systemPath(path).c_str());
     }
-    context_->setTunnel_host("server");
+    context_->server.tunnel_host.set("server");
   }
   ~Cluster() override {
     for (const auto path : {kServerInformation, kServerInformationOfRoot}) ::unlink(systemPath(path).c_str());
@@ -38,14 +38,15 @@ class Cluster : public AgentTest {
     for (const auto& argv : children_.runs()) hosts.push_back(argv.back());
     return hosts;
   }
-  static std::size_t count(const AgentMain::SharedPlist& plist) { return plist ? plist->size() : 0; }
+  static std::size_t count(const ClusterWatch::SharedPlist& plist) { return plist ? plist->size() : 0; }
 
-  AgentMain::SharedPlist members_;
+  ClusterWatch watch_{*context_, context_->server, context_->server_info, children_};
+  ClusterWatch::SharedPlist members_;
 };
 
 TEST_F(Cluster, TheToolIsAskedForTheHost) {
   children_.result = exited(0, propertyListXml(members({"a", "b"})));
-  EXPECT_EQ(agent_.clusterInformation("server", members_), 0);
+  EXPECT_EQ(watch_.clusterInformation("server", members_), 0);
   EXPECT_EQ(count(members_), 2U);
   EXPECT_THAT(children_.runs(),
               ElementsAre(ElementsAre(systemPath(kLumexTool), "--listinfo", "--server", "server")));
@@ -56,19 +57,19 @@ TEST_F(Cluster, OutputThatIsNoPropertyListHasNoMembers) {
   for (const char* output :
        {"", "garbage", "<plist version=\"1.0\"><dict/></plist>", "<plist version=\"1.0\"><array/></plist>"}) {
     children_.result = exited(0, output);
-    EXPECT_EQ(agent_.clusterInformation("server", members_), 0) << output;
+    EXPECT_EQ(watch_.clusterInformation("server", members_), 0) << output;
     EXPECT_EQ(members_, nullptr) << output;
   }
 }
 
 TEST_F(Cluster, WithoutAHostNobodyIsAsked) {
-  EXPECT_EQ(agent_.clusterInformation(std::nullopt, members_), -1);
+  EXPECT_EQ(watch_.clusterInformation(std::nullopt, members_), -1);
   EXPECT_TRUE(children_.runs().empty());
 }
 
 TEST_F(Cluster, AFailingToolWithoutACacheIsItsStatus) {
   children_.result = exited(3);
-  EXPECT_EQ(agent_.clusterInformation("server", members_), 3);
+  EXPECT_EQ(watch_.clusterInformation("server", members_), 3);
   EXPECT_EQ(members_, nullptr);
   EXPECT_TRUE(log_.contains(3, "Unable to retrieve cluster information (/usr/bin/lumex exit code = 3)."));
   EXPECT_TRUE(log_.contains(7, "Unable to retrieve cluster information from disk."));
@@ -76,7 +77,7 @@ TEST_F(Cluster, AFailingToolWithoutACacheIsItsStatus) {
 
 TEST_F(Cluster, AHangingToolIsAFailedOne) {
   children_.result = {ChildResult::End::timedOut, 9, ""};
-  EXPECT_NE(agent_.clusterInformation("server", members_), 0);
+  EXPECT_NE(watch_.clusterInformation("server", members_), 0);
   EXPECT_TRUE(log_.contains(3, "/usr/bin/lumex --listinfo has not answered for 20 seconds and was ended"));
 }
 
@@ -85,7 +86,7 @@ TEST_F(Cluster, TheFirstMemberOfTheCacheIsSkipped) {
   children_.answer = [](const auto& argv) {
     return argv.back() == "b:1" ? exited(0, propertyListXml(members({"x"}))) : exited(5);
   };
-  EXPECT_EQ(agent_.clusterInformation("server", members_), 0);
+  EXPECT_EQ(watch_.clusterInformation("server", members_), 0);
   EXPECT_THAT(asked(), ElementsAre("server", "b:1"));
   EXPECT_TRUE(members_->contains("x"));
 }
@@ -93,7 +94,7 @@ TEST_F(Cluster, TheFirstMemberOfTheCacheIsSkipped) {
 TEST_F(Cluster, ACacheOfOneMemberIsTheAnswerThoughNobodyWasAsked) {
   cache(kServerInformation, members({"a"}));
   children_.result = exited(5);
-  EXPECT_EQ(agent_.clusterInformation("server", members_), -1);
+  EXPECT_EQ(watch_.clusterInformation("server", members_), -1);
   EXPECT_THAT(asked(), ElementsAre("server"));
   EXPECT_TRUE(members_->contains("a"));
   EXPECT_TRUE(log_.contains(7, "Unable to contact any member of the cluster."));
@@ -102,33 +103,33 @@ TEST_F(Cluster, ACacheOfOneMemberIsTheAnswerThoughNobodyWasAsked) {
 TEST_F(Cluster, AMembersOwnFailureIsTheStatus) {
   cache(kServerInformation, members({"a", "b", "c"}));
   children_.result = exited(5);
-  EXPECT_EQ(agent_.clusterInformation("server", members_), 5);
+  EXPECT_EQ(watch_.clusterInformation("server", members_), 5);
   EXPECT_THAT(asked(), ElementsAre("server", "b:1")) << "only one entry is tried";
   EXPECT_EQ(count(members_), 3U);
 }
 
 TEST_F(Cluster, TheSecondCacheCountsOnlyWithoutTheFirst) {
   cache(kServerInformationOfRoot, members({"second"}));
-  EXPECT_TRUE(AgentMain::clusterInformationFromDisk()->contains("second"));
+  EXPECT_TRUE(ClusterWatch::clusterInformationFromDisk()->contains("second"));
   cache(kServerInformation, members({"first"}));
-  EXPECT_TRUE(AgentMain::clusterInformationFromDisk()->contains("first"));
+  EXPECT_TRUE(ClusterWatch::clusterInformationFromDisk()->contains("first"));
   testing::writeFile(systemPath(kServerInformation), "half a file");
-  EXPECT_TRUE(AgentMain::clusterInformationFromDisk()->contains("second"));
+  EXPECT_TRUE(ClusterWatch::clusterInformationFromDisk()->contains("second"));
 }
 
 TEST_F(Cluster, ARefreshThatFailsKeepsTheOldInformation) {
-  context_->setServer_info(std::make_shared<const PlistDictionary>(PlistDictionary{{"old", "x"}}));
+  context_->server_info.set(std::make_shared<const PlistDictionary>(PlistDictionary{{"old", "x"}}));
   children_.result = exited(3);
-  agent_.refreshClusterInformation();
+  watch_.refreshClusterInformation();
   EXPECT_TRUE(log_.waitFor(3, "Unable to update cluster information."));
-  EXPECT_TRUE(context_->server_info_retain()->contains("old"));
+  EXPECT_TRUE(context_->server_info.get()->contains("old"));
 }
 
 TEST_F(Cluster, ARefreshStoresTheAnswer) {
   children_.result = exited(0, propertyListXml(members({"a"})));
-  agent_.refreshClusterInformation();
+  watch_.refreshClusterInformation();
   EXPECT_TRUE(testing::waitUntil([&] {
-    const auto now = context_->server_info_retain();
+    const auto now = context_->server_info.get();
     return now && now->contains("a");
   }));
 }

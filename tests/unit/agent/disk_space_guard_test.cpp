@@ -8,16 +8,16 @@ namespace {
 
 constexpr std::uint32_t kNeverEnough = 0xFFFFFFFFU;
 
-class DiskSpaceGuard : public AgentTest {
+class DiskSpaceGuardTest : public AgentTest {
  protected:
-  DiskSpaceGuard() {
-    session_->setDiskSpaceCutoffInMB(1);
+  DiskSpaceGuardTest() {
+    session_->diskSpaceCutoffInMB.set(1);
     agent_.startTimers();
   }
   void setContinuous(bool enabled) {
     LMRContinuousRecordingInfo info;
     info.enabled = enabled;
-    context_->setContinuous(info);
+    context_->recording.continuous.set(info);
   }
   [[nodiscard]] std::ptrdiff_t disabledLines() const {
     std::ptrdiff_t lines = 0;
@@ -30,23 +30,23 @@ class DiskSpaceGuard : public AgentTest {
   }
 };
 
-TEST_F(DiskSpaceGuard, LeavesARecordingAloneWhileThereIsSpace) {
+TEST_F(DiskSpaceGuardTest, LeavesARecordingAloneWhileThereIsSpace) {
   start("R1")->devices_run = true;
-  agent_.checkDiskSpace();
+  agent_.diskSpaceGuard().checkDiskSpace();
   EXPECT_EQ(journalCount("controller stopRecording"), 0);
   EXPECT_FALSE(log_.mentions("recording disabled"));
-  EXPECT_TRUE(context_->running());
+  EXPECT_TRUE(context_->state.running.get());
 }
 
-TEST_F(DiskSpaceGuard, StopsTheRecordingAndSaysSoOnce) {
+TEST_F(DiskSpaceGuardTest, StopsTheRecordingAndSaysSoOnce) {
   const auto controller = start("R1");
   controller->devices_run = true;
-  session_->setDiskSpaceCutoffInMB(kNeverEnough);
-  agent_.checkDiskSpace();
+  session_->diskSpaceCutoffInMB.set(kNeverEnough);
+  agent_.diskSpaceGuard().checkDiskSpace();
   EXPECT_EQ(journalCount("controller stopRecording"), 1);
   controller->devices_run = false;
-  agent_.checkDiskSpace();
-  agent_.checkDiskSpace();
+  agent_.diskSpaceGuard().checkDiskSpace();
+  agent_.diskSpaceGuard().checkDiskSpace();
   EXPECT_EQ(journalCount("controller stopRecording"), 1);
   EXPECT_EQ(disabledLines(), 1);
   reportEnd(controller);
@@ -54,19 +54,19 @@ TEST_F(DiskSpaceGuard, StopsTheRecordingAndSaysSoOnce) {
   EXPECT_NE(nextJob(), nullptr) << "what was recorded until then is submitted";
 }
 
-TEST_F(DiskSpaceGuard, DoesNotRecordAgainByItselfInPlainMode) {
-  session_->setDiskSpaceCutoffInMB(kNeverEnough);
-  agent_.checkDiskSpace();
-  session_->setDiskSpaceCutoffInMB(1);
-  agent_.checkDiskSpace();
+TEST_F(DiskSpaceGuardTest, DoesNotRecordAgainByItselfInPlainMode) {
+  session_->diskSpaceCutoffInMB.set(kNeverEnough);
+  agent_.diskSpaceGuard().checkDiskSpace();
+  session_->diskSpaceCutoffInMB.set(1);
+  agent_.diskSpaceGuard().checkDiskSpace();
   EXPECT_EQ(framework_->controllersMade(), 0U);
 }
 
-TEST_F(DiskSpaceGuard, RecordsAgainInContinuousMode) {
+TEST_F(DiskSpaceGuardTest, RecordsAgainInContinuousMode) {
   setContinuous(true);
-  agent_.checkDiskSpace();
+  agent_.diskSpaceGuard().checkDiskSpace();
   EXPECT_EQ(framework_->controllersMade(), 1U);
-  agent_.checkDiskSpace();
+  agent_.diskSpaceGuard().checkDiskSpace();
   EXPECT_EQ(framework_->controllersMade(), 1U) << "it runs";
   const auto entries = log_.entries();
   EXPECT_EQ(std::count_if(entries.begin(), entries.end(),
@@ -77,37 +77,37 @@ TEST_F(DiskSpaceGuard, RecordsAgainInContinuousMode) {
   const auto running = framework_->controller(0);
   ASSERT_NE(running, nullptr);
   running->shut_down = true;
-  session_->setStatus(kRecorderIdle);
-  agent_.checkDiskSpace();
+  session_->status.set(kRecorderIdle);
+  agent_.diskSpaceGuard().checkDiskSpace();
   EXPECT_EQ(framework_->controllersMade(), 2U);
 }
 
-TEST_F(DiskSpaceGuard, TellsOfTheNextShortageOnceThereWasSpaceAgain) {
+TEST_F(DiskSpaceGuardTest, TellsOfTheNextShortageOnceThereWasSpaceAgain) {
   setContinuous(true);
-  session_->setDiskSpaceCutoffInMB(kNeverEnough);
-  agent_.checkDiskSpace();
-  agent_.checkDiskSpace();
+  session_->diskSpaceCutoffInMB.set(kNeverEnough);
+  agent_.diskSpaceGuard().checkDiskSpace();
+  agent_.diskSpaceGuard().checkDiskSpace();
   EXPECT_EQ(disabledLines(), 1);
-  session_->setDiskSpaceCutoffInMB(1);
-  agent_.checkDiskSpace();
-  session_->setDiskSpaceCutoffInMB(kNeverEnough);
-  agent_.checkDiskSpace();
+  session_->diskSpaceCutoffInMB.set(1);
+  agent_.diskSpaceGuard().checkDiskSpace();
+  session_->diskSpaceCutoffInMB.set(kNeverEnough);
+  agent_.diskSpaceGuard().checkDiskSpace();
   EXPECT_EQ(disabledLines(), 2);
 }
 
-TEST_F(DiskSpaceGuard, DeletesSegmentsUntilNothingIsGained) {
+TEST_F(DiskSpaceGuardTest, DeletesSegmentsUntilNothingIsGained) {
   const auto controller = start("R1");
   controller->on_delete_segment = [&]() -> std::optional<std::string> {
     journal_.add("deleteEarliestSegment");
     return std::nullopt;
   };
-  session_->setDiskSpaceCutoffInMB(kNeverEnough);
-  agent_.checkDiskSpace();
+  session_->diskSpaceCutoffInMB.set(kNeverEnough);
+  agent_.diskSpaceGuard().checkDiskSpace();
   EXPECT_GE(journalCount("deleteEarliestSegment"), 1);
   EXPECT_LE(journalCount("deleteEarliestSegment"), 5) << "others may use this disk, but not for ever";
 }
 
-TEST_F(DiskSpaceGuard, TheDirectoryOfTheLastSegmentGoesWithIt) {
+TEST_F(DiskSpaceGuardTest, TheDirectoryOfTheLastSegmentGoesWithIt) {
   const auto controller = start("R1");
   const std::string full = movie("full");
   const std::string empty = movie("empty");
@@ -120,35 +120,35 @@ TEST_F(DiskSpaceGuard, TheDirectoryOfTheLastSegmentGoesWithIt) {
     first = false;
     return directory + "/1.mov";
   };
-  session_->setDiskSpaceCutoffInMB(kNeverEnough);
-  agent_.checkDiskSpace();
-  agent_.checkDiskSpace();
+  session_->diskSpaceCutoffInMB.set(kNeverEnough);
+  agent_.diskSpaceGuard().checkDiskSpace();
+  agent_.diskSpaceGuard().checkDiskSpace();
   EXPECT_TRUE(std::filesystem::exists(full));
   EXPECT_FALSE(std::filesystem::exists(empty));
 }
 
-TEST_F(DiskSpaceGuard, AVanishedRepositoryIsMadeAgainAndTheCaptureCancelled) {
+TEST_F(DiskSpaceGuardTest, AVanishedRepositoryIsMadeAgainAndTheCaptureCancelled) {
   start("R1");
   const std::string lost = movie("below");
   std::filesystem::create_directories(lost);
-  context_->setRecording_repository_path(lost);
-  session_->setFilename(lost + "/R1.mov");
+  context_->recording.recording_repository_path.set(lost);
+  session_->filename.set(lost + "/R1.mov");
   std::filesystem::remove_all(lost);
-  agent_.checkDiskSpace();
+  agent_.diskSpaceGuard().checkDiskSpace();
   EXPECT_EQ(journalCount("cancelRecording"), 1);
   EXPECT_TRUE(std::filesystem::is_directory(lost));
-  EXPECT_TRUE(context_->running());
+  EXPECT_TRUE(context_->state.running.get());
   EXPECT_TRUE(log_.contains(6, "Recording Repository does not exist, creating " + lost + "."));
 }
 
-TEST_F(DiskSpaceGuard, AVolumeThatCannotBeMeasuredEndsTheAgent) {
+TEST_F(DiskSpaceGuardTest, AVolumeThatCannotBeMeasuredEndsTheAgent) {
   const auto controller = start("R1");
   testing::writeFile(movie("file"), "");
-  session_->setFilename(movie("file/below/R1.mov"));  // ENOTDIR
-  agent_.checkDiskSpace();
+  session_->filename.set(movie("file/below/R1.mov"));  // ENOTDIR
+  agent_.diskSpaceGuard().checkDiskSpace();
   EXPECT_EQ(journalCount("controller stopRecording"), 1);
-  EXPECT_FALSE(context_->running());
-  context_->setRunning(true);
+  EXPECT_FALSE(context_->state.running.get());
+  context_->state.running.set(true);
 }
 
 }  // namespace

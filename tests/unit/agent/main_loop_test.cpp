@@ -4,8 +4,9 @@
 #include <cstdio>
 #include <ctime>
 
+#include "capture/api/capture_framework.h"
 #include "record/capture_delegate.h"
-#include "record/engine.h"
+#include "record/create_preview.h"
 #include "record/preview_controller.h"
 #include "tests/unit/agent/agent_fixture.h"
 
@@ -13,7 +14,7 @@ namespace lmx {
 namespace {
 
 /// The main loop's checks, a turn at a time.
-class MainLoop : public AgentTest {
+class MainLoopTest : public AgentTest {
  protected:
   static constexpr const char* kOffline =
       "Unable to acquire the specified video device. The agent will remain offline until the device becomes "
@@ -24,41 +25,43 @@ class MainLoop : public AgentTest {
     bool goesOn = false;
     agent_.mainRunLoop().post(
         [&] {
-          goesOn = context_->running();
-          context_->setRunning(false);
+          goesOn = context_->state.running.get();
+          context_->state.running.set(false);
         },
         Wait::no);
-    EXPECT_EQ(agent_.appLoop(), 0);
-    context_->setRunning(true);
+    EXPECT_EQ(agent_.mainLoop().appLoop(), 0);
+    context_->state.running.set(true);
     return goesOn;
   }
-  void checkedDevice(int secondsAgo) { context_->setLast_device_check(std::time(nullptr) - secondsAgo); }
+  void checkedDevice(int secondsAgo) {
+    context_->state.last_device_check.set(std::time(nullptr) - secondsAgo);
+  }
 };
 
-TEST_F(MainLoop, ADeviceThatIsNotMissedIsNotLookedFor) {
+TEST_F(MainLoopTest, ADeviceThatIsNotMissedIsNotLookedFor) {
   EXPECT_TRUE(turn());
-  EXPECT_EQ(session_->previewController(), nullptr);
+  EXPECT_EQ(session_->previewController.get(), nullptr);
 }
 
-TEST_F(MainLoop, AMissedDeviceIsLookedForAfterMoreThanTenSeconds) {
+TEST_F(MainLoopTest, AMissedDeviceIsLookedForAfterMoreThanTenSeconds) {
   checkedDevice(9);
   EXPECT_TRUE(turn());
-  EXPECT_EQ(session_->previewController(), nullptr);
-  EXPECT_GT(context_->last_device_check(), 0);
+  EXPECT_EQ(session_->previewController.get(), nullptr);
+  EXPECT_GT(context_->state.last_device_check.get(), 0);
   checkedDevice(11);
   EXPECT_TRUE(turn());
-  EXPECT_NE(session_->previewController(), nullptr);
-  EXPECT_EQ(context_->last_device_check(), 0);
+  EXPECT_NE(session_->previewController.get(), nullptr);
+  EXPECT_EQ(context_->state.last_device_check.get(), 0);
   EXPECT_FALSE(log_.mentions(kOffline));
 }
 
-TEST_F(MainLoop, AClockThatIsSetBackDoesNotKeepTheAgentOffline) {
+TEST_F(MainLoopTest, AClockThatIsSetBackDoesNotKeepTheAgentOffline) {
   checkedDevice(-3600);
   EXPECT_TRUE(turn());
-  EXPECT_EQ(context_->last_device_check(), 0);
+  EXPECT_EQ(context_->state.last_device_check.get(), 0);
 }
 
-TEST_F(MainLoop, ASecondSignalWhileTheTunnelClosesIsHarmless) {
+TEST_F(MainLoopTest, ASecondSignalWhileTheTunnelClosesIsHarmless) {
   for (int round = 0; round < 20; ++round) {
     checkedDevice(11);
     ASSERT_TRUE(turn());  // opens the tunnel
@@ -69,15 +72,15 @@ TEST_F(MainLoop, ASecondSignalWhileTheTunnelClosesIsHarmless) {
   EXPECT_EQ(log_.count(7, "Process shutDownControl"), 40);
 }
 
-TEST_F(MainLoop, ADeviceThatIsStillMissingEndsTheDaemon) {
+TEST_F(MainLoopTest, ADeviceThatIsStillMissingEndsTheDaemon) {
   framework_->cameras_attach = false;
   checkedDevice(11);
   EXPECT_FALSE(turn());
-  EXPECT_EQ(session_->previewController(), nullptr);
+  EXPECT_EQ(session_->previewController.get(), nullptr);
   EXPECT_FALSE(log_.mentions(kOffline));
 }
 
-TEST_F(MainLoop, ADeviceThatFailedGetsOneMoreRetryWithAWarning) {
+TEST_F(MainLoopTest, ADeviceThatFailedGetsOneMoreRetryWithAWarning) {
   framework_->cameras_attach = false;
   agent_.shutDownControlBecauseDeviceFailed();
   EXPECT_TRUE(log_.contains(7, "Process shutDownControl"));
@@ -85,13 +88,13 @@ TEST_F(MainLoop, ADeviceThatFailedGetsOneMoreRetryWithAWarning) {
   const std::int64_t before = std::time(nullptr);
   EXPECT_TRUE(turn());
   EXPECT_EQ(log_.count(4, kOffline), 1);
-  EXPECT_GE(context_->last_device_check(), before);
+  EXPECT_GE(context_->state.last_device_check.get(), before);
   checkedDevice(11);
   EXPECT_FALSE(turn());
   EXPECT_EQ(log_.count(4, kOffline), 1);
 }
 
-TEST_F(MainLoop, ADeviceThatIsBackForgetsTheWarning) {
+TEST_F(MainLoopTest, ADeviceThatIsBackForgetsTheWarning) {
   agent_.shutDownControlBecauseDeviceFailed();
   checkedDevice(11);
   EXPECT_TRUE(turn());
@@ -101,7 +104,7 @@ TEST_F(MainLoop, ADeviceThatIsBackForgetsTheWarning) {
   EXPECT_FALSE(log_.mentions(kOffline));
 }
 
-TEST_F(MainLoop, PreferencesThatAreGoneAtTheRetryEndTheDaemon) {
+TEST_F(MainLoopTest, PreferencesThatAreGoneAtTheRetryEndTheDaemon) {
   framework_->audio_device_usable = false;
   checkedDevice(11);
   EXPECT_FALSE(turn());
@@ -110,10 +113,10 @@ TEST_F(MainLoop, PreferencesThatAreGoneAtTheRetryEndTheDaemon) {
                             "for preference: RecordingAudioInput"));
 }
 
-TEST_F(MainLoop, APreviewThatNobodyAsksForIsStoppedAfterSixteenSeconds) {
+TEST_F(MainLoopTest, APreviewThatNobodyAsksForIsStoppedAfterSixteenSeconds) {
   const auto preview = LXAgentRecordCreatePreviewController("camera", std::nullopt, false, 400, nullptr);
   ASSERT_NE(preview, nullptr);
-  session_->setPreviewController(preview);
+  session_->previewController.set(preview);
   preview->controller().startPreview();
   preview->setMLastPreviewRequestTime(std::time(nullptr) - 14);
   turn();
@@ -128,18 +131,18 @@ TEST_F(MainLoop, APreviewThatNobodyAsksForIsStoppedAfterSixteenSeconds) {
   EXPECT_TRUE(log_.contains(7, "Process stopPreview"));
 }
 
-TEST_F(MainLoop, ALostDeviceEndsItWithOne) {
+TEST_F(MainLoopTest, ALostDeviceEndsItWithOne) {
   const auto delegate = std::make_shared<LMRCaptureDelegate>(nullptr);
-  delegate->setRecordError(CaptureError{CaptureError::kDomain, kDeviceRemoved, "gone"});
-  session_->setCaptureControllerDelegate(delegate);
-  EXPECT_EQ(agent_.appLoop(), 1);
-  EXPECT_FALSE(context_->running());
+  delegate->recordError.set(CaptureError{CaptureError::kDomain, kDeviceRemoved, "gone"});
+  session_->captureControllerDelegate.set(delegate);
+  EXPECT_EQ(agent_.mainLoop().appLoop(), 1);
+  EXPECT_FALSE(context_->state.running.get());
 }
 
-TEST_F(MainLoop, ARunLoopThatWasStoppedEndsItInOrder) {
+TEST_F(MainLoopTest, ARunLoopThatWasStoppedEndsItInOrder) {
   agent_.mainRunLoop().stop();
-  EXPECT_EQ(agent_.appLoop(), 0);
-  EXPECT_TRUE(context_->running());
+  EXPECT_EQ(agent_.mainLoop().appLoop(), 0);
+  EXPECT_TRUE(context_->state.running.get());
 }
 
 // The thread sanitizer can't follow the forks of these tests.
@@ -150,7 +153,7 @@ void tellOnStandardError(void*, int level, const std::string& text) {
   std::fprintf(stderr, "%d %s\n", level, text.c_str());
 }
 
-class Refusal : public MainLoop {
+class Refusal : public MainLoopTest {
  protected:
   static constexpr const char* kLine = "2 Server rejected agent connection, restarting for retry\\.";
   static constexpr int kWentOn = 7;
@@ -159,7 +162,7 @@ class Refusal : public MainLoop {
   /// One turn, which may end the process; else kWentOn does.
   [[noreturn]] void turnAfter(int seconds) {
     setLogSinkForTesting(tellOnStandardError, nullptr);
-    context_->setServerRejectTime(std::time(nullptr) - seconds);
+    context_->state.serverRejectTime.set(std::time(nullptr) - seconds);
     turn();
     _exit(kWentOn);
   }
@@ -172,24 +175,25 @@ TEST_F(Refusal, EndsTheProcessWithZeroAfterAMinute) {
 TEST_F(Refusal, IsNotActedUponEarlier) { EXPECT_EXIT(turnAfter(57), ::testing::ExitedWithCode(kWentOn), ""); }
 
 TEST_F(Refusal, IsNeverActedUponInAdhocMode) {
-  context_->setAdhoc(true);
+  context_->options.adhoc.set(true);
   EXPECT_EXIT(turnAfter(1000), ::testing::ExitedWithCode(kWentOn), "");
-  context_->setAdhoc(false);
+  context_->options.adhoc.set(false);
 }
 
-TEST_F(MainLoop, ALostDeviceEndsAnAdhocProcessWithSixtyNine) {
+TEST_F(MainLoopTest, ALostDeviceEndsAnAdhocProcessWithSixtyNine) {
   GTEST_FLAG_SET(death_test_style, "threadsafe");
   const auto delegate = std::make_shared<LMRCaptureDelegate>(nullptr);
-  delegate->setRecordError(CaptureError{CaptureError::kDomain, kDeviceRemoved, "gone"});
-  session_->setCaptureControllerDelegate(delegate);
-  context_->setAdhoc(true);
-  context_->postProcessListAddJob(std::make_shared<AgentSubmit>());  // not waited for
+  delegate->recordError.set(CaptureError{CaptureError::kDomain, kDeviceRemoved, "gone"});
+  session_->captureControllerDelegate.set(delegate);
+  context_->options.adhoc.set(true);
+  context_->post_process_list.postProcessListAddJob(std::make_shared<AgentSubmit>());  // not waited for
   const auto ask = [this] {
     setLogSinkForTesting(tellOnStandardError, nullptr);
-    agent_.deviceDisconnected();
+    EXPECT_TRUE(agent_.devices().deviceDisconnected());
+    agent_.devices().announceLostDevice();
   };
   EXPECT_EXIT(ask(), ::testing::ExitedWithCode(69), "2 The capture device has been disconnected\\.");
-  context_->setAdhoc(false);
+  context_->options.adhoc.set(false);
 }
 
 #endif

@@ -55,7 +55,7 @@ class TimedCommands : public AgentTest {
   }
   std::vector<std::string> waiting() {
     std::vector<std::string> ids;
-    for (const auto& item : context_->timedCmdList().entries())
+    for (const auto& item : context_->timedCmdList.entries())
       ids.push_back(lookUp(item, "TimerID").value_or("?"));
     return ids;
   }
@@ -65,7 +65,7 @@ class TimedCommands : public AgentTest {
 TEST_F(TimedCommands, AreLoadedFromTheFileExceptExpiredOnes) {
   writeTimers(PlistArray{entry("START", now_ + 1000, "A"), entry("STOP", now_ - 5, "B"),
                          entry("FOO", now_ + 9, "C"), entry("STOP", now_ + 2000, "D")});
-  agent_.loadSchedule();
+  agent_.timedCommands().loadSchedule();
   EXPECT_THAT(waiting(), ElementsAre("A", "D"));
   EXPECT_TRUE(log_.contains(6, "Not scheduling STOP command. The timer has expired: " + *dateText(now_ - 5)));
   EXPECT_TRUE(log_.contains(6, "Not scheduling unknown command: FOO"));
@@ -73,20 +73,20 @@ TEST_F(TimedCommands, AreLoadedFromTheFileExceptExpiredOnes) {
 
 TEST_F(TimedCommands, LoadedTwiceWaitOnce) {
   writeTimers(PlistArray{entry("START", now_ + 1000, "A")});
-  agent_.loadSchedule();
-  agent_.loadSchedule();
+  agent_.timedCommands().loadSchedule();
+  agent_.timedCommands().loadSchedule();
   EXPECT_THAT(waiting(), ElementsAre("A"));
 }
 
 TEST_F(TimedCommands, AFileOfExpiredOnesIsKept) {
   writeTimers(PlistArray{entry("START", now_ - 1000, "A")});
   const std::string before = testing::readFile(file());
-  agent_.loadSchedule();
+  agent_.timedCommands().loadSchedule();
   EXPECT_EQ(testing::readFile(file()), before);
 }
 
 TEST_F(TimedCommands, WithoutAFileThereIsNothingToDo) {
-  agent_.loadSchedule();
+  agent_.timedCommands().loadSchedule();
   EXPECT_THAT(waiting(), IsEmpty());
   EXPECT_FALSE(log_.mentions("timers file"));
 }
@@ -94,7 +94,7 @@ TEST_F(TimedCommands, WithoutAFileThereIsNothingToDo) {
 TEST_F(TimedCommands, AnUnreadableFileIsKeptUnderAnotherName) {
   for (const char* content : {"half a fi", "<plist version=\"1.0\"><dict/></plist>"}) {
     testing::writeFile(file(), content);
-    agent_.loadSchedule();
+    agent_.timedCommands().loadSchedule();
     EXPECT_TRUE(log_.mentions("The timers file " + file() + " can't be used"));
     EXPECT_EQ(testing::readFile(file() + ".unreadable-1"), content);
     ::unlink((file() + ".unreadable-1").c_str());
@@ -103,7 +103,7 @@ TEST_F(TimedCommands, AnUnreadableFileIsKeptUnderAnotherName) {
 
 TEST_F(TimedCommands, GoodElementsOfABadFileAreLoaded) {
   writeTimers(PlistArray{PlistValue("text"), entry("START", now_ + 1000, "A")});
-  agent_.loadSchedule();
+  agent_.timedCommands().loadSchedule();
   EXPECT_THAT(waiting(), ElementsAre("A"));
   EXPECT_TRUE(std::filesystem::exists(file() + ".unreadable-1"));
   ::unlink((file() + ".unreadable-1").c_str());
@@ -117,19 +117,19 @@ TEST_F(TimedCommands, AThousandEntriesComeBack) {
     many.emplace_back(std::move(one));
   }
   writeTimers(many);
-  agent_.loadSchedule();
+  agent_.timedCommands().loadSchedule();
   EXPECT_EQ(waiting().size(), 1000U);
 }
 
 TEST_F(TimedCommands, ADueCommandRunsInTheMainLoop) {
   setParameters({});
   writeTimers(PlistArray{entry("PAUSE", now_ + 1, "A")});
-  agent_.loadSchedule();
+  agent_.timedCommands().loadSchedule();
   std::thread ending([&] {
     log_.waitFor(6, "Running deferred command: PAUSE");
-    context_->setRunning(false);
+    context_->state.running.set(false);
   });
-  EXPECT_EQ(agent_.appLoop(), 0);
+  EXPECT_EQ(agent_.mainLoop().appLoop(), 0);
   ending.join();
   EXPECT_GE(std::time(nullptr), now_ + 1);
   EXPECT_LE(std::time(nullptr), now_ + 3);

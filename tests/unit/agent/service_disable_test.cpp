@@ -1,4 +1,6 @@
 // The end of an agent whose configuration can't work: exit status and what the service manager is asked.
+#include "agent/service_disable.h"
+
 #include "tests/unit/agent/agent_fixture.h"
 
 // The thread sanitizer can't follow the forks of these tests.
@@ -29,7 +31,7 @@ class ServiceDisable : public ::testing::Test {
           std::fprintf(stderr, "%d %s\n", level, text.c_str());
         },
         nullptr);
-    AgentMain(newAgentContext(), {nullptr, services_, nullptr}).disableService();
+    disableService(*services_);
   }
   std::shared_ptr<TellingServiceManager> services_ = std::make_shared<TellingServiceManager>();
 };

@@ -1,4 +1,8 @@
 // The way of a stopped recording to its job: movie, document, queue.
+#include "capture/api/capture_framework.h"
+#include "model/codes.h"
+#include "postprocess/properties_document.h"
+#include "postprocess/property_gatherer.h"
 #include "tests/unit/agent/agent_fixture.h"
 
 namespace lmx {
@@ -22,26 +26,26 @@ TEST_F(StoppedRecording, BecomesAMovieADocumentAndAJob) {
   stopAndReport(controller);
   const auto job = nextJob();
   ASSERT_NE(job, nullptr);
-  EXPECT_EQ(job->recording_file_path(), movie("R1.mov"));
-  EXPECT_EQ(job->properties_file_path(), movie("R1.xml"));
-  EXPECT_FALSE(job->canceled());
-  EXPECT_EQ(job->getProperty("RecordingMetadata_RECORDING_UUID"), "R1");
-  EXPECT_EQ(job->getProperty("RecordingMetadata_TITLE"), "Talk");
-  EXPECT_EQ(job->getProperty("RecordingMetadata_DURATION"), "61");
-  EXPECT_EQ(job->getProperty("RecordingMetadata_TYPE"), "Audio+Video");
+  EXPECT_EQ(job->recording_file_path, movie("R1.mov"));
+  EXPECT_EQ(job->properties_file_path, movie("R1.xml"));
+  EXPECT_FALSE(job->canceled);
+  EXPECT_EQ(getProperty(job->properties, "RecordingMetadata_RECORDING_UUID"), "R1");
+  EXPECT_EQ(getProperty(job->properties, "RecordingMetadata_TITLE"), "Talk");
+  EXPECT_EQ(getProperty(job->properties, "RecordingMetadata_DURATION"), "61");
+  EXPECT_EQ(getProperty(job->properties, "RecordingMetadata_TYPE"), "Audio+Video");
   EXPECT_EQ(readFile(movie("R1.mov")), "movie");
-  EXPECT_EQ(readFile(movie("R1.xml")), job->propertiesXml());
+  EXPECT_EQ(readFile(movie("R1.xml")), propertiesXml(job->properties));
   EXPECT_EQ(journalCount("processRequest request of R1 " + movie("R1.mov")), 1);
   EXPECT_TRUE(log_.contains(5, "\"" + movie("R1.mov") + "\" recording stopped (duration: 61s)"));
   EXPECT_TRUE(testing::waitUntil([&] { return journalCount("requestHandedOver request of R1") == 1; }));
 }
 
 TEST_F(StoppedRecording, EndDateIsNowLessTheTimeShift) {
-  context_->setTimeshift_seconds(1000);
+  context_->state.timeshift_seconds.set(1000);
   stopAndReport(start("R1"));
   const auto job = nextJob();
   ASSERT_NE(job, nullptr);
-  EXPECT_NEAR(std::stod(job->getProperty("RecordingMetadata_END_DATE").value()),
+  EXPECT_NEAR(std::stod(getProperty(job->properties, "RecordingMetadata_END_DATE").value()),
               static_cast<double>(std::time(nullptr) - 1000), 2.0);
 }
 
@@ -50,14 +54,14 @@ TEST_F(StoppedRecording, GoesToTheChosenFile) {
   stopAndReport(controller);
   const auto job = nextJob();
   ASSERT_NE(job, nullptr);
-  EXPECT_EQ(job->recording_file_path(), movie("chosen.mov"));
+  EXPECT_EQ(job->recording_file_path, movie("chosen.mov"));
 }
 
 TEST_F(StoppedRecording, CarriesItsWorkflow) {
   stopAndReport(start("R1", {{"RecordingMetadata_ADHOC_WORKFLOW_UUID", "W"}}));
   const auto job = nextJob();
   ASSERT_NE(job, nullptr);
-  EXPECT_EQ(job->adhoc_workflow_uuid(), "W");
+  EXPECT_EQ(job->adhoc_workflow_uuid, "W");
 }
 
 TEST_F(StoppedRecording, OnlyTheTextOneDisablesItsSubmission) {
@@ -65,30 +69,30 @@ TEST_F(StoppedRecording, OnlyTheTextOneDisablesItsSubmission) {
     setParameters(std::move(parameters));
     agent_.recordDidStopWithFile(session_, "/nowhere/r/A.mov", nullptr, std::nullopt, 5, std::nullopt, false);
     std::size_t jobs = 0;
-    while (context_->postProcessListNext()) ++jobs;
+    while (context_->post_process_list.postProcessListNext()) ++jobs;
     return jobs;
   };
   constexpr const char* kKey = "RecordingMetadata_ADHOC_SUBMIT_DISABLED";
   EXPECT_EQ(jobsFor({{kKey, "1"}}), 0U);
   for (const char* value : {"0", "", "true", "11"}) EXPECT_EQ(jobsFor({{kKey, value}}), 1U) << value;
   EXPECT_EQ(jobsFor({}), 1U);
-  context_->setSubmit_disabled(true);
+  context_->options.submit_disabled.set(true);
   EXPECT_EQ(jobsFor({}), 0U);
-  context_->setSubmit_disabled(false);
-  context_->setAdhoc(true);
+  context_->options.submit_disabled.set(false);
+  context_->options.adhoc.set(true);
   EXPECT_EQ(jobsFor({}), 0U);
-  context_->setAdhoc(false);
+  context_->options.adhoc.set(false);
 }
 
 TEST_F(StoppedRecording, IsLeftToTheNextStartWhenTheAgentHasStopped) {
   const auto controller = start("R1");
   agent_.stopRecording();
-  context_->setRunning(false);
+  context_->state.running.set(false);
   reportEnd(controller);
   turnTheLoop();
-  session_->setCaptureController(nullptr);
+  session_->captureController.set(nullptr);
   EXPECT_TRUE(testing::waitUntil([&] { return controller.use_count() == 1; }));
-  EXPECT_EQ(context_->postProcessListCount(), 0U);
+  EXPECT_EQ(context_->post_process_list.postProcessListCount(), 0U);
   EXPECT_EQ(journalCount("processRequest request of R1 " + movie("R1.mov")), 0);
 }
 
@@ -100,10 +104,10 @@ TEST_F(StoppedRecording, AMovieThatCannotBeWrittenIsARuntimeErrorAndNoJob) {
   stopAndReport(controller);
   EXPECT_TRUE(log_.waitFor(2, "The recording could not be finished: disk full"));
   EXPECT_TRUE(log_.waitFor(3, "An error occurred during recording (8)"));
-  EXPECT_TRUE(testing::waitUntil([&] { return session_->error() == kRecordCannotWrite; }));
-  session_->setCaptureController(nullptr);
+  EXPECT_TRUE(testing::waitUntil([&] { return session_->error.get() == kRecordCannotWrite; }));
+  session_->captureController.set(nullptr);
   EXPECT_TRUE(testing::waitUntil([&] { return controller.use_count() == 1; })) << "the hand-off has ended";
-  EXPECT_EQ(context_->postProcessListCount(), 0U);
+  EXPECT_EQ(context_->post_process_list.postProcessListCount(), 0U);
   EXPECT_EQ(journalCount("requestHandedOver request of R1"), 0);
 }
 
@@ -118,21 +122,21 @@ TEST_F(StoppedRecording, ASecondOneThatHasStartedMeanwhileHasItsOwnMovieParamete
   turnTheLoop();
   const auto job1 = nextJob();
   ASSERT_NE(job1, nullptr);
-  EXPECT_EQ(session_->recordingType(), kRecordingTypeAudio);  // the report is not for the second one
-  EXPECT_TRUE(session_->audioOnlyMode());
+  EXPECT_EQ(session_->recordingType.get(), kRecordingTypeAudio);  // the report is not for the second one
+  EXPECT_TRUE(session_->audioOnlyMode.get());
   stopAndReport(second);
   const auto job2 = nextJob();
   ASSERT_NE(job2, nullptr);
-  EXPECT_EQ(session_->recordingType(), kRecordingTypeAudioVideo);
+  EXPECT_EQ(session_->recordingType.get(), kRecordingTypeAudioVideo);
 
-  EXPECT_EQ(job1->recording_file_path(), movie("R1.mov"));
-  EXPECT_EQ(job1->getProperty("RecordingMetadata_RECORDING_UUID"), "R1");
-  EXPECT_EQ(job1->getProperty("RecordingMetadata_TITLE"), "First");
-  EXPECT_EQ(job1->getProperty("RecordingMetadata_TYPE"), "Audio+Video");
-  EXPECT_EQ(job2->recording_file_path(), movie("R2.mov"));
-  EXPECT_EQ(job2->getProperty("RecordingMetadata_RECORDING_UUID"), "R2");
-  EXPECT_EQ(job2->getProperty("RecordingMetadata_TITLE"), "Second");
-  EXPECT_EQ(job2->getProperty("RecordingMetadata_TYPE"), "Audio");
+  EXPECT_EQ(job1->recording_file_path, movie("R1.mov"));
+  EXPECT_EQ(getProperty(job1->properties, "RecordingMetadata_RECORDING_UUID"), "R1");
+  EXPECT_EQ(getProperty(job1->properties, "RecordingMetadata_TITLE"), "First");
+  EXPECT_EQ(getProperty(job1->properties, "RecordingMetadata_TYPE"), "Audio+Video");
+  EXPECT_EQ(job2->recording_file_path, movie("R2.mov"));
+  EXPECT_EQ(getProperty(job2->properties, "RecordingMetadata_RECORDING_UUID"), "R2");
+  EXPECT_EQ(getProperty(job2->properties, "RecordingMetadata_TITLE"), "Second");
+  EXPECT_EQ(getProperty(job2->properties, "RecordingMetadata_TYPE"), "Audio");
 }
 
 TEST_F(StoppedRecording, AHandedOverOneDoesNotMakeASessionIdleThatHasGoneOn) {
@@ -144,7 +148,7 @@ TEST_F(StoppedRecording, AHandedOverOneDoesNotMakeASessionIdleThatHasGoneOn) {
   EXPECT_TRUE(testing::waitUntil([&] { return journalCount("requestHandedOver request of R1") == 1; }));
   EXPECT_NE(nextJob(), nullptr);  // it holds the capture too
   EXPECT_TRUE(testing::waitUntil([&] { return first.use_count() == 1; }));
-  EXPECT_EQ(session_->status(), kRecorderRecording);
+  EXPECT_EQ(session_->status.get(), kRecorderRecording);
 }
 
 TEST_F(StoppedRecording, ALateCancellationDoesNotMakeASessionIdleThatHasGoneOn) {
@@ -155,54 +159,54 @@ TEST_F(StoppedRecording, ALateCancellationDoesNotMakeASessionIdleThatHasGoneOn) 
   agent_.captureDidCancel(first.get());
   turnTheLoop();
   EXPECT_TRUE(testing::waitUntil([&] { return first.use_count() == 1; }));
-  EXPECT_EQ(session_->status(), kRecorderRecording);
-  EXPECT_EQ(context_->postProcessListCount(), 0U);
+  EXPECT_EQ(session_->status.get(), kRecorderRecording);
+  EXPECT_EQ(context_->post_process_list.postProcessListCount(), 0U);
 }
 
 TEST_F(StoppedRecording, ACancelledOneBecomesIdleAndNoJob) {
   const auto controller = start("R1");
   agent_.cancelCapture();
-  session_->setStatus(kRecorderRecording);
+  session_->status.set(kRecorderRecording);
   controller->shut_down = true;
   controller->delegate()->lmrCaptureDidCancel(std::nullopt);
   turnTheLoop();
-  EXPECT_EQ(session_->status(), kRecorderIdle);
-  EXPECT_EQ(context_->postProcessListCount(), 0U);
+  EXPECT_EQ(session_->status.get(), kRecorderIdle);
+  EXPECT_EQ(context_->post_process_list.postProcessListCount(), 0U);
 }
 
 TEST_F(StoppedRecording, ALostDeviceStillHandsOverWhatWasRecorded) {
   const auto controller = start("R1");
   reportEnd(controller, CaptureError{CaptureError::kDomain, kDeviceRemoved, "gone"});
-  EXPECT_FALSE(agent_.deviceDisconnected()) << "the recording is on its way";
+  EXPECT_FALSE(agent_.devices().deviceDisconnected()) << "the recording is on its way";
   turnTheLoop();
   EXPECT_NE(nextJob(), nullptr);
 }
 
 TEST_F(StoppedRecording, AFileRecordingMakesItsJobWithoutACapture) {
-  session_->setRecordingType(kRecordingTypeFile);
-  context_->setInput_file(movie("in.mov"));
+  session_->recordingType.set(kRecordingTypeFile);
+  context_->recording.input_file.set(movie("in.mov"));
   setParameters({{"RecordingMetadata_RECORDING_UUID", "R1"}});
   agent_.prepareCapture();
-  ASSERT_EQ(context_->status(), 0);
-  EXPECT_TRUE(testing::waitUntil([&] { return session_->startTime().has_value(); }));
+  ASSERT_EQ(context_->state.status.get(), 0);
+  EXPECT_TRUE(testing::waitUntil([&] { return session_->startTime.get().has_value(); }));
   agent_.stopRecording();
-  const auto job = context_->postProcessListNext();
+  const auto job = context_->post_process_list.postProcessListNext();
   ASSERT_NE(job, nullptr);
-  EXPECT_EQ(job->recording_file_path(), movie("in.mov"));
-  EXPECT_EQ(job->getProperty("RecordingMetadata_TYPE"), "File");
-  EXPECT_EQ(session_->status(), kRecorderIdle);
+  EXPECT_EQ(job->recording_file_path, movie("in.mov"));
+  EXPECT_EQ(getProperty(job->properties, "RecordingMetadata_TYPE"), "File");
+  EXPECT_EQ(session_->status.get(), kRecorderIdle);
 }
 
 TEST_F(StoppedRecording, ACancelledFileRecordingMakesNoJob) {
-  session_->setRecordingType(kRecordingTypeFile);
-  context_->setInput_file(movie("in.mov"));
+  session_->recordingType.set(kRecordingTypeFile);
+  context_->recording.input_file.set(movie("in.mov"));
   setParameters({{"RecordingMetadata_RECORDING_UUID", "R1"}});
   agent_.prepareCapture();
-  EXPECT_TRUE(testing::waitUntil([&] { return session_->startTime().has_value(); }));
+  EXPECT_TRUE(testing::waitUntil([&] { return session_->startTime.get().has_value(); }));
   agent_.cancelCapture();
-  EXPECT_EQ(session_->status(), kRecorderIdle);
+  EXPECT_EQ(session_->status.get(), kRecorderIdle);
   agent_.stopRecording();
-  EXPECT_EQ(context_->postProcessListCount(), 0U);
+  EXPECT_EQ(context_->post_process_list.postProcessListCount(), 0U);
   EXPECT_FALSE(log_.mentions("recording stopped"));
 }
 
@@ -216,39 +220,39 @@ TEST_F(StoppedRecording, ASecondStopMakesNoSecondJob) {
   agent_.stopRecording();
   turnTheLoop();
   EXPECT_TRUE(testing::waitUntil([&] { return journalCount("requestHandedOver request of R1") == 1; }));
-  EXPECT_EQ(context_->postProcessListCount(), 0U);
+  EXPECT_EQ(context_->post_process_list.postProcessListCount(), 0U);
   EXPECT_EQ(journalCount("processRequest request of R1 " + movie("R1.mov")), 1);
 }
 
 TEST_F(StoppedRecording, NewPreferencesDuringItDoNotChangeItsType) {
   const auto controller = start("R1");
-  session_->setRecordingType(kRecordingTypeFile);
+  session_->recordingType.set(kRecordingTypeFile);
   stopAndReport(controller);
   const auto job = nextJob();
   ASSERT_NE(job, nullptr);
   EXPECT_EQ(journalCount("controller stopRecording"), 1);
-  EXPECT_EQ(job->getProperty("RecordingMetadata_TYPE"), "Audio+Video");
+  EXPECT_EQ(getProperty(job->properties, "RecordingMetadata_TYPE"), "Audio+Video");
 }
 
 TEST_F(StoppedRecording, OfAFileSurvivesARefusedRequestForSound) {
   testing::writeFile(movie("in.mov"), "movie");
-  context_->setInput_file(movie("in.mov"));
-  context_->setRecording_type("File");
-  session_->setRecordingType(kRecordingTypeFile);
+  context_->recording.input_file.set(movie("in.mov"));
+  context_->recording.recording_type.set("File");
+  session_->recordingType.set(kRecordingTypeFile);
   setParameters({{"RecordingMetadata_RECORDING_UUID", "F1"}});
   agent_.prepareCapture();
-  ASSERT_EQ(context_->status(), 0);
-  const auto begun = session_->launchTime();
-  session_->setRecordingType(kRecordingTypeAudio);  // as the handler of START does
+  ASSERT_EQ(context_->state.status.get(), 0);
+  const auto begun = session_->launchTime.get();
+  session_->recordingType.set(kRecordingTypeAudio);  // as the handler of START does
   setParameters({{"RecordingMetadata_RECORDING_UUID", "F2"}, {"RecordingMetadata_AUDIO_ONLY", "true"}});
   agent_.prepareCapture();
-  EXPECT_EQ(context_->status(), 4);
+  EXPECT_EQ(context_->state.status.get(), 4);
   agent_.stopRecording();
-  const auto job = context_->postProcessListNext();
+  const auto job = context_->post_process_list.postProcessListNext();
   ASSERT_NE(job, nullptr);
-  EXPECT_EQ(job->getProperty("RecordingMetadata_TYPE"), "File");
-  EXPECT_GE(std::stol(job->getProperty("RecordingMetadata_START_DATE").value()), begun->tv_sec);
-  EXPECT_EQ(session_->recordingType(), kRecordingTypeFile);
+  EXPECT_EQ(getProperty(job->properties, "RecordingMetadata_TYPE"), "File");
+  EXPECT_GE(std::stol(getProperty(job->properties, "RecordingMetadata_START_DATE").value()), begun->tv_sec);
+  EXPECT_EQ(session_->recordingType.get(), kRecordingTypeFile);
 }
 
 TEST_F(StoppedRecording, ThatEndedByItselfIsSubmittedThoughItsReportIsStillToCome) {
@@ -260,9 +264,9 @@ TEST_F(StoppedRecording, ThatEndedByItselfIsSubmittedThoughItsReportIsStillToCom
   turnTheLoop();
   const auto job = nextJob();
   ASSERT_NE(job, nullptr);
-  EXPECT_EQ(job->getProperty("RecordingMetadata_RECORDING_UUID"), "R1");
+  EXPECT_EQ(getProperty(job->properties, "RecordingMetadata_RECORDING_UUID"), "R1");
   stopAndReport(second);
-  EXPECT_EQ(nextJob()->getProperty("RecordingMetadata_RECORDING_UUID"), "R2");
+  EXPECT_EQ(getProperty(nextJob()->properties, "RecordingMetadata_RECORDING_UUID"), "R2");
 }
 
 TEST_F(StoppedRecording, ThatEndedForWantOfSpaceLeavesItsError) {
@@ -270,7 +274,7 @@ TEST_F(StoppedRecording, ThatEndedForWantOfSpaceLeavesItsError) {
   controller->error = CaptureError{CaptureError::kDomain, kWriteFailed, "no space"};
   stopAndReport(controller);
   ASSERT_NE(nextJob(), nullptr) << "what was written is submitted";
-  EXPECT_TRUE(testing::waitUntil([&] { return session_->error() == kRecordCannotWrite; }));
+  EXPECT_TRUE(testing::waitUntil([&] { return session_->error.get() == kRecordCannotWrite; }));
   EXPECT_TRUE(log_.contains(3, "The capture of \"" + movie("R1.mov") + "\" ended early: no space"));
 }
 
@@ -279,22 +283,22 @@ TEST_F(StoppedRecording, OfALostDeviceLeavesNoDiskError) {
   controller->error = CaptureError{CaptureError::kDomain, kDeviceNotFound, "gone"};
   stopAndReport(controller);
   ASSERT_NE(nextJob(), nullptr);
-  EXPECT_EQ(session_->error(), kRecordSuccess);
+  EXPECT_EQ(session_->error.get(), kRecordSuccess);
 }
 
 TEST_F(StoppedRecording, IsDescribedByTheRequestThatTookItOver) {
   const auto controller = start("R1", {{"RecordingMetadata_TITLE", "First"}});
-  session_->setDiskSpaceCutoffInMB(0xFFFFFFFFU);
+  session_->diskSpaceCutoffInMB.set(0xFFFFFFFFU);
   setParameters({{"RecordingMetadata_RECORDING_UUID", "R2"}, {"RecordingMetadata_TITLE", "Second"}});
   agent_.prepareCapture();
-  ASSERT_EQ(context_->status(), 30);
-  session_->setRequest_uuid("request of R2");
-  session_->setRequest_properties(context_->properties());
+  ASSERT_EQ(context_->state.status.get(), 30);
+  session_->request_uuid.set("request of R2");
+  session_->request_properties.set(context_->state.properties.get());
   stopAndReport(controller);
   const auto job = nextJob();
   ASSERT_NE(job, nullptr);
-  EXPECT_EQ(job->getProperty("RecordingMetadata_RECORDING_UUID"), "R2");
-  EXPECT_EQ(job->getProperty("RecordingMetadata_TITLE"), "Second");
+  EXPECT_EQ(getProperty(job->properties, "RecordingMetadata_RECORDING_UUID"), "R2");
+  EXPECT_EQ(getProperty(job->properties, "RecordingMetadata_TITLE"), "Second");
 }
 
 TEST_F(StoppedRecording, RecoveredOnesGetTheirDocumentAndAreNotSubmitted) {
@@ -310,9 +314,9 @@ TEST_F(StoppedRecording, RecoveredOnesGetTheirDocumentAndAreNotSubmitted) {
     EXPECT_TRUE(std::filesystem::exists(movie("R9.xml"))) << "forgotten before the document is there";
     forgotten = true;
   };
-  agent_.keepRecovered({recovered});
+  agent_.submission().keepRecovered({recovered});
   EXPECT_TRUE(forgotten);
-  EXPECT_EQ(context_->postProcessListCount(), 0U);
+  EXPECT_EQ(context_->post_process_list.postProcessListCount(), 0U);
   const std::string xml = readFile(movie("R9.xml"));
   for (const char* part :
        {"value=\"Lost\"", "value=\"100\"", "value=\"160\"", "value=\"60\"", "value=\"Video\""}) {
@@ -327,7 +331,7 @@ TEST_F(StoppedRecording, ARecoveredOneWithoutItsDocumentIsKeptForTheNextStart) {
   RecoveredRecording recovered;
   recovered.path = movie("missing-folder/R9.mov");
   recovered.forget = [&] { forgotten = true; };
-  agent_.keepRecovered({recovered});
+  agent_.submission().keepRecovered({recovered});
   EXPECT_FALSE(forgotten);
 }
 

@@ -1,10 +1,11 @@
 // The ad-hoc client's commands, byte for byte.
 #include "cli/adhoc_command.h"
-#include "record/agent_record.h"
 
 #include <gtest/gtest.h>
 
 #include <functional>
+
+#include "model/codes.h"
 
 namespace lmx {
 namespace {
@@ -20,55 +21,55 @@ std::string minutes(int most, int unattended) {
 
 struct CommandCase {
   const char* name;
-  std::function<void(AgentContext&)> options;
+  std::function<void(RunOptions&)> options;
   std::string command;
 };
 class AdHocCommand : public ::testing::TestWithParam<CommandCase> {};
 
 TEST_P(AdHocCommand, IsBuiltFromTheOptions) {
-  const auto context = newAgentContext();
-  GetParam().options(*context);
-  EXPECT_EQ(adHocCommand(*context), GetParam().command);
+  RunOptions options;
+  GetParam().options(options);
+  EXPECT_EQ(adHocCommand(options), GetParam().command);
 }
 
 INSTANTIATE_TEST_SUITE_P(
     All, AdHocCommand,
     ::testing::Values(
-        CommandCase{"Start", [](AgentContext&) {},
+        CommandCase{"Start", [](RunOptions&) {},
                     std::string("START ") + kFixed + minutes(240, 60) + kWorkflow + "\n"},
         CommandCase{"StartWithEverything",
-                    [](AgentContext& c) {
-                      c.setDuration(5);
-                      c.setUnattended(-1);
-                      c.setSubmit_disabled(true);
-                      c.setUser("jane doe");
-                      c.setPassword("a,b=c");
-                      c.setAdhoc_output_file("/tmp/Hörsaal 3.mov");
+                    [](RunOptions& c) {
+                      c.duration.set(5);
+                      c.unattended.set(-1);
+                      c.submit_disabled.set(true);
+                      c.user.set("jane doe");
+                      c.password.set("a,b=c");
+                      c.adhoc_output_file.set("/tmp/Hörsaal 3.mov");
                     },
                     std::string("START ") + kFixed + minutes(5, -1) + kWorkflow +
                         ",RecordingMetadata_ADHOC_SUBMIT_DISABLED=1,RecordingMetadata_AGENT_USERNAME=jane doe"
                         ",RecordingMetadata_AGENT_PASSWORD=a,b=c"
                         ",RecordingMetadata_ADHOC_FILE_PATH=/tmp/Hörsaal 3.mov\n"},
-        CommandCase{"StartWithAUserOnly", [](AgentContext& c) { c.setUser("jane"); },
+        CommandCase{"StartWithAUserOnly", [](RunOptions& c) { c.user.set("jane"); },
                     std::string("START ") + kFixed + minutes(240, 60) + kWorkflow +
                         ",RecordingMetadata_AGENT_USERNAME=jane\n"},
         CommandCase{"StartAtATime",
-                    [](AgentContext& c) {
-                      c.setStart_timer("2009-06-30 14:05:00 +0200");
-                      c.setAdhoc_output_file("/tmp/a.mov");
+                    [](RunOptions& c) {
+                      c.start_timer.set("2009-06-30 14:05:00 +0200");
+                      c.adhoc_output_file.set("/tmp/a.mov");
                     },
                     std::string("TIMEDCMD time=2009-06-30 14:05:00 +0200,command=START,") + kFixed +
                         minutes(240, 60) + kWorkflow + ",RecordingMetadata_ADHOC_FILE_PATH=/tmp/a.mov\n"},
-        CommandCase{"AnUnknownRequestIsAStart", [](AgentContext& c) { c.setAdhoc_request_type(9); },
+        CommandCase{"AnUnknownRequestIsAStart", [](RunOptions& c) { c.adhoc_request_type.set(9); },
                     std::string("START ") + kFixed + minutes(240, 60) + kWorkflow + "\n"},
-        CommandCase{"Status", [](AgentContext& c) { c.setAdhoc_request_type(kAdHocStatus); },
+        CommandCase{"Status", [](RunOptions& c) { c.adhoc_request_type.set(kAdHocStatus); },
                     "STATUS include_preview=true\n"},
-        CommandCase{"TimerList", [](AgentContext& c) { c.setAdhoc_request_type(kAdHocTimerList); },
+        CommandCase{"TimerList", [](RunOptions& c) { c.adhoc_request_type.set(kAdHocTimerList); },
                     "TIMEDCMD command=TIMERLIST\n"},
         CommandCase{"TimerRevoke",
-                    [](AgentContext& c) {
-                      c.setAdhoc_request_type(kAdHocTimerRevoke);
-                      c.setTimer_id("T-1");
+                    [](RunOptions& c) {
+                      c.adhoc_request_type.set(kAdHocTimerRevoke);
+                      c.timer_id.set("T-1");
                     },
                     "TIMEDCMD command=TIMERREVOKE,TimerID=T-1\n"}),
     [](const auto& test) { return std::string(test.param.name); });

@@ -1,9 +1,10 @@
 // The ad-hoc client against a daemon that the test plays.
+#include <sys/socket.h>
+
 #include <csignal>
 #include <future>
 
-#include <sys/socket.h>
-
+#include "cli/adhoc_client.h"
 #include "platform/net/local_socket.h"
 #include "support/unique_fd.h"
 #include "tests/unit/agent/agent_fixture.h"
@@ -44,28 +45,28 @@ class PlayedDaemon {
   UniqueFd peer_;
 };
 
-class AdHocClient : public AgentTest {
+class AdHocMode : public AgentTest {
  protected:
-  AdHocClient() { context_->setAdhoc(true); }
-  ~AdHocClient() override { context_->setAdhoc(false); }
+  AdHocMode() { context_->options.adhoc.set(true); }
+  ~AdHocMode() override { context_->options.adhoc.set(false); }
 
   /// Runs the client to its end. @return what it printed
   std::string run() {
     ::testing::internal::CaptureStdout();
-    EXPECT_EQ(agent_.startup(), 0);
+    EXPECT_EQ(AdHocClient(agent_).startupAdHoc(), 0);
     return ::testing::internal::GetCapturedStdout();
   }
 };
 
-TEST_F(AdHocClient, WithoutADaemonSaysNothing) {
-  context_->setAdhoc_request_type(1);
+TEST_F(AdHocMode, WithoutADaemonSaysNothing) {
+  context_->options.adhoc_request_type.set(1);
   EXPECT_EQ(run(), "");
   EXPECT_TRUE(log_.contains(6, "lmxagentd (version 100) starting..."));
 }
 
-TEST_F(AdHocClient, AsksForTheStatusOnce) {
+TEST_F(AdHocMode, AsksForTheStatusOnce) {
   PlayedDaemon daemon;
-  context_->setAdhoc_request_type(1);
+  context_->options.adhoc_request_type.set(1);
   auto conversation = std::async(std::launch::async, [&] {
     daemon.accept();
     EXPECT_EQ(daemon.receive(), "STATUS include_preview=true\n");
@@ -76,9 +77,9 @@ TEST_F(AdHocClient, AsksForTheStatusOnce) {
   conversation.get();
 }
 
-TEST_F(AdHocClient, CutsALongReply) {
+TEST_F(AdHocMode, CutsALongReply) {
   PlayedDaemon daemon;
-  context_->setAdhoc_request_type(2);
+  context_->options.adhoc_request_type.set(2);
   auto conversation = std::async(std::launch::async, [&] {
     daemon.accept();
     daemon.receive();
@@ -90,9 +91,9 @@ TEST_F(AdHocClient, CutsALongReply) {
   conversation.get();
 }
 
-TEST_F(AdHocClient, ADaemonThatHangsUpHasNothingToSay) {
+TEST_F(AdHocMode, ADaemonThatHangsUpHasNothingToSay) {
   PlayedDaemon daemon;
-  context_->setAdhoc_request_type(1);
+  context_->options.adhoc_request_type.set(1);
   auto conversation = std::async(std::launch::async, [&] {
     daemon.accept();
     daemon.receive();
@@ -102,12 +103,12 @@ TEST_F(AdHocClient, ADaemonThatHangsUpHasNothingToSay) {
   conversation.get();
 }
 
-class AdHocRecording : public AdHocClient, public ::testing::WithParamInterface<int> {};
+class AdHocRecording : public AdHocMode, public ::testing::WithParamInterface<int> {};
 
 TEST_P(AdHocRecording, LastsUntilASignal) {
   PlayedDaemon daemon;
-  context_->setSubmit_disabled(true);
-  context_->setAdhoc_output_file("/tmp/a.mov");
+  context_->options.submit_disabled.set(true);
+  context_->options.adhoc_output_file.set("/tmp/a.mov");
   auto conversation = std::async(std::launch::async, [&] {
     daemon.accept();
     EXPECT_TRUE(daemon.receive().starts_with("START RecordingMetadata_RECORDING_UUID="));
@@ -125,9 +126,9 @@ TEST_P(AdHocRecording, LastsUntilASignal) {
 
 INSTANTIATE_TEST_SUITE_P(Signals, AdHocRecording, ::testing::Values(SIGINT, SIGTERM));
 
-TEST_F(AdHocClient, AnInterruptIsHeardWhileTheDaemonIsBusy) {
+TEST_F(AdHocMode, AnInterruptIsHeardWhileTheDaemonIsBusy) {
   PlayedDaemon daemon;  // a connection waits in its queue as behind another peer
-  context_->setSubmit_disabled(true);
+  context_->options.submit_disabled.set(true);
   auto conversation = std::async(std::launch::async, [&] {
     daemon.accept();
     daemon.receive();
@@ -141,10 +142,10 @@ TEST_F(AdHocClient, AnInterruptIsHeardWhileTheDaemonIsBusy) {
   EXPECT_TRUE(printed.ends_with("received: <empty>\nsent STOP, received: cmdStatus=0\n")) << printed;
 }
 
-TEST_F(AdHocClient, AnUnknownRequestStartsButDoesNotStay) {
+TEST_F(AdHocMode, AnUnknownRequestStartsButDoesNotStay) {
   PlayedDaemon daemon;
-  context_->setSubmit_disabled(true);
-  context_->setAdhoc_request_type(9);
+  context_->options.submit_disabled.set(true);
+  context_->options.adhoc_request_type.set(9);
   auto conversation = std::async(std::launch::async, [&] {
     daemon.accept();
     EXPECT_TRUE(daemon.receive().starts_with("START "));
@@ -159,15 +160,15 @@ class AdHocMarks : public AgentTest {};
 
 TEST_F(AdHocMarks, PauseAndResumeSignalsMarkTheRecordingWithTheTimeShift) {
   const Controller made = start("R1");
-  session_->setRecording_uuid("R1");
-  context_->setAdhoc(true);
-  context_->setTimeshift_seconds(30);
+  session_->recording_uuid.set("R1");
+  context_->options.adhoc.set(true);
+  context_->state.timeshift_seconds.set(30);
   const std::size_t before = made->marks().size();
   const double from = secondsSinceReferenceDate() - 30;
   agent_.signal(SIGUSR1);
   agent_.signal(SIGUSR2);
   const double to = secondsSinceReferenceDate() - 30;
-  context_->setAdhoc(false);
+  context_->options.adhoc.set(false);
   const auto marks = made->marks();
   ASSERT_EQ(marks.size(), before + 2);
   EXPECT_EQ(marks[before].operation, "setStop");

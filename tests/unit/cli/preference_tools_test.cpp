@@ -11,6 +11,7 @@
 
 #include "cli/bind_command.h"
 #include "platform/paths.h"
+#include "prefs/adhoc_defaults.h"
 #include "prefs/agent_preferences.h"
 #include "tests/unit/doubles/scripted_services.h"
 #include "tests/unit/doubles/test_root.h"
@@ -41,7 +42,7 @@ class PreferenceTools : public ::testing::Test {
   static std::string file() { return systemPath(kPreferencesFile); }
   static PlistDictionary stored() {
     const PlistResult read = readPropertyList(file());
-    return read.value && read.value->dictionary() ? *read.value->dictionary() : PlistDictionary();
+    return read && read->dictionary() ? *read->dictionary() : PlistDictionary();
   }
   static std::string text(const PlistDictionary& from, const std::string& key) {
     const auto found = from.find(key);
@@ -68,7 +69,7 @@ class PreferenceTools : public ::testing::Test {
 
 TEST_F(PreferenceTools, PreviewPathGoesIntoNewDefaults) {
   EXPECT_EQ(setPreviewPath("/tmp/p.jpg"), 0);
-  PlistDictionary expected = AgentPreferences::adHocDefaults();
+  PlistDictionary expected = adHocDefaults();
   expected["PreviewPath"] = "/tmp/p.jpg";
   EXPECT_EQ(stored(), expected);
 }
@@ -163,7 +164,7 @@ TEST_F(PreferenceTools, BindRunsTheToolAndFillsThePreferences) {
   EXPECT_THAT(children_.runs(), ElementsAre(ElementsAre(systemPath(kLumexTool), "--bind", "Fake-Camera", "-u",
                                                         "jane", "-s", "host")));
   EXPECT_EQ(children_.options().maximumOutput, 264U);
-  PlistDictionary expected = AgentPreferences::adHocDefaults();
+  PlistDictionary expected = adHocDefaults();
   expected["RecordingType"] = "File";
   expected["RecordingPath"] = "/a.mov";
   expected["CameraName"] = "Fake-Camera";

@@ -7,6 +7,7 @@
 #include <utility>
 #include <vector>
 
+#include "capture/api/capture_framework.h"
 #include "tests/unit/doubles/scripted_capture.h"
 
 namespace lmx::testing {

@@ -1,10 +1,9 @@
-// A directory in front of the system's fixed paths, for test programs whose code reads or writes them.
+// The directory that stands in front of the system's fixed paths in a test program.
 #pragma once
 #include <gtest/gtest.h>
 #include <stdlib.h>
 
 #include <filesystem>
-#include <memory>
 #include <string>
 
 #include "platform/paths.h"
@@ -13,24 +12,33 @@
 
 namespace lmx::testing {
 
-/// Set up before the first test: the root is read only once by the program.
-class TestRoot : public ::testing::Environment {
+/// Made before main, since the program reads where it is only once; removed at its end.
+class TestRoot {
  public:
-  void SetUp() override {
-    directory_ = std::make_unique<TemporaryDirectory>();
-    ASSERT_EQ(setenv("LMXAGENTD_ROOT", directory_->path().c_str(), 1), 0);
-    for (const char* folder : {"/var/run", "/var/lmx/agent/secrets", "/Library/Preferences"}) {
-      std::filesystem::create_directories(directory_->path() + folder);
-    }
-    ASSERT_EQ(systemPath(""), directory_->path()) << "somebody has asked for a path too early";
+  TestRoot() {
+    // With slashes at the end, which must not show.
+    setenv("LMXAGENTD_ROOT", (path() + "//").c_str(), 1);
+    setHome();
+    makeFolders();
   }
-  void TearDown() override { directory_ = nullptr; }
+  [[nodiscard]] const std::string& path() const { return directory_.path(); }
+  void setHome() const { setenv("HOME", (path() + "/home").c_str(), 1); }
+  /// Removes whatever tests have put there.
+  void clear() const {
+    for (const auto& entry : std::filesystem::directory_iterator(path())) std::filesystem::remove_all(entry);
+    makeFolders();
+  }
 
  private:
-  std::unique_ptr<TemporaryDirectory> directory_;
+  void makeFolders() const {
+    for (const char* folder : {"/dev", "/var/run", "/var/lmx/agent/secrets", "/Library/Preferences"}) {
+      std::filesystem::create_directories(path() + folder);
+    }
+  }
+  TemporaryDirectory directory_;
 };
 
-inline ::testing::Environment* const kTestRoot = ::testing::AddGlobalTestEnvironment(new TestRoot);
+inline const TestRoot kTestRoot;
 
 /// Preferences of an agent that is bound to a server, as far as a capture needs them.
 inline PlistDictionary capturePreferences(const std::string& repository) {

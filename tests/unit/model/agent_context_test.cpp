@@ -1,9 +1,10 @@
 // The shared record: its defaults, the queue, the cluster information, its end.
+#include "model/agent_context.h"
+
 #include <gtest/gtest.h>
 
 #include <thread>
 
-#include "model/agent_context.h"
 #include "postprocess/agent_submit.h"
 #include "record/agent_record.h"
 #include "tests/unit/doubles/log_capture.h"
@@ -20,72 +21,60 @@ class Context : public ::testing::Test {
 };
 
 TEST_F(Context, NewOneHasItsDefaults) {
-  EXPECT_FALSE(context_->running());
-  EXPECT_EQ(context_->duration(), 240);
-  EXPECT_EQ(context_->unattended(), 60);
-  EXPECT_EQ(context_->status(), 0);
+  EXPECT_FALSE(context_->state.running.get());
+  EXPECT_EQ(context_->options.duration.get(), 240);
+  EXPECT_EQ(context_->options.unattended.get(), 60);
+  EXPECT_EQ(context_->state.status.get(), 0);
   EXPECT_NE(context_->record_context(), nullptr);
-  EXPECT_EQ(context_->continuous(), LMRContinuousRecordingInfo{});
-  EXPECT_FALSE(context_->user());
-  EXPECT_EQ(context_->postProcessListCount(), 0U);
+  EXPECT_EQ(context_->recording.continuous.get(), LMRContinuousRecordingInfo{});
+  EXPECT_FALSE(context_->options.user.get());
+  EXPECT_EQ(context_->post_process_list.postProcessListCount(), 0U);
 }
 
 TEST_F(Context, QueueIsFirstInFirstOut) {
-  EXPECT_EQ(context_->postProcessListNext(), nullptr);
-  EXPECT_EQ(context_->postProcessListCount(), 0U);
+  EXPECT_EQ(context_->post_process_list.postProcessListNext(), nullptr);
+  EXPECT_EQ(context_->post_process_list.postProcessListCount(), 0U);
   const auto a = std::make_shared<AgentSubmit>();
   const auto b = std::make_shared<AgentSubmit>();
-  context_->postProcessListAddJob(a);
-  context_->postProcessListAddJob(b);
-  EXPECT_EQ(context_->postProcessListCount(), 2U);
-  EXPECT_EQ(context_->postProcessListNext(), a);
-  EXPECT_EQ(context_->postProcessListNext(), b);
-  EXPECT_EQ(context_->postProcessListNext(), nullptr);
+  context_->post_process_list.postProcessListAddJob(a);
+  context_->post_process_list.postProcessListAddJob(b);
+  EXPECT_EQ(context_->post_process_list.postProcessListCount(), 2U);
+  EXPECT_EQ(context_->post_process_list.postProcessListNext(), a);
+  EXPECT_EQ(context_->post_process_list.postProcessListNext(), b);
+  EXPECT_EQ(context_->post_process_list.postProcessListNext(), nullptr);
 }
 
 TEST_F(Context, QueueTakesJobsFromSeveralThreads) {
   constexpr std::size_t kJobs = 200;
   const auto add = [this] {
-    for (std::size_t i = 0; i < kJobs; ++i) context_->postProcessListAddJob(std::make_shared<AgentSubmit>());
+    for (std::size_t i = 0; i < kJobs; ++i)
+      context_->post_process_list.postProcessListAddJob(std::make_shared<AgentSubmit>());
   };
   std::thread one(add);
   std::thread two(add);
   std::size_t taken = 0;
   while (taken < 2 * kJobs) {
-    if (context_->postProcessListNext()) ++taken;
+    if (context_->post_process_list.postProcessListNext()) ++taken;
   }
   one.join();
   two.join();
-  EXPECT_EQ(context_->postProcessListCount(), 0U);
+  EXPECT_EQ(context_->post_process_list.postProcessListCount(), 0U);
 }
 
-TEST_F(Context, ServerInfoIsNullBeforeItIsSet) { EXPECT_EQ(context_->server_info_retain(), nullptr); }
+TEST_F(Context, ServerInfoIsNullBeforeItIsSet) { EXPECT_EQ(context_->server_info.get(), nullptr); }
 
 TEST_F(Context, ServerInfoThatIsStoredAlreadySurvivesItsStoring) {
-  context_->setServer_info(std::make_shared<const PlistDictionary>(PlistDictionary{{"a", "b"}}));
-  context_->setServer_info(context_->server_info_retain());
-  ASSERT_NE(context_->server_info_retain(), nullptr);
-  EXPECT_EQ(*context_->server_info_retain()->at("a").string(), "b");
+  context_->server_info.set(std::make_shared<const PlistDictionary>(PlistDictionary{{"a", "b"}}));
+  context_->server_info.set(context_->server_info.get());
+  ASSERT_NE(context_->server_info.get(), nullptr);
+  EXPECT_EQ(*context_->server_info.get()->at("a").string(), "b");
 }
 
 TEST_F(Context, RetainedServerInfoOutlivesItsReplacement) {
-  context_->setServer_info(std::make_shared<const PlistDictionary>(PlistDictionary{{"a", "b"}}));
-  const auto held = context_->server_info_retain();
-  context_->setServer_info(nullptr);
+  context_->server_info.set(std::make_shared<const PlistDictionary>(PlistDictionary{{"a", "b"}}));
+  const auto held = context_->server_info.get();
+  context_->server_info.set(nullptr);
   EXPECT_EQ(held->size(), 1U);
-}
-
-TEST_F(Context, MutexesMayBeLockedTwiceByTheirHolder) {
-  EXPECT_EQ(context_->lock_control_action_mutex(), 0);
-  EXPECT_EQ(context_->lock_control_action_mutex(), 0);
-  EXPECT_EQ(context_->unlock_control_action_mutex(), 0);
-  EXPECT_EQ(context_->unlock_control_action_mutex(), 0);
-  EXPECT_EQ(context_->lock_post_process_list_mutex(), 0);
-  EXPECT_EQ(context_->postProcessListCount(), 0U);
-  EXPECT_EQ(context_->unlock_post_process_list_mutex(), 0);
-  EXPECT_EQ(context_->lock_server_info_mutex(), 0);
-  EXPECT_EQ(context_->server_info_retain(), nullptr);
-  EXPECT_EQ(context_->unlock_server_info_mutex(), 0);
 }
 
 TEST_F(Context, MessagesAreNoFormats) {
@@ -96,38 +85,19 @@ TEST_F(Context, MessagesAreNoFormats) {
 }
 
 TEST_F(Context, CleanupTakesItApart) {
-  context_->setRunning(true);
-  context_->setLaunch_time(TimeValue{1, 2});
-  context_->setLog_context(LMPLogCreateContext("test", "com.zandor.lumex"));
-  context_->setServer_info(std::make_shared<const PlistDictionary>());
-  context_->postProcessListAddJob(std::make_shared<AgentSubmit>());
+  context_->state.running.set(true);
+  context_->state.launch_time.set(TimeValue{1, 2});
+  context_->open(LMPLogCreateContext("test", "com.zandor.lumex"));
+  context_->server_info.set(std::make_shared<const PlistDictionary>());
+  context_->post_process_list.postProcessListAddJob(std::make_shared<AgentSubmit>());
   context_->cleanup();
-  EXPECT_FALSE(context_->running());
-  EXPECT_FALSE(context_->launch_time());
-  EXPECT_FALSE(context_->continuous());
+  EXPECT_FALSE(context_->state.running.get());
+  EXPECT_FALSE(context_->state.launch_time.get());
+  EXPECT_FALSE(context_->recording.continuous.get());
   EXPECT_EQ(context_->log_context(), nullptr);
   EXPECT_EQ(context_->record_context(), nullptr);
-  EXPECT_EQ(context_->server_info_retain(), nullptr);
-  EXPECT_EQ(context_->postProcessListCount(), 0U);
-}
-
-TEST_F(Context, CleanupReleasesTheTunnelInDaemonModeOnly) {
-  for (const bool adhoc : {false, true}) {
-    const auto context = newAgentContext();
-    int released = 0;
-    context->setAdhoc(adhoc);
-    context->setCleanupHooks([&] { ++released; }, [] { return false; });
-    context->cleanup();
-    context->cleanup();
-    EXPECT_EQ(released, adhoc ? 0 : 1);
-  }
-  EXPECT_TRUE(log_.entries().empty());
-}
-
-TEST_F(Context, CleanupStopsThePostProcessThread) {
-  context_->setCleanupHooks({}, [] { return true; });
-  context_->cleanup();
-  EXPECT_EQ(log_.entries(), (std::vector<LogCapture::Entry>{{6, "Stopping post-process thread..."}}));
+  EXPECT_EQ(context_->server_info.get(), nullptr);
+  EXPECT_EQ(context_->post_process_list.postProcessListCount(), 0U);
 }
 
 }  // namespace

@@ -7,13 +7,13 @@
 #include <set>
 
 #include "platform/identifiers.h"
-#include "tests/unit/platform/test_root.h"
+#include "tests/unit/doubles/test_root.h"
 
 namespace lmx {
 namespace {
 
 TEST(SystemPath, StandsBehindTheRoot) {
-  EXPECT_EQ(systemPath(kPidFile), testing::testRoot() + "/var/run/lmxagentd.pid");
+  EXPECT_EQ(systemPath(kPidFile), testing::kTestRoot.path() + "/var/run/lmxagentd.pid");
 }
 
 TEST(SystemPath, ReadsTheEnvironmentOnce) {

@@ -1,6 +1,7 @@
 // What a job gathers for its properties document.
 #include <gmock/gmock.h>
 
+#include "postprocess/property_gatherer.h"
 #include "tests/unit/postprocess/submit_fixture.h"
 
 namespace lmx {
@@ -18,14 +19,14 @@ constexpr TimeValue kStop{1700000060, 5};
 class Gathering : public testing::SubmitFixture {
  protected:
   Gathering() {
-    context_->setMachine_uuid("CAMERA-1");
-    context_->setRecording_video_maximum_frame_rate("25");
-    context_->record_context()->setRecordingType(kRecordingTypeAudioVideo);
+    context_->server.machine_uuid.set("CAMERA-1");
+    context_->recording.recording_video_maximum_frame_rate.set("25");
+    context_->record_context()->recordingType.set(kRecordingTypeAudioVideo);
   }
   const Dictionary& gather(const SharedDictionary& parameters,
                            const std::optional<std::string>& movie = "/r/ABC.mov", bool canceled = false) {
     job_.setPropertyValuesWithContext(context_, movie, kStart, kStop, 60, parameters, canceled);
-    return job_.properties();
+    return job_.properties;
   }
   static Dictionary complete() {
     return {{"RecordingMetadata_MACHINE_UUID", "CAMERA-1"},
@@ -49,10 +50,10 @@ class Gathering : public testing::SubmitFixture {
 
 TEST_F(Gathering, TakesEverythingFromTheAgent) {
   EXPECT_EQ(gather(nullptr), complete());
-  EXPECT_EQ(job_.recording_file_path(), "/r/ABC.mov");
-  EXPECT_EQ(job_.properties_file_path(), "/r/ABC.xml");
-  EXPECT_EQ(job_.agentContext(), context_);
-  EXPECT_FALSE(job_.canceled());
+  EXPECT_EQ(job_.recording_file_path, "/r/ABC.mov");
+  EXPECT_EQ(job_.properties_file_path, "/r/ABC.xml");
+  EXPECT_EQ(job_.agentContext, context_);
+  EXPECT_FALSE(job_.canceled);
   EXPECT_THAT(log_.entries(), IsEmpty());
 }
 
@@ -76,9 +77,9 @@ TEST_F(Gathering, EveryOtherValueOfTheStartIsKeptToo) {
                        {"RecordingMetadata_AUDIO_SAMPLE_RATE", "x"},
                        {"RecordingMetadata_AUDIO_INPUT", "x"},
                        {"RecordingMetadata_DATA_MEDIA_EXTENSION", ".x"}};
-  context_->setRecording_audio_channel("Stereo");
-  context_->setRecording_audio_sample_rate("44");
-  context_->setRecording_audio_input("Automatic");
+  context_->recording.recording_audio_channel.set("Stereo");
+  context_->recording.recording_audio_sample_rate.set("44");
+  context_->recording.recording_audio_input.set("Automatic");
   EXPECT_EQ(gather(shared(own)), completeWith(own));
   EXPECT_THAT(log_.entries(), IsEmpty());
 }
@@ -88,7 +89,7 @@ TEST_F(Gathering, AStartDateOfTheStartEndsTheGathering) {
       gather(shared({{"RecordingMetadata_START_DATE", "1"}}), "/r/ABC.mov", true),
       (Dictionary{{"RecordingMetadata_START_DATE", "1"}, {"RecordingMetadata_MACHINE_UUID", "CAMERA-1"}}));
   EXPECT_THAT(log_.entries(), ElementsAre(kFailed));
-  EXPECT_FALSE(job_.canceled());
+  EXPECT_FALSE(job_.canceled);
 }
 
 TEST_F(Gathering, AnEndDateOfTheStartEndsTheGathering) {
@@ -100,7 +101,7 @@ TEST_F(Gathering, AnEndDateOfTheStartEndsTheGathering) {
 }
 
 TEST_F(Gathering, AnImageSideOfTheStartEndsTheGatheringWhenTheRecordersIsKnown) {
-  context_->record_context()->setVideoWidth(1280);
+  context_->record_context()->videoWidth.set(1280);
   EXPECT_EQ(gather(shared({{"RecordingMetadata_VIDEO_IMAGE_WIDTH", "640"}})),
             completeWith({{"RecordingMetadata_VIDEO_IMAGE_WIDTH", "640"}},
                          {"RecordingMetadata_DATA_MEDIA_EXTENSION"}));
@@ -108,7 +109,7 @@ TEST_F(Gathering, AnImageSideOfTheStartEndsTheGatheringWhenTheRecordersIsKnown) 
 }
 
 TEST_F(Gathering, AnImageHeightOfTheStartEndsTheGatheringWhenTheRecordersIsKnown) {
-  context_->record_context()->setVideoHeight(720);
+  context_->record_context()->videoHeight.set(720);
   EXPECT_EQ(gather(shared({{"RecordingMetadata_VIDEO_IMAGE_HEIGHT", "360"}})),
             completeWith({{"RecordingMetadata_VIDEO_IMAGE_HEIGHT", "360"}},
                          {"RecordingMetadata_DATA_MEDIA_EXTENSION"}));
@@ -116,8 +117,8 @@ TEST_F(Gathering, AnImageHeightOfTheStartEndsTheGatheringWhenTheRecordersIsKnown
 }
 
 TEST_F(Gathering, TheAgentWritesNoImageSizeOfItsOwn) {
-  context_->record_context()->setVideoWidth(1280);
-  context_->record_context()->setVideoHeight(720);
+  context_->record_context()->videoWidth.set(1280);
+  context_->record_context()->videoHeight.set(720);
   EXPECT_EQ(gather(nullptr), complete());
 }
 
@@ -129,7 +130,7 @@ TEST_F(Gathering, AnImageSizeOfTheStartIsKeptWhenTheRecordersIsUnknown) {
 }
 
 TEST_F(Gathering, AnEmptyImageSizeOfTheStartIsNoSize) {
-  context_->record_context()->setVideoWidth(1280);
+  context_->record_context()->videoWidth.set(1280);
   EXPECT_EQ(gather(shared({{"RecordingMetadata_VIDEO_IMAGE_WIDTH", ""}})),
             completeWith({{"RecordingMetadata_VIDEO_IMAGE_WIDTH", ""}}));
 }
@@ -147,36 +148,36 @@ TEST_F(Gathering, AnEmptyExtensionOfTheStartEndsTheGathering) {
 }
 
 TEST_F(Gathering, WhatTheAgentDoesNotKnowIsLeftOut) {
-  context_->setMachine_uuid("");
-  context_->setRecording_video_maximum_frame_rate(std::nullopt);
-  context_->record_context()->setRecordingType(kRecordingTypeNone);
+  context_->server.machine_uuid.set("");
+  context_->recording.recording_video_maximum_frame_rate.set(std::nullopt);
+  context_->record_context()->recordingType.set(kRecordingTypeNone);
   EXPECT_EQ(gather(nullptr),
             completeWith({}, {"RecordingMetadata_MACHINE_UUID", "RecordingMetadata_VIDEO_MAXIMUM_FRAME_RATE",
                               "RecordingMetadata_TYPE"}));
 }
 
 TEST_F(Gathering, WithoutASessionThereIsNoType) {
-  context_->setRecord_context(nullptr);
+  context_->releaseRecord();
   EXPECT_EQ(gather(nullptr), completeWith({}, {"RecordingMetadata_TYPE"}));
 }
 
 TEST_F(Gathering, ATypeWithoutANameEndsTheGathering) {
-  context_->record_context()->setRecordingType(9);
+  context_->record_context()->recordingType.set(9);
   gather(nullptr);
   EXPECT_THAT(log_.entries(), ElementsAre(kFailed));
 }
 
 TEST_F(Gathering, TheJobsOwnSessionDecidesTheType) {
   auto own = std::make_shared<AgentRecord>();
-  own->setRecordingType(kRecordingTypeAudio);
-  job_.setRecord(own);
+  own->recordingType.set(kRecordingTypeAudio);
+  job_.recorded = own;
   EXPECT_EQ(gather(nullptr), completeWith({{"RecordingMetadata_TYPE", "Audio"}}));
 }
 
 TEST_F(Gathering, TheSoundSettingsAreAdded) {
-  context_->setRecording_audio_channel("Stereo");
-  context_->setRecording_audio_sample_rate("44");
-  context_->setRecording_audio_input("Automatic");
+  context_->recording.recording_audio_channel.set("Stereo");
+  context_->recording.recording_audio_sample_rate.set("44");
+  context_->recording.recording_audio_input.set("Automatic");
   EXPECT_EQ(gather(nullptr), completeWith({{"RecordingMetadata_AUDIO_CHANNEL", "Stereo"},
                                            {"RecordingMetadata_AUDIO_SAMPLE_RATE", "44"},
                                            {"RecordingMetadata_AUDIO_INPUT", "Automatic"}}));
@@ -184,13 +185,13 @@ TEST_F(Gathering, TheSoundSettingsAreAdded) {
 
 TEST_F(Gathering, ADirectoryNamedMovIsReplacedToo) {
   gather(nullptr, "/a.mov/b.movie/ABC.mov");
-  EXPECT_EQ(job_.properties_file_path(), "/a.xml/b.xmlie/ABC.xml");
+  EXPECT_EQ(job_.properties_file_path, "/a.xml/b.xmlie/ABC.xml");
 }
 
 TEST_F(Gathering, AMovieNotNamedMovGetsItsDocumentBesideItWithAWarning) {
   EXPECT_EQ(gather(nullptr, "/r/ABC.mp4"),
             completeWith({{"RecordingMetadata_DATA_MEDIA_EXTENSION", ".mp4"}}));
-  EXPECT_EQ(job_.properties_file_path(), "/r/ABC.mp4.xml");
+  EXPECT_EQ(job_.properties_file_path, "/r/ABC.mp4.xml");
   EXPECT_THAT(log_.entries(),
               ElementsAre(Entry{kLogWarning,
                                 "The movie \"/r/ABC.mp4\" is not named .mov: its properties go to "
@@ -199,7 +200,7 @@ TEST_F(Gathering, AMovieNotNamedMovGetsItsDocumentBesideItWithAWarning) {
 
 TEST_F(Gathering, TheExtensionBeginsAtTheLastDot) {
   EXPECT_EQ(gather(nullptr, "/r.1/A.B.mov"), complete());
-  EXPECT_EQ(job_.properties_file_path(), "/r.1/A.B.xml");
+  EXPECT_EQ(job_.properties_file_path, "/r.1/A.B.xml");
 }
 
 TEST_F(Gathering, AMovieWithoutAnyDotEndsTheGathering) {
@@ -211,48 +212,41 @@ TEST_F(Gathering, WithoutAMovieOnlyTheMetadataIsThere) {
   EXPECT_EQ(gather(shared({{"RecordingMetadata_TITLE", "Optics"}}), std::nullopt),
             (Dictionary{{"RecordingMetadata_TITLE", "Optics"}}));
   EXPECT_THAT(log_.entries(), ElementsAre(kFailed));
-  EXPECT_EQ(job_.recording_file_path(), std::nullopt);
+  EXPECT_EQ(job_.recording_file_path, std::nullopt);
 }
 
 TEST_F(Gathering, ACanceledRecordingIsMarked) {
   gather(nullptr, "/r/ABC.mov", true);
-  EXPECT_TRUE(job_.canceled());
+  EXPECT_TRUE(job_.canceled);
 }
 
 TEST_F(Gathering, ATimeThatNobodySetIsZero) {
   job_.setPropertyValuesWithContext(context_, "/r/ABC.mov", std::nullopt, kStop, 60, nullptr, false);
-  EXPECT_EQ(job_.properties(), completeWith({{"RecordingMetadata_START_DATE", "0"}}));
+  EXPECT_EQ(job_.properties, completeWith({{"RecordingMetadata_START_DATE", "0"}}));
   EXPECT_THAT(log_.entries(), IsEmpty());
 }
 
 TEST_F(Gathering, SecondsAreThirtyTwoBitNumbers) {
   job_.setPropertyValuesWithContext(context_, "/r/ABC.mov", TimeValue{4294967296 + 5, 0}, kStop,
                                     4294967296 + 7, nullptr, false);
-  EXPECT_EQ(job_.getProperty("RecordingMetadata_START_DATE"), "5");
-  EXPECT_EQ(job_.getProperty("RecordingMetadata_DURATION"), "7");
+  EXPECT_EQ(getProperty(job_.properties, "RecordingMetadata_START_DATE"), "5");
+  EXPECT_EQ(getProperty(job_.properties, "RecordingMetadata_DURATION"), "7");
 }
 
 TEST(AgentSubmitProperties, AnExistingValueIsNeverReplaced) {
-  AgentSubmit job;
-  EXPECT_TRUE(job.addValue("1", "name"));
-  EXPECT_FALSE(job.addValue("2", "name"));
-  EXPECT_EQ(job.getProperty("name"), "1");
+  Dictionary properties;
+  EXPECT_TRUE(addValue(properties, "1", "name"));
+  EXPECT_FALSE(addValue(properties, "2", "name"));
+  EXPECT_EQ(getProperty(properties, "name"), "1");
 }
 
 TEST(AgentSubmitProperties, AnAbsentNameOrValueIsRefused) {
-  AgentSubmit job;
-  EXPECT_FALSE(job.addValue(std::nullopt, "name"));
-  EXPECT_FALSE(job.addValue("1", std::nullopt));
-  EXPECT_TRUE(job.addValue("", "name"));
-  EXPECT_EQ(job.getProperty(std::nullopt), std::nullopt);
-  EXPECT_EQ(job.getProperty("other"), std::nullopt);
-}
-
-TEST_F(Gathering, CleanupLetsGoOfPropertiesAndContext) {
-  gather(nullptr);
-  job_.cleanup();
-  EXPECT_THAT(job_.properties(), IsEmpty());
-  EXPECT_EQ(job_.agentContext(), nullptr);
+  Dictionary properties;
+  EXPECT_FALSE(addValue(properties, std::nullopt, "name"));
+  EXPECT_FALSE(addValue(properties, "1", std::nullopt));
+  EXPECT_TRUE(addValue(properties, "", "name"));
+  EXPECT_EQ(getProperty(properties, std::nullopt), std::nullopt);
+  EXPECT_EQ(getProperty(properties, "other"), std::nullopt);
 }
 
 }  // namespace

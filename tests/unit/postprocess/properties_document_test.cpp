@@ -1,7 +1,8 @@
 // The properties document's text and its file.
+#include "postprocess/properties_document.h"
+
 #include <gmock/gmock.h>
 #include <sys/stat.h>
-
 #include <pugixml.hpp>
 
 #include "tests/unit/postprocess/submit_fixture.h"
@@ -16,8 +17,8 @@ using Entry = testing::LogCapture::Entry;
 class PropertiesDocument : public testing::SubmitFixture {
  protected:
   std::string documentOf(Dictionary properties) {
-    job_.setProperties(std::move(properties));
-    return job_.propertiesXml();
+    job_.properties = std::move(properties);
+    return propertiesXml(job_.properties);
   }
   /// What a reader finds in the document.
   static Dictionary parsed(const std::string& document) {
@@ -112,11 +113,11 @@ INSTANTIATE_TEST_SUITE_P(
     [](const auto& instance) { return instance.param.name; });
 
 TEST_F(PropertiesDocument, IsWrittenUnderItsName) {
-  job_.setAgentContext(context_);
-  job_.setProperties({{"RecordingMetadata_TITLE", "Optik & Größe"}});
-  job_.setProperties_file_path(inRepository("ABC.xml"));
+  job_.agentContext = context_;
+  job_.properties = {{"RecordingMetadata_TITLE", "Optik & Größe"}};
+  job_.properties_file_path = inRepository("ABC.xml");
   EXPECT_EQ(job_.writeProperties(), 0);
-  EXPECT_EQ(contentOf(inRepository("ABC.xml")), job_.propertiesXml());
+  EXPECT_EQ(contentOf(inRepository("ABC.xml")), propertiesXml(job_.properties));
   EXPECT_EQ(filesInRepository(), 1U);
   EXPECT_THAT(log_.entries(), IsEmpty());
 }
@@ -125,17 +126,17 @@ TEST_F(PropertiesDocument, ReplacesAnOlderOneAsAWhole) {
   write(inRepository("ABC.xml"), std::string(10000, 'x'));
   struct stat before {};
   ASSERT_EQ(stat(inRepository("ABC.xml").c_str(), &before), 0);
-  job_.setProperties_file_path(inRepository("ABC.xml"));
+  job_.properties_file_path = inRepository("ABC.xml");
   EXPECT_EQ(job_.writeProperties(), 0);
   struct stat after {};
   ASSERT_EQ(stat(inRepository("ABC.xml").c_str(), &after), 0);
   EXPECT_NE(before.st_ino, after.st_ino);
-  EXPECT_EQ(contentOf(inRepository("ABC.xml")), job_.propertiesXml());
+  EXPECT_EQ(contentOf(inRepository("ABC.xml")), propertiesXml(job_.properties));
 }
 
 TEST_F(PropertiesDocument, AFailedWriteIsAWarningAndNoFailure) {
-  job_.setAgentContext(context_);
-  job_.setProperties_file_path(inRepository("missing/ABC.xml"));
+  job_.agentContext = context_;
+  job_.properties_file_path = inRepository("missing/ABC.xml");
   EXPECT_EQ(job_.writeProperties(), 0);
   EXPECT_THAT(log_.entries(),
               ElementsAre(Entry{kLogWarning, "The properties document \"" + inRepository("missing/ABC.xml") +

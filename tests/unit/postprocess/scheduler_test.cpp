@@ -4,6 +4,7 @@
 #include <gmock/gmock.h>
 
 #include <latch>
+#include <thread>
 
 #include "tests/unit/postprocess/submit_fixture.h"
 
@@ -21,9 +22,9 @@ class Scheduler : public testing::SubmitFixture {
  protected:
   void add(const std::string& uuid) {
     auto job = std::make_shared<AgentSubmit>();
-    job->setAgentContext(context_);
-    job->setProperties({{"RecordingMetadata_RECORDING_UUID", uuid}});
-    context_->postProcessListAddJob(std::move(job));
+    job->agentContext = context_;
+    job->properties = {{"RecordingMetadata_RECORDING_UUID", uuid}};
+    context_->post_process_list.postProcessListAddJob(std::move(job));
   }
   /// Runs the loop on this thread; `onSleep` comes in place of each sleep.
   void runLoop(std::function<void()> onSleep) {
@@ -49,7 +50,7 @@ class Scheduler : public testing::SubmitFixture {
 };
 
 TEST_F(Scheduler, WithoutJobsLooksEveryFiveSecondsAndDoesNothingElse) {
-  runLoop([this] { context_->setRunning(sleeps_.size() < 3); });
+  runLoop([this] { context_->state.running.set(sleeps_.size() < 3); });
   EXPECT_THAT(sleeps_, ElementsAre(5s, 5s, 5s));
   EXPECT_THAT(children_.runs(), IsEmpty());
   using Entry = testing::LogCapture::Entry;
@@ -58,7 +59,7 @@ TEST_F(Scheduler, WithoutJobsLooksEveryFiveSecondsAndDoesNothingElse) {
 
 TEST_F(Scheduler, RunsTheJobsInTheOrderOfTheirArrivalWithoutSleepingBetweenThem) {
   for (const char* uuid : {"A", "B", "C"}) add(uuid);
-  runLoop([this] { context_->setRunning(false); });
+  runLoop([this] { context_->state.running.set(false); });
   EXPECT_THAT(submitted(), ElementsAre("A", "B", "C"));
   EXPECT_EQ(sleeps_.size(), 1U);
 }
@@ -66,7 +67,7 @@ TEST_F(Scheduler, RunsTheJobsInTheOrderOfTheirArrivalWithoutSleepingBetweenThem)
 TEST_F(Scheduler, TakesAJobThatCameWhileItSlept) {
   runLoop([this] {
     if (sleeps_.size() == 1) add("A");
-    if (sleeps_.size() == 2) context_->setRunning(false);
+    if (sleeps_.size() == 2) context_->state.running.set(false);
   });
   EXPECT_THAT(submitted(), ElementsAre("A"));
 }
@@ -75,17 +76,17 @@ TEST_F(Scheduler, GoesOnAfterAFailedJob) {
   children_.results = {{ChildResult::End::exited, 1, {}}};
   add("A");
   add("B");
-  runLoop([this] { context_->setRunning(false); });
+  runLoop([this] { context_->state.running.set(false); });
   EXPECT_THAT(submitted(), ElementsAre("A", "B"));
 }
 
 TEST_F(Scheduler, EndsAfterTheJobInHandWhenTheAgentStops) {
   add("A");
   add("B");
-  children_.on_run = [this](const ChildOptions&) { context_->setRunning(false); };
+  children_.on_run = [this](const ChildOptions&) { context_->state.running.set(false); };
   runLoop([] {});
   EXPECT_THAT(submitted(), ElementsAre("A"));
-  EXPECT_EQ(context_->postProcessListCount(), 1U);
+  EXPECT_EQ(context_->post_process_list.postProcessListCount(), 1U);
   EXPECT_THAT(sleeps_, IsEmpty());
 }
 
@@ -95,7 +96,7 @@ TEST_F(Scheduler, EndsAfterTheJobInHandWhenItIsCancelled) {
   children_.on_run = [this](const ChildOptions&) { cancelled_ = true; };
   runLoop([] {});
   EXPECT_THAT(submitted(), ElementsAre("A"));
-  EXPECT_EQ(context_->postProcessListCount(), 1U);
+  EXPECT_EQ(context_->post_process_list.postProcessListCount(), 1U);
 }
 
 TEST_F(Scheduler, IsBusyWhileAJobRunsAndIdleWhileItSleeps) {
@@ -105,7 +106,7 @@ TEST_F(Scheduler, IsBusyWhileAJobRunsAndIdleWhileItSleeps) {
   bool busyInSleep = true;
   runLoop([this, &busyInSleep] {
     busyInSleep = busy_;
-    context_->setRunning(false);
+    context_->state.running.set(false);
   });
   EXPECT_TRUE(busyInJob);
   EXPECT_FALSE(busyInSleep);
@@ -114,12 +115,12 @@ TEST_F(Scheduler, IsBusyWhileAJobRunsAndIdleWhileItSleeps) {
 
 TEST_F(Scheduler, ReleasesAJobOnceItHasRun) {
   auto job = std::make_shared<AgentSubmit>();
-  job->setAgentContext(context_);
+  job->agentContext = context_;
   const std::weak_ptr<AgentSubmit> watched = job;
-  context_->postProcessListAddJob(std::move(job));
+  context_->post_process_list.postProcessListAddJob(std::move(job));
   runLoop([this, &watched] {
     EXPECT_TRUE(watched.expired());
-    context_->setRunning(false);
+    context_->state.running.set(false);
   });
 }
 
@@ -129,7 +130,7 @@ TEST_F(Scheduler, DoesNotHoldTheListWhileAJobRuns) {
     if (submitted().size() > 1) return;
     std::jthread([this] { add("B"); }).join();  // would hang
   };
-  runLoop([this] { context_->setRunning(false); });
+  runLoop([this] { context_->state.running.set(false); });
   EXPECT_THAT(submitted(), ElementsAre("A", "B"));
 }
 

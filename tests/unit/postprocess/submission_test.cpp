@@ -53,10 +53,10 @@ TEST(SubmissionArguments, AnEmptyWorkflowIsAWorkflow) {
 class SubmissionJob : public testing::SubmitFixture {
  protected:
   SubmissionJob() {
-    job_.setAgentContext(context_);
-    job_.setProperties({{"RecordingMetadata_RECORDING_UUID", "ABC"}});
-    job_.setRecording_file_path(inRepository("ABC.mov"));
-    job_.setProperties_file_path(inRepository("ABC.xml"));
+    job_.agentContext = context_;
+    job_.properties = {{"RecordingMetadata_RECORDING_UUID", "ABC"}};
+    job_.recording_file_path = inRepository("ABC.mov");
+    job_.properties_file_path = inRepository("ABC.xml");
     write(inRepository("ABC.mov"), "movie");
     write(inRepository("ABC.xml"), "document");
   }
@@ -124,23 +124,23 @@ TEST_F(SubmissionJob, AToolThatCannotBeStartedIsLoggedWithItsPathAndReason) {
 }
 
 TEST_F(SubmissionJob, WithoutARecordingIdentifierTheToolNeverRuns) {
-  job_.setProperties({{"RecordingMetadata_TITLE", "Optics"}});
+  job_.properties = {{"RecordingMetadata_TITLE", "Optics"}};
   EXPECT_EQ(job_.addRecordingWithCommentary(children_), -1);
   EXPECT_THAT(children_.runs(), IsEmpty());
   EXPECT_THAT(log_.entries(), ElementsAre(kStarting, kInProgress, kUnable, kIncomplete, kInternal));
 }
 
 TEST_F(SubmissionJob, WithoutAContextTheToolNeverRuns) {
-  job_.setAgentContext(nullptr);
+  job_.agentContext = nullptr;
   EXPECT_EQ(job_.addRecordingWithCommentary(children_), -1);
   EXPECT_THAT(children_.runs(), IsEmpty());
   EXPECT_TRUE(log_.contains(kUnable.level, kUnable.text));
 }
 
 TEST_F(SubmissionJob, AWorkflowIsSubmittedWithUserAndPassword) {
-  job_.setAdhoc_workflow_uuid("W-1");
-  context_->setUser("ada");
-  context_->setPassword("secret");
+  job_.adhoc_workflow_uuid = "W-1";
+  context_->options.user.set("ada");
+  context_->options.password.set("secret");
   EXPECT_EQ(job_.addRecordingWithCommentary(children_), 0);
   EXPECT_THAT(children_.runs(),
               ElementsAre(Words{systemPath("/usr/bin/lumex"), "--server", "https://lumex.example", "--submit",
@@ -152,9 +152,9 @@ TEST_F(SubmissionJob, AWorkflowIsSubmittedWithUserAndPassword) {
 }
 
 TEST_F(SubmissionJob, ThePasswordStandsInTheCommandLineOnly) {
-  job_.setAdhoc_workflow_uuid("W-1");
-  context_->setUser("ada");
-  context_->setPassword("secret");
+  job_.adhoc_workflow_uuid = "W-1";
+  context_->options.user.set("ada");
+  context_->options.password.set("secret");
   children_.results = {{End::notStarted, ENOENT, {}}};
   job_.addRecordingWithCommentary(children_);
   for (const Entry& entry : log_.entries()) {
@@ -164,23 +164,23 @@ TEST_F(SubmissionJob, ThePasswordStandsInTheCommandLineOnly) {
 }
 
 TEST_F(SubmissionJob, AWorkflowWithoutPasswordFailsBeforeTheTool) {
-  job_.setAdhoc_workflow_uuid("W-1");
-  context_->setUser("ada");
+  job_.adhoc_workflow_uuid = "W-1";
+  context_->options.user.set("ada");
   EXPECT_EQ(job_.addRecordingWithCommentary(children_), -1);
   EXPECT_THAT(children_.runs(), IsEmpty());
   EXPECT_THAT(log_.entries(), ElementsAre(kStarting, kInProgress, kUnable, kIncomplete, kInternal));
 }
 
 TEST_F(SubmissionJob, AWorkflowWithoutUserFailsBeforeTheTool) {
-  job_.setAdhoc_workflow_uuid("");
-  context_->setPassword("secret");
+  job_.adhoc_workflow_uuid = "";
+  context_->options.password.set("secret");
   EXPECT_EQ(job_.addRecording(children_), 1);
   EXPECT_THAT(children_.runs(), IsEmpty());
   EXPECT_THAT(log_.entries(), ElementsAre(kUnable));
 }
 
 TEST_F(SubmissionJob, DisabledSubmissionDoesNothing) {
-  context_->setSubmit_disabled(true);
+  context_->options.submit_disabled.set(true);
   EXPECT_EQ(job_.addRecordingWithCommentary(children_), 0);
   EXPECT_THAT(children_.runs(), IsEmpty());
   EXPECT_THAT(log_.entries(), ElementsAre(kStarting, kDone));
@@ -192,8 +192,8 @@ TEST_F(SubmissionJob, DisabledSubmissionDoesNothing) {
 class CanceledJob : public SubmissionJob, public ::testing::WithParamInterface<bool> {};
 
 TEST_P(CanceledJob, RemovesBothFilesWhetherSubmissionIsDisabledOrNot) {
-  context_->setSubmit_disabled(GetParam());
-  job_.setCanceled(true);
+  context_->options.submit_disabled.set(GetParam());
+  job_.canceled = true;
   EXPECT_EQ(job_.addRecordingWithCommentary(children_), 0);
   EXPECT_THAT(children_.runs(), IsEmpty());
   EXPECT_EQ(filesInRepository(), 0U);
@@ -208,7 +208,7 @@ INSTANTIATE_TEST_SUITE_P(Submission, CanceledJob, ::testing::Bool(),
 
 TEST_F(SubmissionJob, ACanceledJobWhoseMovieIsGoneStillRemovesTheDocument) {
   std::filesystem::remove(inRepository("ABC.mov"));
-  job_.setCanceled(true);
+  job_.canceled = true;
   EXPECT_EQ(job_.addRecordingWithCommentary(children_), 0);
   EXPECT_TRUE(
       log_.contains(kLogError, "An error occurred removing file \"" + inRepository("ABC.mov") + "\""));
@@ -224,14 +224,14 @@ class FileRecording : public SubmissionJob {
     std::filesystem::create_directories(elsewhere());
     write(elsewhere() + "/talk.mov", movie_);
     write(elsewhere() + "/talk.xml", "talk's document");
-    job_.setRecording_file_path(elsewhere() + "/talk.mov");
-    job_.setProperties_file_path(elsewhere() + "/talk.xml");
-    job_.setProperties({{"RecordingMetadata_RECORDING_UUID", "NEW"}});
-    context_->record_context()->setRecordingType(kRecordingTypeFile);
+    job_.recording_file_path = elsewhere() + "/talk.mov";
+    job_.properties_file_path = elsewhere() + "/talk.xml";
+    job_.properties = {{"RecordingMetadata_RECORDING_UUID", "NEW"}};
+    context_->record_context()->recordingType.set(kRecordingTypeFile);
   }
   static std::string elsewhere() { return kRoot_ + "/elsewhere"; }
 
-  static inline const std::string kRoot_ = testing::kRoot.path();
+  static inline const std::string kRoot_ = testing::kTestRoot.path();
   const std::string movie_ = std::string(200000, 'm') + "end";  // more than one buffer
 };
 
@@ -285,7 +285,7 @@ TEST_F(FileRecording, AMovieThatCannotBeReadLeavesNoHalfCopy) {
 }
 
 TEST_F(FileRecording, AnUnwritableRepositoryIsADebugLineEach) {
-  context_->setRecording_repository_path(kRoot_ + "/missing");
+  context_->recording.recording_repository_path.set(kRoot_ + "/missing");
   EXPECT_EQ(job_.addRecording(children_), 0);
   EXPECT_EQ(children_.runs().size(), 1U);
   EXPECT_EQ(log_.entries().size(), 3U);
@@ -293,14 +293,14 @@ TEST_F(FileRecording, AnUnwritableRepositoryIsADebugLineEach) {
 
 TEST_F(FileRecording, TheJobsOwnSessionDecidesWhatIsCopied) {
   auto own = std::make_shared<AgentRecord>();
-  own->setRecordingType(kRecordingTypeVideo);
-  job_.setRecord(own);
+  own->recordingType.set(kRecordingTypeVideo);
+  job_.recorded = own;
   EXPECT_EQ(job_.addRecording(children_), 0);
   EXPECT_FALSE(std::filesystem::exists(inRepository("NEW.mov")));
 }
 
 TEST_F(FileRecording, AWorkflowWithoutPasswordIsCopiedAllTheSame) {
-  job_.setAdhoc_workflow_uuid("W-1");
+  job_.adhoc_workflow_uuid = "W-1";
   EXPECT_EQ(job_.addRecording(children_), 1);
   EXPECT_EQ(contentOf(inRepository("NEW.mov")), movie_);
 }
@@ -310,7 +310,7 @@ TEST_F(FileRecording, AWorkflowWithoutPasswordIsCopiedAllTheSame) {
 class RealTool : public SubmissionJob {
  protected:
   static std::string tool() { return systemPath(kLumexTool); }
-  static std::string argumentsFile() { return testing::kRoot.path() + "/arguments"; }
+  static std::string argumentsFile() { return testing::kTestRoot.path() + "/arguments"; }
   static void installTool(const std::string& end) {
     std::filesystem::create_directories(directoryOf(tool()));
     write(tool(),
@@ -321,7 +321,7 @@ class RealTool : public SubmissionJob {
 
 TEST_F(RealTool, GetsItsArgumentsAsTheyAre) {
   installTool("exit 0");
-  job_.setProperties({{"RecordingMetadata_RECORDING_UUID", "A B'$(id)\"*"}});
+  job_.properties = {{"RecordingMetadata_RECORDING_UUID", "A B'$(id)\"*"}};
   EXPECT_EQ(job_.addRecordingWithCommentary(systemChildRunner()), 0);
   EXPECT_EQ(contentOf(argumentsFile()),
             "[--server]\n[https://lumex.example]\n[--submit]\n[--recording]\n[A B'$(id)\"*]\n[--delete]\n");

@@ -18,7 +18,7 @@
 #include "postprocess/agent_submit.h"
 #include "record/agent_record.h"
 #include "tests/unit/doubles/log_capture.h"
-#include "tests/unit/prefs/temporary_root.h"
+#include "tests/unit/doubles/test_root.h"
 
 namespace lmx::testing {
 
@@ -53,16 +53,16 @@ inline SharedDictionary shared(Dictionary dictionary) {
 class SubmitFixture : public ::testing::Test {
  protected:
   SubmitFixture() {
-    kRoot.clear();
+    kTestRoot.clear();
     std::filesystem::create_directories(repository());
-    context_->setLumex_url("https://lumex.example");
-    context_->setRecording_repository_path(repository());
-    context_->setRunning(true);
+    context_->server.lumex_url.set("https://lumex.example");
+    context_->recording.recording_repository_path.set(repository());
+    context_->state.running.set(true);
   }
   /// The list and the jobs in it hold the context.
   ~SubmitFixture() override { context_->cleanup(); }
 
-  static std::string repository() { return kRoot.path() + "/recordings"; }
+  static std::string repository() { return kTestRoot.path() + "/recordings"; }
   static std::string inRepository(const std::string& name) { return repository() + "/" + name; }
   static void write(const std::string& path, const std::string& content) {
     std::ofstream(path, std::ios::binary) << content;

@@ -1,4 +1,6 @@
 // The settings on their way into the context.
+#include "prefs/agent_settings.h"
+
 #include <arpa/inet.h>
 #include <gmock/gmock.h>
 
@@ -51,7 +53,8 @@ class Settings : public testing::PrefsFixture {
   }
   bool read(const PlistDictionary& dictionary) {
     replace(dictionary);
-    return AgentPreferences().setAgentPreferencesInContext(*context_);
+    AgentPreferences prefs;
+    return setAgentPreferencesInContext(prefs, *context_);
   }
 
   std::shared_ptr<AgentContext> context_ = newAgentContext();
@@ -63,20 +66,20 @@ TEST_F(Settings, ABoundAgentGetsAllOfThem) {
   all["RecordingCapturePreset"] = "Video:Best";
   all["ContinuousRecording"] = continuous(true, 12.5, 10);
   ASSERT_TRUE(read(all));
-  EXPECT_EQ(context_->machine_name(), "Hall 3");
-  EXPECT_EQ(context_->machine_uuid(), "CAMERA-1");
-  EXPECT_EQ(context_->server_uuid(), "SERVER-1");
-  EXPECT_EQ(context_->lumex_url(), "https://lumex.example");
-  EXPECT_EQ(context_->tunnel_host(), "tunnel.example");
-  EXPECT_EQ(context_->tunnel_port(), "8170");
-  EXPECT_EQ(context_->recording_repository_path(), "/recordings");
-  EXPECT_EQ(context_->recording_type(), "Audio+Video");
-  EXPECT_EQ(context_->recording_video_maximum_frame_rate(), "25");
-  EXPECT_EQ(context_->preview_file(), "/preview.jpg");
-  EXPECT_EQ(context_->capture_preset(), "Video:Best");
-  EXPECT_EQ(context_->record_context()->recordingType(), kRecordingTypeAudioVideo);
-  EXPECT_EQ(context_->record_context()->diskSpaceCutoffInMB(), 2048U);
-  EXPECT_EQ(context_->continuous(), (LMRContinuousRecordingInfo{12.5, 10, true, true}));
+  EXPECT_EQ(context_->server.machine_name.get(), "Hall 3");
+  EXPECT_EQ(context_->server.machine_uuid.get(), "CAMERA-1");
+  EXPECT_EQ(context_->server.server_uuid.get(), "SERVER-1");
+  EXPECT_EQ(context_->server.lumex_url.get(), "https://lumex.example");
+  EXPECT_EQ(context_->server.tunnel_host.get(), "tunnel.example");
+  EXPECT_EQ(context_->server.tunnel_port.get(), "8170");
+  EXPECT_EQ(context_->recording.recording_repository_path.get(), "/recordings");
+  EXPECT_EQ(context_->recording.recording_type.get(), "Audio+Video");
+  EXPECT_EQ(context_->recording.recording_video_maximum_frame_rate.get(), "25");
+  EXPECT_EQ(context_->recording.preview_file.get(), "/preview.jpg");
+  EXPECT_EQ(context_->recording.capture_preset.get(), "Video:Best");
+  EXPECT_EQ(context_->record_context()->recordingType.get(), kRecordingTypeAudioVideo);
+  EXPECT_EQ(context_->record_context()->diskSpaceCutoffInMB.get(), 2048U);
+  EXPECT_EQ(context_->recording.continuous.get(), (LMRContinuousRecordingInfo{12.5, 10, true, true}));
   EXPECT_THAT(messages(), ElementsAre(Entry{kLogInfo, "Reading preferences..."}));
 }
 
@@ -204,20 +207,20 @@ TEST_F(Settings, TheListenerPortIsStoredInNetworkOrderAndLogged) {
     PlistDictionary all = bound();
     all["TCPListenerPort"] = port.text;
     ASSERT_TRUE(read(all)) << port.text;
-    EXPECT_EQ(context_->tcp_listener_port(), htons(port.number)) << port.text;
+    EXPECT_EQ(context_->server.tcp_listener_port.get(), htons(port.number)) << port.text;
     EXPECT_TRUE(log_.contains(kLogNotice, "TCP listener port: " + std::to_string(port.number))) << port.text;
   }
 }
 
 TEST_F(Settings, WithoutAListenerPortTheFieldIsLeftAsItIs) {
-  context_->setTcp_listener_port(htons(99));
+  context_->server.tcp_listener_port.set(htons(99));
   ASSERT_TRUE(read(bound()));
-  EXPECT_EQ(context_->tcp_listener_port(), htons(99));
+  EXPECT_EQ(context_->server.tcp_listener_port.get(), htons(99));
 }
 
 TEST_F(Settings, TheSecretIsStoredAndNeverLogged) {
   ASSERT_TRUE(read(bound()));
-  const auto secret = context_->shared_secret();
+  const auto secret = context_->server.shared_secret.get();
   ASSERT_TRUE(secret);
   for (unsigned char i = 0; i < 16; ++i) EXPECT_EQ((*secret)[i], i);
   EXPECT_FALSE(log_.mentions(kSecret));
@@ -246,31 +249,31 @@ TEST_F(Settings, ASecretOfAnotherLengthOrNoBase64FailsSilently) {
   for (const char* secret : {kFifteen, kSeventeen, "not base64!", ""}) {
     writeSecret(secret);
     EXPECT_FALSE(read(bound())) << secret;
-    EXPECT_EQ(context_->shared_secret(), std::nullopt) << secret;
+    EXPECT_EQ(context_->server.shared_secret.get(), std::nullopt) << secret;
   }
   for (const Entry& entry : messages()) EXPECT_EQ(entry, (Entry{kLogInfo, "Reading preferences..."}));
 }
 
 TEST_F(Settings, AdHocModeSkipsBindingSecretAndRepository) {
-  context_->setAdhoc(true);
+  context_->options.adhoc.set(true);
   std::filesystem::remove(secretFile());
   PlistDictionary all = bound();
   all["TCPListenerPort"] = "8170";
   ASSERT_TRUE(read(all));
-  EXPECT_EQ(context_->machine_name(), std::nullopt);
-  EXPECT_EQ(context_->lumex_url(), std::nullopt);
-  EXPECT_EQ(context_->tcp_listener_port(), 0);
-  EXPECT_EQ(context_->shared_secret(), std::nullopt);
-  EXPECT_EQ(context_->recording_repository_path(), std::nullopt);
-  EXPECT_EQ(context_->recording_type(), "Audio+Video");
+  EXPECT_EQ(context_->server.machine_name.get(), std::nullopt);
+  EXPECT_EQ(context_->server.lumex_url.get(), std::nullopt);
+  EXPECT_EQ(context_->server.tcp_listener_port.get(), 0);
+  EXPECT_EQ(context_->server.shared_secret.get(), std::nullopt);
+  EXPECT_EQ(context_->recording.recording_repository_path.get(), std::nullopt);
+  EXPECT_EQ(context_->recording.recording_type.get(), "Audio+Video");
 }
 
 TEST_F(Settings, WithoutASessionTheyFailAfterTheBinding) {
-  context_->setRecord_context(nullptr);
+  context_->releaseRecord();
   EXPECT_FALSE(read(bound()));
   EXPECT_TRUE(log_.contains(kLogCritical, "Internal error occurred creating record context"));
-  EXPECT_EQ(context_->tunnel_port(), "8170");
-  EXPECT_EQ(context_->recording_repository_path(), std::nullopt);
+  EXPECT_EQ(context_->server.tunnel_port.get(), "8170");
+  EXPECT_EQ(context_->recording.recording_repository_path.get(), std::nullopt);
 }
 
 TEST_F(Settings, AFailureKeepsTheFieldsBeforeItAndStoresWhatTheFailingKeyHad) {
@@ -280,9 +283,9 @@ TEST_F(Settings, AFailureKeepsTheFieldsBeforeItAndStoresWhatTheFailingKeyHad) {
   all["LumexURL"] = "";
   all["TunnelHost"] = "elsewhere.example";
   EXPECT_FALSE(read(all));
-  EXPECT_EQ(context_->machine_name(), "Hall 4");
-  EXPECT_EQ(context_->lumex_url(), "");
-  EXPECT_EQ(context_->tunnel_host(), "tunnel.example");
+  EXPECT_EQ(context_->server.machine_name.get(), "Hall 4");
+  EXPECT_EQ(context_->server.lumex_url.get(), "");
+  EXPECT_EQ(context_->server.tunnel_host.get(), "tunnel.example");
 }
 
 TEST_F(Settings, AnUnknownTypeIsStoredAllTheSame) {
@@ -290,8 +293,8 @@ TEST_F(Settings, AnUnknownTypeIsStoredAllTheSame) {
   PlistDictionary all = bound();
   all["RecordingType"] = "Hologram";
   EXPECT_FALSE(read(all));
-  EXPECT_EQ(context_->recording_type(), "Hologram");
-  EXPECT_EQ(context_->record_context()->recordingType(), kRecordingTypeNone);
+  EXPECT_EQ(context_->recording.recording_type.get(), "Hologram");
+  EXPECT_EQ(context_->record_context()->recordingType.get(), kRecordingTypeNone);
 }
 
 TEST_F(Settings, AKeyThatDisappearedLeavesItsFieldAbsent) {
@@ -300,26 +303,26 @@ TEST_F(Settings, AKeyThatDisappearedLeavesItsFieldAbsent) {
   all["RecordingCapturePreset"] = "Video:Best";
   ASSERT_TRUE(read(all));
   ASSERT_TRUE(read(bound()));
-  EXPECT_EQ(context_->preview_file(), std::nullopt);
-  EXPECT_EQ(context_->capture_preset(), std::nullopt);
+  EXPECT_EQ(context_->recording.preview_file.get(), std::nullopt);
+  EXPECT_EQ(context_->recording.capture_preset.get(), std::nullopt);
 }
 
 TEST_F(Settings, OnlyAFileRecordingReadsItsPath) {
   PlistDictionary all = bound();
   all["RecordingPath"] = "/movie.mov";
   ASSERT_TRUE(read(all));
-  EXPECT_EQ(context_->input_file(), std::nullopt);
+  EXPECT_EQ(context_->recording.input_file.get(), std::nullopt);
   all["RecordingType"] = "File";
   ASSERT_TRUE(read(all));
-  EXPECT_EQ(context_->input_file(), "/movie.mov");
-  EXPECT_EQ(context_->record_context()->recordingType(), kRecordingTypeFile);
+  EXPECT_EQ(context_->recording.input_file.get(), "/movie.mov");
+  EXPECT_EQ(context_->record_context()->recordingType.get(), kRecordingTypeFile);
 }
 
 TEST_F(Settings, AnIntegerInTheFileServesWhereATextIsExpected) {
   PlistDictionary all = bound();
   all["RecordingDiskSpaceCutoffInMB"] = std::int64_t{512};
   ASSERT_TRUE(read(all));
-  EXPECT_EQ(context_->record_context()->diskSpaceCutoffInMB(), 512U);
+  EXPECT_EQ(context_->record_context()->diskSpaceCutoffInMB.get(), 512U);
 }
 
 class Migration : public testing::PrefsFixture {};
@@ -339,7 +342,7 @@ TEST_F(Migration, TheObsoleteIntervalBecomesMilliseconds) {
   for (const auto& [seconds, milliseconds] : kIntervals) {
     replace({{"RecordingPreviewIntervalInSeconds", seconds}, {"PreviewIntervalInMilliseconds", "7"}});
     AgentPreferences().migrateOldKeys();
-    EXPECT_EQ(readPropertyList(systemFile()).value,
+    EXPECT_EQ(readPropertyList(systemFile()).value(),
               PlistValue(PlistDictionary{{"PreviewIntervalInMilliseconds", milliseconds}}));
   }
 }
@@ -355,7 +358,7 @@ TEST_F(Migration, TheFileIsRewrittenOnceAndOtherKeysSurvive) {
   prefs.migrateOldKeys();
   AgentPreferences().migrateOldKeys();
   EXPECT_EQ(inodeOf(systemFile()), after);
-  EXPECT_EQ(readPropertyList(systemFile()).value,
+  EXPECT_EQ(readPropertyList(systemFile()).value(),
             PlistValue(PlistDictionary{{"PreviewIntervalInMilliseconds", "2000"}, {"Mine", nested}}));
 }
 

@@ -15,7 +15,7 @@
 #include "platform/plist/property_list.h"
 #include "prefs/agent_preferences.h"
 #include "tests/unit/doubles/log_capture.h"
-#include "tests/unit/prefs/temporary_root.h"
+#include "tests/unit/doubles/test_root.h"
 
 namespace lmx::testing {
 
@@ -23,13 +23,13 @@ namespace lmx::testing {
 class PrefsFixture : public ::testing::Test {
  protected:
   PrefsFixture() {
-    kRoot.clear();
+    kTestRoot.clear();
     std::filesystem::create_directories(directoryOf(systemFile()));
     std::filesystem::create_directories(directoryOf(userFile()));
   }
 
   static std::string systemFile() { return systemPath(kPreferencesFile); }
-  static std::string userFile() { return kRoot.path() + "/home" + std::string(kPreferencesFile); }
+  static std::string userFile() { return kTestRoot.path() + "/home" + std::string(kPreferencesFile); }
 
   /// Puts a new file under the name, as an editor that renames does.
   static void replace(const std::string& path, const PlistDictionary& dictionary) {

@@ -1,8 +1,12 @@
 // Building and refusing the settings of a capture.
+#include "prefs/recording_context.h"
+
 #include <gmock/gmock.h>
 
 #include <functional>
 
+#include "prefs/preference_dump.h"
+#include "prefs/recording_types.h"
 #include "tests/unit/prefs/prefs_fixture.h"
 #include "tests/unit/prefs/scripted_catalog.h"
 
@@ -24,26 +28,27 @@ class RecordingContext : public testing::PrefsFixture {
             {"PreviewIntervalInMilliseconds", "400"}};
   }
   std::shared_ptr<LMRRecordingContext> build(CaptureType type = CaptureType::audioAndVideo) {
-    return AgentPreferences(catalog_).newRecordingContextWithSelector(kFile, type);
+    return builder().newRecordingContext(type);
   }
+  RecordingContextBuilder builder() { return {prefs_, kFile, *catalog_}; }
   /// The reason of the refusal; also proves that the next attempt will read the file afresh.
-  std::string reasonOfRefusal(const std::function<void(AgentPreferences&)>& step) {
-    AgentPreferences prefs(catalog_);
-    prefs.getFromPrefsFile("RecordingType");
+  std::string reasonOfRefusal(const std::function<void(RecordingContextBuilder&)>& step) {
+    prefs_.getFromPrefsFile("RecordingType");
     try {
-      step(prefs);
+      auto building = builder();
+      step(building);
     } catch (const PreferenceError& error) {
-      EXPECT_EQ(prefs.prefsDict(), std::nullopt);
+      EXPECT_EQ(prefs_.prefsDict(), std::nullopt);
       EXPECT_STREQ(PreferenceError::name(), "Preference Error");
       return error.what();
     }
     return "accepted";
   }
   std::string reasonOfRefusedBuild(CaptureType type = CaptureType::audioAndVideo) {
-    return reasonOfRefusal(
-        [type](AgentPreferences& prefs) { prefs.newRecordingContextWithSelector(kFile, type); });
+    return reasonOfRefusal([type](RecordingContextBuilder& b) { b.newRecordingContext(type); });
   }
 
+  AgentPreferences prefs_;
   std::shared_ptr<ScriptedCatalog> catalog_ = std::make_shared<ScriptedCatalog>();
 };
 
@@ -92,7 +97,7 @@ TEST_F(RecordingContext, TheTypeDecidesWhichMediaAreOn) {
 
 TEST_F(RecordingContext, AFileRecordingHasNoDeviceAndNoCompression) {
   replace(complete());
-  const auto context = AgentPreferences().newRecordingContextForDaemonWithRecordingType(CaptureType::file);
+  const auto context = newRecordingContextForDaemonWithRecordingType(*catalog_, CaptureType::file);
   ASSERT_TRUE(context);
   EXPECT_EQ(context->videoDeviceID, std::nullopt);
   EXPECT_EQ(context->audioDeviceID, std::nullopt);
@@ -213,13 +218,13 @@ TEST_F(RecordingContext, NoRepositoryIsRefusedForEveryType) {
 
 TEST_F(RecordingContext, EachRefusalHasItsReasonAndDropsTheCache) {
   replace(complete());
-  EXPECT_EQ(reasonOfRefusal([](AgentPreferences& p) { p.failInvalidCompression("Key", "value"); }),
+  EXPECT_EQ(reasonOfRefusal([](RecordingContextBuilder& b) { b.failInvalidCompression("Key", "value"); }),
             "Unknown compression type: \"value\" for preference: Key");
-  EXPECT_EQ(reasonOfRefusal([](AgentPreferences& p) { p.failInvalidDevice("Key", "value"); }),
+  EXPECT_EQ(reasonOfRefusal([](RecordingContextBuilder& b) { b.failInvalidDevice("Key", "value"); }),
             "Unknown device ID: value for preference: Key");
-  EXPECT_EQ(reasonOfRefusal([](AgentPreferences& p) { p.failInvalidPreference("Key", "value"); }),
+  EXPECT_EQ(reasonOfRefusal([](RecordingContextBuilder& b) { b.failInvalidPreference("Key", "value"); }),
             "Invalid value: value for preference: Key");
-  EXPECT_EQ(reasonOfRefusal([](AgentPreferences& p) { p.failPreferenceRequired("Key"); }),
+  EXPECT_EQ(reasonOfRefusal([](RecordingContextBuilder& b) { b.failPreferenceRequired("Key"); }),
             "Missing required preference: Key");
 }
 
@@ -253,9 +258,8 @@ TEST_F(RecordingContext, InvalidContinuousSettingsGiveNothingAndOneLine) {
 
 TEST_F(RecordingContext, ABuildDropsTheCache) {
   replace(complete());
-  AgentPreferences prefs(catalog_);
-  prefs.newRecordingContextWithSelector(kFile, CaptureType::audioAndVideo);
-  EXPECT_EQ(prefs.prefsDict(), std::nullopt);
+  build();
+  EXPECT_EQ(prefs_.prefsDict(), std::nullopt);
 }
 
 // Types.
@@ -263,41 +267,39 @@ TEST_F(RecordingContext, ABuildDropsTheCache) {
 TEST(RecordingTypes, NamesAndCodesConvertBothWays) {
   const std::pair<const char*, int> kTypes[] = {{"Audio", 1}, {"Audio+Video", 2}, {"Video", 3}, {"File", 4}};
   for (const auto& [name, code] : kTypes) {
-    EXPECT_EQ(AgentPreferences::recTypeToCode(name), code);
-    EXPECT_STREQ(AgentPreferences::recTypeToString(code), name);
+    EXPECT_EQ(recTypeToCode(name), code);
+    EXPECT_STREQ(recTypeToString(code), name);
   }
   for (const char* name : {"audio", "Audio ", "Video+Audio", ""}) {
-    EXPECT_EQ(AgentPreferences::recTypeToCode(name), 0) << name;
+    EXPECT_EQ(recTypeToCode(name), 0) << name;
   }
-  EXPECT_EQ(AgentPreferences::recTypeToCode(nullptr), 0);
-  for (const int code : {-1, 0, 5}) EXPECT_EQ(AgentPreferences::recTypeToString(code), nullptr) << code;
+  EXPECT_EQ(recTypeToCode(std::nullopt), 0);
+  for (const int code : {-1, 0, 5}) EXPECT_EQ(recTypeToString(code), nullptr) << code;
 }
 
 TEST_F(RecordingContext, CaptureTypesHaveNumbersOfTheirOwn) {
-  const AgentPreferences prefs;
-  EXPECT_EQ(static_cast<int>(prefs.captureTypeFromString("Audio+Video")), 0);
-  EXPECT_EQ(static_cast<int>(prefs.captureTypeFromString("Audio")), 1);
-  EXPECT_EQ(static_cast<int>(prefs.captureTypeFromString("Video")), 2);
-  EXPECT_EQ(static_cast<int>(prefs.captureTypeFromString("File")), 3);
-  EXPECT_EQ(static_cast<int>(prefs.captureTypeFromString("audio")), 0);
+  EXPECT_EQ(static_cast<int>(captureTypeFromString("Audio+Video")), 0);
+  EXPECT_EQ(static_cast<int>(captureTypeFromString("Audio")), 1);
+  EXPECT_EQ(static_cast<int>(captureTypeFromString("Video")), 2);
+  EXPECT_EQ(static_cast<int>(captureTypeFromString("File")), 3);
+  EXPECT_EQ(static_cast<int>(captureTypeFromString("audio")), 0);
 }
 
 TEST_F(RecordingContext, TheCaptureTypeOfThePreferencesDropsTheCache) {
   replace({{"RecordingType", "Video"}});
-  AgentPreferences prefs;
-  EXPECT_EQ(prefs.captureTypeFromPrefsWithSelector(kFile), CaptureType::video);
-  EXPECT_EQ(prefs.prefsDict(), std::nullopt);
+  EXPECT_EQ(builder().captureTypeFromPrefs(), CaptureType::video);
+  EXPECT_EQ(prefs_.prefsDict(), std::nullopt);
 }
 
 TEST_F(RecordingContext, ATypeInLowerCaseIsRefused) {
   replace({{"RecordingType", "audio"}});
-  EXPECT_EQ(reasonOfRefusal([](AgentPreferences& p) { p.captureTypeFromPrefsWithSelector(kFile); }),
+  EXPECT_EQ(reasonOfRefusal([](RecordingContextBuilder& b) { b.captureTypeFromPrefs(); }),
             "Invalid value: audio for preference: RecordingType");
 }
 
 TEST_F(RecordingContext, NoTypeIsRefused) {
   replace({{"CameraName", "Hall 3"}});
-  EXPECT_EQ(reasonOfRefusal([](AgentPreferences& p) { p.captureTypeFromPrefsWithSelector(kFile); }),
+  EXPECT_EQ(reasonOfRefusal([](RecordingContextBuilder& b) { b.captureTypeFromPrefs(); }),
             "Missing required preference: RecordingType");
 }
 
@@ -309,21 +311,21 @@ TEST_F(RecordingContext, TheDaemonsMigratesTheObsoleteIntervalFirst) {
   all["RecordingPreviewIntervalInSeconds"] = "2";
   all["RecordingType"] = "Video";
   replace(all);
-  const auto context = AgentPreferences::newRecordingContextForDaemon(catalog_);
+  const auto context = newRecordingContextForDaemon(*catalog_);
   EXPECT_EQ(context->captureType, CaptureType::video);
   EXPECT_EQ(context->previewIntervalInMilliseconds, 2000);
   const auto file = readPropertyList(systemFile());
-  EXPECT_FALSE(file.value->dictionary()->contains("RecordingPreviewIntervalInSeconds"));
+  EXPECT_FALSE(file->dictionary()->contains("RecordingPreviewIntervalInSeconds"));
 }
 
 TEST_F(RecordingContext, TheDaemonsReadsNoUserFileAndNoDefaults) {
   replace(userFile(), complete());
-  EXPECT_THROW(AgentPreferences::newRecordingContextForDaemon(catalog_), PreferenceError);
+  EXPECT_THROW(newRecordingContextForDaemon(*catalog_), PreferenceError);
 }
 
 TEST_F(RecordingContext, TheAdHocOneStandsOnUserFileAndDefaults) {
   replace(userFile(), {{"RecordingRepositoryPath", "/my/movies"}});
-  const auto context = AgentPreferences::newRecordingContextForAdHoc(catalog_);
+  const auto context = newRecordingContextForAdHoc(*catalog_);
   EXPECT_EQ(context->captureType, CaptureType::audioAndVideo);
   EXPECT_EQ(context->captureTempDir, "/my/movies");
   EXPECT_EQ(context->diskSpaceCutoffInMB, 1024);
@@ -333,7 +335,7 @@ TEST_F(RecordingContext, TheAdHocOneStandsOnUserFileAndDefaults) {
 
 TEST_F(RecordingContext, TheAdHocOneNeedsARepositoryToo) {
   try {
-    AgentPreferences::newRecordingContextForAdHoc(catalog_);
+    newRecordingContextForAdHoc(*catalog_);
     FAIL() << "accepted";
   } catch (const PreferenceError& error) {
     EXPECT_STREQ(error.what(), "Missing required preference: RecordingRepositoryPath");
@@ -371,7 +373,7 @@ class Dump : public testing::PrefsFixture {
 
 TEST_F(Dump, OfAnEmptyFileIsEmpty) {
   replace(PlistDictionary{});
-  EXPECT_EQ(printed(&AgentPreferences::dumpDaemon), "");
+  EXPECT_EQ(printed(&dumpDaemon), "");
 }
 
 TEST_F(Dump, ListsItsKeysInTheirOrder) {
@@ -391,7 +393,7 @@ TEST_F(Dump, ListsItsKeysInTheirOrder) {
            {"TunnelHost", "tunnel.example"},
            {"TunnelPort", "8170"},
            {"RecordingCapturePreset", "not listed"}});
-  EXPECT_EQ(printed(&AgentPreferences::dumpDaemon),
+  EXPECT_EQ(printed(&dumpDaemon),
             "'RecordingType' == 'Audio'\n'RecordingVideoInput' == 'Automatic'\n"
             "'RecordingVideoMaximumFrameRate' == '30'\n'RecordingAudioChannel' == 'Stereo'\n"
             "'RecordingAudioInput' == 'Automatic'\n'RecordingAudioSampleRate' == '44'\n"
@@ -404,7 +406,7 @@ TEST_F(Dump, ListsItsKeysInTheirOrder) {
 
 TEST_F(Dump, AdHocListsTheDefaultsUnderTheUsersValues) {
   replace(userFile(), {{"RecordingType", "Video"}});
-  EXPECT_EQ(printed(&AgentPreferences::dumpAdHoc),
+  EXPECT_EQ(printed(&dumpAdHoc),
             "'RecordingType' == 'Video'\n'RecordingVideoInput' == 'Automatic'\n"
             "'RecordingVideoMaximumFrameRate' == '30'\n'RecordingAudioChannel' == 'Stereo'\n"
             "'RecordingAudioInput' == 'Automatic'\n'RecordingAudioSampleRate' == '44'\n"

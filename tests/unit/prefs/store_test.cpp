@@ -3,6 +3,7 @@
 
 #include <algorithm>
 
+#include "prefs/adhoc_defaults.h"
 #include "tests/unit/prefs/prefs_fixture.h"
 
 namespace lmx {
@@ -54,13 +55,6 @@ TEST_F(PreferenceStore, TheCacheLivesUntilItIsReset) {
   prefs.resetPrefsCache();
   EXPECT_EQ(prefs.prefsDict(), std::nullopt);
   EXPECT_EQ(text(prefs.getFromPrefsFile("CameraName")), "Hall 4");
-}
-
-TEST_F(PreferenceStore, ADictionarySetByHandIsReadInsteadOfTheFile) {
-  replace({{"CameraName", "Hall 3"}});
-  AgentPreferences prefs;
-  prefs.setPrefsDict(PlistDictionary{{"CameraName", "Hall 9"}});
-  EXPECT_EQ(text(prefs.getFromPrefsFile("CameraName")), "Hall 9");
 }
 
 struct MalformedFile {
@@ -166,7 +160,7 @@ TEST_F(PreferenceStore, ADomainKeyIsTheUsersThenTheSystemsThenTheDefault) {
 
 TEST_F(PreferenceStore, EveryAdHocDefaultIsVisibleInTheDomain) {
   AgentPreferences prefs;
-  for (const auto& [key, value] : AgentPreferences::adHocDefaults()) EXPECT_EQ(prefs.get(key), value) << key;
+  for (const auto& [key, value] : adHocDefaults()) EXPECT_EQ(prefs.get(key), value) << key;
 }
 
 TEST_F(PreferenceStore, ADomainKeyThatNobodyHasIsANotice) {
@@ -200,7 +194,7 @@ TEST_F(PreferenceStore, WithoutAHomeTheDomainBeginsAtTheSystemsFile) {
   AgentPreferences prefs;
   unsetenv("HOME");
   EXPECT_EQ(text(prefs.get("RecordingType")), "Video");
-  testing::kRoot.setHome();
+  testing::kTestRoot.setHome();
 }
 
 TEST_F(PreferenceStore, TheDefaultsAreTheOnesThatNewFilesStartFrom) {
@@ -216,7 +210,7 @@ TEST_F(PreferenceStore, TheDefaultsAreTheOnesThatNewFilesStartFrom) {
       {"RecordingVideoMaximumFrameRate", "30"},
       {"RecordingVideoImagePercent", "50"},
       {"PreviewIntervalInMilliseconds", "400"}};
-  EXPECT_EQ(AgentPreferences::adHocDefaults(), expected);
+  EXPECT_EQ(adHocDefaults(), expected);
 }
 
 }  // namespace

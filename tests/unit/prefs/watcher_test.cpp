@@ -2,6 +2,7 @@
 #include <gmock/gmock.h>
 #include <unistd.h>
 
+#include "prefs/agent_settings.h"
 #include "record/agent_record.h"
 #include "tests/unit/prefs/prefs_fixture.h"
 
@@ -65,7 +66,7 @@ TEST_F(PreferenceWatcher, AfterADeletionABoundAgentFailsAtItsCameraName) {
   std::filesystem::remove(systemFile());
   ASSERT_TRUE(prefs.prefsFileChanged());
   const auto context = newAgentContext();
-  EXPECT_FALSE(prefs.setAgentPreferencesInContext(*context));
+  EXPECT_FALSE(setAgentPreferencesInContext(prefs, *context));
   EXPECT_TRUE(
       log_.contains(kLogError, "lmxagentd cannot run in agent mode without being bound to a Lumex server."));
 }

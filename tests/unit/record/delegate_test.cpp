@@ -1,6 +1,7 @@
 // Reports of a capture controller, and the preview controller.
+#include "capture/api/capture_framework.h"
 #include "record/capture_delegate.h"
-
+#include "record/create_preview.h"
 #include "record/preview_controller.h"
 #include "tests/unit/record/engine_fixture.h"
 
@@ -12,10 +13,10 @@ using testing::ScriptedCaptureController;
 class Delegate : public EngineTest {
  protected:
   Delegate() {
-    session_->setCaptureController(controller_);
-    context_->setRecording_type("Video");
-    session_->setRecordingType(kRecordingTypeAudio);
-    session_->setAudioOnlyMode(true);
+    session_->captureController.set(controller_);
+    context_->recording.recording_type.set("Video");
+    session_->recordingType.set(kRecordingTypeAudio);
+    session_->audioOnlyMode.set(true);
   }
   std::shared_ptr<ScriptedCaptureController> controller_ =
       std::make_shared<ScriptedCaptureController>(journal_);
@@ -24,45 +25,45 @@ class Delegate : public EngineTest {
 
 TEST_F(Delegate, DeviceIsLostByTheseCodesOfTheFrameworkOnly) {
   for (const int code : {1002, 1003, 1100, 1200, 1201, 1203, 1300, 1302}) {
-    delegate_.setRecordError(CaptureError{CaptureError::kDomain, code, ""});
+    delegate_.recordError.set(CaptureError{CaptureError::kDomain, code, ""});
     EXPECT_TRUE(delegate_.deviceDisconnected()) << code;
-    delegate_.setRecordError(CaptureError{"another.domain", code, ""});
+    delegate_.recordError.set(CaptureError{"another.domain", code, ""});
     EXPECT_FALSE(delegate_.deviceDisconnected()) << code;
   }
   for (const int code : {0, 1000, 1001, 1004, 1101, 1202, 1301, 1303, 2000, 2001, 2002, 2003}) {
-    delegate_.setRecordError(CaptureError{CaptureError::kDomain, code, ""});
+    delegate_.recordError.set(CaptureError{CaptureError::kDomain, code, ""});
     EXPECT_FALSE(delegate_.deviceDisconnected()) << code;
   }
-  delegate_.setRecordError(std::nullopt);
+  delegate_.recordError.set(std::nullopt);
   EXPECT_FALSE(delegate_.deviceDisconnected());
 }
 
 TEST_F(Delegate, CompletionSubmitsAndRestoresTheType) {
   delegate_.lmrCaptureDidComplete(CaptureError{CaptureError::kDomain, 1003, "gone"});
   EXPECT_EQ(journal_.entries(), (Entries{"captureDidComplete"}));
-  EXPECT_EQ(delegate_.recordError()->code, 1003);
-  EXPECT_EQ(session_->recordingType(), kRecordingTypeVideo);
-  EXPECT_FALSE(session_->audioOnlyMode());
+  EXPECT_EQ(delegate_.recordError.get()->code, 1003);
+  EXPECT_EQ(session_->recordingType.get(), kRecordingTypeVideo);
+  EXPECT_FALSE(session_->audioOnlyMode.get());
 }
 
 TEST_F(Delegate, CancellationMakesIdleAndRestoresTheType) {
   delegate_.lmrCaptureDidCancel(CaptureError{CaptureError::kDomain, 1200, "failed"});
   EXPECT_EQ(journal_.entries(), (Entries{"captureDidCancel"}));
-  EXPECT_EQ(delegate_.recordError()->code, 1200);
-  EXPECT_EQ(session_->recordingType(), kRecordingTypeVideo);
+  EXPECT_EQ(delegate_.recordError.get()->code, 1200);
+  EXPECT_EQ(session_->recordingType.get(), kRecordingTypeVideo);
 }
 
 TEST_F(Delegate, AReportWithoutErrorKeepsTheEarlierOne) {
-  delegate_.setRecordError(CaptureError{CaptureError::kDomain, 1002, ""});
+  delegate_.recordError.set(CaptureError{CaptureError::kDomain, 1002, ""});
   delegate_.lmrCaptureDidComplete(std::nullopt);
   EXPECT_TRUE(delegate_.deviceDisconnected());
 }
 
 TEST_F(Delegate, TypeOfASessionThatHasGoneOnIsLeftAlone) {
-  session_->setCaptureController(std::make_shared<ScriptedCaptureController>(journal_));
+  session_->captureController.set(std::make_shared<ScriptedCaptureController>(journal_));
   delegate_.lmrCaptureDidComplete(std::nullopt);
-  EXPECT_EQ(session_->recordingType(), kRecordingTypeAudio);
-  EXPECT_TRUE(session_->audioOnlyMode());
+  EXPECT_EQ(session_->recordingType.get(), kRecordingTypeAudio);
+  EXPECT_TRUE(session_->audioOnlyMode.get());
 }
 
 TEST_F(EngineTest, PreviewControllerNamesTheCamera) {
@@ -82,18 +83,18 @@ TEST_F(EngineTest, PreviewControllerOfAMissingCameraIsNone) {
 
 TEST_F(EngineTest, PreviewFrameIsTheNewestOneAsBase64) {
   MyLMRPreviewControllerDelegate frames(400);
-  EXPECT_EQ(frames.base64PreviewFrameCopy(), nullptr);
+  EXPECT_EQ(frames.base64PreviewFrameCopy(), std::nullopt);
   frames.handleJPEGData({'o', 'l', 'd'});
   frames.handleJPEGData({'n', 'e', 'w'});
-  const heap_ptr<char> frame = frames.base64PreviewFrameCopy();
-  EXPECT_EQ(std::string(frame.get()).substr(0, 4), "bmV3");
+  const auto frame = frames.base64PreviewFrameCopy();
+  EXPECT_EQ(frame, "bmV3");
 }
 
 TEST_F(EngineTest, PreviewRequestIsStampedAlsoWithoutAFrame) {
   const auto preview = LXAgentRecordCreatePreviewController("camera", std::nullopt, false, 400, nullptr);
   ASSERT_NE(preview, nullptr);
   EXPECT_EQ(preview->mLastPreviewRequestTime(), 0);
-  EXPECT_EQ(preview->base64PreviewFrameCopy(), nullptr);
+  EXPECT_EQ(preview->base64PreviewFrameCopy(), std::nullopt);
   EXPECT_GT(preview->mLastPreviewRequestTime(), 0);
 }
 

@@ -5,7 +5,9 @@
 #include <memory>
 #include <string>
 
-#include "record/engine.h"
+#include "record/agent_record.h"
+#include "record/engine_environment.h"
+#include "record/prepare_capture.h"
 #include "tests/unit/doubles/log_capture.h"
 #include "tests/unit/doubles/scripted_actions.h"
 #include "tests/unit/doubles/scripted_framework.h"
@@ -21,14 +23,14 @@ class EngineTest : public ::testing::Test {
 
   EngineTest() {
     testing::writePreferences(testing::capturePreferences(repository_.path()));
-    context_->setRunning(true);
-    context_->setRecording_repository_path(repository_.path());
-    session_->setRecordingType(kRecordingTypeAudioVideo);
+    context_->state.running.set(true);
+    context_->recording.recording_repository_path.set(repository_.path());
+    session_->recordingType.set(kRecordingTypeAudioVideo);
     setEngineEnvironment({context_, &actions_, framework_});
   }
   /// No capture thread may outlive the test: they end once their controller has shut down.
   ~EngineTest() override {
-    session_->setStatus(kRecorderIdle);
+    session_->status.set(kRecorderIdle);
     endCaptures();
     session_ = nullptr;
     context_ = nullptr;

@@ -1,8 +1,10 @@
 // The session: its state when new, its copy and its end.
+#include "capture/api/capture_framework.h"
 #include "record/agent_record.h"
-
+#include "record/create_preview.h"
+#include "record/prepare_capture.h"
 #include "record/preview_controller.h"
-#include "support/heap_ptr.h"
+#include "record/stop_capture.h"
 #include "tests/unit/record/engine_fixture.h"
 
 namespace lmx {
@@ -14,129 +16,117 @@ class Session : public EngineTest {};
 
 TEST_F(Session, FreshRecordHasNoStatusErrorOrTimes) {
   const AgentRecord fresh;
-  EXPECT_EQ(fresh.status(), 0);
-  EXPECT_EQ(fresh.error(), 0);
-  for (const auto get :
-       {&AgentRecord::elapsedTime, &AgentRecord::launchTime, &AgentRecord::startTime, &AgentRecord::stopTime,
-        &AgentRecord::hardStopTime, &AgentRecord::softStopTime, &AgentRecord::lastContact}) {
-    EXPECT_FALSE((fresh.*get)().has_value());
+  EXPECT_EQ(fresh.status.get(), 0);
+  EXPECT_EQ(fresh.error.get(), 0);
+  for (const auto* time :
+       {&fresh.elapsedTime, &fresh.launchTime, &fresh.startTime, &fresh.stopTime, &fresh.lastContact,
+        &fresh.stop_times.hardStopTime, &fresh.stop_times.softStopTime}) {
+    EXPECT_FALSE(time->get().has_value());
   }
-  EXPECT_FALSE(fresh.filename());
-  EXPECT_EQ(fresh.captureController(), nullptr);
+  EXPECT_FALSE(fresh.filename.get());
+  EXPECT_EQ(fresh.captureController.get(), nullptr);
 }
 
 TEST_F(Session, CopyHasTheValuesAndSharesTheCapture) {
   const auto controller = std::make_shared<ScriptedCaptureController>(journal_);
-  session_->setCaptureController(controller);
-  session_->setFilename("/r/A.mov");
-  session_->setRequest_uuid("Q");
-  session_->setRecording_uuid("U");
-  session_->setStatus(2);
-  session_->setStartTime(TimeValue{5, 6});
-  session_->setAutoShutoffCheckTimer(true);
+  session_->captureController.set(controller);
+  session_->filename.set("/r/A.mov");
+  session_->request_uuid.set("Q");
+  session_->recording_uuid.set("U");
+  session_->status.set(2);
+  session_->startTime.set(TimeValue{5, 6});
+  session_->autoShutoffCheckTimer.set(true);
   const auto copy = session_->copy();
-  EXPECT_EQ(copy->captureController(), controller);
-  EXPECT_EQ(copy->filename(), "/r/A.mov");
-  EXPECT_EQ(copy->request_uuid(), "Q");
-  EXPECT_EQ(copy->recording_uuid(), "U");
-  EXPECT_EQ(copy->status(), 2);
-  EXPECT_EQ(copy->recordingType(), kRecordingTypeAudioVideo);
-  EXPECT_EQ(copy->startTime()->tv_sec, 5);
-  EXPECT_FALSE(copy->stopTime().has_value());
-  EXPECT_FALSE(copy->autoShutoffCheckTimer());
-  copy->captureController()->stopRecording();
+  EXPECT_EQ(copy->captureController.get(), controller);
+  EXPECT_EQ(copy->filename.get(), "/r/A.mov");
+  EXPECT_EQ(copy->request_uuid.get(), "Q");
+  EXPECT_EQ(copy->recording_uuid.get(), "U");
+  EXPECT_EQ(copy->status.get(), 2);
+  EXPECT_EQ(copy->recordingType.get(), kRecordingTypeAudioVideo);
+  EXPECT_EQ(copy->startTime.get()->tv_sec, 5);
+  EXPECT_FALSE(copy->stopTime.get().has_value());
+  EXPECT_FALSE(copy->autoShutoffCheckTimer.get());
+  copy->captureController.get()->stopRecording();
   EXPECT_EQ(journalCount("controller stopRecording"), 1);
 }
 
 TEST_F(Session, CopyHasEverySetting) {
-  session_->setError(30);
-  session_->setDelay(1);
-  session_->setMaxUnattendedRecordingMinutes(2);
-  session_->setSessions({.captureWidth = 3, .videoKeyFrameRate = 4});
-  session_->setVideoPercent(5);
-  session_->setVideoWidth(6);
-  session_->setVideoHeight(7);
-  session_->setAudioSampleRate(8);
-  session_->setAudioChannelsNumber(9);
-  session_->setAudioOnlyMode(true);
-  session_->setDiskSpaceCutoffInMB(10);
-  session_->setMetadata(parameters({{"a", "b"}}));
+  session_->error.set(30);
+  session_->stop_times.maxUnattendedRecordingMinutes.set(2);
+  session_->videoWidth.set(6);
+  session_->videoHeight.set(7);
+  session_->audioOnlyMode.set(true);
+  session_->diskSpaceCutoffInMB.set(10);
+  session_->metadata.set(parameters({{"a", "b"}}));
   const auto copy = session_->copy();
-  EXPECT_EQ(copy->error(), 30);
-  EXPECT_EQ(copy->delay(), 1);
-  EXPECT_EQ(copy->maxUnattendedRecordingMinutes(), 2);
-  EXPECT_EQ(copy->sessions().captureWidth, 3);
-  EXPECT_EQ(copy->sessions().videoKeyFrameRate, 4U);
-  EXPECT_EQ(copy->videoPercent(), 5U);
-  EXPECT_EQ(copy->videoWidth(), 6U);
-  EXPECT_EQ(copy->videoHeight(), 7U);
-  EXPECT_EQ(copy->audioSampleRate(), 8);
-  EXPECT_EQ(copy->audioChannelsNumber(), 9);
-  EXPECT_TRUE(copy->audioOnlyMode());
-  EXPECT_EQ(copy->diskSpaceCutoffInMB(), 10U);
-  EXPECT_EQ(lookUp(copy->metadata(), "a"), "b");
+  EXPECT_EQ(copy->error.get(), 30);
+  EXPECT_EQ(copy->stop_times.maxUnattendedRecordingMinutes.get(), 2);
+  EXPECT_EQ(copy->videoWidth.get(), 6U);
+  EXPECT_EQ(copy->videoHeight.get(), 7U);
+  EXPECT_TRUE(copy->audioOnlyMode.get());
+  EXPECT_EQ(copy->diskSpaceCutoffInMB.get(), 10U);
+  EXPECT_EQ(lookUp(copy->metadata.get(), "a"), "b");
 }
 
 TEST_F(Session, CopyHasEachTimeThatIsSetAndNoOther) {
-  using Time = AgentRecord::Time;
-  const std::pair<Time (AgentRecord::*)() const, void (AgentRecord::*)(Time)> kTimes[] = {
-      {&AgentRecord::elapsedTime, &AgentRecord::setElapsedTime},
-      {&AgentRecord::launchTime, &AgentRecord::setLaunchTime},
-      {&AgentRecord::startTime, &AgentRecord::setStartTime},
-      {&AgentRecord::stopTime, &AgentRecord::setStopTime},
-      {&AgentRecord::hardStopTime, &AgentRecord::setHardStopTime},
-      {&AgentRecord::softStopTime, &AgentRecord::setSoftStopTime},
-      {&AgentRecord::lastContact, &AgentRecord::setLastContact}};
-  for (const auto& [get, set] : kTimes) {
-    (session_.get()->*set)(TimeValue{5, 6});
+  const auto times = [](AgentRecord& record) {
+    return std::array{&record.elapsedTime,
+                      &record.launchTime,
+                      &record.startTime,
+                      &record.stopTime,
+                      &record.lastContact,
+                      &record.stop_times.hardStopTime,
+                      &record.stop_times.softStopTime};
+  };
+  const auto own = times(*session_);
+  for (std::size_t set = 0; set < own.size(); ++set) {
+    own[set]->set(TimeValue{5, 6});
     const auto copy = session_->copy();
-    for (const auto& [other, unused] : kTimes) {
-      EXPECT_EQ((copy.get()->*other)().has_value(), other == get);
-    }
-    const Time copied = (copy.get()->*get)();
-    ASSERT_TRUE(copied);
-    EXPECT_EQ(copied->tv_sec, 5);
-    EXPECT_EQ(copied->tv_usec, 6);
-    (session_.get()->*set)(std::nullopt);
+    const auto copied = times(*copy);
+    for (std::size_t i = 0; i < copied.size(); ++i) EXPECT_EQ(copied[i]->get().has_value(), i == set);
+    ASSERT_TRUE(copied[set]->get());
+    EXPECT_EQ(copied[set]->get()->tv_sec, 5);
+    EXPECT_EQ(copied[set]->get()->tv_usec, 6);
+    own[set]->set(std::nullopt);
   }
 }
 
 TEST_F(Session, CopySharesTheCaptureObjects) {
   ASSERT_EQ(LXAgentRecordPrepareCapture(*context_, parameters({})), 0);
-  session_->setPreviewController(
+  session_->previewController.set(
       LXAgentRecordCreatePreviewController("camera", std::nullopt, false, 400, nullptr));
   const auto copy = session_->copy();
-  EXPECT_NE(copy->captureThread(), nullptr);
-  EXPECT_EQ(copy->captureThread(), session_->captureThread());
-  EXPECT_NE(copy->previewController(), nullptr);
-  EXPECT_EQ(copy->previewController(), session_->previewController());
-  EXPECT_NE(copy->captureControllerDelegate(), nullptr);
-  EXPECT_EQ(copy->captureControllerDelegate(), session_->captureControllerDelegate());
+  EXPECT_NE(copy->captureThread.get(), nullptr);
+  EXPECT_EQ(copy->captureThread.get(), session_->captureThread.get());
+  EXPECT_NE(copy->previewController.get(), nullptr);
+  EXPECT_EQ(copy->previewController.get(), session_->previewController.get());
+  EXPECT_NE(copy->captureControllerDelegate.get(), nullptr);
+  EXPECT_EQ(copy->captureControllerDelegate.get(), session_->captureControllerDelegate.get());
 }
 
 TEST_F(Session, StoppingThroughACopyStopsTheSameRecording) {
   ASSERT_EQ(LXAgentRecordPrepareCapture(*context_, parameters({})), 0);
   const auto copy = session_->copy();
   actions_.on_stop_capture = [&] {
-    copy->setStatus(kRecorderIdle);
+    copy->status.set(kRecorderIdle);
     endCaptures();
   };
   EXPECT_EQ(LXAgentRecordStopCapture(copy), 0);
   const auto marks = framework_->controller(0)->marks();
   ASSERT_EQ(marks.size(), 2U);
   EXPECT_EQ(marks[1].operation, "setStop");
-  EXPECT_EQ(marks[1].uuid, session_->recording_uuid());
+  EXPECT_EQ(marks[1].uuid, session_->recording_uuid.get());
   EXPECT_EQ(journalCount("stopCapture"), 1);
 }
 
 TEST_F(Session, CopyKeepsItsValuesWhenTheSessionGoesOn) {
-  session_->setFilename("/r/A.mov");
-  session_->setStopTime(TimeValue{1, 0});
+  session_->filename.set("/r/A.mov");
+  session_->stopTime.set(TimeValue{1, 0});
   const auto copy = session_->copy();
-  session_->setFilename("/r/B.mov");
-  session_->setStopTime(TimeValue{2, 0});
-  EXPECT_EQ(copy->filename(), "/r/A.mov");
-  EXPECT_EQ(copy->stopTime()->tv_sec, 1);
+  session_->filename.set("/r/B.mov");
+  session_->stopTime.set(TimeValue{2, 0});
+  EXPECT_EQ(copy->filename.get(), "/r/A.mov");
+  EXPECT_EQ(copy->stopTime.get()->tv_sec, 1);
 }
 
 TEST_F(Session, CopyHasAMutexOfItsOwn) {
@@ -154,47 +144,31 @@ TEST_F(Session, CleanupOfARecordingOneStopsItWithItsCallback) {
   const auto controller = std::make_shared<ScriptedCaptureController>(journal_);
   controller->shut_down = true;
   controller->elapsed_of_request = 7.9;
-  record->setRecordingType(kRecordingTypeAudio);
-  record->setCaptureController(controller);
-  record->setFilename("/r/A.mov");
-  record->setStatus(kRecorderRecording);
-  actions_.on_stop_capture = [&] { record->setStatus(kRecorderIdle); };
+  record->recordingType.set(kRecordingTypeAudio);
+  record->captureController.set(controller);
+  record->filename.set("/r/A.mov");
+  record->status.set(kRecorderRecording);
+  actions_.on_stop_capture = [&] { record->status.set(kRecorderIdle); };
   record->cleanup();
   EXPECT_EQ(journal_.entries(), (Entries{"setStop", "stopCapture", "recordDidStop /r/A.mov 7"}));
-  EXPECT_EQ(record->captureController(), nullptr);
-  EXPECT_FALSE(record->filename());
+  EXPECT_EQ(record->captureController.get(), nullptr);
+  EXPECT_FALSE(record->filename.get());
 }
 
 TEST_F(Session, CleanupOfACopyStopsNothing) {
   const auto record = std::make_shared<AgentRecord>();
-  record->setRecordingType(kRecordingTypeAudio);
-  record->setStatus(kRecorderRecording);
+  record->recordingType.set(kRecordingTypeAudio);
+  record->status.set(kRecorderRecording);
   record->copy()->cleanup();
   EXPECT_TRUE(journal_.entries().empty());
-  record->setStatus(kRecorderIdle);
+  record->status.set(kRecorderIdle);
 }
 
 TEST_F(Session, CleanupKeepsTheRequest) {
-  session_->setRequest_uuid("Q");
+  session_->request_uuid.set("Q");
   session_->cleanup();
-  EXPECT_EQ(session_->request_uuid(), "Q");
-  EXPECT_EQ(session_->recording_uuid(), "");
-}
-
-TEST(TimeArithmetic, MicrosecondsAreCarriedAndBorrowed) {
-  struct Row {
-    TimeValue a, b, sum, difference;
-  };
-  for (const Row& row : {Row{{5, 600000}, {2, 400000}, {8, 0}, {3, 200000}},
-                         Row{{5, 100000}, {2, 400000}, {7, 500000}, {2, 700000}},
-                         Row{{1, 999999}, {0, 999999}, {2, 999998}, {1, 0}}}) {
-    const heap_ptr<TimeValue> sum(LXAgentTimevalAdd(&row.a, &row.b));
-    const heap_ptr<TimeValue> difference(LXAgentTimevalSubtract(&row.a, &row.b));
-    EXPECT_EQ(sum->tv_sec, row.sum.tv_sec);
-    EXPECT_EQ(sum->tv_usec, row.sum.tv_usec);
-    EXPECT_EQ(difference->tv_sec, row.difference.tv_sec);
-    EXPECT_EQ(difference->tv_usec, row.difference.tv_usec);
-  }
+  EXPECT_EQ(session_->request_uuid.get(), "Q");
+  EXPECT_EQ(session_->recording_uuid.get(), "");
 }
 
 }  // namespace

@@ -1,6 +1,8 @@
 // Stopping a recording through the engine, and its status.
 #include <chrono>
 
+#include "record/recording_status.h"
+#include "record/stop_capture.h"
 #include "tests/unit/record/engine_fixture.h"
 
 namespace lmx {
@@ -12,15 +14,15 @@ using testing::ScriptedCaptureController;
 class Stop : public EngineTest {
  protected:
   Stop() {
-    session_->setCaptureController(controller_);
-    session_->setFilename(movie("R1.mov"));
-    session_->setStatus(kRecorderRecording);
-    session_->setRecording_uuid("U");
-    session_->setElapsedTime(TimeValue{});
-    session_->setStartTime(currentTime());
+    session_->captureController.set(controller_);
+    session_->filename.set(movie("R1.mov"));
+    session_->status.set(kRecorderRecording);
+    session_->recording_uuid.set("U");
+    session_->elapsedTime.set(TimeValue{});
+    session_->startTime.set(lmp_gettimeofday());
     controller_->shut_down = true;
     controller_->elapsed_of_request = 12.9;
-    actions_.on_stop_capture = [this] { session_->setStatus(kRecorderIdle); };
+    actions_.on_stop_capture = [this] { session_->status.set(kRecorderIdle); };
   }
   std::shared_ptr<ScriptedCaptureController> controller_ =
       std::make_shared<ScriptedCaptureController>(journal_);
@@ -31,18 +33,18 @@ TEST_F(Stop, MarksPerformsAndReportsWholeSeconds) {
   EXPECT_EQ(journal_.entries(),
             (Entries{"setStop", "stopCapture", "recordDidStop " + movie("R1.mov") + " 12"}));
   EXPECT_EQ(controller_->marks()[0].uuid, "U");
-  EXPECT_TRUE(session_->stopTime());
-  EXPECT_EQ(session_->status(), kRecorderIdle);
+  EXPECT_TRUE(session_->stopTime.get());
+  EXPECT_EQ(session_->status.get(), kRecorderIdle);
 }
 
 TEST_F(Stop, ElapsedTimeGrowsByTheSpan) {
-  auto start = *currentTime();
+  auto start = *lmp_gettimeofday();
   start.tv_sec -= 100;
-  session_->setStartTime(start);
-  session_->setElapsedTime(TimeValue{50, 0});
+  session_->startTime.set(start);
+  session_->elapsedTime.set(TimeValue{50, 0});
   ASSERT_EQ(LXAgentRecordStopCapture(session_), 0);
-  EXPECT_GE(session_->elapsedTime()->tv_sec, 150);
-  EXPECT_LE(session_->elapsedTime()->tv_sec, 152);
+  EXPECT_GE(session_->elapsedTime.get()->tv_sec, 150);
+  EXPECT_LE(session_->elapsedTime.get()->tv_sec, 152);
 }
 
 TEST_F(Stop, WithoutASessionIsTwo) {
@@ -51,23 +53,23 @@ TEST_F(Stop, WithoutASessionIsTwo) {
 }
 
 TEST_F(Stop, WithoutARecordingIsThree) {
-  session_->setStatus(kRecorderIdle);
+  session_->status.set(kRecorderIdle);
   EXPECT_EQ(LXAgentRecordStopCapture(session_), 3);
   EXPECT_TRUE(log_.contains(3, "Unable to stop, capture not running"));
   EXPECT_EQ(journal_.entries(), (Entries{"setStop", "recordRuntimeError 3"}));
-  EXPECT_EQ(session_->error(), 3);
+  EXPECT_EQ(session_->error.get(), 3);
 }
 
 TEST_F(Stop, APausedOneIsRunning) {
-  session_->setStatus(kRecorderPaused);
+  session_->status.set(kRecorderPaused);
   EXPECT_EQ(LXAgentRecordStopCapture(session_), 0);
 }
 
 TEST_F(Stop, UnknownTypeIsOne) {
-  session_->setRecordingType(9);
+  session_->recordingType.set(9);
   EXPECT_EQ(LXAgentRecordStopCapture(session_), 1);
   EXPECT_EQ(journal_.entries(), (Entries{"setStop", "recordRuntimeError 1"}));
-  EXPECT_EQ(session_->error(), 1);
+  EXPECT_EQ(session_->error.get(), 1);
 }
 
 TEST_F(Stop, AgentStatusIsTheResult) {
@@ -76,24 +78,24 @@ TEST_F(Stop, AgentStatusIsTheResult) {
     bool logged;
   };
   for (const Row& row : {Row{26, false}, Row{3, true}}) {
-    session_->setStatus(kRecorderRecording);
-    context_->setStatus(row.agent_status);
+    session_->status.set(kRecorderRecording);
+    context_->state.status.set(row.agent_status);
     EXPECT_EQ(LXAgentRecordStopCapture(session_), row.agent_status);
-    EXPECT_EQ(session_->error(), row.agent_status);
+    EXPECT_EQ(session_->error.get(), row.agent_status);
     EXPECT_EQ(log_.contains(3, "_LXAgentRecordStopCaptureSync received error"), row.logged);
   }
   EXPECT_EQ(journalCount("recordDidStop " + movie("R1.mov") + " 12"), 0);
 }
 
 TEST_F(Stop, FileRecordingNeedsNoMainThread) {
-  session_->setRecordingType(kRecordingTypeFile);
-  session_->setCaptureController(nullptr);
+  session_->recordingType.set(kRecordingTypeFile);
+  session_->captureController.set(nullptr);
   EXPECT_EQ(LXAgentRecordStopCapture(session_), 0);
   EXPECT_EQ(journal_.entries(), (Entries{"recordDidStop " + movie("R1.mov") + " 0"}));
 }
 
 TEST_F(Stop, AdhocStopsTheControllerDirectly) {
-  context_->setAdhoc(true);
+  context_->options.adhoc.set(true);
   EXPECT_EQ(LXAgentRecordStopCapture(session_), 0);
   EXPECT_EQ(journalCount("controller stopRecording"), 1);
   EXPECT_EQ(journalCount("stopCapture"), 0);
@@ -111,7 +113,7 @@ TEST_F(Stop, OfAControllerThatNeverShutsDownEndsAfterTenSeconds) {
 
 TEST_F(EngineTest, ACaptureThatFailsToStartIsStopped) {
   actions_.on_stop_capture = [this] {
-    session_->setStatus(kRecorderIdle);
+    session_->status.set(kRecorderIdle);
     endCaptures();
   };
   framework_->on_new_controller = [](auto& controller) { controller.start_succeeds = false; };
@@ -119,7 +121,7 @@ TEST_F(EngineTest, ACaptureThatFailsToStartIsStopped) {
   EXPECT_TRUE(log_.waitFor(2, "The recording failed to start"));
   EXPECT_TRUE(
       testing::waitUntil([&] { return journalCount("recordDidStop " + movie("R1.mov") + " 0") == 1; }));
-  EXPECT_EQ(session_->status(), kRecorderIdle);
+  EXPECT_EQ(session_->status.get(), kRecorderIdle);
 }
 
 TEST_F(Stop, StatusComesFromTheControllersState) {
@@ -143,10 +145,10 @@ TEST_F(Stop, StatusLeavesOutputsOfUnsetTimes) {
 }
 
 TEST_F(Stop, StatusTellsTimesErrorAndSpace) {
-  session_->setLaunchTime(TimeValue{101, 5});
-  session_->setStopTime(TimeValue{102, 5});
-  session_->setHardStopTime(TimeValue{103, 5});
-  session_->setError(30);
+  session_->launchTime.set(TimeValue{101, 5});
+  session_->stopTime.set(TimeValue{102, 5});
+  session_->stop_times.hardStopTime.set(TimeValue{103, 5});
+  session_->error.set(30);
   RecordStatus status;
   EXPECT_EQ(LXAgentRecordGetStatus(session_, &status), 0);
   EXPECT_EQ(status.start, 101);

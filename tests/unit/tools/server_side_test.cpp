@@ -1,12 +1,11 @@
 // The server's side of the tunnel.
-#include "tools/lmx-tunnel/server_side.h"
-
 #include <gtest/gtest.h>
 
 #include <fstream>
 
 #include "tests/unit/doubles/log_capture.h"
 #include "tests/unit/doubles/temporary_directory.h"
+#include "tools/lmx-tunnel/server_side.h"
 
 namespace lmx {
 namespace {
@@ -62,10 +61,9 @@ TEST(Secret, IsReadAsTheAgentReadsIt) {
   const testing::TemporaryDirectory folder;
   const auto read = [&](const std::string& content) {
     std::ofstream(folder.file("s.plist")) << content;
-    std::string problem;
-    const auto key = readSecret(folder.file("s.plist"), problem);
-    EXPECT_EQ(key.has_value(), problem.empty());
-    return key.has_value();
+    const auto key = readSecret(folder.file("s.plist"));
+    EXPECT_TRUE(key || !key.error().message.empty());
+    return key.ok();
   };
   const auto plist = [](const std::string& text) {
     return "<plist version=\"1.0\"><dict><key>lmx_secret</key><string>" + text + "</string></dict></plist>";

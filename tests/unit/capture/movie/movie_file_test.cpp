@@ -1,4 +1,6 @@
 // The growing movie: written, cut off anywhere, read back, made whole, copied.
+#include "capture/movie/movie_file.h"
+
 #include <gtest/gtest.h>
 
 #include <filesystem>
@@ -6,7 +8,6 @@
 #include <random>
 
 #include "capture/movie/movie_boxes.h"
-#include "capture/movie/movie_file.h"
 #include "capture/source/device_id.h"
 #include "capture/source/test_picture.h"
 #include "capture/store/finished_capture.h"

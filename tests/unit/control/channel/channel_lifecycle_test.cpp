@@ -219,7 +219,7 @@ TEST(Stop, EndsABackOffEarly) {
 TEST_F(Lifecycle, NetworkChangeMakesANewConnectionAndThenClosesTheOld) {
   start();
   const int first = connections_.peer(0);
-  channel_.setNetTransitionTime(currentTime()->tv_sec);
+  channel_.setNetTransitionTime(lmp_gettimeofday()->tv_sec);
   clock_.ahead_seconds = 2;
   say(first, "x");  // one turn of the loop
   connections_.peer(1);
@@ -229,7 +229,7 @@ TEST_F(Lifecycle, NetworkChangeMakesANewConnectionAndThenClosesTheOld) {
 }
 
 TEST_F(Lifecycle, NetworkChangeIsActedUponOnlyInALaterSecond) {
-  context_->setRecord_context(nullptr);  // its contact times would be compared with the frozen clock
+  context_->releaseRecord();  // its contact times would be compared with the frozen clock
   clock_.frozen_at = 5000;
   start();
   const int first = connections_.peer(0);
@@ -254,13 +254,13 @@ TEST_F(Lifecycle, ContactLostForTenMinutesReconnectsAndClearsTheTime) {
   say(first, "x");  // one turn of the loop, not yet a command
   connections_.peer(1);
   EXPECT_TRUE(log_.contains(5, "Too long since last contact from server.  Reconnecting..."));
-  EXPECT_FALSE(context_->record_context()->lastContact().has_value());
+  EXPECT_FALSE(context_->record_context()->lastContact.get().has_value());
   EXPECT_TRUE(Connections::closes(first));
 }
 
 TEST_F(Lifecycle, WithoutSessionContactIsNeverLost) {
   start();
-  context_->setRecord_context(nullptr);
+  context_->releaseRecord();
   clock_.ahead_seconds = 100000;
   const int first = connections_.peer(0);
   say(first, "foo\n");
@@ -352,7 +352,7 @@ TEST_F(Lifecycle, StopOnItsOwnThreadLetsGoOfTheContext) {
   channel_.stop();
   EXPECT_TRUE(channel_.threadHasEnded());
   EXPECT_EQ(channel_.agentContext(), nullptr);
-  EXPECT_EQ(channel_.properties(), nullptr);
+  EXPECT_EQ(channel_.properties.get(), nullptr);
 }
 
 TEST_F(Lifecycle, AskedToStopTheChannelFinishesTheCommandItExecutes) {

@@ -83,7 +83,7 @@ TEST_F(Dispatch, GateRefusesButCountsAsContact) {
   channel_.receive("STATUS\n");
   EXPECT_EQ(channel_.replies(), Replies{"cmdStatus=36"});
   EXPECT_TRUE(log_.contains(3, "Command rejected because authentication is required [STATUS]"));
-  EXPECT_TRUE(context_->record_context()->lastContact().has_value());
+  EXPECT_TRUE(context_->record_context()->lastContact.get().has_value());
 }
 
 TEST_F(Dispatch, UserauthPassesTheGate) {
@@ -95,16 +95,16 @@ TEST_F(Dispatch, UserauthPassesTheGate) {
 }
 
 TEST_F(Dispatch, UnknownCommandCountsAsContact) {
-  ASSERT_FALSE(context_->record_context()->lastContact().has_value());
+  ASSERT_FALSE(context_->record_context()->lastContact.get().has_value());
   channel_.receive("foo\n");
-  EXPECT_TRUE(context_->record_context()->lastContact().has_value());
+  EXPECT_TRUE(context_->record_context()->lastContact.get().has_value());
 }
 
 TEST_F(Dispatch, LineThatTheTransportRejectsIsIgnored) {
   channel_.readable_lines = false;
   channel_.receive("STATUS\n");
   EXPECT_TRUE(channel_.replies().empty());
-  EXPECT_FALSE(context_->record_context()->lastContact().has_value());
+  EXPECT_FALSE(context_->record_context()->lastContact.get().has_value());
   EXPECT_FALSE(log_.mentions("Command"));
 }
 

@@ -27,7 +27,7 @@ class TurnedClock : public ChannelClock {
   Journal sleeps;
 
   std::optional<TimeValue> now() override {
-    auto time = currentTime();
+    auto time = lmp_gettimeofday();
     if (!readable || !time) return std::nullopt;
     if (frozen_at >= 0) return TimeValue{frozen_at, 0};
     time->tv_sec += ahead_seconds;

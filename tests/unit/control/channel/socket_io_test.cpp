@@ -1,6 +1,4 @@
 // Sending and waiting on real sockets.
-#include "platform/net/socket_io.h"
-
 #include <gtest/gtest.h>
 #include <sys/eventfd.h>
 #include <sys/socket.h>
@@ -11,6 +9,7 @@
 #include <thread>
 
 #include "control/channel/plain_text.h"
+#include "platform/net/socket_io.h"
 #include "support/unique_fd.h"
 #include "tests/unit/doubles/log_capture.h"
 

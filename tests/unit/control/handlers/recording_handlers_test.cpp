@@ -28,12 +28,12 @@ constexpr const char* kStart =
 
 class RecordingHandlers : public ::testing::Test {
  protected:
-  RecordingHandlers() { session_->setCaptureController(capture_); }
+  RecordingHandlers() { session_->captureController.set(capture_); }
 
   void setContinuous(bool enabled) {
     LMRContinuousRecordingInfo info;
     info.enabled = enabled;
-    context_->setContinuous(info);
+    context_->recording.continuous.set(info);
   }
   Lines run(const std::string& line) {
     channel_.receive(line);
@@ -41,9 +41,9 @@ class RecordingHandlers : public ::testing::Test {
   }
   /// Runs `line` and expects its one mark to carry the time at which it ran, less the shift of the context.
   ScriptedCaptureController::Mark onlyMark(const std::string& line) {
-    const double before = secondsSinceReferenceDate() - context_->timeshift_seconds();
+    const double before = secondsSinceReferenceDate() - context_->state.timeshift_seconds.get();
     run(line);
-    const double after = secondsSinceReferenceDate() - context_->timeshift_seconds();
+    const double after = secondsSinceReferenceDate() - context_->state.timeshift_seconds.get();
     const auto marks = capture_->marks();
     EXPECT_EQ(marks.size(), 1U);
     if (marks.empty()) return {};
@@ -67,60 +67,62 @@ TEST_F(RecordingHandlers, StartPreparesThenMarksThenReplies) {
   const auto mark = onlyMark(kStart);
   EXPECT_EQ(channel_.replies(), Lines{"cmdStatus=0"});
   EXPECT_EQ(journal_.entries(), (Lines{"prepareCapture, waiting", "setStart"}));
-  EXPECT_EQ(mark.uuid, session_->request_uuid());
+  EXPECT_EQ(mark.uuid, session_->request_uuid.get());
   EXPECT_EQ(mark.uuid.size(), 36U);
   EXPECT_EQ(lookUp(mark.parameters, "RecordingMetadata_TITLE"), "My Talk");
 }
 
 TEST_F(RecordingHandlers, StartHandsItsPropertiesToContextAndSession) {
   run(kStart);
-  EXPECT_EQ(lookUp(context_->properties(), "RecordingMetadata_RECORDING_UUID"), "R1");
-  EXPECT_EQ(session_->request_properties(), context_->properties());
-  EXPECT_EQ(session_->maxUnattendedRecordingMinutes(), 20);
+  EXPECT_EQ(lookUp(context_->state.properties.get(), "RecordingMetadata_RECORDING_UUID"), "R1");
+  EXPECT_EQ(session_->request_properties.get(), context_->state.properties.get());
+  EXPECT_EQ(session_->stop_times.maxUnattendedRecordingMinutes.get(), 20);
 }
 
 TEST_F(RecordingHandlers, StartPropertiesAreThereBeforeThePrepare) {
   std::optional<std::string> seen;
-  actions_.on_prepare_capture = [&] { seen = lookUp(context_->properties(), "RecordingMetadata_TITLE"); };
+  actions_.on_prepare_capture = [&] {
+    seen = lookUp(context_->state.properties.get(), "RecordingMetadata_TITLE");
+  };
   run(kStart);
   EXPECT_EQ(seen, "My Talk");
 }
 
 TEST_F(RecordingHandlers, StartMarksTheShiftedTime) {
-  context_->setTimeshift_seconds(300);
+  context_->state.timeshift_seconds.set(300);
   onlyMark(kStart);
 }
 
 TEST_F(RecordingHandlers, StartRepliesWithTheStatusOfThePrepare) {
-  context_->setStatus(3);
-  actions_.on_prepare_capture = [&] { context_->setStatus(30); };
+  context_->state.status.set(3);
+  actions_.on_prepare_capture = [&] { context_->state.status.set(30); };
   EXPECT_EQ(run(kStart), Lines{"cmdStatus=30"});
 }
 
 TEST_F(RecordingHandlers, StartClearsTheStatusOfAnEarlierAction) {
-  context_->setStatus(3);
+  context_->state.status.set(3);
   EXPECT_EQ(run(kStart), Lines{"cmdStatus=0"});
 }
 
 TEST_F(RecordingHandlers, RefusedSecondStartStillReplacesTheRequestAndMarks) {
   run(kStart);
-  const std::string first = session_->request_uuid();
-  actions_.on_prepare_capture = [&] { context_->setStatus(4); };
+  const std::string first = session_->request_uuid.get();
+  actions_.on_prepare_capture = [&] { context_->state.status.set(4); };
   EXPECT_EQ(run(kStart), (Lines{"cmdStatus=0", "cmdStatus=4"}));
-  EXPECT_NE(session_->request_uuid(), first);
+  EXPECT_NE(session_->request_uuid.get(), first);
   ASSERT_EQ(capture_->marks().size(), 2U);
-  EXPECT_EQ(capture_->marks()[1].uuid, session_->request_uuid());
+  EXPECT_EQ(capture_->marks()[1].uuid, session_->request_uuid.get());
 }
 
 TEST_F(RecordingHandlers, StartWithoutControllerHasNothingToMark) {
-  session_->setCaptureController(nullptr);
-  actions_.on_prepare_capture = [&] { context_->setStatus(3); };
+  session_->captureController.set(nullptr);
+  actions_.on_prepare_capture = [&] { context_->state.status.set(3); };
   EXPECT_EQ(run(kStart), Lines{"cmdStatus=3"});
 }
 
 TEST_F(RecordingHandlers, StartMarksOnTheControllerThatThePrepareMade) {
   auto made = std::make_shared<ScriptedCaptureController>(journal_);
-  actions_.on_prepare_capture = [&] { session_->setCaptureController(made); };
+  actions_.on_prepare_capture = [&] { session_->captureController.set(made); };
   run(kStart);
   EXPECT_TRUE(capture_->marks().empty());
   EXPECT_EQ(made->marks().size(), 1U);
@@ -147,32 +149,32 @@ TEST_F(RecordingHandlers, StartWithoutARequiredParameterChangesNothing) {
   }
   EXPECT_EQ(channel_.replies().size(), 4U);
   EXPECT_TRUE(journal_.entries().empty());
-  EXPECT_EQ(context_->properties(), nullptr);
-  EXPECT_FALSE(session_->hardStopTime().has_value());
-  EXPECT_EQ(session_->request_uuid(), "");
+  EXPECT_EQ(context_->state.properties.get(), nullptr);
+  EXPECT_FALSE(session_->stop_times.hardStopTime.get().has_value());
+  EXPECT_EQ(session_->request_uuid.get(), "");
 }
 
 TEST_F(RecordingHandlers, StartWithoutSessionStillReplies) {
-  context_->setRecord_context(nullptr);
+  context_->releaseRecord();
   EXPECT_EQ(run(kStart), Lines{"cmdStatus=0"});
 }
 
 TEST_F(RecordingHandlers, OnlyTheExactTextTrueMakesAudioOnly) {
-  session_->setRecordingType(kRecordingTypeAudioVideo);
+  session_->recordingType.set(kRecordingTypeAudioVideo);
   std::string line(kStart);
   line.insert(line.size() - 1, ",RecordingMetadata_AUDIO_ONLY=");
   for (const char* value : {"TRUE", "yes", "1", ""}) {
     run(std::string(line).insert(line.size() - 1, value));
-    EXPECT_EQ(session_->recordingType(), kRecordingTypeAudioVideo) << value;
+    EXPECT_EQ(session_->recordingType.get(), kRecordingTypeAudioVideo) << value;
   }
   run(line.insert(line.size() - 1, "true"));
-  EXPECT_EQ(session_->recordingType(), kRecordingTypeAudio);
+  EXPECT_EQ(session_->recordingType.get(), kRecordingTypeAudio);
   EXPECT_TRUE(log_.contains(7, "RecordingMetadata_AUDIO_ONLY: switching to audio-only recording type"));
 }
 
 TEST_F(RecordingHandlers, StopMarksThenAsksForTheStopWithoutWaiting) {
-  session_->setRequest_uuid("Q1");
-  context_->setTimeshift_seconds(60);
+  session_->request_uuid.set("Q1");
+  context_->state.timeshift_seconds.set(60);
   EXPECT_EQ(onlyMark("STOP\n").uuid, "Q1");
   EXPECT_EQ(channel_.replies(), Lines{"cmdStatus=0"});
   EXPECT_EQ(journal_.entries(), (Lines{"setStop", "stopRecording"}));
@@ -185,7 +187,7 @@ TEST_F(RecordingHandlers, StopDoesNotCareForContinuousMode) {
 }
 
 TEST_F(RecordingHandlers, PauseMarksBeforeItPauses) {
-  session_->setRequest_uuid("Q1");
+  session_->request_uuid.set("Q1");
   const auto mark = onlyMark("PAUSE\n");
   EXPECT_EQ(mark.operation + " " + mark.uuid, "setStop Q1");
   EXPECT_EQ(channel_.replies(), Lines{"cmdStatus=0"});
@@ -199,7 +201,7 @@ TEST_F(RecordingHandlers, PauseInContinuousModeOnlyMarks) {
 }
 
 TEST_F(RecordingHandlers, ResumeMarksAfterItHasResumed) {
-  session_->setRequest_uuid("Q1");
+  session_->request_uuid.set("Q1");
   const auto mark = onlyMark("RESUME\n");
   EXPECT_EQ(mark.operation + " " + mark.uuid, "setStart Q1");
   EXPECT_EQ(channel_.replies(), Lines{"cmdStatus=0"});
@@ -213,7 +215,7 @@ TEST_F(RecordingHandlers, ResumeInContinuousModeOnlyMarks) {
 }
 
 TEST_F(RecordingHandlers, CancelCancelsTheRequestAndTheCaptureWithoutWaiting) {
-  session_->setRequest_uuid("Q1");
+  session_->request_uuid.set("Q1");
   EXPECT_EQ(onlyMark("CANCEL\n").uuid, "Q1");
   EXPECT_EQ(channel_.replies(), Lines{"cmdStatus=0"});
   EXPECT_EQ(journal_.entries(), (Lines{"cancelRequest", "cancelCapture"}));
@@ -226,7 +228,7 @@ TEST_F(RecordingHandlers, CancelInContinuousModeOnlyCancelsTheRequest) {
 }
 
 TEST_F(RecordingHandlers, WithoutSessionTheRecordingCommandsAnswerOne) {
-  context_->setRecord_context(nullptr);
+  context_->releaseRecord();
   for (const char* line : {"STOP\n", "PAUSE\n", "RESUME\n", "CANCEL\n"}) {
     EXPECT_EQ(run(line).back(), "cmdStatus=1") << line;
   }
@@ -234,7 +236,7 @@ TEST_F(RecordingHandlers, WithoutSessionTheRecordingCommandsAnswerOne) {
 }
 
 TEST_F(RecordingHandlers, WithoutControllerTheyStillActAndReply) {
-  session_->setCaptureController(nullptr);
+  session_->captureController.set(nullptr);
   for (const char* line : {"STOP\n", "PAUSE\n", "RESUME\n", "CANCEL\n"}) {
     EXPECT_EQ(run(line).back(), "cmdStatus=0") << line;
   }
@@ -249,14 +251,14 @@ TEST_F(RecordingHandlers, WithoutActionsTheyStillReply) {
 }
 
 TEST_F(RecordingHandlers, ServerSetsTheVersionWithoutReplyEvenWhenTheUuidDiffers) {
-  context_->setServer_uuid("S1");
+  context_->server.server_uuid.set("S1");
   EXPECT_TRUE(run("SERVER version=2,server_uuid=X\n").empty());
   EXPECT_EQ(channel_.serverProtocolVersion(), 2);
   EXPECT_TRUE(log_.contains(6, "Server UUID does not match"));
 }
 
 TEST_F(RecordingHandlers, ServerOfOurOwnIsNamedInTheLog) {
-  context_->setServer_uuid("S1");
+  context_->server.server_uuid.set("S1");
   EXPECT_TRUE(run("SERVER version=3,server_uuid=S1\n").empty());
   EXPECT_EQ(channel_.serverProtocolVersion(), 3);
   EXPECT_TRUE(log_.contains(6, "Server is: S1"));
@@ -274,7 +276,7 @@ TEST_F(RecordingHandlers, XPreviewChangesTheIntervalWithoutReply) {
       std::make_shared<MyLMRPreviewController>(std::make_unique<testing::ScriptedPreviewController>());
   auto delegate = std::make_shared<MyLMRPreviewControllerDelegate>(400);
   preview->setDelegate(delegate);
-  session_->setPreviewController(preview);
+  session_->previewController.set(preview);
   EXPECT_TRUE(run("X-PREVIEW refresh_milliseconds=500\n").empty());
   EXPECT_EQ(delegate->frameGrabInterval(), 500);
   EXPECT_TRUE(run("X-PREVIEW\n").empty());
@@ -324,8 +326,8 @@ class Configure : public ::testing::Test {
  protected:
   /// Seconds from now to the hard stop; -1 when there is none.
   std::int64_t hardStopIn() {
-    const auto stop = context_->record_context()->hardStopTime();
-    return stop ? std::int64_t{stop->tv_sec} - std::int64_t{currentTime()->tv_sec} : -1;
+    const auto stop = context_->record_context()->stop_times.hardStopTime.get();
+    return stop ? std::int64_t{stop->tv_sec} - std::int64_t{lmp_gettimeofday()->tv_sec} : -1;
   }
   LogCapture log_;
   std::shared_ptr<AgentContext> context_ = newAgentContext();
@@ -358,9 +360,9 @@ TEST_F(Configure, EmptyValuesLeaveEverythingAsItWas) {
   channel_.configure(&full);
   channel_.configure(&empty);
   EXPECT_GE(hardStopIn(), 0);
-  EXPECT_EQ(context_->record_context()->maxUnattendedRecordingMinutes(), 7);
-  EXPECT_EQ(context_->user(), "bob");
-  EXPECT_EQ(context_->password(), "sesame");
+  EXPECT_EQ(context_->record_context()->stop_times.maxUnattendedRecordingMinutes.get(), 7);
+  EXPECT_EQ(context_->options.user.get(), "bob");
+  EXPECT_EQ(context_->options.password.get(), "sesame");
 }
 
 TEST_F(Configure, PropertiesAreReplacedNotMerged) {
@@ -368,7 +370,7 @@ TEST_F(Configure, PropertiesAreReplacedNotMerged) {
   const Dictionary second{{"b", "2"}};
   channel_.configure(&first);
   channel_.configure(&second);
-  EXPECT_EQ(*channel_.properties(), second);
+  EXPECT_EQ(*channel_.properties.get(), second);
 }
 
 TEST_F(RecordingHandlers, AMovieCannotBeNamedOutOfTheRepository) {
@@ -381,20 +383,21 @@ TEST_F(RecordingHandlers, AMovieCannotBeNamedOutOfTheRepository) {
 
 TEST_F(RecordingHandlers, StartForgetsDeadlinesOfAnEarlierRecordingOnly) {
   const auto inAnHour = std::time(nullptr) + 3600;
-  session_->setSoftStopTime(TimeValue{inAnHour, 0});
-  session_->setHardStopTime(TimeValue{inAnHour, 0});
+  session_->stop_times.softStopTime.set(TimeValue{inAnHour, 0});
+  session_->stop_times.hardStopTime.set(TimeValue{inAnHour, 0});
   run("START RecordingMetadata_RECORDING_UUID=R,RecordingMetadata_MAX_RECORDING_MINUTES=0,"
       "RecordingMetadata_UNATTENDED_RECORDING_MINUTES=0\n");
-  EXPECT_FALSE(session_->hardStopTime()) << "that of the recording before";
-  EXPECT_FALSE(session_->softStopTime());
+  EXPECT_FALSE(session_->stop_times.hardStopTime.get()) << "that of the recording before";
+  EXPECT_FALSE(session_->stop_times.softStopTime.get());
   run(kStart);
-  const auto own = session_->hardStopTime();
+  const auto own = session_->stop_times.hardStopTime.get();
   EXPECT_TRUE(own);
-  EXPECT_FALSE(session_->softStopTime());
-  session_->setStatus(kRecorderRecording);
-  session_->setSoftStopTime(TimeValue{1000, 0});
+  EXPECT_FALSE(session_->stop_times.softStopTime.get());
+  session_->status.set(kRecorderRecording);
+  session_->stop_times.softStopTime.set(TimeValue{1000, 0});
   run(kStart);
-  EXPECT_NE(session_->softStopTime().value_or(TimeValue{}).tv_sec, 0) << "a running one keeps its deadline";
+  EXPECT_NE(session_->stop_times.softStopTime.get().value_or(TimeValue{}).tv_sec, 0)
+      << "a running one keeps its deadline";
 }
 
 }  // namespace

@@ -11,6 +11,7 @@
 #include "control/protocol/audio_levels.h"
 #include "control/protocol/status_reply.h"
 #include "record/agent_record.h"
+#include "record/recording_status.h"
 #include "tests/unit/control/channel/scripted_channel.h"
 #include "tests/unit/doubles/log_capture.h"
 #include "tests/unit/doubles/scripted_actions.h"
@@ -93,12 +94,12 @@ class TemporaryFile {
 class StatusCommand : public ::testing::Test {
  protected:
   StatusCommand() {
-    session_->setCaptureController(capture_);
-    session_->setFilename("/tmp/lecture.mov");
-    session_->setRecordingType(kRecordingTypeAudioVideo);
-    context_->setMachine_name("Hall 3");
-    context_->setTunnel_host("tunnel.example");
-    context_->setCapture_preset("Video:Good");
+    session_->captureController.set(capture_);
+    session_->filename.set("/tmp/lecture.mov");
+    session_->recordingType.set(kRecordingTypeAudioVideo);
+    context_->server.machine_name.set("Hall 3");
+    context_->server.tunnel_host.set("tunnel.example");
+    context_->recording.capture_preset.set("Video:Good");
   }
   std::string reply(const std::string& line) {
     channel_.receive(line + "\n");
@@ -119,7 +120,7 @@ class StatusCommand : public ::testing::Test {
 };
 
 TEST_F(StatusCommand, WithoutSessionAnswersTwoAndZeroes) {
-  context_->setRecord_context(nullptr);
+  context_->releaseRecord();
   EXPECT_EQ(reply("STATUS"),
             "cmdStatus=2,recordStatus=0,start=0,elapsedTime=0,stop=0,hard_stop=0,lastError=0,"
             "availDiskInMB=0,totalDiskInMB=0");
@@ -132,9 +133,9 @@ TEST_F(StatusCommand, IdleSession) {
 TEST_F(StatusCommand, RunningRecordingIsReported) {
   capture_->state = 3;
   capture_->elapsed_milliseconds = 61999;
-  session_->setLaunchTime(TimeValue{1700000000, 999999});
-  session_->setHardStopTime(TimeValue{1700003000, 0});
-  session_->setError(30);
+  session_->launchTime.set(TimeValue{1700000000, 999999});
+  session_->stop_times.hardStopTime.set(TimeValue{1700003000, 0});
+  session_->error.set(30);
   EXPECT_TRUE(
       reply("STATUS").starts_with("cmdStatus=0,recordStatus=2,start=1700000000,elapsedTime=61,stop=0,"
                                   "hard_stop=1700003000,lastError=30,availDiskInMB="))
@@ -158,7 +159,7 @@ TEST_F(StatusCommand, ProfileFollowsOnlyTheExactTextTrue) {
 
 TEST_F(StatusCommand, PreviewFileOfARunningRecording) {
   const TemporaryFile image("JPEG!");
-  context_->setPreview_file(image.path());
+  context_->recording.preview_file.set(image.path());
   capture_->state = 3;
   capture_->power_levels = {0.0, -20.0};
   EXPECT_TRUE(reply("STATUS include_preview=true,include_profile=true")
@@ -169,7 +170,7 @@ TEST_F(StatusCommand, PreviewFileOfARunningRecording) {
 
 TEST_F(StatusCommand, PreviewFileOfAnIdleRecorderHasNoLevels) {
   const TemporaryFile image("JPEG!");
-  context_->setPreview_file(image.path());
+  context_->recording.preview_file.set(image.path());
   capture_->power_levels = {0.0};
   EXPECT_TRUE(reply("STATUS include_preview=true")
                   .ends_with(",audio-level-left=0.000000,audio-level-right=0.000000,preview-size=8,"
@@ -180,7 +181,7 @@ TEST_F(StatusCommand, PreviewFileThatHoldsNothingGivesNoPreview) {
   const TemporaryFile empty("");
   for (const std::string& path :
        {empty.path(), std::string("/tmp/unit_control/absent.jpg"), std::string("/tmp")}) {
-    context_->setPreview_file(path);
+    context_->recording.preview_file.set(path);
     EXPECT_THAT(reply("STATUS include_preview=true"), ::testing::MatchesRegex(plain_)) << path;
   }
   EXPECT_EQ(log_.count(7, "preview buffer is NULL"), 3);
@@ -189,25 +190,25 @@ TEST_F(StatusCommand, PreviewFileThatHoldsNothingGivesNoPreview) {
 TEST_F(StatusCommand, PreviewFileTooLargeForAStillGivesNoPreview) {
   const TemporaryFile movie("JPEG!");
   std::filesystem::resize_file(movie.path(), (16U << 20) + 1);
-  context_->setPreview_file(movie.path());
+  context_->recording.preview_file.set(movie.path());
   EXPECT_THAT(reply("STATUS include_preview=true"), ::testing::MatchesRegex(plain_));
 }
 
 TEST_F(StatusCommand, PreviewFileOfAnAudioOnlySessionIsStillSent) {
   const TemporaryFile image("JPEG!");
-  context_->setPreview_file(image.path());
-  session_->setRecordingType(kRecordingTypeAudio);
+  context_->recording.preview_file.set(image.path());
+  session_->recordingType.set(kRecordingTypeAudio);
   EXPECT_TRUE(reply("STATUS include_preview=true").ends_with(",preview-size=8,preview=SlBFRyE="));
 }
 
 TEST_F(StatusCommand, AudioOnlySessionHasNoPreviewAndNoLineAboutIt) {
-  session_->setRecordingType(kRecordingTypeAudio);
+  session_->recordingType.set(kRecordingTypeAudio);
   EXPECT_THAT(reply("STATUS include_preview=true"), ::testing::MatchesRegex(plain_));
   EXPECT_FALSE(log_.mentions("preview buffer is NULL"));
 }
 
 TEST_F(StatusCommand, VideoSessionWithoutPreviewSaysSoInTheLog) {
-  session_->setRecordingType(kRecordingTypeVideo);
+  session_->recordingType.set(kRecordingTypeVideo);
   EXPECT_THAT(reply("STATUS include_preview=true"), ::testing::MatchesRegex(plain_));
   EXPECT_TRUE(log_.contains(7, "preview buffer is NULL"));
 }

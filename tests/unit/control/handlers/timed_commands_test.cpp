@@ -30,7 +30,7 @@ class TimedCommand : public ::testing::Test {
  protected:
   TimedCommand() {
     ::unlink(file().c_str());
-    session_->setCaptureController(capture_);
+    session_->captureController.set(capture_);
   }
   ~TimedCommand() override { ::unlink(file().c_str()); }
 
@@ -38,7 +38,7 @@ class TimedCommand : public ::testing::Test {
   /// The file as it is on the disk.
   static PlistArray stored() {
     const PlistResult read = readPropertyList(file());
-    return read.value ? std::get<PlistArray>(read.value->value) : PlistArray();
+    return read ? std::get<PlistArray>(read->value) : PlistArray();
   }
   std::string in(std::time_t seconds) const { return *dateText(now_ + seconds); }
   /// Runs one line. @return its reply
@@ -49,7 +49,7 @@ class TimedCommand : public ::testing::Test {
     EXPECT_EQ(replies.size(), before + 1) << line;
     return replies.size() > before ? replies.back() : "";
   }
-  std::vector<SharedDictionary> listed() { return context_->timedCmdList().entries(); }
+  std::vector<SharedDictionary> listed() { return context_->timedCmdList.entries(); }
   /// What the main loop does when the time of the n-th scheduled command has come.
   std::string fire(std::size_t n) {
     const std::size_t before = channel_.replies().size();
@@ -90,7 +90,7 @@ TEST_F(TimedCommand, StartIsScheduledWithItsParametersAndAnIdentity) {
   EXPECT_TRUE(log_.contains(6, "Running deferred command: START"));
   EXPECT_THAT(listed(), IsEmpty());
   EXPECT_THAT(stored(), IsEmpty());
-  EXPECT_EQ(context_->properties()->at("TimerID"), id) << "the handler gets the whole entry";
+  EXPECT_EQ(context_->state.properties.get()->at("TimerID"), id) << "the handler gets the whole entry";
   EXPECT_THAT(journal_.entries(), ::testing::Contains("prepareCapture, waiting"));
 }
 
@@ -239,7 +239,7 @@ TEST_F(TimedCommand, AKillLeavesTheOldOrTheNewList) {
     waitpid(child, nullptr, 0);
     const std::size_t entries = stored().size();
     EXPECT_TRUE(entries == 1 || entries == 2) << entries;
-    context_->timedCmdList().removeTimer(std::string(20000, 'x'));
+    context_->timedCmdList.removeTimer(std::string(20000, 'x'));
   }
 }
 

@@ -115,7 +115,7 @@ class Peer {
 class LocalSocket : public ::testing::Test {
  protected:
   void SetUp() override {
-    context_->record_context()->setFilename("/tmp/lecture.mov");
+    context_->record_context()->filename.set("/tmp/lecture.mov");
     start();
   }
   void start() {
@@ -131,7 +131,7 @@ class LocalSocket : public ::testing::Test {
 };
 
 TEST_F(LocalSocket, StatusReplyHasNoLineFeed) {
-  context_->setRecord_context(nullptr);
+  context_->releaseRecord();
   Peer peer;
   peer.send("STATUS\n");
   const std::string status = peer.receiveUpTo("totalDiskInMB=0");
@@ -284,7 +284,7 @@ TEST_F(LocalSocket, TenMegabytesWithoutALineFeedLeaveTheChannelUsable) {
 TEST_F(LocalSocket, ReplyLongerThanTheSocketBufferArrivesWhole) {
   const std::string image = "/tmp/unit_control_image_" + std::to_string(::getpid());
   std::ofstream(image, std::ios::binary) << std::string(3U << 20, 'x');
-  context_->setPreview_file(image);
+  context_->recording.preview_file.set(image);
   Peer peer;
   peer.send("STATUS include_preview=true\n");
   const std::string reply = peer.receiveUpTo("eHh4");

@@ -1,4 +1,6 @@
 // The tunnel's channel against a server that the test plays on loopback.
+#include "control/tunnel/agent_control.h"
+
 #include <arpa/inet.h>
 #include <gtest/gtest.h>
 #include <netinet/in.h>
@@ -11,9 +13,7 @@
 #include <iterator>
 #include <thread>
 
-#include "control/tunnel/agent_control.h"
 #include "support/base64.h"
-#include "support/heap_ptr.h"
 #include "support/unique_fd.h"
 #include "tests/unit/control/channel/scripted_channel.h"
 #include "tests/unit/doubles/log_capture.h"
@@ -61,11 +61,11 @@ class PlayedServer {
 class Tunnel : public ::testing::Test {
  protected:
   Tunnel() {
-    context_->setTunnel_host("127.0.0.1");
-    context_->setTunnel_port(std::to_string(server_.port()));
-    context_->setMachine_uuid("C-1");
-    context_->setShared_secret(kSecret);
-    context_->setRunning(true);
+    context_->server.tunnel_host.set("127.0.0.1");
+    context_->server.tunnel_port.set(std::to_string(server_.port()));
+    context_->server.machine_uuid.set("C-1");
+    context_->server.shared_secret.set(kSecret);
+    context_->state.running.set(true);
   }
   static std::ptrdiff_t openDescriptors() {
     return std::distance(std::filesystem::directory_iterator("/proc/self/fd"), {});
@@ -78,11 +78,10 @@ class Tunnel : public ::testing::Test {
   }
   std::string encrypted(const std::string& text) const {
     const std::string iv = hello_.substr(hello_.find("iv=") + 3, 24);
-    const heap_ptr<unsigned char> vector(lmp_decode_base64(iv.c_str(), nullptr));
-    const std::string plaintext = std::string(32, 'r') + text;
-    const heap_ptr<char> line(agent_encrypt_message(vector.get(), kSecret.data(), plaintext.data(),
-                                                    static_cast<std::uint32_t>(plaintext.size()), nullptr));
-    return std::string(line.get()) + "\n";
+    const auto bytes = lmp_decode_base64(iv);
+    CipherBlock vector{};
+    std::copy(bytes->begin(), bytes->end(), vector.begin());
+    return agent_encrypt_message(vector, kSecret, std::string(kRandomPrefix, 'r') + text).value() + "\n";
   }
   static void send(const UniqueFd& peer, const std::string& bytes) {
     ASSERT_EQ(::send(peer.get(), bytes.data(), bytes.size(), MSG_NOSIGNAL),
@@ -132,20 +131,20 @@ TEST_F(Tunnel, ARefusalCountsOnlyWhenItCameInPieces) {
   // The answer proves that the whole line has been dealt with, and that what came behind its own line waits.
   send(peer, encrypted("STOP") + "ERR Unb");
   EXPECT_FALSE(PlayedServer::readLine(peer).empty());
-  EXPECT_EQ(context_->serverRejectTime(), 0);
+  EXPECT_EQ(context_->state.serverRejectTime.get(), 0);
   send(peer, "ound agent\n");
   ASSERT_TRUE(log_.waitFor(4, "Server rejected agent connection, sleeping for one minute."));
   // The time is set behind the line.
   ASSERT_TRUE(testing::waitUntil([&] { return tunnel_.threadHasEnded(); }));
-  EXPECT_NEAR(static_cast<double>(context_->serverRejectTime()), static_cast<double>(std::time(nullptr)),
-              2.0);
+  EXPECT_NEAR(static_cast<double>(context_->state.serverRejectTime.get()),
+              static_cast<double>(std::time(nullptr)), 2.0);
 }
 
 TEST_F(Tunnel, InItsBackOffItHearsThePreviousConnection) {
   clock_.real_sleep = true;
   ASSERT_TRUE(tunnel_.initWithAgentContext());
   const UniqueFd old = acceptWithHello();
-  context_->setTunnel_port("9");  // nobody there
+  context_->server.tunnel_port.set("9");  // nobody there
   tunnel_.setNetTransitionTime(1);
   ASSERT_TRUE(log_.waitFor(6, "Failed to connect to server, retrying in 5 seconds."));
   send(old, encrypted("STOP"));
@@ -167,17 +166,17 @@ TEST_F(Tunnel, CommandsAreDecryptedAndAnswered) {
 }
 
 TEST_F(Tunnel, AnOfflineAgentSaysSo) {
-  context_->setRunning(false);
+  context_->state.running.set(false);
   ASSERT_TRUE(tunnel_.initWithAgentContext());
   acceptWithHello();
   EXPECT_TRUE(hello_.ends_with(",version=100,agent_recording_status=offline\n")) << hello_;
-  EXPECT_TRUE(testing::waitUntil([&] { return context_->agent_sent_or_fail(); }));
+  EXPECT_TRUE(testing::waitUntil([&] { return context_->state.agent_sent_or_fail.get(); }));
 }
 
 TEST_F(Tunnel, TenMinutesWithoutContactMakeANewConnection) {
   ASSERT_TRUE(tunnel_.initWithAgentContext());
   const UniqueFd old = acceptWithHello();
-  context_->record_context()->setLastContact(currentTime());
+  context_->record_context()->lastContact.set(lmp_gettimeofday());
   clock_.ahead_seconds = 601;
   const UniqueFd peer = acceptWithHello();
   EXPECT_TRUE(log_.contains(5, "Too long since last contact from server.  Reconnecting..."));

@@ -3,14 +3,12 @@
 
 #include <gtest/gtest.h>
 
-#include <cstring>
 #include <random>
 #include <string>
 
 #include "control/tunnel/agent_control.h"
 #include "record/agent_record.h"
 #include "support/base64.h"
-#include "support/heap_ptr.h"
 #include "tests/unit/doubles/log_capture.h"
 
 namespace lmx {
@@ -28,28 +26,16 @@ class MessageCipher : public ::testing::Test {
     for (int i = 0; i < 32; ++i) prefix_ += static_cast<char>(i);
   }
   std::string encrypt(const std::string& plaintext) {
-    std::uint64_t length = 0;
-    const heap_ptr<char> text(agent_encrypt_message(vector_, key_, plaintext.data(),
-                                                    static_cast<std::uint32_t>(plaintext.size()), &length));
+    const auto text = agent_encrypt_message(vector_, key_, plaintext);
     EXPECT_TRUE(text);
-    if (!text) return "";
-    EXPECT_EQ(length, std::strlen(text.get()));
-    return text.get();
+    return text.value_or("");
   }
   /// @return the plaintext; "(none)" on failure
   std::string decrypt(const std::string& text) {
-    std::uint32_t length = 99;
-    const heap_ptr<unsigned char> plaintext(
-        agent_decrypt_message(vector_, key_, text.c_str(), static_cast<std::uint32_t>(text.size()), &length));
-    if (!plaintext) {
-      EXPECT_EQ(length, 0U);
-      return "(none)";
-    }
-    EXPECT_EQ(plaintext.get()[length], 0);
-    return {reinterpret_cast<const char*>(plaintext.get()), length};
+    return agent_decrypt_message(vector_, key_, text).value_or("(none)");
   }
-  unsigned char key_[16];
-  unsigned char vector_[16];
+  CipherBlock key_{};
+  CipherBlock vector_{};
   std::string prefix_;
   testing::LogCapture log_;
 };
@@ -91,13 +77,12 @@ TEST_F(MessageCipher, WhatIsNoMessageIsRefusedWithALine) {
   }
 }
 
-TEST_F(MessageCipher, AShortPlaintextIsZeroBeyondItsEnd) {
-  const std::string line = encrypt("short");
-  std::uint32_t length = 0;
-  const heap_ptr<unsigned char> plaintext(agent_decrypt_message(vector_, key_, line.c_str(), 0, &length));
-  ASSERT_TRUE(plaintext);
-  EXPECT_EQ(length, 5U);
-  for (std::size_t i = 5; i <= kRandomPrefix; ++i) EXPECT_EQ(plaintext.get()[i], 0) << i;
+TEST(MessageIn, IsWhatStandsBehindTheRandomPrefix) {
+  const std::string prefix(kRandomPrefix, 'r');
+  EXPECT_EQ(messageIn(prefix + "STOP"), "STOP");
+  EXPECT_EQ(messageIn(prefix + std::string("ST\0OP", 5)), "ST");
+  EXPECT_EQ(messageIn(prefix), "");
+  EXPECT_EQ(messageIn("short"), "");
 }
 
 TEST_F(MessageCipher, AnyNoiseIsSurvived) {
@@ -105,26 +90,24 @@ TEST_F(MessageCipher, AnyNoiseIsSurvived) {
   for (int round = 0; round < 2000; ++round) {
     std::string bytes(random() % 200, '\0');
     for (char& c : bytes) c = static_cast<char>(random());
-    const heap_ptr<char> text(lmp_encode_base64(bytes.data(), bytes.size(), nullptr));
-    decrypt(text.get());
+    decrypt(lmp_encode_base64(bytes));
     decrypt(bytes);
   }
 }
 
 TEST(RandomBytes, AreNotTheSameTwice) {
-  const heap_ptr<unsigned char> one(agent_random_bytes(32));
-  const heap_ptr<unsigned char> other(agent_random_bytes(32));
-  EXPECT_NE(std::memcmp(one.get(), other.get(), 32), 0);
-  EXPECT_TRUE(heap_ptr<unsigned char>(agent_random_bytes(0)));
+  EXPECT_NE(agent_random_bytes(32), agent_random_bytes(32));
+  EXPECT_EQ(agent_random_bytes(32).size(), 32U);
+  EXPECT_EQ(agent_random_bytes(0), "");
 }
 
 TEST(Hello, TellsWhoAndWhetherItCanRecord) {
   const auto context = newAgentContext();
-  context->setMachine_uuid("C-1");
-  context->setRunning(true);
+  context->server.machine_uuid.set("C-1");
+  context->state.running.set(true);
   EXPECT_EQ(AgentControl::hello(*context, "dmVjdG9y"),
             "AGENT protocol=1,agent_uuid=C-1,iv=dmVjdG9y,version=100\n");
-  context->setRunning(false);
+  context->state.running.set(false);
   EXPECT_EQ(AgentControl::hello(*context, "*"),
             "AGENT protocol=1,agent_uuid=C-1,iv=*,version=100,agent_recording_status=offline\n");
 }

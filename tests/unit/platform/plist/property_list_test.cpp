@@ -26,10 +26,11 @@ std::string repeated(const std::string& text, int times) {
 }
 std::string problemOf(const std::string& text) {
   const PlistResult result = parsePropertyList(text);
-  EXPECT_NE(result.value.has_value(), !result.problem.empty());
-  return result.problem;
+  return result ? "" : result.error().message;
 }
-std::optional<PlistValue> valueOf(const std::string& body) { return parsePropertyList(document(body)).value; }
+std::optional<PlistValue> valueOf(const std::string& body) {
+  return parsePropertyList(document(body)).value();
+}
 
 TEST(PlistValue, NumbersAndTextsConvert) {
   struct Case {
@@ -93,9 +94,9 @@ PlistDictionary everyKind() {
 
 TEST(PropertyList, EveryKindOfValueComesBackFromXml) {
   const PlistResult result = parsePropertyList(propertyListXml(everyKind()));
-  ASSERT_TRUE(result.value) << result.problem;
-  for (const auto& [key, value] : everyKind()) EXPECT_EQ(result.value->dictionary()->at(key), value) << key;
-  EXPECT_EQ(*result.value, PlistValue(everyKind()));
+  ASSERT_TRUE(result) << result.error().message;
+  for (const auto& [key, value] : everyKind()) EXPECT_EQ(result->dictionary()->at(key), value) << key;
+  EXPECT_EQ(*result, PlistValue(everyKind()));
 }
 
 TEST(PropertyList, XmlIsWholeAndEndsInALineFeed) {
@@ -123,12 +124,12 @@ TEST(PropertyList, WhatXmlCannotHoldIsReplaced) {
       {"tab\tline\n", "tab\tline\n"},
   };
   for (const Case& c : cases)
-    EXPECT_EQ(parsePropertyList(propertyListXml(c.text)).value, PlistValue(c.stored));
+    EXPECT_EQ(parsePropertyList(propertyListXml(c.text)).value(), PlistValue(c.stored));
 }
 
 TEST(PropertyList, DatesThatDoNotFitAreTheNearestOnes) {
   for (const double seconds : {1e18, -1e18, std::numeric_limits<double>::infinity(), std::nan("")}) {
-    const auto value = parsePropertyList(propertyListXml(PlistDate{seconds})).value;
+    const auto value = parsePropertyList(propertyListXml(PlistDate{seconds})).value();
     ASSERT_TRUE(value);
     const double stored = std::get<PlistDate>(value->value).secondsSinceReferenceDate;
     EXPECT_EQ(std::signbit(stored), seconds < 0);
@@ -145,7 +146,7 @@ TEST(PropertyList, ReadsWhatOthersWrite) {
   EXPECT_EQ(valueOf("<data>\n\tAAEC\n\t/w==\n</data>"), PlistValue(PlistValue::Data{0, 1, 2, 255}));
   EXPECT_EQ(valueOf("<array />"), PlistValue(PlistArray{}));
   EXPECT_EQ(valueOf("<string/>"), PlistValue(""));
-  EXPECT_EQ(parsePropertyList("<dict><key>bare</key><true/></dict>").value,
+  EXPECT_EQ(parsePropertyList("<dict><key>bare</key><true/></dict>").value(),
             PlistValue(PlistDictionary{{"bare", true}}));
 }
 
@@ -240,14 +241,14 @@ TEST(PropertyList, NumbersOfNoCharacterAreRefused) {
 }
 
 TEST(PropertyList, ByteOrderMarkIsSkipped) {
-  EXPECT_EQ(parsePropertyList("\xEF\xBB\xBF" + document("<string>x</string>")).value, PlistValue("x"));
+  EXPECT_EQ(parsePropertyList("\xEF\xBB\xBF" + document("<string>x</string>")).value(), PlistValue("x"));
 }
 
 TEST(PropertyList, EveryBeginningOfADocumentIsHandled) {
   const std::string text = propertyListXml(everyKind());
   // Without its last tag no document is one.
   for (std::size_t length = 0; length < text.rfind("</plist>"); ++length) {
-    EXPECT_FALSE(parsePropertyList(text.substr(0, length)).value) << length;
+    EXPECT_FALSE(parsePropertyList(text.substr(0, length)).value()) << length;
   }
 }
 
@@ -258,7 +259,7 @@ TEST(PropertyListFile, WrittenAndReadAgain) {
   struct stat status {};
   ASSERT_EQ(stat(path.c_str(), &status), 0);
   EXPECT_EQ(status.st_mode & 07777, 0600U);
-  EXPECT_EQ(readPropertyList(path).value, PlistValue(everyKind()));
+  EXPECT_EQ(readPropertyList(path).value(), PlistValue(everyKind()));
 }
 
 TEST(PropertyListFile, FailureToWriteIsTold) {
@@ -269,37 +270,37 @@ TEST(PropertyListFile, FailureToWriteIsTold) {
 TEST(PropertyListFile, MissingFileIsNamedByItsError) {
   const TemporaryDirectory directory;
   const PlistResult result = readPropertyList(directory.file("none"));
-  EXPECT_FALSE(result.value);
-  EXPECT_EQ(result.systemError, ENOENT);
-  EXPECT_EQ(result.problem, "No such file or directory");
+  EXPECT_FALSE(result.value());
+  EXPECT_EQ(result.error().error().systemError, ENOENT);
+  EXPECT_EQ(result.error().message, "No such file or directory");
 }
 
 TEST(PropertyListFile, BrokenFileIsNoSystemError) {
   const TemporaryDirectory directory;
   writeFile(directory.file("broken"), "text");
   const PlistResult result = readPropertyList(directory.file("broken"));
-  EXPECT_EQ(result.systemError, 0);
-  EXPECT_EQ(result.problem, "neither an XML nor a binary property list");
+  EXPECT_EQ(result.error().error().systemError, 0);
+  EXPECT_EQ(result.error().message, "neither an XML nor a binary property list");
 }
 
 TEST(PropertyListFile, SizeHasALimit) {
   const TemporaryDirectory directory;
   const std::string text = document("<string>" + std::string(1000, 'x') + "</string>");
   writeFile(directory.file("f"), text);
-  EXPECT_TRUE(readPropertyList(directory.file("f"), {.bytes = text.size()}).value);
+  EXPECT_TRUE(readPropertyList(directory.file("f"), {.bytes = text.size()}).value());
   const PlistResult result = readPropertyList(directory.file("f"), {.bytes = text.size() - 1});
-  EXPECT_FALSE(result.value);
-  EXPECT_EQ(result.problem, "larger than " + std::to_string(text.size() - 1) + " bytes");
+  EXPECT_FALSE(result.value());
+  EXPECT_EQ(result.error().message, "larger than " + std::to_string(text.size() - 1) + " bytes");
   writeFile(directory.file("g"), document("<string>" + std::string(kPlistFileLimit, 'x') + "</string>"));
-  EXPECT_EQ(readPropertyList(directory.file("g")).problem, "larger than 262144 bytes");
+  EXPECT_EQ(readPropertyList(directory.file("g")).error().message, "larger than 262144 bytes");
 }
 
 TEST(PropertyListFile, OnlyRegularFilesAreRead) {
   const TemporaryDirectory directory;
   ASSERT_EQ(mkfifo(directory.file("fifo").c_str(), 0600), 0);
-  EXPECT_EQ(readPropertyList(directory.file("fifo")).problem, "not a regular file");
-  EXPECT_EQ(readPropertyList("/dev/zero").problem, "not a regular file");
-  EXPECT_EQ(readPropertyList(directory.path()).systemError, EISDIR);
+  EXPECT_EQ(readPropertyList(directory.file("fifo")).error().message, "not a regular file");
+  EXPECT_EQ(readPropertyList("/dev/zero").error().message, "not a regular file");
+  EXPECT_EQ(readPropertyList(directory.path()).error().systemError, EISDIR);
 }
 
 }  // namespace

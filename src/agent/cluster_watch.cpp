@@ -1,7 +1,9 @@
-// The members of the server's cluster: asked of the server's tool, else read from its cache.
-#include "agent/agent_main.h"
+// Asking the tool, one member after another.
+#include "agent/cluster_watch.h"
+
+#include <thread>
+
 #include "control/tunnel/cluster_hosts.h"
-#include "platform/log.h"
 #include "platform/paths.h"
 #include "platform/work_queue.h"
 
@@ -16,11 +18,10 @@ constexpr auto kQueryLimit = 30s;
 constexpr auto kFirstToolLimit = 20s;
 constexpr const char* kMembers = "cluster_members";
 
-AgentContext::SharedPlist membersOf(const PlistResult& information) {
-  const PlistDictionary* all = information.value ? information.value->dictionary() : nullptr;
-  const auto found = all == nullptr ? PlistDictionary::const_iterator{} : all->find(kMembers);
-  if (all == nullptr || found == all->end() || found->second.dictionary() == nullptr) return nullptr;
-  return std::make_shared<const PlistDictionary>(*found->second.dictionary());
+ClusterWatch::SharedPlist membersOf(const PlistResult& information) {
+  const PlistValue* members = information ? information->under(kMembers) : nullptr;
+  if (members == nullptr || members->dictionary() == nullptr) return nullptr;
+  return std::make_shared<const PlistDictionary>(*members->dictionary());
 }
 
 /// The status to hand on: never 0 for a tool that did not exit in order.
@@ -31,35 +32,38 @@ int statusOf(const ChildResult& result) {
 
 }  // namespace
 
-int AgentMain::clusterInformationFromSpecificHostOnly(const std::string& host, SharedPlist& members,
-                                                      std::chrono::milliseconds limit) const {
+ClusterWatch::~ClusterWatch() {
+  while (refreshing_) std::this_thread::sleep_for(1ms);
+}
+
+int ClusterWatch::clusterInformationFromSpecificHostOnly(const std::string& host, SharedPlist& members,
+                                                         std::chrono::milliseconds limit) const {
   ChildOptions options;
   options.captureOutput = true;
   options.limit = limit;
-  const ChildResult result =
-      environment_.children->run({systemPath(kLumexTool), "--listinfo", "--server", host}, options);
+  const ChildResult result = children_.run({systemPath(kLumexTool), "--listinfo", "--server", host}, options);
   if (result.end == ChildResult::End::timedOut) {
-    LMPLogMessage(context_->log_context(), kLogError,
+    LMPLogMessage(log_.log_context(), kLogError,
                   "/usr/bin/lumex --listinfo has not answered for %d seconds and was ended",
                   static_cast<int>(limit / 1s));
   }
   const int status = statusOf(result);
   if (status != 0) {
-    LMPLogMessage(context_->log_context(), kLogError,
+    LMPLogMessage(log_.log_context(), kLogError,
                   "Unable to retrieve cluster information (/usr/bin/lumex exit code = %d).", status);
     return status;
   }
   const PlistResult answer = parsePropertyList(result.output);
-  if (!answer.value) {
-    LMPLogMessage(context_->log_context(), kLogError,
-                  "The answer of /usr/bin/lumex --listinfo can't be used: %s", answer.problem.c_str());
+  if (!answer) {
+    LMPLogMessage(log_.log_context(), kLogError, "The answer of /usr/bin/lumex --listinfo can't be used: %s",
+                  answer.error().message.c_str());
   }
   members = membersOf(answer);
   return 0;
 }
 
-int AgentMain::clusterInformationWithMember(std::size_t index, const std::vector<std::string>& hosts,
-                                            SharedPlist& members, std::chrono::milliseconds limit) const {
+int ClusterWatch::clusterInformationWithMember(std::size_t index, const std::vector<std::string>& hosts,
+                                               SharedPlist& members, std::chrono::milliseconds limit) const {
   for (; index < hosts.size(); ++index) {
     const int status = clusterInformationFromSpecificHostOnly(hosts[index], members, limit);
     if (status != -1) return status;
@@ -67,15 +71,15 @@ int AgentMain::clusterInformationWithMember(std::size_t index, const std::vector
   return -1;
 }
 
-AgentMain::SharedPlist AgentMain::clusterInformationFromDisk() {
+ClusterWatch::SharedPlist ClusterWatch::clusterInformationFromDisk() {
   for (const std::string_view path : {kServerInformation, kServerInformationOfRoot}) {
     const PlistResult file = readPropertyList(systemPath(path));
-    if (file.value && file.value->dictionary() != nullptr) return membersOf(file);
+    if (file && file->dictionary() != nullptr) return membersOf(file);
   }
   return nullptr;
 }
 
-int AgentMain::clusterInformation(const std::optional<std::string>& host, SharedPlist& members) const {
+int ClusterWatch::clusterInformation(const std::optional<std::string>& host, SharedPlist& members) const {
   members = nullptr;
   if (!host) return -1;
   const auto deadline = std::chrono::steady_clock::now() + kQueryLimit;
@@ -83,7 +87,7 @@ int AgentMain::clusterInformation(const std::optional<std::string>& host, Shared
   if (status == 0) return 0;
   const SharedPlist cached = clusterInformationFromDisk();
   if (!cached) {
-    context_->logDebug("Unable to retrieve cluster information from disk.");
+    log_.logDebug("Unable to retrieve cluster information from disk.");
     return status;
   }
   const auto left =
@@ -91,35 +95,35 @@ int AgentMain::clusterInformation(const std::optional<std::string>& host, Shared
   // The first of the list is skipped: it is the server that has just failed.
   const int result = clusterInformationWithMember(1, clusterHostArray(cached.get()), members, left);
   if (result != 0) {
-    context_->logDebug("Unable to contact any member of the cluster.");
+    log_.logDebug("Unable to contact any member of the cluster.");
     members = cached;
   }
   return result;
 }
 
-void AgentMain::learnCluster() {
+void ClusterWatch::learnCluster() {
   SharedPlist members;
-  if (clusterInformation(context_->tunnel_host(), members) == -1) {
-    LMPLogMessage(context_->log_context(), kLogCritical, "Unable to retrieve cluster information");
+  if (clusterInformation(server_.tunnel_host.get(), members) == -1) {
+    LMPLogMessage(log_.log_context(), kLogCritical, "Unable to retrieve cluster information");
   }
-  context_->setServer_info(members);
+  server_info_.set(members);
   std::string joined;
   const auto hosts = clusterHostArray(members.get());
   for (const std::string& host : hosts) joined += (joined.empty() ? "" : ", ") + host;
-  context_->logDebug("Hosts: " + (joined.empty() ? "(none)" : joined));
-  if (hosts.empty()) LMPLogMessage(context_->log_context(), kLogError, "No cluster members known");
+  log_.logDebug("Hosts: " + (joined.empty() ? "(none)" : joined));
+  if (hosts.empty()) LMPLogMessage(log_.log_context(), kLogError, "No cluster members known");
 }
 
-void AgentMain::refreshClusterInformation() {
-  if (cluster_refresh_.exchange(true)) return;  // the last one is still waiting for its tool
-  dispatchAsync(WorkPriority::background, [this] {
+void ClusterWatch::refreshClusterInformation() {
+  if (refreshing_.exchange(true)) return;  // the last one is still waiting for its tool
+  dispatchAsync([this] {
     const auto ended = [](std::atomic<bool>* refresh) { *refresh = false; };
-    const std::unique_ptr<std::atomic<bool>, decltype(ended)> end_of_refresh(&cluster_refresh_, ended);
+    const std::unique_ptr<std::atomic<bool>, decltype(ended)> end_of_refresh(&refreshing_, ended);
     SharedPlist members;
-    if (clusterInformation(context_->tunnel_host(), members) != 0) {
-      LMPLogMessage(context_->log_context(), kLogError, "Unable to update cluster information.");
+    if (clusterInformation(server_.tunnel_host.get(), members) != 0) {
+      LMPLogMessage(log_.log_context(), kLogError, "Unable to update cluster information.");
     } else {
-      context_->setServer_info(members);
+      server_info_.set(members);
     }
   });
 }

@@ -1,7 +1,10 @@
-// Life of the server tunnel.
-#include "agent/agent_main.h"
+// Opening and closing the tunnel.
+#include "agent/tunnel_keeper.h"
+
+#include <chrono>
+#include <utility>
+
 #include "platform/log.h"
-#include "platform/network_watcher.h"
 
 namespace lmx {
 
@@ -11,19 +14,14 @@ namespace {
 
 constexpr auto kThreadPatience = 10s;
 
-struct NetworkWatch final : RunLoop::Source {
-  NetworkWatcher watcher;
-  std::unique_ptr<RunLoop::Source> source;  // last: it goes before the descriptor
-};
-
 }  // namespace
 
-bool AgentMain::openTunnel() {
-  agentControl_ = newControlChannel<AgentControl>(context_, this);
+bool TunnelKeeper::openTunnel() {
+  agentControl_ = newControlChannel<AgentControl>(context_, &actions_);
   return agentControl_ != nullptr;
 }
 
-void AgentMain::closeTunnel() {
+void TunnelKeeper::closeTunnel() {
   // Taken out first: the turns below may bring another signal, and with it this function again.
   auto closing = std::exchange(agentControl_, nullptr);
   if (!closing) return;
@@ -41,25 +39,16 @@ void AgentMain::closeTunnel() {
   [[maybe_unused]] const AgentControl* left_behind = closing.release();
 }
 
-void AgentMain::tellServerOfTheEnd() {
+void TunnelKeeper::tellServerOfTheEnd() {
   if (!agentControl_ || agentControl_->server_protocol_version() < 2 || !agentControl_->connected()) return;
   closeTunnel();
   LMPLogMessage(context_->log_context(), kLogInfo, "Notifying the server that the agent is going offline");
   const auto deadline = std::chrono::steady_clock::now() + 10s;
-  context_->setAgent_sent_or_fail(false);
+  context_->state.agent_sent_or_fail.set(false);
   if (!openTunnel()) return;
-  while (!context_->agent_sent_or_fail() && std::chrono::steady_clock::now() < deadline) loop_.run(100ms);
+  while (!context_->state.agent_sent_or_fail.get() && std::chrono::steady_clock::now() < deadline)
+    loop_.run(100ms);
   closeTunnel();
-}
-
-std::unique_ptr<RunLoop::Source> AgentMain::watchNetwork(std::function<void()> changed) {
-  auto watch = std::make_unique<NetworkWatch>();
-  if (watch->watcher.open() != 0) return nullptr;
-  watch->source = loop_.watchReadable(watch->watcher.descriptor(),
-                                      [&watcher = watch->watcher, changed = std::move(changed)] {
-                                        if (watcher.takeChanges()) changed();
-                                      });
-  return watch;
 }
 
 }  // namespace lmx

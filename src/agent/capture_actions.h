@@ -1,0 +1,51 @@
+// The actions that touch the capture.
+#pragma once
+#include <memory>
+
+#include "agent/submission.h"
+#include "capture/api/capture_framework.h"
+#include "model/agent_context.h"
+#include "record/agent_record.h"
+
+namespace lmx {
+
+/// Main thread only. Those that have a result leave it in the agent's `status`.
+class CaptureActions {
+ public:
+  /// Both outlive the object.
+  CaptureActions(AgentContext& context, Submission& submission)
+      : context_(context), submission_(submission) {}
+
+  void prepareCapture();
+  void startPreview();
+  void stopPreview();
+  void pauseCapture();
+  void resumeCapture();
+  void stopCapture();
+  void cancelCapture();
+  void stopRecording();
+  void setRecorderStatusToIdle();
+  /// What SIGUSR1 and SIGUSR2 ask for. In ad-hoc mode they only mark the recording.
+  void pauseOrResume(bool pause);
+
+  /// The session's capture; null when there is none.
+  [[nodiscard]] std::shared_ptr<LMRCaptureController> captureController() const;
+
+  // The recording callbacks: one log line each. Any thread.
+  void recordDidStartWithFile(const std::string& file) const;
+  void recordDidPauseWithFile(const std::string& file, std::int64_t elapsedSeconds) const;
+  void recordDidResumeWithFile(const std::string& file) const;
+  void recordRuntimeErrorCallback(int code) const;
+
+ private:
+  void setPreviewRunning(bool run);
+  void stopOrCancelCapture(bool cancel);
+  void stopOrCancelAdHoc(bool cancel);
+  [[nodiscard]] double shiftedReferenceTime() const;
+  [[nodiscard]] std::shared_ptr<AgentRecord> session() const { return context_.record_context(); }
+
+  AgentContext& context_;
+  Submission& submission_;
+};
+
+}  // namespace lmx

@@ -1,0 +1,102 @@
+// Probing, missing and finding the camera.
+#include "agent/device_watch.h"
+
+#include <unistd.h>
+
+#include <chrono>
+#include <cstdio>
+#include <ctime>
+#include <exception>
+#include <thread>
+
+#include "agent/elapsed.h"
+#include "model/codes.h"
+#include "platform/log.h"
+#include "prefs/recording_context.h"
+#include "record/capture_delegate.h"
+#include "record/create_preview.h"
+
+namespace lmx {
+namespace {
+
+using namespace std::chrono_literals;
+
+constexpr std::int64_t kDeviceRetrySeconds = 10;
+constexpr const char* kOfflineMessage =
+    "Unable to acquire the specified video device. The agent will remain offline until the device becomes "
+    "available.";
+
+}  // namespace
+
+std::shared_ptr<LMRRecordingContext> DeviceWatch::recordingContext() const {
+  try {
+    return context_->options.adhoc.get() ? newRecordingContextForAdHoc(*framework_)
+                                         : newRecordingContextForDaemon(*framework_);
+  } catch (const std::exception& error) {
+    LMPLogMessage(nullptr, kLogCritical, "Unable to load the recording context, exception = %s",
+                  error.what());
+  } catch (...) {
+    LMPLogMessage(nullptr, kLogCritical, "Unable to load the recording context.");
+  }
+  return nullptr;
+}
+
+void DeviceWatch::probeDevice(const LMRRecordingContext& settings) {
+  if (!settings.videoDeviceID) return;
+  if (LXAgentRecordCreatePreviewController(settings.videoDeviceID, settings.audioDeviceID,
+                                           settings.audioEnabled, settings.previewIntervalInMilliseconds,
+                                           nullptr)) {
+    return;
+  }
+  LMPLogMessage(context_->log_context(), kLogAlert, "%s", kOfflineMessage);
+  context_->state.last_device_check.set(std::time(nullptr));
+  device_offline_ = true;
+}
+
+void DeviceWatch::retryDevice(std::int64_t now) {
+  const std::int64_t last = context_->state.last_device_check.get();
+  if (last < 1 || isAhead(now, last, kDeviceRetrySeconds + 1)) return;
+  const auto settings = recordingContext();
+  if (!settings) return context_->state.running.set(false);
+  if (openAgain(*settings)) {
+    context_->state.last_device_check.set(0);
+    shouldDisplayOfflineMessage_ = false;
+    if (!device_is_back_()) context_->state.running.set(false);
+    return;
+  }
+  context_->state.last_device_check.set(now);
+  if (!shouldDisplayOfflineMessage_) return context_->state.running.set(false);
+  LMPLogMessage(nullptr, kLogWarning, "%s", kOfflineMessage);
+  shouldDisplayOfflineMessage_ = false;
+}
+
+/// @return whether nothing is missing: an agent that records no picture has no camera to wait for
+bool DeviceWatch::openAgain(const LMRRecordingContext& settings) {
+  const auto record = context_->record_context();
+  record->previewController.set(nullptr);
+  if (!settings.videoEnabled) return true;
+  const auto controller = record->captureController.get();
+  const auto preview = LXAgentRecordCreatePreviewController(
+      settings.videoDeviceID, settings.audioDeviceID, settings.audioEnabled,
+      settings.previewIntervalInMilliseconds, controller ? controller->session() : nullptr);
+  record->previewController.set(preview);
+  return preview != nullptr;
+}
+
+bool DeviceWatch::deviceDisconnected() const {
+  const auto record = context_->record_context();
+  const auto delegate = record ? record->captureControllerDelegate.get() : nullptr;
+  return delegate && delegate->deviceDisconnected() &&
+         (context_->options.adhoc.get() || submission_.isIdle());
+}
+
+void DeviceWatch::announceLostDevice() const {
+  LMPLogMessage(context_->log_context(), kLogCritical, "The capture device has been disconnected.");
+  if (context_->options.adhoc.get()) {
+    std::fflush(nullptr);
+    _exit(exitStatus(ProcessEnd::deviceLost));
+  }
+  std::this_thread::sleep_for(2s);
+}
+
+}  // namespace lmx

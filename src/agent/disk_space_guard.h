@@ -1,0 +1,29 @@
+// The watch over the free space of the volume that movies are written to.
+#pragma once
+#include <cstdint>
+
+#include "agent/capture_actions.h"
+#include "model/agent_context.h"
+
+namespace lmx {
+
+/// Main thread only.
+class DiskSpaceGuard {
+ public:
+  /// Both outlive the object.
+  DiskSpaceGuard(AgentContext& context, CaptureActions& capture) : context_(context), capture_(capture) {}
+
+  /// Stops recording when the movie's volume runs full, and in continuous mode starts it again. Ends the
+  /// agent when the volume can't be measured at all.
+  void checkDiskSpace();
+
+ private:
+  void recordAgainWithSpace(std::uint64_t megabytes);
+  void stopForLackOfSpace(std::uint64_t megabytes, std::uint32_t wanted);
+
+  AgentContext& context_;
+  CaptureActions& capture_;
+  bool shouldDisplayNoDiskSpaceMessage_ = true;
+};
+
+}  // namespace lmx

@@ -1,0 +1,44 @@
+// The daemon's main loop: what happens between two turns of the run loop.
+#pragma once
+#include <cstdint>
+#include <memory>
+
+#include "agent/capture_actions.h"
+#include "agent/device_watch.h"
+#include "agent/timed_command_runner.h"
+#include "model/agent_context.h"
+#include "platform/run_loop.h"
+#include "platform/service_manager.h"
+#include "prefs/agent_preferences.h"
+
+namespace lmx {
+
+/// Main thread only.
+class MainLoop {
+ public:
+  /// What the loop looks after; all of them outlive it.
+  struct Parts {
+    AgentContext& context;
+    RunLoop& loop;
+    CaptureActions& capture;
+    DeviceWatch& devices;
+    TimedCommandRunner& timed_commands;
+    ServiceManager* service_manager;  ///< null only in tests that change no preferences
+  };
+  explicit MainLoop(const Parts& parts) : parts_(parts) {}
+
+  /// Has changes of the preferences file read from now on. @param preferences  outlives the loop
+  void watchPreferences(AgentPreferences& preferences) { preferences_ = &preferences; }
+  /// Turns until the agent is told to end. @return 0 for an orderly end, 1 when the capture device was lost
+  int appLoop();
+
+ private:
+  void stopForgottenPreview(std::int64_t now);
+  void reloadChangedPreferences();
+  void checkServerRefusal(std::int64_t now);
+
+  const Parts parts_;
+  AgentPreferences* preferences_ = nullptr;
+};
+
+}  // namespace lmx

@@ -1,0 +1,37 @@
+// The schedule's turn in the main loop.
+#include "agent/timed_command_runner.h"
+
+#include <algorithm>
+#include <exception>
+#include <utility>
+
+#include "support/time_value.h"
+
+namespace lmx {
+
+void TimedCommandRunner::scheduleTimedCommand(SharedDictionary entry, std::time_t date, ChannelKind channel) {
+  schedule_.add({std::move(entry), date, channel});
+  loop_.post([] {}, Wait::no);  // the loop may be asleep past that date
+}
+
+void TimedCommandRunner::loadSchedule() { channels_.channelOf(ChannelKind::tunnel).loadTimedCommands(); }
+
+void TimedCommandRunner::runDueCommands(std::time_t now) {
+  for (const Schedule::Command& command : schedule_.takeDue(now)) {
+    try {
+      channels_.channelOf(command.channel).completeTimedCommand(command.entry);
+    } catch (const std::exception& problem) {  // the commands behind it are still to run
+      LMPLogMessage(log_.log_context(), kLogCritical, "A timed command failed: %s", problem.what());
+    }
+  }
+}
+
+std::chrono::milliseconds TimedCommandRunner::timeToNextCommand(std::chrono::milliseconds atMost) const {
+  const auto next = schedule_.next();
+  const auto now = lmp_gettimeofday();
+  if (!next || !now) return atMost;
+  return std::clamp(std::chrono::milliseconds(lmp_diff_timeval({*next, 0}, *now) + 1),
+                    std::chrono::milliseconds(0), atMost);
+}
+
+}  // namespace lmx

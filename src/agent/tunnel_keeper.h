@@ -1,0 +1,36 @@
+// Life of the server tunnel.
+#pragma once
+#include <memory>
+
+#include "control/tunnel/agent_control.h"
+#include "model/agent_actions.h"
+#include "model/agent_context.h"
+#include "platform/run_loop.h"
+
+namespace lmx {
+
+/// Main thread only.
+class TunnelKeeper {
+ public:
+  /// @param actions, loop  outlive the object
+  TunnelKeeper(std::shared_ptr<AgentContext> context, AgentActions& actions, RunLoop& loop)
+      : context_(std::move(context)), actions_(actions), loop_(loop) {}
+
+  /// The tunnel; null while it is closed.
+  [[nodiscard]] AgentControl* tunnel() const { return agentControl_.get(); }
+  /// @return false when it can't be started (logged)
+  bool openTunnel();
+  /// Ends the tunnel. The loop turns meanwhile, since the tunnel's thread may be waiting for this one; a
+  /// thread that has not ended after ten seconds is left behind.
+  void closeTunnel();
+  /// Leaves word with a server that understands it: a last hello that says offline. Ten seconds at most.
+  void tellServerOfTheEnd();
+
+ private:
+  const std::shared_ptr<AgentContext> context_;
+  AgentActions& actions_;
+  RunLoop& loop_;
+  std::unique_ptr<AgentControl> agentControl_;  ///< null while the camera is away
+};
+
+}  // namespace lmx

@@ -1,0 +1,13 @@
+// What -i prints.
+#pragma once
+#include <string>
+
+#include "capture/api/capture_framework.h"
+#include "model/codes.h"
+
+namespace lmx {
+
+/// Prints "ad-hoc-prefs", "daemon-prefs" or "zq-device-list"; nothing for any other kind.
+ProcessEnd printInformation(const std::string& kind, CaptureFramework& framework);
+
+}  // namespace lmx

@@ -1,0 +1,38 @@
+// The keys that decide on recordings, with their values.
+#include "prefs/preference_dump.h"
+
+#include <cstdio>
+
+#include "prefs/agent_preferences.h"
+
+namespace lmx {
+namespace {
+
+void dumpWithSelector(AgentPreferences::Selector read) {
+  AgentPreferences prefs;
+  static constexpr const char* kKeys[] = {"RecordingType",
+                                          "RecordingVideoInput",
+                                          "RecordingVideoMaximumFrameRate",
+                                          "RecordingAudioChannel",
+                                          "RecordingAudioInput",
+                                          "RecordingAudioSampleRate",
+                                          "CameraName",
+                                          "CameraUUID",
+                                          "RecordingRepositoryPath",
+                                          "RecordingDiskSpaceCutoffInMB",
+                                          "PreviewIntervalInMilliseconds",
+                                          "ServerUUID",
+                                          "TunnelHost",
+                                          "TunnelPort",
+                                          "LumexURL"};
+  for (const char* key : kKeys) {
+    if (const auto value = textOf((prefs.*read)(key))) std::printf("'%s' == '%s'\n", key, value->c_str());
+  }
+}
+
+}  // namespace
+
+void dumpDaemon() { dumpWithSelector(&AgentPreferences::getFromPrefsFile); }
+void dumpAdHoc() { dumpWithSelector(&AgentPreferences::get); }
+
+}  // namespace lmx

@@ -1,0 +1,44 @@
+// The end of a recording that nobody ended.
+#include "record/auto_shutoff.h"
+
+#include <cstdlib>
+
+#include "capture/api/capture_framework.h"
+#include "platform/log.h"
+#include "record/engine_environment.h"
+
+namespace lmx {
+namespace {
+
+/// Forgets `deadline` if it is still `known`: meanwhile the session may have gone on to the next recording.
+void forget(SharedValue<StopTimes::Time>& deadline, const StopTimes::Time& known) {
+  const auto now = deadline.get();
+  const bool same = now.has_value() == known.has_value() && (!now || lmp_diff_timeval(*now, *known) == 0);
+  if (same) deadline.set(std::nullopt);
+}
+
+}  // namespace
+
+void checkForAutoShutoffConditions(AgentRecord& session) {
+  if (!session.stop_times.shouldStopRecording()) return;
+  LMPLogMessage(nullptr, kLogNotice, "Doing Auto-Shutoff: Video");
+  doAutoShutoff(session);
+}
+
+int doAutoShutoff(AgentRecord& session) {
+  const EngineEnvironment environment = engineEnvironment();
+  if (environment.context && environment.context->options.adhoc.get()) std::_Exit(0);
+  const auto hard = session.stop_times.hardStopTime.get();
+  const auto soft = session.stop_times.softStopTime.get();
+  if (const auto controller = session.captureController.get()) {
+    controller->setStopWithUUID(session.request_uuid.get(), secondsSinceReferenceDate());
+  }
+  if (environment.actions != nullptr) {
+    environment.actions->perform(&AgentActions::stopRecording, Wait::untilDone);
+  }
+  forget(session.stop_times.hardStopTime, hard);
+  forget(session.stop_times.softStopTime, soft);
+  return 0;
+}
+
+}  // namespace lmx

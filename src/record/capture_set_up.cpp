@@ -1,0 +1,68 @@
+// From the preferences to a capture that is ready to start.
+#include "record/capture_set_up.h"
+
+#include <cstdlib>
+
+#include "model/codes.h"
+#include "platform/log.h"
+#include "prefs/recording_context.h"
+#include "record/agent_record.h"
+#include "record/capture_delegate.h"
+#include "record/engine_environment.h"
+#include "record/preview_controller.h"
+
+namespace lmx {
+namespace {
+
+std::shared_ptr<LMRRecordingContext> captureSettings(AgentContext& context, const AgentRecord& session) {
+  const auto framework = engineEnvironment().framework;
+  try {
+    if (context.options.adhoc.get()) return newRecordingContextForAdHoc(*framework);
+    CaptureType type = CaptureType::audioAndVideo;
+    if (session.recordedType() == kRecordingTypeAudio) type = CaptureType::audio;
+    if (session.recordedType() == kRecordingTypeVideo) type = CaptureType::video;
+    return newRecordingContextForDaemonWithRecordingType(*framework, type);
+  } catch (const PreferenceError& error) {
+    LMPLogMessage(nullptr, kLogCritical, "Unable to load the recording context, exception = %s",
+                  error.what());
+    return nullptr;
+  }
+}
+
+double frameRateSetting(const AgentContext& context) {
+  const auto text = context.recording.recording_video_maximum_frame_rate.get();
+  const double rate = text ? std::strtod(text->c_str(), nullptr) : 0;
+  return rate >= 1 && rate <= 240 ? rate : 30.0;
+}
+
+}  // namespace
+
+int LXAgentRecordPrepareCaptureController(AgentContext& context) {
+  const auto session = context.record_context();
+  const auto framework = engineEnvironment().framework;
+  if (!session || !framework) return kRecordNotRunning;
+  const auto settings = captureSettings(context, *session);
+  if (!settings) return kRecordNotRunning;
+  settings->outputPath = session->filename.get().value_or("");
+  settings->maximumFrameRate = frameRateSetting(context);
+  if (settings->continuous.segmentLength != 0) {
+    settings->maxDurationMinutes = static_cast<std::uint32_t>(settings->continuous.segmentLength);
+  } else if (context.options.duration.get() >= 1) {
+    settings->maxDurationMinutes = static_cast<std::uint32_t>(context.options.duration.get());
+  }
+  const auto controller = framework->newCaptureController();
+  const auto delegate = std::make_shared<LMRCaptureDelegate>(controller.get());
+  session->captureController.set(controller);
+  session->captureControllerDelegate.set(delegate);
+  controller->setDelegate(delegate);
+  const auto preview = session->previewController.get();
+  if (controller->prepareRecording(*settings, preview ? preview->controller().session() : nullptr)) {
+    return kRecordSuccess;
+  }
+  const auto error = controller->lastError();
+  LMPLogMessage(nullptr, kLogError, "The capture could not be prepared: %s",
+                error ? error->message.c_str() : "no reason given");
+  return kRecordNotRunning;
+}
+
+}  // namespace lmx

@@ -1,0 +1,17 @@
+// Prepares and starts the agent's one recording.
+#pragma once
+#include <optional>
+#include <string>
+
+#include "model/agent_context.h"
+#include "support/dictionary.h"
+
+namespace lmx {
+
+/// Prepares and starts a recording with `metadata`. Main thread. @return a RecordError.
+int LXAgentRecordPrepareCapture(AgentContext& context, SharedDictionary metadata);
+/// The same for the movie `path`, with the control-action mutex held.
+int LXAgentRecordPrepareCaptureSync(AgentContext& context, const std::optional<std::string>& path,
+                                    SharedDictionary metadata);
+
+}  // namespace lmx

@@ -1,0 +1,19 @@
+// Stops the agent's one recording.
+#pragma once
+#include <memory>
+#include <optional>
+
+#include "model/agent_context.h"
+#include "record/agent_record.h"
+#include "support/time_value.h"
+
+namespace lmx {
+
+/// Stops the session's recording; called by the capture thread and by AgentRecord::cleanup. @return a
+/// RecordError.
+int LXAgentRecordStopCapture(const std::shared_ptr<AgentRecord>& session);
+
+/// The stop time of a finished recording: now less the time shift.
+std::optional<TimeValue> shiftedNow(const AgentContext& context);
+
+}  // namespace lmx
