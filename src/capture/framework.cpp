@@ -11,7 +11,8 @@
 #include "capture/preview_controller.h"
 #include "capture/source/device_list.h"
 #include "capture/source/devices.h"
-#include "capture/store/finished_capture.h"
+#include "capture/store/abandoned_capture.h"
+#include "capture/store/capture_files.h"
 #include "platform/log.h"
 #include "platform/paths.h"
 
@@ -27,6 +28,21 @@ std::vector<std::string> subfolders(const std::string& folder) {
   }
   closedir(directory);
   return names;
+}
+
+/// The first use of an element loads its library: a recording should not wait for that.
+void loadPlugin(const char* name) {
+  const GstHandle<GstElementFactory> factory(gst_element_factory_find(name));
+  if (!factory) {
+    LMPLogMessage(nullptr, kLogError,
+                  "The GStreamer element %s is missing: recordings will fail; install its package", name);
+    return;
+  }
+  const GstHandle<GstElement> element(gst_element_factory_create(factory.get(), nullptr));
+  if (!element) return;
+  gst_object_ref_sink(element.get());
+  gst_element_set_state(element.get(), GST_STATE_READY);
+  gst_element_set_state(element.get(), GST_STATE_NULL);
 }
 
 class GstCaptureFramework : public CaptureFramework {
@@ -92,29 +108,17 @@ class GstCaptureFramework : public CaptureFramework {
 };
 
 void GstCaptureFramework::warmUp() {
-  // The first use of the plug-ins loads their libraries: a recording should not wait for that.
   ensureGStreamer();
   for (const char* name : {"x264enc", "avenc_aac", "appsrc", "appsink", "videoconvert", "videoscale",
                            "videorate", "audioconvert", "audioresample", "decodebin"}) {
-    const GstHandle<GstElementFactory> factory(gst_element_factory_find(name));
-    if (!factory) {
-      LMPLogMessage(nullptr, kLogError,
-                    "The GStreamer element %s is missing: recordings will fail; install its package", name);
-      continue;
-    }
-    if (GstElement* element = gst_element_factory_create(factory.get(), nullptr)) {
-      gst_object_ref_sink(element);
-      gst_element_set_state(element, GST_STATE_READY);
-      gst_element_set_state(element, GST_STATE_NULL);
-      gst_object_unref(element);
-    }
+    loadPlugin(name);
   }
 }
 
 std::vector<RecoveredRecording> GstCaptureFramework::recoverUnfinished(const std::string& repository) {
   std::vector<RecoveredRecording> all;
   for (const std::string& folder : subfolders(captureFolderOf(repository))) {
-    const std::shared_ptr<FinishedCapture> capture = FinishedCapture::openAbandoned(folder);
+    const std::shared_ptr<FinishedCapture> capture = openAbandonedCapture(folder);
     if (!capture) continue;  // still being recorded by another process, or nothing of ours
     auto recordings = capture->recoverPending(repository);
     std::move(recordings.begin(), recordings.end(), std::back_inserter(all));

@@ -9,8 +9,11 @@ namespace lmx {
 bool PreviewController::attachIOWithDevice(const std::string& device, CaptureError* error) {
   CaptureSource source;
   source.videoDevice = device;
-  const auto lease = CapturePipeline::acquire(source, error);
-  if (!lease) return false;
+  const auto lease = PipelineRegistry::instance().acquire(source);
+  if (!lease) {
+    *error = lease.error();
+    return false;
+  }
   const auto hardware = findHardware(device);
   const std::lock_guard lock(mutex_);
   source_ = source;
@@ -42,10 +45,12 @@ std::shared_ptr<CaptureSession> PreviewController::session() const {
 void PreviewController::startPreview() {
   const std::lock_guard lock(mutex_);
   if (lease_) return;
-  CaptureError error;
-  lease_ = CapturePipeline::acquire(source_, &error);
-  if (!lease_)
-    LMPLogMessage(nullptr, kLogError, "The preview could not be started: %s", error.message.c_str());
+  auto lease = PipelineRegistry::instance().acquire(source_);
+  if (lease) {
+    lease_ = *std::move(lease);
+  } else {
+    LMPLogMessage(nullptr, kLogError, "The preview could not be started: %s", lease.error().message.c_str());
+  }
 }
 
 void PreviewController::stopPreview() {

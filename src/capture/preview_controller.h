@@ -3,7 +3,7 @@
 #include <mutex>
 #include <string>
 
-#include "capture/source/capture_pipeline.h"
+#include "capture/source/pipeline_registry.h"
 
 namespace lmx {
 
@@ -26,7 +26,7 @@ class PreviewController : public LMRPreviewController {
   std::shared_ptr<LMRPreviewControllerDelegate> delegate_;  // guarded by mutex_
   CaptureSource source_;                                    // guarded by mutex_
   std::string name_;                                        // guarded by mutex_
-  CapturePipeline::Lease lease_;                            // guarded by mutex_
+  PipelineLease lease_;                                     // guarded by mutex_: null unless it runs
 };
 
 }  // namespace lmx

@@ -100,7 +100,7 @@ class LMRCaptureController {
   virtual double elapsedTimeForRequestWithUUID(const std::string& uuid) = 0;
   /// Media written so far by the whole capture.
   virtual std::int64_t elapsedTimeInMilliseconds() = 0;
-  /// 3 recording, 4 paused, anything else: neither.
+  /// kCaptureRecording, kCapturePaused; anything else: neither.
   virtual int recordingState() = 0;
   virtual bool hasShutDown() = 0;
   [[nodiscard]] virtual std::optional<CaptureError> lastError() = 0;

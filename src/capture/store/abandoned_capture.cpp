@@ -1,4 +1,6 @@
-// What an earlier process left of a capture, read back with as much distrust as a power cut deserves.
+// Reads a capture that a crash or a power cut ended, with as much distrust as that deserves.
+#include "capture/store/abandoned_capture.h"
+
 #include <sys/stat.h>
 
 #include <algorithm>
@@ -8,7 +10,10 @@
 #include <fstream>
 #include <sstream>
 
-#include "capture/store/finished_capture.h"
+#include "capture/movie/movie_finish.h"
+#include "capture/movie/movie_reader.h"
+#include "capture/store/capture_files.h"
+#include "model/codes.h"
 #include "platform/log.h"
 #include "support/time_value.h"
 
@@ -47,15 +52,15 @@ double writtenAt(const std::string& path) {
 CaptureRecord wholeOf(const CaptureRecord& damaged, const MovieIndex& index, const std::string& folder) {
   const TrackIndex& lead = index.tracks.front();
   CaptureRecord record;
-  record.recordingType = recordingTypeCode(index.video() != nullptr, index.audio() != nullptr);
+  record.recordingType = recordingTypeOf(index.video() != nullptr, index.audio() != nullptr);
   record.frameSeconds = lead.seconds() / static_cast<double>(lead.sizes.size());
-  record.wallOffset = writtenAt(folder + "/" + FinishedCapture::kMediaName) - lead.seconds();
+  record.wallOffset = writtenAt(folder + "/" + kMediaName) - lead.seconds();
   record.runs.push_back({.sessionTime = 0, .firstFrame = 0});
   SharedDictionary parameters;
   if (!damaged.marks.requests().empty()) parameters = damaged.marks.requests().front().parameters;
-  if (!lookUp(parameters, "RecordingMetadata_RECORDING_UUID")) {
+  if (!lookUp(parameters, kRecordingUuidKey)) {
     parameters = std::make_shared<const Dictionary>(
-        Dictionary{{"RecordingMetadata_RECORDING_UUID", folder.substr(folder.rfind('/') + 1)}});
+        Dictionary{{kRecordingUuidKey, folder.substr(folder.rfind('/') + 1)}});
   }
   record.marks.start("recovered", 0, parameters);
   return record;
@@ -82,6 +87,7 @@ std::uint32_t framesOfTheMovie(const CaptureRecord& record) {
   return 0;
 }
 
+/// Null, as the answer for a capture that stays as it is.
 std::shared_ptr<FinishedCapture> leftAlone(const std::string& path, const char* why) {
   LMPLogMessage(
       nullptr, kLogError,
@@ -90,18 +96,47 @@ std::shared_ptr<FinishedCapture> leftAlone(const std::string& path, const char* 
   return nullptr;
 }
 
+/// The folder's journal, locked.
+Result<std::shared_ptr<Journal>> openJournal(const std::string& path, bool hasMedia) {
+  auto journal = Journal::open(path);
+  // Media without a journal are nobody's: a capture makes its journal first and removes it last.
+  if (!journal && journal.error().systemError == ENOENT && hasMedia) return Journal::create(path);
+  return journal;
+}
+
+/// The record to make movies by: the journal's if it can be trusted.
+CaptureRecord trusted(CaptureRecord record, const MovieIndex& index, const std::string& folder) {
+  if (record.intact && !record.runs.empty()) return record;
+  LMPLogMessage(nullptr, kLogError,
+                "The journal of %s is damaged: all that was captured is kept as one recording",
+                folder.c_str());
+  return wholeOf(record, index, folder);
+}
+
+/// Makes the media one whole movie. @return whether they may go once they have been used
+MediaAfterUse finishMedia(const std::string& media, std::uint64_t mediaSize, const MovieIndex& index) {
+  if (mediaSize > index.mediaEnd + kTornTailLimit) {
+    LMPLogMessage(nullptr, kLogError,
+                  "%s can be read up to %.0f s only; the movie ends there, and the file stays as it is",
+                  media.c_str(), index.seconds());
+    return MediaAfterUse::keep;
+  }
+  if (const int error = finishMovieInPlace(media, index))
+    LMPLogMessage(nullptr, kLogWarning, "%s stays fragmented: %s", media.c_str(), std::strerror(error));
+  return MediaAfterUse::remove;
+}
+
 }  // namespace
 
-std::shared_ptr<FinishedCapture> FinishedCapture::openAbandoned(const std::string& folder) {
+std::shared_ptr<FinishedCapture> openAbandonedCapture(const std::string& folder) {
   const std::string journalPath = folder + "/" + kJournalName;
   const std::string media = folder + "/" + kMediaName;
   const std::uint64_t mediaSize = sizeOf(media);
-  std::shared_ptr<Journal> journal = Journal::open(journalPath, true);
-  // Media without a journal are nobody's: a capture makes its journal first and removes it last.
-  if (!journal && errno == ENOENT && mediaSize > 0) journal = Journal::open(journalPath, false);
+  const auto journal = openJournal(journalPath, mediaSize > 0);
   if (!journal) {
-    if (errno == EWOULDBLOCK || errno == ENOENT) return nullptr;
-    return leftAlone(journalPath, std::strerror(errno));
+    const int error = journal.error().systemError;
+    if (error == EWOULDBLOCK || error == ENOENT) return nullptr;
+    return leftAlone(journalPath, std::strerror(error));
   }
   const auto text = readAll(journalPath);
   if (!text) return leftAlone(journalPath, "input/output error");
@@ -112,26 +147,12 @@ std::shared_ptr<FinishedCapture> FinishedCapture::openAbandoned(const std::strin
   CaptureRecord record = parseJournal(*text);
   if (!index || index->tracks.front().sizes.empty()) {
     const std::uint32_t frames = mediaSize == 0 ? framesOfTheMovie(record) : 0;
-    return std::make_shared<FinishedCapture>(folder, std::move(journal), std::move(record), frames);
+    return std::make_shared<FinishedCapture>(folder, *journal, std::move(record), frames);
   }
-  if (!record.intact || record.runs.empty()) {
-    LMPLogMessage(nullptr, kLogError,
-                  "The journal of %s is damaged: all that was captured is kept as one recording",
-                  folder.c_str());
-    record = wholeOf(record, *index, folder);
-  }
+  record = trusted(std::move(record), *index, folder);
   const std::uint32_t frames = framesIn(*index, record.frameSeconds);
-  const bool torn = mediaSize > index->mediaEnd + kTornTailLimit;
-  if (torn) {
-    LMPLogMessage(nullptr, kLogError,
-                  "%s can be read up to %.0f s only; the movie ends there, and the file stays as it is",
-                  media.c_str(), index->seconds());
-  } else if (const int error = finishMovieInPlace(media, *index)) {
-    LMPLogMessage(nullptr, kLogWarning, "%s stays fragmented: %s", media.c_str(), std::strerror(error));
-  }
-  auto capture = std::make_shared<FinishedCapture>(folder, std::move(journal), std::move(record), frames);
-  capture->keep_media_ = torn;
-  return capture;
+  return std::make_shared<FinishedCapture>(folder, *journal, std::move(record), frames,
+                                           finishMedia(media, mediaSize, *index));
 }
 
 }  // namespace lmx

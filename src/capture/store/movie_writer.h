@@ -2,14 +2,13 @@
 #pragma once
 #include <atomic>
 #include <condition_variable>
-#include <deque>
 #include <functional>
 #include <mutex>
-#include <string>
+#include <optional>
 #include <thread>
 #include <vector>
 
-#include "capture/movie/movie_file.h"
+#include "capture/movie/growing_movie.h"
 #include "capture/store/journal.h"
 
 namespace lmx {

@@ -1,0 +1,49 @@
+// Those who get what a pipeline captures.
+#pragma once
+#include <memory>
+#include <mutex>
+#include <optional>
+#include <vector>
+
+#include "capture/api/capture_framework.h"
+#include "capture/gst/gst_handles.h"
+
+namespace lmx {
+
+/// Gets what is captured, on streaming threads. Must return quickly: queue and return.
+class CaptureConsumer {
+ public:
+  virtual ~CaptureConsumer() = default;
+  /// @param buffer  an I420 frame of the pipeline's size (a reference for the consumer)
+  /// @param runningTime  seconds
+  virtual void onVideo(BufferHandle buffer, double runningTime) = 0;
+  /// @param buffer  interleaved 32-bit float samples
+  virtual void onAudio(BufferHandle buffer, double runningTime) = 0;
+  /// On the pipeline's bus thread; once at most.
+  virtual void onCaptureError(const CaptureError& error) = 0;
+};
+
+/// A pipeline's consumers, and the error that ended the flow to them. Consumers are called without the lock.
+/// Thread-safe.
+class CaptureConsumers {
+ public:
+  /// One that comes after the failure is told at once.
+  void add(const std::shared_ptr<CaptureConsumer>& consumer);
+  /// A call that is under way may still reach the consumer afterwards.
+  void remove(const CaptureConsumer* consumer);
+
+  enum class Medium { video, audio };
+  void deliver(Medium medium, GstBuffer* buffer, double runningTime) const;
+  /// Logs the error and tells the consumers. Only the first one counts: what follows is its echo.
+  void fail(const CaptureError& error);
+  [[nodiscard]] std::optional<CaptureError> failure() const;
+
+ private:
+  using Held = std::vector<std::shared_ptr<CaptureConsumer>>;
+  [[nodiscard]] Held heldLocked() const;
+  mutable std::mutex mutex_;
+  std::vector<std::weak_ptr<CaptureConsumer>> consumers_;  // guarded by mutex_
+  std::optional<CaptureError> failure_;                    // guarded by mutex_
+};
+
+}  // namespace lmx

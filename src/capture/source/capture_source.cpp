@@ -1,0 +1,13 @@
+// Telling sources apart.
+#include "capture/source/capture_source.h"
+
+#include "support/format.h"
+
+namespace lmx {
+
+std::string CaptureSource::key() const {
+  return formatted("%s|%s|%d/%d|%d|%d", videoDevice.value_or("-").c_str(), audioDevice.value_or("-").c_str(),
+                   frameRate.numerator, frameRate.denominator, sampleRate, channels);
+}
+
+}  // namespace lmx
