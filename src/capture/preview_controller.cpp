@@ -1,4 +1,4 @@
-// Opening a camera for a look.
+// Opening and closing the camera of a preview.
 #include "capture/preview_controller.h"
 
 #include "capture/source/devices.h"
@@ -29,11 +29,6 @@ void PreviewController::addAudioDeviceWithID(const std::optional<std::string>& d
 std::string PreviewController::videoDeviceLocalizedDisplayName() const {
   const std::lock_guard lock(mutex_);
   return name_;
-}
-
-void PreviewController::setDelegate(std::shared_ptr<LMRPreviewControllerDelegate> delegate) {
-  const std::lock_guard lock(mutex_);
-  delegate_ = std::move(delegate);
 }
 
 std::shared_ptr<CaptureSession> PreviewController::session() const {

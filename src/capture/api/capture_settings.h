@@ -19,9 +19,9 @@ enum class RecordingQuality { good = 0, better = 1, best = 2 };
 /// How one medium is encoded.
 struct LMRCompressionOptions {
   MediaType media = MediaType::video;
-  RecordingQuality quality = RecordingQuality::better;
-  int sampleRate = 48000;  ///< Hz, audio
-  int channels = 2;        ///< audio
+  RecordingQuality quality = RecordingQuality::better;  ///< video; sound has one bit rate
+  int sampleRate = 48000;                               ///< Hz, audio
+  int channels = 2;                                     ///< audio
   bool operator==(const LMRCompressionOptions&) const = default;
 };
 
