@@ -7,6 +7,7 @@
 #include <cerrno>
 #include <cstdio>
 #include <cstring>
+#include <iterator>
 
 #include "capture/movie/movie_reader.h"
 #include "capture/store/capture_files.h"
@@ -152,19 +153,24 @@ RecoveredRecording FinishedCapture::describe(const Request& request, const std::
   recording.parameters = request.parameters;
   recording.recordingType = record_.recordingType;
   recording.forget = [self = shared_from_this(), uuid = request.uuid] { self->handedOver(uuid); };
+  const std::vector<FrameRange> ranges = framesFor(request);
+  if (ranges.empty()) return recording;
+  recording.startTime = wallTimeOf(ranges.front().first);
+  recording.stopTime = wallTimeOf(ranges.back().end - 1) + record_.frameSeconds;
   std::uint32_t frames = 0;
-  for (const FrameRange& range : framesFor(request)) {
-    frames += range.end - range.first;
-    for (const MovieRun& run : record_.runs) {
-      if (run.firstFrame > range.first) break;
-      const double at = run.sessionTime + record_.wallOffset;
-      if (recording.startTime == 0)
-        recording.startTime = at + (range.first - run.firstFrame) * record_.frameSeconds;
-      recording.stopTime = at + (range.end - run.firstFrame) * record_.frameSeconds;
-    }
-  }
+  for (const FrameRange& range : ranges) frames += range.end - range.first;
   recording.duration = frames * record_.frameSeconds;
   return recording;
+}
+
+/// When `frame` was captured, seconds since 2001-01-01 UTC.
+double FinishedCapture::wallTimeOf(std::uint32_t frame) const {
+  const auto& runs = record_.runs;
+  const auto after =
+      std::find_if(runs.begin(), runs.end(), [frame](const MovieRun& run) { return run.firstFrame > frame; });
+  if (after == runs.begin()) return record_.wallOffset;
+  const MovieRun& run = *std::prev(after);
+  return record_.wallOffset + run.sessionTime + (frame - run.firstFrame) * record_.frameSeconds;
 }
 
 std::vector<FrameRange> FinishedCapture::framesFor(const Request& request) const {

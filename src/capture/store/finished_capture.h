@@ -49,6 +49,7 @@ class FinishedCapture : public std::enable_shared_from_this<FinishedCapture> {
   std::optional<RecoveredRecording> recover(const Request& request, const std::string& repository);
   void giveUp(const Request& request, const CaptureError& error);
   RecoveredRecording describe(const Request& request, const std::string& path);
+  [[nodiscard]] double wallTimeOf(std::uint32_t frame) const;
   [[nodiscard]] std::vector<FrameRange> framesFor(const Request& request) const;
   void removeIfResolvedLocked();
 

@@ -34,7 +34,9 @@ std::vector<FrameRange> framesOf(const Request& request, const std::vector<Movie
   std::vector<FrameRange> ranges;
   if (frameSeconds <= 0) return ranges;
   for (std::size_t i = 0; i < runs.size(); ++i) {
-    const std::uint32_t runEnd = i + 1 < runs.size() ? runs[i + 1].firstFrame : totalFrames;
+    // Media that could not be read to their end hold fewer frames than the journal tells of.
+    const std::uint32_t runEnd =
+        i + 1 < runs.size() ? std::min(runs[i + 1].firstFrame, totalFrames) : totalFrames;
     for (const Span& span : request.spans) append(ranges, framesIn(span, runs[i], runEnd, frameSeconds));
   }
   // A request that ended before the first frame came still has that one.

@@ -49,6 +49,43 @@ TEST(Recovery, MakesAMovieNamedForTheRecording) {
   EXPECT_EQ(readMovieIndex(repository.file("LECTURE.mov"))->tracks[0].sizes.size(), 60U);
 }
 
+TEST(Recovery, TimesOfARequestThatBeganInALaterRun) {
+  const Folder repository;
+  const auto capture = openAbandonedCapture(crashedCapture(repository,
+                                                           "capture 2 0.033333333333 1000.0\n"
+                                                           "start A 0 RecordingMetadata_RECORDING_UUID A\n"
+                                                           "run 0 0\nstop A 1\ndone A\n"
+                                                           "start B 50 RecordingMetadata_RECORDING_UUID B\n"
+                                                           "run 50 30\n",
+                                                           4));
+  const auto recovered = capture->recoverPending(repository.path());
+  ASSERT_EQ(recovered.size(), 1U);
+  EXPECT_NEAR(recovered[0].startTime, 1050.0, 1e-6);
+  EXPECT_NEAR(recovered[0].stopTime, 1051.0, 1e-6);
+  EXPECT_NEAR(recovered[0].duration, 1.0, 1e-6);
+}
+
+TEST(Recovery, TimesOfARequestThatWasRecordedInTwoRuns) {
+  const Folder repository;
+  const auto capture = openAbandonedCapture(
+      crashedCapture(repository, std::string(kJournal) + "stop R 1\nstart R 50\nrun 50 30\n", 4));
+  const auto recovered = capture->recoverPending(repository.path());
+  ASSERT_EQ(recovered.size(), 1U);
+  EXPECT_NEAR(recovered[0].startTime, 1000.0, 1e-6);
+  EXPECT_NEAR(recovered[0].stopTime, 1051.0, 1e-6);
+  EXPECT_NEAR(recovered[0].duration, 2.0, 1e-6);
+}
+
+TEST(Recovery, LengthIsThatOfTheMediaEvenWhereTheJournalTellsOfMore) {
+  const Folder repository;
+  const auto capture = openAbandonedCapture(
+      crashedCapture(repository, std::string(kJournal) + "stop R 30\nstart R 50\nrun 50 900\n", 2));
+  const auto recovered = capture->recoverPending(repository.path());
+  ASSERT_EQ(recovered.size(), 1U);
+  EXPECT_NEAR(recovered[0].duration, 1.0, 1e-6);
+  EXPECT_NEAR(recovered[0].stopTime, 1001.0, 1e-6);
+}
+
 TEST(Recovery, DoesNotOverwriteAMovie) {
   const Folder repository;
   std::ofstream(repository.file("LECTURE.mov")) << "earlier";

@@ -19,5 +19,12 @@ TEST(FramesOf, RoundsMarksUpToFrames) {
   EXPECT_TRUE(framesOf(request, runs, kFrame, 60).empty());
 }
 
+TEST(FramesOf, AreThoseThatAreThere) {
+  const std::vector<MovieRun> runs{{.sessionTime = 0, .firstFrame = 0},
+                                   {.sessionTime = 20, .firstFrame = 300}};
+  const Request request{.uuid = "R", .parameters = nullptr, .spans = {{.start = 0}}};
+  EXPECT_EQ(framesOf(request, runs, kFrame, 100), (std::vector<FrameRange>{{0, 100}}));
+}
+
 }  // namespace
 }  // namespace lmx
