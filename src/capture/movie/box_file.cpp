@@ -11,7 +11,6 @@
 namespace lmx {
 namespace {
 
-constexpr std::uint64_t kHeadSize = 8;
 constexpr std::uint64_t kHeaderLimit = 16U << 20;  // moov and moof of ours are far smaller
 
 }  // namespace
@@ -35,7 +34,7 @@ std::optional<BoxFile::Box> BoxFile::boxAt(std::uint64_t at, const char* type) c
 Bytes BoxFile::body(const Box& box) const {
   if (box.size > kHeaderLimit) return {};
   Bytes bytes(box.size - kHeadSize);
-  if (readAllAt(fd_, bytes, box.start + kHeadSize) != 0) bytes.clear();
+  if (readAllAt(fd_, bytes, box.bodyStart()) != 0) bytes.clear();
   return bytes;
 }
 

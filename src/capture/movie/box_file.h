@@ -11,10 +11,12 @@ namespace lmx {
 /// A file as a sequence of boxes. Reads only; as large as it was when the object was made.
 class BoxFile {
  public:
+  static constexpr std::uint64_t kHeadSize = 8;  ///< of a box: its size and its type
   struct Box {
     std::string type;
     std::uint64_t start = 0;  ///< file offset of its head
     std::uint64_t size = 0;   ///< with its head
+    [[nodiscard]] std::uint64_t bodyStart() const { return start + kHeadSize; }
     [[nodiscard]] std::uint64_t end() const { return start + size; }
   };
 

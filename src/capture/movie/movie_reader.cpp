@@ -3,6 +3,8 @@
 
 #include <fcntl.h>
 
+#include <algorithm>
+
 #include "capture/movie/box_file.h"
 #include "capture/movie/box_reader.h"
 #include "capture/movie/fragment_boxes.h"
@@ -101,6 +103,17 @@ void join(TrackIndex& track, const TrackIndex& part) {
   }
 }
 
+/// Whether all samples of `track` lie inside of their "mdat": a damaged head must not lead a reader astray.
+bool liesWithin(const TrackIndex& track, const BoxFile::Box& mdat) {
+  std::size_t sample = 0;
+  for (const Chunk& chunk : track.chunks) {
+    std::uint64_t end = chunk.offset;
+    for (std::uint32_t i = 0; i < chunk.samples; ++i) end += track.sizes[sample++];
+    if (chunk.offset < mdat.bodyStart() || end > mdat.end()) return false;
+  }
+  return true;
+}
+
 /// Adds the fragment behind the index's media. @return false, with the index as it was, where no whole one is
 bool readFragment(const BoxFile& file, MovieIndex& index) {
   const auto moof = file.boxAt(index.mediaEnd, "moof");
@@ -112,6 +125,8 @@ bool readFragment(const BoxFile& file, MovieIndex& index) {
   forEachBox(file.body(*moof), [&](std::string_view type, Body body, Body) {
     if (type == "traf") good = good && readTrackFragment(body, moof->start, fragment);
   });
+  good = good && std::all_of(fragment.tracks.begin(), fragment.tracks.end(),
+                             [&](const TrackIndex& track) { return liesWithin(track, *mdat); });
   if (!good) return false;
   for (std::size_t i = 0; i < index.tracks.size(); ++i) join(index.tracks[i], fragment.tracks[i]);
   index.mediaEnd = mdat->end();

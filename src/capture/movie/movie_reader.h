@@ -8,7 +8,7 @@
 namespace lmx {
 
 /// The index of a file that GrowingMovie wrote, finished or not. What stands behind its last whole fragment
-/// is left out.
+/// is left out; every sample of the index lies inside the file.
 /// @return nothing when the file can't be read, is no such movie or holds no header yet
 std::optional<MovieIndex> readMovieIndex(const std::string& path);
 

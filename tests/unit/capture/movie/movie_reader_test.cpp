@@ -6,6 +6,8 @@
 #include <fstream>
 #include <random>
 
+#include "capture/movie/fragment_boxes.h"
+#include "capture/movie/movie_boxes.h"
 #include "tests/unit/capture/capture_harness.h"
 #include "tests/unit/capture/movie/sample_movies.h"
 
@@ -20,6 +22,35 @@ TEST(ReadMovieIndex, OtherFilesAreRefused) {
   EXPECT_FALSE(readMovieIndex(folder.file("missing")));
   std::ofstream(folder.file("text")) << std::string(5000, 'x');
   EXPECT_FALSE(readMovieIndex(folder.file("text")));
+}
+
+/// Where a fragment's head holds the fields of its only sample.
+constexpr std::size_t kDataOffsetAt = 84;
+constexpr std::size_t kSampleSizeAt = 92;
+
+/// Frames that are read of a movie of one frame of 100 bytes, with one byte of its fragment's head changed.
+std::size_t framesRead(const Folder& folder, std::size_t at, std::uint8_t value) {
+  Bytes fragment = fragmentHeader(1, {{1, 0, {{100, 1000, true}}}});
+  EXPECT_EQ(fragment[kDataOffsetAt + 3], fragment.size()) << "the head is not laid out as this test thinks";
+  EXPECT_EQ(fragment[kSampleSizeAt + 3], 100);
+  fragment[at] = value;
+  fragment.resize(fragment.size() + 100);
+  std::ofstream file(folder.file("m.mov"), std::ios::binary);
+  for (const Bytes& part : {fileStart(), fragmentedHeader({testing::sampleFormats().front()}), fragment})
+    file.write(reinterpret_cast<const char*>(part.data()), static_cast<std::streamsize>(part.size()));
+  file.close();
+  const auto index = readMovieIndex(folder.file("m.mov"));
+  return index ? index->tracks.front().sizes.size() : 0;
+}
+
+TEST(ReadMovieIndex, SamplesOutsideOfTheirMediaAreRefused) {
+  const Folder folder;
+  EXPECT_EQ(framesRead(folder, kSampleSizeAt + 3, 100), 1U);
+  EXPECT_EQ(framesRead(folder, kSampleSizeAt + 3, 99), 1U);
+  EXPECT_EQ(framesRead(folder, kSampleSizeAt + 3, 101), 0U) << "one byte too long";
+  EXPECT_EQ(framesRead(folder, kSampleSizeAt, 0xFF), 0U) << "4 GB long";
+  EXPECT_EQ(framesRead(folder, kDataOffsetAt + 3, 107), 0U) << "begins in the head";
+  EXPECT_EQ(framesRead(folder, kDataOffsetAt, 0xFF), 0U) << "begins behind the file";
 }
 
 TEST(ReadMovieIndex, AnyCorruptionIsSurvived) {
