@@ -8,6 +8,7 @@
 #include <cmath>
 #include <cstring>
 #include <fstream>
+#include <limits>
 #include <sstream>
 
 #include "capture/movie/movie_finish.h"
@@ -73,7 +74,8 @@ bool makesSense(const MovieIndex& index, std::uint64_t fileSize) {
 }
 
 std::uint32_t framesIn(const MovieIndex& index, double frameSeconds) {
-  return static_cast<std::uint32_t>(std::floor(index.tracks.front().seconds() / frameSeconds + 1e-3));
+  const double frames = std::floor(index.tracks.front().seconds() / frameSeconds + 1e-3);
+  return static_cast<std::uint32_t>(std::min(frames, double{std::numeric_limits<std::uint32_t>::max()}));
 }
 
 /// Frames of the movie that all of the media have become, for its document; 0 when there is no such movie.

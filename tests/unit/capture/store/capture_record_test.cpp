@@ -29,6 +29,23 @@ TEST(ParseJournal, TellsWhatWasWritten) {
   EXPECT_EQ(record.movies.at("R"), "/r/R.mov");
 }
 
+TEST(ParseJournal, ANumberThatIsNoneIsDamage) {
+  const std::string capture = "capture 2 0.04 1000\n";
+  EXPECT_TRUE(parseJournal(capture + "start R 1\nrun 1 0\n").intact);
+  for (const char* line :
+       {"start R x\n", "start R nan\n", "start R 1\nrun 1e999 0\n", "start R 1\nrun 1 -1\n",
+        "start R 1\nrun 1 4294967296\n", "start R 1\nstop R 5x\n", "start R inf\n"}) {
+    EXPECT_FALSE(parseJournal(capture + line).intact) << line;
+  }
+}
+
+TEST(ParseJournal, AFrameOfNoLengthIsDamage) {
+  for (const char* length : {"0", "-1", "1e-300", "1e300", "nan"}) {
+    const std::string text = std::string("capture 2 ") + length + " 1000\nstart R 1\nrun 1 0\n";
+    EXPECT_FALSE(parseJournal(text).intact) << length;
+  }
+}
+
 TEST(ParseJournal, GarbageIsSkipped) {
   const CaptureRecord record = parseJournal("\n\nnonsense\nstart\nstart R\nrun x\nstop R 1 2 3\n%%%\n");
   EXPECT_TRUE(record.runs.empty());
