@@ -1,4 +1,4 @@
-// The engine's face of one recording: hands commands and marks to the recorder.
+// What the engine sees of one recording. Passes commands and marks on to the recorder.
 #pragma once
 #include <atomic>
 #include <functional>
@@ -13,7 +13,7 @@
 
 namespace lmx {
 
-/// Before a recording is prepared there is nothing that marks and commands could reach: they do nothing.
+/// Marks and commands do nothing before the recording has been prepared.
 class CaptureController : public LMRCaptureController,
                           public std::enable_shared_from_this<CaptureController> {
  public:
@@ -54,7 +54,7 @@ class CaptureController : public LMRCaptureController,
   [[nodiscard]] std::optional<CaptureError> refusal() const;
 
   const std::function<std::optional<std::string>()> default_microphone_;
-  std::atomic<bool> armed_{false};  ///< told to record; media flow to the marks before that, too
+  std::atomic<bool> armed_{false};  ///< startRecording has been called, or the capture has been tagged
   mutable std::mutex mutex_;
   std::weak_ptr<CaptureControllerDelegate> delegate_;  // guarded by mutex_
   std::shared_ptr<CaptureRecorder> recorder_;          // guarded by mutex_: null until prepared

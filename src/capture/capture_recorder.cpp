@@ -1,4 +1,4 @@
-// The recording thread, and what others ask of it.
+// Opening a capture, commands to it, and the recording thread.
 #include "capture/capture_recorder.h"
 
 #include <malloc.h>
@@ -41,10 +41,10 @@ CaptureRecorder::CaptureRecorder(const RecordingPlan& plan, PipelineLease pipeli
 
 void CaptureRecorder::run(std::function<void(const Outcome&)> onEnd) {
   pipeline()->consumers().add(shared_from_this());
-  // Nobody could join it: the last to let go of the recorder may be this thread itself.
+  // Detached: this thread may hold the last reference to the recorder, and a thread cannot join itself.
   std::thread([self = shared_from_this(), onEnd = std::move(onEnd)] {
     onEnd(self->record());
-    // The encoder leaves tens of megabytes free in the heap, which by itself gives nothing back.
+    // The encoder has freed tens of megabytes that the heap would otherwise keep.
     malloc_trim(0);
   }).detach();
 }
@@ -56,7 +56,7 @@ void CaptureRecorder::startFlow() {
 }
 
 void CaptureRecorder::end(Ending how) {
-  std::optional<double> now;  // as fast as possible there is no "now": the capture ends with the last mark
+  std::optional<double> now;  // absent for devices of "speed=max": their capture ends with the last mark
   bool realTime = false;
   {
     const std::lock_guard lock(mutex_);
@@ -65,8 +65,8 @@ void CaptureRecorder::end(Ending how) {
     if (realTime) now = pipeline_->runningTime();
   }
   if (!marks_.end(how, now)) return;
-  // The frame that proves that all before it are here comes within a frame's time; a camera that has not
-  // given its first picture yet gets longer, so that a recording stopped at once still holds one.
+  // The recording ends with the first frame behind the end, which is due within a frame's time. A camera that
+  // has not delivered any picture yet gets longer: a recording that is stopped at once still holds one.
   const auto patience = recorded_frames_ > 0 ? 1s : 3s;
   queue_.hurry(realTime ? MediaQueue::Clock::now() + patience : MediaQueue::Clock::time_point::max());
 }
@@ -171,7 +171,7 @@ void CaptureRecorder::feed(MediaQueue::Batch batch) {
   recorded_frames_ = cutter_.recordedFrames();
 }
 
-/// Whether everything up to the end has been seen.
+/// Whether all media up to the end have been fed, or no more will come.
 bool CaptureRecorder::reachedEnd() const {
   const auto end = marks_.endTime();
   if (!end) return false;
@@ -186,7 +186,7 @@ void CaptureRecorder::checkLimits() {
   end(Ending::stop);
 }
 
-/// Closes the movie, or throws away what nobody wants. @return how many frames it holds
+/// Closes the movie, or discards it when no request wants it. @return how many frames it holds
 std::uint32_t CaptureRecorder::closeMovie() {
   if (marks_.worthless()) {
     movie_.reset();

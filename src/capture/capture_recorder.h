@@ -1,4 +1,4 @@
-// Records one capture: raw media in, a growing movie out, cut along marks that come meanwhile.
+// Records one capture: cuts raw media along the marks that arrive meanwhile and writes a growing movie.
 #pragma once
 #include <atomic>
 #include <condition_variable>
@@ -38,9 +38,9 @@ class CaptureRecorder : public CaptureConsumer, public std::enable_shared_from_t
   /// given back, and keeps alive what it holds until then.
   void run(std::function<void(const Outcome&)> onEnd);
 
-  /// Starts the flow of devices that wait for it. Others flow already.
+  /// Starts devices that wait for it ("speed=max"). All others deliver already.
   void startFlow();
-  /// Ends the recording; the rest happens on the recording thread. Only the first call counts.
+  /// Decides that the recording ends; the recording thread does the rest. Only the first call counts.
   void end(Ending how);
 
   [[nodiscard]] CaptureMarks& marks() { return marks_; }

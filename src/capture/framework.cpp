@@ -1,4 +1,4 @@
-// Devices, compressions, controllers and the recovery of unfinished captures.
+// Implements the capture framework: devices, compressions, controllers, recovery of unfinished captures.
 #include "capture/framework.h"
 
 #include <dirent.h>
@@ -30,7 +30,7 @@ std::vector<std::string> subfolders(const std::string& folder) {
   return names;
 }
 
-/// The first use of an element loads its library: a recording should not wait for that.
+/// Uses an element once, so that a recording need not wait until its library is loaded.
 void loadPlugin(const char* name) {
   const GstHandle<GstElementFactory> factory(gst_element_factory_find(name));
   if (!factory) {

@@ -1,4 +1,4 @@
-// Frames by the marks, sound by the frames.
+// Cuts frames along the marks and sound along the frames.
 #include "capture/media_cutter.h"
 
 #include <algorithm>
@@ -32,7 +32,7 @@ FrameDecision MediaCutter::decide(double t) {
 void MediaCutter::feedFrame(const RawMedium& frame) {
   const FrameDecision decision = decide(frame.time);
   if (!decision.take || !startMovie()) return;
-  // A place that no frame came for shows the next one: the frame rate stays constant.
+  // Where a frame is missing the next one is shown in its place, too: the frame rate stays constant.
   if (decision.beginsRun) next_place_ = decision.place;
   bool forceKey = decision.forceKey;
   for (; next_place_ <= decision.place; ++next_place_) {

@@ -14,11 +14,11 @@
 namespace lmx {
 
 /// Decides frame by frame whether it is recorded; sound follows the decisions on the picture. Where there is
-/// only sound, virtual frames of 10 ms stand for the picture: the same cuts, the same clock. Recorder's
+/// only sound, virtual frames of 10 ms stand for the picture: the same cuts, the same clock. Recording
 /// thread only.
 class MediaCutter {
  public:
-  /// What the cutter works with; all of it must outlive the cutter.
+  /// What the cutter reads and writes; all of it must outlive the cutter.
   struct Surroundings {
     const CaptureMarks& marks;
     Journal& journal;
@@ -29,7 +29,7 @@ class MediaCutter {
 
   /// Frames ascend in time.
   void feedFrame(const RawMedium& frame);
-  /// Chunks ascend in time. They are kept until the picture has come as far.
+  /// Chunks ascend in time. They are kept until the frames beside them have been decided.
   void feedSound(RawMedia chunks);
   /// Whether all frames before `end`, and the sound of those that were taken, have been fed.
   [[nodiscard]] bool reaches(double end) const;

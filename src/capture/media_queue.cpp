@@ -1,4 +1,4 @@
-// Limits of the queue, and who waits for whom.
+// Limits of the queue, and who waits for what.
 #include "capture/media_queue.h"
 
 #include <algorithm>
@@ -8,9 +8,9 @@
 namespace lmx {
 namespace {
 
-constexpr std::size_t kMaxFrames = 90;    // three seconds: an encoder that far behind does not catch up
+constexpr std::size_t kMaxFrames = 90;    // three seconds: an encoder this far behind will not catch up
 constexpr std::size_t kMaxChunks = 1000;  // ten seconds
-constexpr std::size_t kFastQueue = 16;    // not in real time: the source waits for us
+constexpr std::size_t kFastQueue = 16;    // not live: the source waits
 constexpr double kFastLead = 1.0;         // seconds that sound may be ahead of the picture then
 constexpr std::uint64_t kDropsPerLogLine = 300;
 

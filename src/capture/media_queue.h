@@ -1,4 +1,4 @@
-// Raw media on their way from the streaming threads to the recorder's thread.
+// Queues raw media between the streaming threads and the recording thread.
 #pragma once
 #include <atomic>
 #include <chrono>
@@ -19,36 +19,36 @@ struct RawMedium {
 };
 using RawMedia = std::deque<RawMedium>;
 
-/// Live media never wait: what finds the queue full is dropped. Media that come as fast as they are taken
-/// wait for room instead. Thread-safe.
+/// Live media never wait: when the queue is full they are dropped. Media of devices that are not live
+/// ("speed=max") wait for room instead. Thread-safe.
 class MediaQueue {
  public:
   using Clock = std::chrono::steady_clock;
 
-  /// @param hasVideo  sound then waits for the picture: it alone does not wake the recorder
+  /// @param hasVideo  if so, sound alone does not wake the recording thread: it is cut along the picture
   MediaQueue(bool hasVideo, bool realTime) : has_video_(hasVideo), real_time_(realTime) {}
 
   // Streaming threads.
   void pushVideo(RawMedium frame);
   void pushAudio(RawMedium chunk);
 
-  // The recorder's thread.
+  // The recording thread.
   struct Batch {
     RawMedia video;
     RawMedia audio;
     bool inTime = true;  ///< false: the deadline has passed
   };
-  /// Waits until there is something to do and takes all there is.
+  /// Waits until there are media to work on and takes all of them.
   [[nodiscard]] Batch take();
-  /// Running time that the picture has reached: sound that does not come in real time stays near it.
+  /// Running time that the picture has reached. Sound that is not live waits when it is far ahead of it.
   void setPictureHorizon(double time) { picture_horizon_ = time; }
 
-  /// The capture is ending: take() wakes for sound alone, and gives up at `deadline`. The earliest deadline
-  /// counts; Clock::time_point::max() is none.
+  /// The capture is ending: from now on sound alone wakes take(), which gives up at `deadline`. The earliest
+  /// deadline counts; Clock::time_point::max() means none.
   void hurry(Clock::time_point deadline);
   /// Whether the deadline has passed.
   [[nodiscard]] bool expired() const;
-  /// Drops what is queued and all that still comes; nobody waits any more.
+  /// Discards what is queued and what is pushed later. No push waits any more.
   void close();
 
  private:

@@ -1,4 +1,4 @@
-// The movie of a capture: raw frames and samples in, encoded and written to the disk.
+// Encodes the raw frames and samples of a capture and writes the movie to the disk.
 #pragma once
 #include <cstdint>
 #include <functional>
@@ -11,18 +11,18 @@
 
 namespace lmx {
 
-/// The encoder with the writer behind it. Both start with the first frame or sample. Recorder's thread only.
+/// The encoder with the writer behind it. Both start with the first frame or sample. Recording thread only.
 class MovieOutput {
  public:
-  /// Why nothing more can be written. Called on any thread, more than once perhaps; it must not wait for the
-  /// recorder's thread.
+  /// Gets the reason when nothing more can be written, possibly several times and on any thread. It must not
+  /// wait for the recording thread.
   using OnError = std::function<void(const CaptureError& error)>;
 
   /// @param movie  created, not begun
   /// @param journal  must outlive the output
   MovieOutput(const MovieEncoding& encoding, GrowingMovie movie, Journal& journal, OnError onError);
 
-  /// Starts the encoder if it does not run yet. @param size  of the frames
+  /// Starts the encoder unless it runs already. @param size  of the frames
   /// @return false when it could not be started
   bool start(PictureSize size);
 
@@ -32,10 +32,10 @@ class MovieOutput {
   /// Encodes `count` samples of each channel, interleaved, from `samples` on; null for silence.
   void pushSound(const float* samples, std::uint32_t count);
 
-  /// Ends the streams and makes the movie whole. Damage is logged or reported as an error.
+  /// Ends the streams and makes the movie whole. What goes wrong is logged or reported to `onError`.
   /// @param totalSamples  of each channel; what the encoder adds is dropped
   void close(std::int64_t totalSamples);
-  /// How many of `frames` of the movie's clock the closed movie holds.
+  /// How many of the `frames` that were recorded the closed movie holds.
   [[nodiscard]] std::uint32_t framesWritten(std::uint32_t frames) const;
   [[nodiscard]] bool started() const { return encoder_ != nullptr; }
 
@@ -49,7 +49,7 @@ class MovieOutput {
   Journal& journal_;
   const OnError on_error_;
   std::unique_ptr<MovieWriter> writer_;
-  std::unique_ptr<Encoder> encoder_;  // behind the writer: its threads call that
+  std::unique_ptr<Encoder> encoder_;  // declared behind the writer, which its threads call
 };
 
 }  // namespace lmx

@@ -1,4 +1,4 @@
-// Settings to a plan.
+// From the settings of a recording to its plan.
 #include "capture/recording_plan.h"
 
 namespace lmx {

@@ -1,4 +1,4 @@
-// What a recording is to be, worked out from its settings before anything is opened.
+// Works out devices and encoding of a recording from its settings, before anything is opened.
 #pragma once
 #include <chrono>
 #include <functional>

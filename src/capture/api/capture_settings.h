@@ -1,5 +1,4 @@
-// What a capture is to be: the recording context, and the catalogue of devices and compressions it is built
-// from.
+// The settings of a capture, and the catalogue of devices and compressions they are chosen from.
 #pragma once
 #include <cstdint>
 #include <memory>

@@ -1,4 +1,4 @@
-// The encoder pipeline.
+// Feeds the encoder pipeline and takes its samples.
 #include "capture/gst/encoder.h"
 
 #include <gst/app/gstappsink.h>
@@ -16,8 +16,8 @@ namespace {
 
 constexpr int kSamplesPerPacket = 1024;  // AAC
 
-/// What a broken driver gives must not end the recording: the encoder refuses what is no number, and of a
-/// sample far beyond full scale it makes a packet that players can't read.
+/// A broken driver must not end the recording: the encoder refuses NaN, and turns samples far beyond full
+/// scale into packets that players can't read.
 float soundLevel(float sample) { return std::isnan(sample) ? 0.0F : std::clamp(sample, -1.0F, 1.0F); }
 
 Bytes contents(GstBuffer* buffer) {
@@ -32,7 +32,7 @@ Bytes codecData(GstSample* sample) {
   return value == nullptr ? Bytes() : contents(gst_value_get_buffer(value));
 }
 
-/// A buffer of `count` values: those from `samples` on, or silence where that is null. Null without memory.
+/// A buffer of `count` values from `samples` on, or of silence if that is null. Null when out of memory.
 BufferHandle soundBuffer(const float* samples, std::size_t count) {
   BufferHandle buffer(gst_buffer_new_allocate(nullptr, count * sizeof(float), nullptr));
   GstMapInfo map;

@@ -1,4 +1,4 @@
-// Raw frames and samples of one movie in, H.264 and AAC samples out.
+// Encodes the raw frames and samples of one movie to H.264 and AAC.
 #pragma once
 #include <atomic>
 #include <condition_variable>
@@ -16,7 +16,7 @@
 
 namespace lmx {
 
-/// Where encoded samples go. Called on the encoder's threads, one thread a track.
+/// Takes what is encoded. Called on the encoder's threads, one per track.
 struct EncoderOutput {
   /// Once a track, before its samples.
   std::function<void(std::uint32_t track, TrackFormat format)> onFormat;
@@ -25,7 +25,7 @@ struct EncoderOutput {
   std::function<void(std::string problem)> onError;
 };
 
-/// Feeding belongs to one thread. Track 0 is the picture where there is one; the sound follows.
+/// Fed by one thread. Track 0 is the picture, if there is one; the sound follows.
 class Encoder {
  public:
   /// Starts an encoder. The error says in words why there is none.

@@ -1,4 +1,4 @@
-// Bit rates, time scales and the encoder's launch line.
+// Chooses bit rates and time scales, and writes the encoder's launch line.
 #include "capture/gst/encoding.h"
 
 #include <algorithm>

@@ -1,4 +1,4 @@
-// Starting GStreamer and building pipelines.
+// Starts GStreamer and builds pipelines.
 #include "capture/gst/gst_handles.h"
 
 #include <mutex>

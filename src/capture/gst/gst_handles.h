@@ -36,7 +36,7 @@ using GText = std::unique_ptr<char, GFree>;
 /// Initialises GStreamer once in the process; cheap afterwards. Thread-safe.
 void ensureGStreamer();
 
-/// Builds a pipeline from its description. The error is GStreamer's, in words.
+/// Builds a pipeline from its description. The error is GStreamer's message.
 Result<GstHandle<GstElement>> newPipeline(const std::string& description);
 
 /// An element of `pipeline` by name; null when there is none.

@@ -41,7 +41,7 @@ void SoundCutter::cutRun(std::size_t number, double t, std::uint32_t count, std:
   ++run_;
 }
 
-/// Places the samples `first` to `last` of a chunk, the first of which belongs at `target`.
+/// Places samples `first` to `last` of a chunk. The first of them belongs at position `target`.
 SoundPiece SoundCutter::place(const Extent& run, std::int64_t target, std::int64_t first, std::int64_t last) {
   SoundPiece piece;
   std::int64_t from = first;

@@ -1,4 +1,4 @@
-// Finding boxes in a file.
+// Finds boxes in a file.
 #include "capture/movie/box_file.h"
 
 #include <sys/stat.h>

@@ -1,4 +1,4 @@
-// Big-endian fields, bounds-checked.
+// Reads big-endian fields within bounds.
 #include "capture/movie/box_reader.h"
 
 namespace lmx {

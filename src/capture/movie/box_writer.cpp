@@ -1,4 +1,4 @@
-// Big-endian fields.
+// Writes big-endian fields.
 #include "capture/movie/box_writer.h"
 
 namespace lmx {

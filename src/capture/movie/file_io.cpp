@@ -1,4 +1,4 @@
-// pread and pwrite until all is done.
+// Repeats pread and pwrite until all bytes are done.
 #include "capture/movie/file_io.h"
 
 #include <unistd.h>

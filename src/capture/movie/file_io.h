@@ -1,4 +1,4 @@
-// Reading and writing whole blocks at an offset.
+// Reads and writes whole blocks at an offset.
 #pragma once
 #include <cstdint>
 #include <span>

@@ -1,4 +1,4 @@
-// Fragments to the disk.
+// Writes a movie fragment by fragment.
 #include "capture/movie/growing_movie.h"
 
 #include <fcntl.h>
@@ -14,7 +14,7 @@
 namespace lmx {
 namespace {
 
-/// The samples of track `t`; their data go behind what `media` holds.
+/// The samples of track `t`. Their data are appended to `media`.
 TrackFragment collect(std::uint32_t t, const TrackIndex& track, const std::vector<EncodedSample>& samples,
                       Bytes& media) {
   TrackFragment fragment{.trackNumber = t + 1, .baseTime = track.totalDuration, .samples = {}};
@@ -27,7 +27,7 @@ TrackFragment collect(std::uint32_t t, const TrackIndex& track, const std::vecto
   return fragment;
 }
 
-/// Notes samples that were written from `offset` on, track after track.
+/// Adds samples that were written from `offset` on, track after track, to the index.
 void note(const std::vector<TrackFragment>& fragments, std::uint64_t offset, MovieIndex& index) {
   for (const TrackFragment& fragment : fragments) {
     TrackIndex& track = index.tracks[fragment.trackNumber - 1];

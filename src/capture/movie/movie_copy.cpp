@@ -1,4 +1,4 @@
-// Ranges of frames to runs of samples, samples to the new file.
+// Finds the samples of each range and copies them.
 #include "capture/movie/movie_copy.h"
 
 #include <fcntl.h>
@@ -70,7 +70,7 @@ std::size_t SourceTrack::keyFrameAtOrBefore(std::size_t sample) const {
   return after == index.syncSamples.begin() ? sample : *std::prev(after);
 }
 
-/// Appends ranges to the new file and to its index. The first track leads: ranges are ranges of its time.
+/// Appends ranges to the new file and to its index. The first track leads: ranges are counted in its time.
 class RangeCopier {
  public:
   /// @param out  index of the new file, with the tracks of `index`
@@ -112,7 +112,8 @@ int RangeCopier::copy(const FrameRange& frames, double frameSeconds) {
   return 0;
 }
 
-/// A frame of the ranges is a sample of the picture; where there is only sound it is a stretch of it.
+/// The samples of the leading track for a range of frames. A frame is one sample of the picture, or a stretch
+/// of the sound where there is no picture.
 SampleRange RangeCopier::leadSamples(const FrameRange& frames, double frameSeconds) const {
   const SourceTrack& lead = tracks_[0];
   const std::uint32_t sampleUnits = std::max(1U, lead.durations.front());
@@ -124,8 +125,8 @@ SampleRange RangeCopier::leadSamples(const FrameRange& frames, double frameSecon
   return {lead.keyFrameAtOrBefore(sampleOf(frames.first)), sampleOf(frames.end)};
 }
 
-/// The samples of `track` that go with what the lead has been given, when they begin at `seconds`. What
-/// earlier ranges were rounded by is made good here, so sound never runs away from the picture.
+/// As many samples of `track`, from `seconds` on, as it takes to be as long as the leading track. This evens
+/// out the rounding of earlier ranges: sound never drifts away from the picture.
 SampleRange RangeCopier::samplesFrom(std::size_t track, double seconds) const {
   const double sample = tracks_[track].sampleSeconds();
   const auto first = static_cast<std::size_t>(std::lround(seconds / sample));

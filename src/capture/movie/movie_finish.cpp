@@ -1,4 +1,4 @@
-// The index behind the media, then the head in front of them.
+// Writes the index behind the media, then the head in front of them.
 #include "capture/movie/movie_finish.h"
 
 #include <fcntl.h>

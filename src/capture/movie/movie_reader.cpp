@@ -1,4 +1,4 @@
-// From the boxes of a growing movie to its index.
+// Builds an index from the boxes of a growing movie.
 #include "capture/movie/movie_reader.h"
 
 #include <fcntl.h>
@@ -42,7 +42,7 @@ void readTrackBoxes(Body bytes, TrackFormat& format) {
   });
 }
 
-/// Without samples; no tracks when one of them makes no sense.
+/// The tracks of a movie, without samples; none at all if one of them makes no sense.
 MovieIndex readTracks(Body moov) {
   MovieIndex index;
   forEachBox(moov, [&](std::string_view type, Body body, Body) {
@@ -103,7 +103,7 @@ void join(TrackIndex& track, const TrackIndex& part) {
   }
 }
 
-/// Whether all samples of `track` lie inside of their "mdat": a damaged head must not lead a reader astray.
+/// Whether all samples of `track` lie inside their "mdat". In a damaged head they may point anywhere.
 bool liesWithin(const TrackIndex& track, const BoxFile::Box& mdat) {
   std::size_t sample = 0;
   for (const Chunk& chunk : track.chunks) {
@@ -114,7 +114,8 @@ bool liesWithin(const TrackIndex& track, const BoxFile::Box& mdat) {
   return true;
 }
 
-/// Adds the fragment behind the index's media. @return false, with the index as it was, where no whole one is
+/// Adds the fragment that starts at the end of the index's media. @return false, with the index unchanged,
+/// when there is no whole fragment
 bool readFragment(const BoxFile& file, MovieIndex& index) {
   const auto moof = file.boxAt(index.mediaEnd, "moof");
   const auto mdat = moof ? file.boxAt(moof->end(), "mdat") : std::nullopt;

@@ -1,4 +1,4 @@
-// Sample descriptions of H.264 and AAC.
+// "stsd" boxes of H.264 and AAC.
 #include "capture/movie/sample_description.h"
 
 #include "capture/movie/box_writer.h"

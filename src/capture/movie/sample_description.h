@@ -7,10 +7,10 @@
 
 namespace lmx {
 
-/// Of H.264. @param avcC  decoder configuration record (ISO/IEC 14496-15)
+/// "stsd" of an H.264 track. @param avcC  decoder configuration record (ISO/IEC 14496-15)
 Bytes videoSampleDescription(std::uint16_t width, std::uint16_t height, std::span<const std::uint8_t> avcC);
 
-/// Of AAC. @param config  AudioSpecificConfig (ISO/IEC 14496-3), at most some hundred bytes
+/// "stsd" of an AAC track. @param config  AudioSpecificConfig (ISO/IEC 14496-3), at most some hundred bytes
 Bytes audioSampleDescription(std::uint32_t sampleRate, std::uint16_t channels,
                              std::span<const std::uint8_t> config);
 

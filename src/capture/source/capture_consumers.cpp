@@ -1,4 +1,4 @@
-// Handing media and the end of them to every consumer.
+// Delivers media and errors to every consumer.
 #include "capture/source/capture_consumers.h"
 
 #include "platform/log.h"

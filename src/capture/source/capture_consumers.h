@@ -1,4 +1,4 @@
-// Those who get what a pipeline captures.
+// The consumers of a capture pipeline.
 #pragma once
 #include <memory>
 #include <mutex>
@@ -10,7 +10,7 @@
 
 namespace lmx {
 
-/// Gets what is captured, on streaming threads. Must return quickly: queue and return.
+/// Receives captured media on streaming threads. Must return quickly: queue and return.
 class CaptureConsumer {
  public:
   virtual ~CaptureConsumer() = default;
@@ -23,18 +23,19 @@ class CaptureConsumer {
   virtual void onCaptureError(const CaptureError& error) = 0;
 };
 
-/// A pipeline's consumers, and the error that ended the flow to them. Consumers are called without the lock.
+/// The consumers of a pipeline, and the error that stopped it. Consumers are called without the lock held.
 /// Thread-safe.
 class CaptureConsumers {
  public:
-  /// One that comes after the failure is told at once.
+  /// A consumer that is added after the pipeline has failed gets the error at once.
   void add(const std::shared_ptr<CaptureConsumer>& consumer);
-  /// A call that is under way may still reach the consumer afterwards.
+  /// A call that is already on its way may still reach the consumer afterwards.
   void remove(const CaptureConsumer* consumer);
 
   enum class Medium { video, audio };
   void deliver(Medium medium, GstBuffer* buffer, double runningTime) const;
-  /// Logs the error and tells the consumers. Only the first one counts: what follows is its echo.
+  /// Logs the error and reports it to the consumers. Only the first one counts: others are consequences of
+  /// it.
   void fail(const CaptureError& error);
   [[nodiscard]] std::optional<CaptureError> failure() const;
 

@@ -158,7 +158,7 @@ void CapturePipeline::noteSize(GstSample* sample) {
   height_ = info.height;
 }
 
-// ---- trouble
+// ---- messages and errors
 
 std::optional<CaptureError> CapturePipeline::pendingError() const {
   const MessageHandle message(gst_bus_pop_filtered(bus_.get(), GST_MESSAGE_ERROR));

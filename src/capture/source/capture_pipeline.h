@@ -14,7 +14,7 @@
 
 namespace lmx {
 
-/// Running time counts the seconds since the flow began; the wall clock may be set without moving it.
+/// Running time counts the seconds since the pipeline started; setting the wall clock does not affect it.
 /// Thread-safe but for its destruction, which closes the devices and waits for the streaming threads.
 class CapturePipeline : public CaptureSession {
  public:
@@ -35,7 +35,7 @@ class CapturePipeline : public CaptureSession {
   [[nodiscard]] double runningTimeAt(double wallTime) const;
   /// Wall-clock time of running time 0.
   [[nodiscard]] double wallOffset() const;
-  /// False for devices of "speed=max", which deliver as fast as they are listened to.
+  /// False for devices of "speed=max", which deliver as fast as their consumers take.
   [[nodiscard]] bool realTime() const { return real_time_; }
 
   /// Size of the frames, pixels; 0 before the first frame of a device whose size is not known beforehand.

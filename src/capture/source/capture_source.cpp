@@ -1,4 +1,4 @@
-// Telling sources apart.
+// The key under which a source is shared.
 #include "capture/source/capture_source.h"
 
 #include "support/format.h"

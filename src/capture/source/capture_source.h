@@ -16,14 +16,14 @@ struct CaptureSource {
   int sampleRate = 48000;  ///< Hz
   int channels = 2;
 
-  /// The same for equal sources only.
+  /// Identifies the source: equal for equal sources, different for others.
   [[nodiscard]] std::string key() const;
-  /// The camera; the microphone where there is none.
+  /// For messages: the camera, or the microphone where there is no camera.
   [[nodiscard]] std::string name() const { return videoDevice.value_or(audioDevice.value_or("")); }
-  /// Of kind "unknown" without a device.
+  /// The identifiers taken apart; of kind "unknown" where there is no device.
   [[nodiscard]] DeviceID video() const { return parseDeviceID(videoDevice.value_or("")); }
   [[nodiscard]] DeviceID audio() const { return parseDeviceID(audioDevice.value_or("")); }
-  /// Whether picture and sound come out of the same device.
+  /// Whether picture and sound come from the same device.
   [[nodiscard]] bool oneDevice() const { return videoDevice == audioDevice; }
 };
 

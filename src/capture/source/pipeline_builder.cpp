@@ -1,4 +1,4 @@
-// Launch line, real devices, clock and the marks of the synthetic ones.
+// From the launch line to a pipeline with devices and clock.
 #include "capture/source/pipeline_builder.h"
 
 #include "capture/source/devices.h"
@@ -16,7 +16,7 @@ std::string unknownIdentifier(const DeviceID& device, const char* what) {
   return "\"" + device.text + "\" is no " + what + " identifier; list them with lmxagentd -i zq-device-list";
 }
 
-/// All that needs no hardware.
+/// The launch line of all devices that need no hardware.
 std::string describe(const CaptureSource& source) {
   std::string description;
   if (source.videoDevice) description += videoBranch(source.video(), source.frameRate);
@@ -41,7 +41,7 @@ Result<GstHandle<GstElement>, CaptureError> launch(const CaptureSource& source) 
   return *std::move(pipeline);
 }
 
-/// Null for null.
+/// Takes ownership of a new element; null stays null.
 GstHandle<GstElement> owned(GstElement* element) {
   if (element != nullptr) gst_object_ref_sink(element);
   return GstHandle<GstElement>(element);
@@ -81,7 +81,7 @@ Result<GstHandle<GstElement>, CaptureError> buildCapturePipeline(const CaptureSo
   if (!pipeline) return pipeline;
   GstElement* element = pipeline->get();
   if (auto error = addHardware(element, source)) return *std::move(error);
-  // One clock for all, and a monotonic one: a microphone's own clock would bend the picture's times.
+  // One monotonic clock for all: a microphone's own clock would distort the times of the picture.
   const GstHandle<GstClock> clock(gst_system_clock_obtain());
   gst_pipeline_use_clock(GST_PIPELINE(element), clock.get());
   if (source.video().kind == DeviceKind::test) attachTestPicture(element, source.video());

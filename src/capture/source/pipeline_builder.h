@@ -9,7 +9,7 @@ namespace lmx {
 
 /// A pipeline that is not started. Frames arrive at its appsink "vsink", samples at "asink"; a medium without
 /// a device has no sink. Its clock is the system's monotonic one.
-/// @return why a device can't be had: kDeviceNotFound or kDeviceFailed
+/// @return kDeviceNotFound or kDeviceFailed when a device is missing or can't be set up
 Result<GstHandle<GstElement>, CaptureError> buildCapturePipeline(const CaptureSource& source);
 
 }  // namespace lmx

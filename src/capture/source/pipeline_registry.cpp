@@ -1,4 +1,4 @@
-// Counting the users of a pipeline.
+// Counts the users of each pipeline.
 #include "capture/source/pipeline_registry.h"
 
 namespace lmx {

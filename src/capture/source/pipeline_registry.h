@@ -1,4 +1,4 @@
-// The capture pipelines that are open in this process, shared by all who ask for the same devices.
+// Shares open capture pipelines among all users of the same devices.
 #pragma once
 #include <map>
 #include <memory>
@@ -9,15 +9,15 @@
 
 namespace lmx {
 
-/// A user's hold on a pipeline. The devices are closed when the last one goes, before anybody can open them
-/// again. Never drop the last one on a streaming thread: closing waits for those.
+/// Keeps a pipeline open. When the last lease goes the devices are closed, before anybody can open them
+/// again. Never drop the last lease on a streaming thread: closing waits for those threads.
 using PipelineLease = std::shared_ptr<CapturePipeline>;
 
-/// Opening and closing happen under one lock: a device that is just being closed is never opened a second
-/// time. Thread-safe.
+/// Opens and closes devices under one lock, so a device is never opened while it is still being closed.
+/// Thread-safe.
 class PipelineRegistry {
  public:
-  /// The one of the process. Never destroyed: threads that outlive main may still give leases back.
+  /// The registry of this process. Never destroyed: threads that outlive main may still return leases.
   static PipelineRegistry& instance();
 
   /// Opens the devices, or joins the pipeline that has them open. Blocks while a device opens.

@@ -1,4 +1,4 @@
-// Times of the last sign of life.
+// The steady clock in milliseconds.
 #include "capture/source/silence_watch.h"
 
 #include <chrono>

@@ -1,17 +1,17 @@
-// Notices devices that have stopped to deliver.
+// Notices when a camera or a microphone has stopped delivering.
 #pragma once
 #include <atomic>
 #include <cstdint>
 
 namespace lmx {
 
-/// When something last came from the camera and from the microphone, by the steady clock. Thread-safe.
+/// Remembers, by the steady clock, when the camera and the microphone last delivered something. Thread-safe.
 class SilenceWatch {
  public:
-  /// Takes note that it came now.
+  /// Something has just come from that device.
   void heardVideo() { last_video_ms_ = now(); }
   void heardAudio() { last_audio_ms_ = now(); }
-  /// Both get their full time again.
+  /// Starts counting anew for both.
   void restart();
   /// Whether nothing has come for more than two seconds.
   [[nodiscard]] bool videoSilent() const { return silentSince(last_video_ms_); }

@@ -1,4 +1,4 @@
-// Reads a capture that a crash or a power cut ended, with as much distrust as that deserves.
+// Reads a capture that a crash or a power cut ended. Nothing it left can be trusted.
 #include "capture/store/abandoned_capture.h"
 
 #include <sys/stat.h>
@@ -21,7 +21,7 @@
 namespace lmx {
 namespace {
 
-/// What a writer that died may have left behind its last whole fragment: one fragment is half a second.
+/// How much a killed writer may have left behind its last whole fragment. A fragment is half a second.
 constexpr std::uint64_t kTornTailLimit = 16U << 20;
 /// The same where there is no whole fragment at all.
 constexpr std::uint64_t kTornStartLimit = 2U << 20;
@@ -48,8 +48,8 @@ double writtenAt(const std::string& path) {
          kReferenceDateOffset;
 }
 
-/// All of the media as one recording, for a journal that can't be trusted: who of several requests wanted
-/// what, and whether one was cancelled, is not known any more, and too much can be cut away later.
+/// All of the media as one recording, for a journal that can't be trusted. Which request wanted what is not
+/// known any more; too much is better than too little, since it can be cut away later.
 CaptureRecord wholeOf(const CaptureRecord& damaged, const MovieIndex& index, const std::string& folder) {
   const TrackIndex& lead = index.tracks.front();
   CaptureRecord record;
@@ -67,7 +67,7 @@ CaptureRecord wholeOf(const CaptureRecord& damaged, const MovieIndex& index, con
   return record;
 }
 
-/// Whether `index` can be of a movie whose writer has died, rather than of a file that a disk has damaged.
+/// Whether the file looks like a movie whose writer was killed, rather than like one that the disk damaged.
 bool makesSense(const MovieIndex& index, std::uint64_t fileSize) {
   const TrackIndex& lead = index.tracks.front();
   return lead.sizes.empty() ? fileSize <= index.mediaEnd + kTornStartLimit : lead.totalDuration > 0;
@@ -78,7 +78,7 @@ std::uint32_t framesIn(const MovieIndex& index, double frameSeconds) {
   return static_cast<std::uint32_t>(std::min(frames, double{std::numeric_limits<std::uint32_t>::max()}));
 }
 
-/// Frames of the movie that all of the media have become, for its document; 0 when there is no such movie.
+/// Length of the movie that the media were moved to, in frames, for its document; 0 when there is none.
 std::uint32_t framesOfTheMovie(const CaptureRecord& record) {
   for (const auto& [uuid, path] : record.movies) {
     const Request* request = record.marks.find(uuid);
@@ -89,7 +89,7 @@ std::uint32_t framesOfTheMovie(const CaptureRecord& record) {
   return 0;
 }
 
-/// Null, as the answer for a capture that stays as it is.
+/// Logs that the capture stays as it is. @return null
 std::shared_ptr<FinishedCapture> leftAlone(const std::string& path, const char* why) {
   LMPLogMessage(
       nullptr, kLogError,
@@ -101,7 +101,7 @@ std::shared_ptr<FinishedCapture> leftAlone(const std::string& path, const char* 
 /// The folder's journal, locked.
 Result<std::shared_ptr<Journal>> openJournal(const std::string& path, bool hasMedia) {
   auto journal = Journal::open(path);
-  // Media without a journal are nobody's: a capture makes its journal first and removes it last.
+  // No live capture has media but no journal: the journal is made first and removed last.
   if (!journal && journal.error().systemError == ENOENT && hasMedia) return Journal::create(path);
   return journal;
 }

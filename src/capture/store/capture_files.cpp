@@ -1,4 +1,4 @@
-// Making and removing a capture's folder.
+// Makes and removes the folder of a capture.
 #include "capture/store/capture_files.h"
 
 #include <unistd.h>
@@ -13,7 +13,7 @@ namespace lmx {
 namespace {
 
 int makeFolder(const std::string& folder) {
-  // The end of the capture before takes their common folder away when it is empty: it may go in between.
+  // The end of an earlier capture removes the common folder if it is empty, possibly right now: try again.
   int error = ENOENT;
   for (int attempt = 0; error == ENOENT && attempt < 10; ++attempt) error = mkdir_p(folder.c_str(), 0700);
   return error;

@@ -1,4 +1,4 @@
-// The files that a capture keeps in a folder of its own while it is recorded.
+// The files of a capture in progress, in a folder of its own.
 #pragma once
 #include <memory>
 #include <string>

@@ -104,7 +104,7 @@ RequestMarks CaptureMarks::close() {
   return marks_;
 }
 
-// ---- the recorder
+// ---- wishes
 
 CaptureMarks::Wish CaptureMarks::wishAt(double previous, double t, bool firstFrame) const {
   const std::lock_guard lock(mutex_);

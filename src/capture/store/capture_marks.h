@@ -1,4 +1,4 @@
-// The marks of a running capture, written to its journal as they come, and the decision when it ends.
+// Keeps the marks of a running capture, writes them to its journal and decides when the capture ends.
 #pragma once
 #include <memory>
 #include <mutex>
@@ -24,23 +24,24 @@ class CaptureMarks {
   void cancel(const std::string& uuid);
   void pause(double t);
   void resume(double t);
-  /// Names the whole capture, from `t` on. Not a request: nothing of it is recorded or journalled.
+  /// Names the whole capture, from `t` on. The tag is no request: it records nothing and is not journalled.
   void tag(const std::string& uuid, double t);
 
-  /// Ends the span of the tag; also in a closed capture.
+  /// Ends the span of the tag, even if the capture has been closed.
   void untag(const std::string& uuid, double t);
 
   [[nodiscard]] bool paused() const;
   /// Recorded seconds of a request, or seconds since the tag, up to `now`; 0 for an unknown one.
   [[nodiscard]] double elapsed(const std::string& uuid, double now) const;
 
-  /// Decides that the capture ends at `t`; absent: with its last mark. Only the first decision counts.
+  /// Decides that the capture ends at `t`, or with its last mark if `t` is absent. Only the first call
+  /// counts.
   /// @return whether this was the first
   bool end(Ending how, std::optional<double> t);
-  /// Nothing as long as no end has been decided.
+  /// Nothing until an end has been decided.
   [[nodiscard]] std::optional<double> endTime() const;
   [[nodiscard]] bool cancelled() const;
-  /// Whether it has been cancelled and no request wants its movie: nothing of it will be needed.
+  /// Whether the capture has been cancelled and no request wants its movie: it can be discarded.
   [[nodiscard]] bool worthless() const;
 
   struct Wish {
@@ -51,7 +52,7 @@ class CaptureMarks {
   /// @param firstFrame  the movie has no frame yet: a request that has ended already takes this one
   [[nodiscard]] Wish wishAt(double previous, double t, bool firstFrame) const;
 
-  /// No mark is taken any more. @return the marks as they are now
+  /// Accepts no more marks. @return the final marks
   RequestMarks close();
 
  private:

@@ -1,4 +1,4 @@
-// Journal lines to a record.
+// Parses journal lines into a record.
 #include "capture/store/capture_record.h"
 
 #include <charconv>
@@ -15,11 +15,11 @@ namespace {
 constexpr double kShortestFrame = 1e-4;
 constexpr double kLongestFrame = 1e4;
 
-/// The words of a line. A number that is none makes it a line that is not understood.
+/// Reads the words of a line. After a word that should be a number but is none, ok() is false.
 class LineReader {
  public:
   explicit LineReader(const JournalWords& words) : words_(words) {}
-  /// Whether it is a line of that kind with that many words.
+  /// Whether the line is of that kind and has that many words.
   [[nodiscard]] bool is(const char* kind, std::size_t words) const {
     return words_.size() == words && words_[0] == kind;
   }
@@ -44,7 +44,8 @@ class LineReader {
   bool ok_ = true;
 };
 
-// Each of these takes its kinds of lines. @return whether the line was understood; only then it has an effect
+// Each of these handles some kinds of lines. It returns whether the line was understood; other lines change
+// nothing.
 
 bool applyStart(CaptureRecord& record, const JournalWords& words) {
   LineReader line(words);
@@ -113,7 +114,7 @@ CaptureRecord parseJournal(const std::string& text) {
   CaptureRecord record;
   bool understood = true;
   std::size_t at = 0;
-  // Only lines that end are whole: the last one of a killed writer may be torn.
+  // A line without its end is torn: its writer was killed.
   for (std::size_t end; (end = text.find('\n', at)) != std::string::npos; at = end + 1) {
     understood = applyLine(record, journalWords(text.substr(at, end - at))) && understood;
   }

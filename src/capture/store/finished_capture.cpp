@@ -1,4 +1,4 @@
-// Movies out of a closed capture.
+// Makes the movies of a closed capture and removes it.
 #include "capture/store/finished_capture.h"
 
 #include <unistd.h>
@@ -92,7 +92,7 @@ std::optional<CaptureError> FinishedCapture::copyFrames(const std::vector<FrameR
                                                         const std::string& path) {
   const auto index = readMovieIndex(media_);
   if (!index) return CaptureError{CaptureError::kDomain, kWriteFailed, media_ + " can't be read"};
-  // In the capture's own folder: no other capture writes there, and what a crash leaves goes with it.
+  // Written in the capture's own folder: no other capture writes there, and a crash's leftovers go with it.
   int error = copyOver(*index, ranges, folder_ + "/" + kPartName, path);
   if (error == EXDEV)
     error = copyOver(*index, ranges, path + "." + folder_.substr(folder_.rfind('/') + 1) + ".part", path);
@@ -136,7 +136,7 @@ std::optional<RecoveredRecording> FinishedCapture::recover(const Request& reques
   return describe(request, path);
 }
 
-/// For now where the disk is to blame, for good where there is nothing to make a movie of.
+/// For good if there are no media for the request; for now if the disk is to blame.
 void FinishedCapture::giveUp(const Request& request, const CaptureError& error) {
   const bool nothing = error.code == kNoMedia;
   LMPLogMessage(nullptr, nothing ? kLogWarning : kLogError, "Unfinished recording in %s: %s%s",

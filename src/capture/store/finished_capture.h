@@ -1,4 +1,4 @@
-// What a capture left on the disk, and the movies that are made of it.
+// A closed capture on the disk, and the movies made from it.
 #pragma once
 #include <memory>
 #include <mutex>
@@ -14,8 +14,8 @@
 
 namespace lmx {
 
-/// What becomes of the media once every request has its movie. They are kept where a part can't be read: it
-/// may still be of use to somebody.
+/// What becomes of the media once every request has its movie. They are kept if part of them can't be read:
+/// somebody may still be able to rescue it.
 enum class MediaAfterUse { remove, keep };
 
 /// A closed capture: its folder with the journal and the media. Thread-safe; its operations may take as long

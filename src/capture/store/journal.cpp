@@ -1,4 +1,4 @@
-// Lines to the disk.
+// Creates, locks and writes a journal.
 #include "capture/store/journal.h"
 
 #include <fcntl.h>
@@ -29,7 +29,7 @@ Result<std::shared_ptr<Journal>> Journal::open(const std::string& path) {
 }
 
 Result<std::shared_ptr<Journal>> Journal::create(const std::string& path) {
-  // It bears its name only once it is locked: the recovery at the start must not take it for a dead one.
+  // It gets its name only once it is locked: otherwise a recovery might take it for an abandoned one.
   const std::string name = path + ".new";
   UniqueFd file(::open(name.c_str(), O_RDWR | O_APPEND | O_CLOEXEC | O_CREAT | O_EXCL, 0600));
   if (!file.valid() || flock(file.get(), LOCK_EX | LOCK_NB) != 0) return Error::fromSystem(name);
@@ -47,7 +47,7 @@ void Journal::append(const JournalWords& words) {
   const ssize_t written = write(file_.get(), line.data(), line.size());
   if (written == static_cast<ssize_t>(line.size())) return;
   const int error = written < 0 ? errno : ENOSPC;
-  // Half a line must not become one with the next; cutting a file short needs no space.
+  // Half a line must not run into the next one. Truncating the file needs no space.
   struct stat status {};
   const bool whole =
       written <= 0 || (fstat(file_.get(), &status) == 0 &&

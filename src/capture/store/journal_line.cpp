@@ -1,4 +1,4 @@
-// Percent escapes.
+// Escapes and splits the words of journal lines.
 #include "capture/store/journal_line.h"
 
 #include <cctype>

@@ -1,4 +1,4 @@
-// Lines of a capture's journal: words between blanks, so escaped that any text is one word. Pure.
+// Lines of a capture's journal: words separated by blanks, escaped so that a word can hold any text. Pure.
 #pragma once
 #include <string>
 #include <vector>

@@ -1,4 +1,4 @@
-// Free names, and renaming what is in the way.
+// Finds free names and renames what is in the way.
 #include "capture/store/movie_names.h"
 
 #include <unistd.h>

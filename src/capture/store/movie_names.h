@@ -1,4 +1,4 @@
-// Names for movies in a folder where others may have the name already.
+// Names movies in a folder where the wanted name may be taken.
 #pragma once
 #include <string>
 

@@ -34,12 +34,12 @@ std::vector<FrameRange> framesOf(const Request& request, const std::vector<Movie
   std::vector<FrameRange> ranges;
   if (frameSeconds <= 0) return ranges;
   for (std::size_t i = 0; i < runs.size(); ++i) {
-    // Media that could not be read to their end hold fewer frames than the journal tells of.
+    // Media that could not be read to their end hold fewer frames than the journal mentions.
     const std::uint32_t runEnd =
         i + 1 < runs.size() ? std::min(runs[i + 1].firstFrame, totalFrames) : totalFrames;
     for (const Span& span : request.spans) append(ranges, framesIn(span, runs[i], runEnd, frameSeconds));
   }
-  // A request that ended before the first frame came still has that one.
+  // A request that ended before the first frame still gets that frame.
   if (ranges.empty() && totalFrames > 0 && !request.spans.empty() && !runs.empty() &&
       request.spans.front().start <= runs.front().sessionTime) {
     ranges.push_back({0, 1});
