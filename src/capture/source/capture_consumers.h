@@ -19,7 +19,7 @@ class CaptureConsumer {
   virtual void onVideo(BufferHandle buffer, double runningTime) = 0;
   /// @param buffer  interleaved 32-bit float samples
   virtual void onAudio(BufferHandle buffer, double runningTime) = 0;
-  /// On the pipeline's bus thread; once at most.
+  /// Once at most; on the pipeline's bus thread, or inside CaptureConsumers::add.
   virtual void onCaptureError(const CaptureError& error) = 0;
 };
 
