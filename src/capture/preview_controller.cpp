@@ -14,7 +14,9 @@ bool PreviewController::attachIOWithDevice(const std::string& device, CaptureErr
     *error = lease.error();
     return false;
   }
-  const auto hardware = findHardware(device);
+  // Listing the hardware takes a while, and other devices have no name there.
+  const bool isHardware = parseDeviceID(device).kind == DeviceKind::hardware;
+  const auto hardware = isHardware ? findHardware(device) : std::nullopt;
   const std::lock_guard lock(mutex_);
   source_ = source;
   name_ = hardware ? hardware->name : device;
