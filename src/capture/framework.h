@@ -6,7 +6,7 @@
 
 namespace lmx {
 
-/// The framework on GStreamer. Cheap to make: plug-ins are loaded by warmUp or by the first use.
+/// The framework on GStreamer.
 std::shared_ptr<CaptureFramework> newCaptureFramework();
 
 }  // namespace lmx

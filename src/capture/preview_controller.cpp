@@ -1,4 +1,4 @@
-// Opening a camera for a look.
+// Opening and closing the camera of a preview.
 #include "capture/preview_controller.h"
 
 #include "capture/source/devices.h"
@@ -9,9 +9,14 @@ namespace lmx {
 bool PreviewController::attachIOWithDevice(const std::string& device, CaptureError* error) {
   CaptureSource source;
   source.videoDevice = device;
-  const auto lease = CapturePipeline::acquire(source, error);
-  if (!lease) return false;
-  const auto hardware = findHardware(device);
+  const auto lease = PipelineRegistry::instance().acquire(source);
+  if (!lease) {
+    *error = lease.error();
+    return false;
+  }
+  // Listing the hardware takes a while, and other devices have no name there.
+  const bool isHardware = parseDeviceID(device).kind == DeviceKind::hardware;
+  const auto hardware = isHardware ? findHardware(device) : std::nullopt;
   const std::lock_guard lock(mutex_);
   source_ = source;
   name_ = hardware ? hardware->name : device;
@@ -28,11 +33,6 @@ std::string PreviewController::videoDeviceLocalizedDisplayName() const {
   return name_;
 }
 
-void PreviewController::setDelegate(std::shared_ptr<LMRPreviewControllerDelegate> delegate) {
-  const std::lock_guard lock(mutex_);
-  delegate_ = std::move(delegate);
-}
-
 std::shared_ptr<CaptureSession> PreviewController::session() const {
   const std::lock_guard lock(mutex_);
   if (lease_) return lease_;
@@ -42,10 +42,12 @@ std::shared_ptr<CaptureSession> PreviewController::session() const {
 void PreviewController::startPreview() {
   const std::lock_guard lock(mutex_);
   if (lease_) return;
-  CaptureError error;
-  lease_ = CapturePipeline::acquire(source_, &error);
-  if (!lease_)
-    LMPLogMessage(nullptr, kLogError, "The preview could not be started: %s", error.message.c_str());
+  auto lease = PipelineRegistry::instance().acquire(source_);
+  if (lease) {
+    lease_ = *std::move(lease);
+  } else {
+    LMPLogMessage(nullptr, kLogError, "The preview could not be started: %s", lease.error().message.c_str());
+  }
 }
 
 void PreviewController::stopPreview() {

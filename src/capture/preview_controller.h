@@ -1,20 +1,21 @@
-// A camera looked at without recording: proves that it can be had, and holds it open while a preview runs.
+// Looks at a camera without recording: proves that it can be had, and holds it open while a preview runs.
 #pragma once
 #include <mutex>
 #include <string>
 
-#include "capture/source/capture_pipeline.h"
+#include "capture/source/pipeline_registry.h"
 
 namespace lmx {
 
-/// The device is open only while a preview runs: a lit lamp in an empty room is a complaint. Thread-safe.
+/// The camera is open only while a preview runs: its lamp must not be lit in an empty room. No pictures are
+/// taken of a preview, so its delegate is never called. Thread-safe.
 class PreviewController : public LMRPreviewController {
  public:
   explicit PreviewController(std::shared_ptr<CaptureSession> session) : session_(std::move(session)) {}
   bool attachIOWithDevice(const std::string& device, CaptureError* error) override;
   void addAudioDeviceWithID(const std::optional<std::string>& device) override;
   [[nodiscard]] std::string videoDeviceLocalizedDisplayName() const override;
-  void setDelegate(std::shared_ptr<LMRPreviewControllerDelegate> delegate) override;
+  void setDelegate(std::shared_ptr<LMRPreviewControllerDelegate> /*delegate*/) override {}
   [[nodiscard]] std::shared_ptr<CaptureSession> session() const override;
   void startPreview() override;
   void stopPreview() override;
@@ -22,11 +23,10 @@ class PreviewController : public LMRPreviewController {
 
  private:
   mutable std::mutex mutex_;
-  std::shared_ptr<CaptureSession> session_;                 // guarded by mutex_
-  std::shared_ptr<LMRPreviewControllerDelegate> delegate_;  // guarded by mutex_
-  CaptureSource source_;                                    // guarded by mutex_
-  std::string name_;                                        // guarded by mutex_
-  CapturePipeline::Lease lease_;                            // guarded by mutex_
+  const std::shared_ptr<CaptureSession> session_;
+  CaptureSource source_;  // guarded by mutex_
+  std::string name_;      // guarded by mutex_
+  PipelineLease lease_;   // guarded by mutex_: null unless it runs
 };
 
 }  // namespace lmx

@@ -1,4 +1,5 @@
-// What the recording engine needs of a capture framework. capture/ implements it; tests script it.
+// What the recording engine needs of a capture framework. capture/ implements it; tests replace it with a
+// script.
 #pragma once
 #include <chrono>
 #include <cstdint>
@@ -63,49 +64,55 @@ struct RecoveredRecording {
   std::function<void()> forget;  ///< call it once the document is written: what is left of the capture goes
 };
 
-/// Records one capture. All operations are thread-safe unless said otherwise and return quickly, but for
-/// prepareRecording (opens devices) and processRequest (as long as the disk needs).
-/// Times are seconds since 2001-01-01 UTC. A request is what one START asked for: half-open spans between
-/// marks.
+/// Records one capture. All operations are thread-safe unless said otherwise. They return quickly, but for
+/// prepareRecording (opens devices) and those that deal with finished movies: these wait for the disk, and
+/// for each other. Times are seconds since 2001-01-01 UTC. A request is what one START asked for: half-open
+/// spans between marks.
 class LMRCaptureController {
  public:
   virtual ~LMRCaptureController() = default;
 
-  /// The delegate must live until it has had its one report or the controller is destroyed.
+  /// Gets one report, when the capture has ended. Held weakly: a delegate that has gone by then gets none.
   virtual void setDelegate(std::weak_ptr<CaptureControllerDelegate> delegate) = 0;
-  /// Opens what the settings name, or joins `session`, and sets up the writing. Main thread.
-  /// @return false when it can't: the reason is in lastError().
+  /// Opens the devices that the settings name and sets up the writing; once. Main thread, blocks while a
+  /// device opens.
+  /// @param session  not needed: devices that a preview has open in the same format are found and shared
+  /// @return false when it can't: the reason is in lastError()
   virtual bool prepareRecording(const LMRRecordingContext& settings,
                                 std::shared_ptr<CaptureSession> session) = 0;
-  /// @return false when the recording can't run; true when it runs, or has already been ended in order.
+  /// @return false when the recording could not be prepared; true when it runs, or has ended already
   virtual bool startRecording() = 0;
-  /// End with lmrCaptureDidComplete, once the file is closed. A second stop or cancel does nothing.
+  /// Ends with lmrCaptureDidComplete, once the file is closed. Only the first stop or cancel counts.
   virtual void stopRecording() = 0;
   /// Ends with lmrCaptureDidCancel. What cancelled requests recorded is deleted; a request that was started
   /// by mark and that nobody cancelled is kept for recoverAbandonedRequests.
   virtual void cancelRecording() = 0;
+  /// Between pause and resume nothing is recorded, whatever the marks say.
   virtual void pauseRecording() = 0;
   virtual void resumeRecording() = 0;
 
-  /// Tags the whole capture with `uuid`, from now on; not a client's request and never submitted or
-  /// recovered.
+  /// Tags the whole capture with `uuid`, from now on. The tag is no client's request: it records nothing and
+  /// is never submitted or recovered.
   virtual void setStartWithUUID(const std::string& uuid) = 0;
   virtual void setStopWithUUID(const std::string& uuid) = 0;
-  /// Opens a span of a client's request. `parameters` (of its START) are kept with the first mark.
+  /// Opens a span of a client's request. `parameters` (of its START) are kept with the first mark. Ignored
+  /// once the capture is ending.
   virtual void setStartWithUUID(const std::string& uuid, double atTime, SharedDictionary parameters) = 0;
   virtual void setStopWithUUID(const std::string& uuid, double atTime) = 0;
   virtual void cancelRequestWithUUID(const std::string& uuid) = 0;
 
-  /// Recorded seconds of the request up to now; 0 for an unknown one.
+  /// Recorded seconds of the request (for the tag: seconds since it was set) up to now; 0 for an unknown one.
   virtual double elapsedTimeForRequestWithUUID(const std::string& uuid) = 0;
-  /// Media written so far by the whole capture.
+  /// Media recorded so far by the whole capture.
   virtual std::int64_t elapsedTimeInMilliseconds() = 0;
-  /// 3 recording, 4 paused, anything else: neither.
+  /// kCaptureRecording, kCapturePaused; anything else: neither.
   virtual int recordingState() = 0;
+  /// Whether the file is closed and the devices are given back, or nothing could be prepared at all.
   virtual bool hasShutDown() = 0;
   [[nodiscard]] virtual std::optional<CaptureError> lastError() = 0;
+  /// The open devices; null before and after the capture.
   [[nodiscard]] virtual std::shared_ptr<CaptureSession> session() = 0;
-  /// Per-channel levels in decibels, newest.
+  /// Newest level of each channel in decibels; empty where levels are not measured.
   virtual std::vector<double> audioAveragePowerLevels() = 0;
 
   /// Writes the request's movie to `outputPath`: there under its name only when whole. Blocks; waits for the
@@ -118,11 +125,12 @@ class LMRCaptureController {
   /// one that was submitted has been processed. Blocks.
   virtual std::vector<RecoveredRecording> recoverAbandonedRequests() = 0;
 
-  // Continuous recording.
+  /// Frees space during a continuous recording. @return path of the deleted segment; nothing when there is
+  /// none
   virtual std::optional<std::string> deleteEarliestSegment() = 0;
 };
 
-/// Preview frames of a preview controller, on a thread of the framework.
+/// Takes the pictures of a preview, on a thread of the framework.
 class LMRPreviewControllerDelegate {
  public:
   virtual ~LMRPreviewControllerDelegate() = default;
@@ -130,16 +138,21 @@ class LMRPreviewControllerDelegate {
   virtual void handleJPEGData(std::vector<std::uint8_t> jpeg) = 0;
 };
 
-/// A capture session on one camera (and one microphone).
+/// A look at one camera (and one microphone) without recording.
 class LMRPreviewController {
  public:
   virtual ~LMRPreviewController() = default;
-  /// Opens the camera. @return false, with `*error` set, when it can't be had. Main thread.
+  /// Chooses the camera and opens it for a moment, to prove that it can be had. Main thread, blocks
+  /// meanwhile.
+  /// @return false, with `*error` set, when it can't be had
   virtual bool attachIOWithDevice(const std::string& device, CaptureError* error) = 0;
   virtual void addAudioDeviceWithID(const std::optional<std::string>& device) = 0;
   [[nodiscard]] virtual std::string videoDeviceLocalizedDisplayName() const = 0;
+  /// May never be called: a framework need not take pictures of a preview.
   virtual void setDelegate(std::shared_ptr<LMRPreviewControllerDelegate> delegate) = 0;
+  /// That of the running preview, else the one it was made with; may be null.
   [[nodiscard]] virtual std::shared_ptr<CaptureSession> session() const = 0;
+  /// Opens the devices until stopPreview. A failure is logged: isPreviewRunning() tells.
   virtual void startPreview() = 0;
   virtual void stopPreview() = 0;
   [[nodiscard]] virtual bool isPreviewRunning() const = 0;

@@ -1,4 +1,4 @@
-// A recording context in words.
+// Describes a recording context in words.
 #include "capture/api/capture_settings.h"
 
 #include "support/format.h"

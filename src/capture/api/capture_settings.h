@@ -1,5 +1,4 @@
-// What a capture is to be: the recording context, and the catalogue of devices and compressions it is built
-// from.
+// The settings of a capture, and the catalogue of devices and compressions they are chosen from.
 #pragma once
 #include <cstdint>
 #include <memory>
@@ -19,9 +18,9 @@ enum class RecordingQuality { good = 0, better = 1, best = 2 };
 /// How one medium is encoded.
 struct LMRCompressionOptions {
   MediaType media = MediaType::video;
-  RecordingQuality quality = RecordingQuality::better;
-  int sampleRate = 48000;  ///< Hz, audio
-  int channels = 2;        ///< audio
+  RecordingQuality quality = RecordingQuality::better;  ///< video; sound has one bit rate
+  int sampleRate = 48000;                               ///< Hz, audio
+  int channels = 2;                                     ///< audio
   bool operator==(const LMRCompressionOptions&) const = default;
 };
 

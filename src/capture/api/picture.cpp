@@ -1,4 +1,4 @@
-// Frame rates as fractions.
+// Turns frame rates into fractions.
 #include "capture/api/picture.h"
 
 #include <cmath>

@@ -1,4 +1,4 @@
-// The encoder pipeline.
+// Feeds the encoder pipeline and takes its samples.
 #include "capture/gst/encoder.h"
 
 #include <gst/app/gstappsink.h>
@@ -9,51 +9,16 @@
 #include <cmath>
 #include <cstring>
 
-#include "capture/movie/movie_boxes.h"
-#include "platform/log.h"
-#include "support/format.h"
+#include "capture/movie/sample_description.h"
 
 namespace lmx {
 namespace {
 
 constexpr int kSamplesPerPacket = 1024;  // AAC
 
-std::string videoDescription(const VideoEncoding& video) {
-  const FrameRate rate = video.frameRate;
-  const int keyInterval = std::max(1, static_cast<int>(std::lround(1.0 / rate.frameSeconds())));
-  return string_with_format(
-      "appsrc name=vsrc format=time block=true max-buffers=8 max-bytes=0 max-time=0 stream-type=stream "
-      "caps=video/x-raw,format=I420,width=%d,height=%d,framerate=%d/%d,pixel-aspect-ratio=1/1 ! "
-      "x264enc tune=zerolatency speed-preset=%s bitrate=%d key-int-max=%d byte-stream=false aud=false "
-      "option-string=scenecut=0 ! video/x-h264,stream-format=avc,alignment=au ! "
-      "appsink name=vout sync=false async=false max-buffers=0 enable-last-sample=false ",
-      video.size.width, video.size.height, rate.numerator, rate.denominator, speedPreset(video),
-      videoBitRate(video), keyInterval);
-}
-
-std::string audioDescription(const AudioEncoding& audio) {
-  return string_with_format(
-      "appsrc name=asrc format=time block=true max-buffers=64 max-bytes=0 max-time=0 stream-type=stream "
-      "caps=audio/x-raw,format=F32LE,layout=interleaved,rate=%d,channels=%d%s ! "
-      "avenc_aac bitrate=%d ! appsink name=aout sync=false async=false max-buffers=0 "
-      "enable-last-sample=false ",
-      audio.sampleRate, audio.channels, audio.channels == 2 ? ",channel-mask=(bitmask)0x3" : "",
-      audio.bitRate);
-}
-
-/// What a broken driver gives must not end the recording: the encoder refuses what is no number, and of a
-/// sample far beyond full scale it makes a packet that players can't read.
+/// A broken driver must not end the recording: the encoder refuses NaN, and turns samples far beyond full
+/// scale into packets that players can't read.
 float soundLevel(float sample) { return std::isnan(sample) ? 0.0F : std::clamp(sample, -1.0F, 1.0F); }
-
-Bytes codecData(GstSample* sample) {
-  const GstStructure* structure = gst_caps_get_structure(gst_sample_get_caps(sample), 0);
-  const GValue* value = gst_structure_get_value(structure, "codec_data");
-  if (value == nullptr) return {};
-  GstBuffer* buffer = gst_value_get_buffer(value);
-  Bytes bytes(gst_buffer_get_size(buffer));
-  gst_buffer_extract(buffer, 0, bytes.data(), bytes.size());
-  return bytes;
-}
 
 Bytes contents(GstBuffer* buffer) {
   Bytes bytes(gst_buffer_get_size(buffer));
@@ -61,76 +26,65 @@ Bytes contents(GstBuffer* buffer) {
   return bytes;
 }
 
+Bytes codecData(GstSample* sample) {
+  const GstStructure* structure = gst_caps_get_structure(gst_sample_get_caps(sample), 0);
+  const GValue* value = gst_structure_get_value(structure, "codec_data");
+  return value == nullptr ? Bytes() : contents(gst_value_get_buffer(value));
+}
+
+/// A buffer of `count` values from `samples` on, or of silence if that is null. Null when out of memory.
+BufferHandle soundBuffer(const float* samples, std::size_t count) {
+  BufferHandle buffer(gst_buffer_new_allocate(nullptr, count * sizeof(float), nullptr));
+  GstMapInfo map;
+  if (gst_buffer_map(buffer.get(), &map, GST_MAP_WRITE) == FALSE) return nullptr;
+  if (samples != nullptr) {
+    std::transform(samples, samples + count, reinterpret_cast<float*>(map.data), soundLevel);
+  } else {
+    std::memset(map.data, 0, count * sizeof(float));
+  }
+  gst_buffer_unmap(buffer.get(), &map);
+  return buffer;
+}
+
 }  // namespace
 
-int videoBitRate(const VideoEncoding& video) {
-  static constexpr double kFactor[] = {0.75, 1.0, 1.6};
-  const double megapixels = video.size.width * video.size.height / video.frameRate.frameSeconds() / 1e6;
-  // About 2.5 Mbit/s at 720p30 and 4.5 at 1080p30: slides and a speaker, sharp text.
-  const double kilobits = 205.0 * std::pow(megapixels, 0.75);
-  return std::max(150, static_cast<int>(kilobits * kFactor[static_cast<int>(video.quality)]));
+Encoder::Encoder(const MovieEncoding& movie, EncoderOutput output)
+    : video_(movie.video), audio_(movie.audio), output_(std::move(output)) {}
+
+Result<std::unique_ptr<Encoder>> Encoder::create(const MovieEncoding& movie, EncoderOutput output) {
+  auto pipeline = newPipeline(encoderDescription(movie));
+  if (!pipeline) return std::move(pipeline).error();
+  std::unique_ptr<Encoder> encoder(new Encoder(movie, std::move(output)));
+  encoder->attach(*std::move(pipeline));
+  if (gst_element_set_state(encoder->pipeline_.get(), GST_STATE_PLAYING) == GST_STATE_CHANGE_FAILURE)
+    return Error{"the encoder could not be started"};
+  return encoder;
 }
 
-const char* speedPreset(const VideoEncoding& video) {
-  const bool upTo720p = video.size.width * video.size.height <= 1280 * 720;
-  if (video.quality == RecordingQuality::good || !upTo720p) return "superfast";
-  return "veryfast";
-}
-
-std::uint32_t videoTimescale(FrameRate rate) {
-  std::uint32_t scale = static_cast<std::uint32_t>(rate.numerator);
-  while (scale < 10000) scale *= 10;
-  return scale;
-}
-
-std::uint32_t frameDuration(FrameRate rate) {
-  return videoTimescale(rate) / static_cast<std::uint32_t>(rate.numerator) *
-         static_cast<std::uint32_t>(rate.denominator);
-}
-
-Encoder::Encoder(std::optional<VideoEncoding> video, std::optional<AudioEncoding> audio, EncoderOutput output)
-    : video_(video), audio_(audio), output_(std::move(output)) {}
-
-std::unique_ptr<Encoder> Encoder::create(const std::optional<VideoEncoding>& video,
-                                         const std::optional<AudioEncoding>& audio, EncoderOutput output,
-                                         std::string* problem) {
-  std::unique_ptr<Encoder> encoder(new Encoder(video, audio, std::move(output)));
-  return encoder->build(problem) ? std::move(encoder) : nullptr;
-}
-
-bool Encoder::build(std::string* problem) {
-  std::string description;
-  if (video_) description += videoDescription(*video_);
-  if (audio_) description += audioDescription(*audio_);
-  pipeline_ = newPipeline(description, problem);
-  if (!pipeline_) return false;
-  const auto attach = [this](const char* name, GstFlowReturn (*onSample)(GstElement*, gpointer) noexcept) {
-    GstAppSinkCallbacks callbacks{};
-    callbacks.new_sample = reinterpret_cast<GstFlowReturn (*)(GstAppSink*, gpointer)>(onSample);
-    callbacks.eos = reinterpret_cast<void (*)(GstAppSink*, gpointer)>(&onEos);
-    const GstHandle<GstElement> sink = elementNamed(pipeline_.get(), name);
-    gst_app_sink_set_callbacks(GST_APP_SINK(sink.get()), &callbacks, this, nullptr);
-    ++open_streams_;
-  };
+void Encoder::attach(GstHandle<GstElement> pipeline) {
+  pipeline_ = std::move(pipeline);
   if (video_) {
     video_source_ = elementNamed(pipeline_.get(), "vsrc");
-    attach("vout", &onVideoSample);
+    takeFrom("vout", &onVideoSample);
   }
   if (audio_) {
     audio_source_ = elementNamed(pipeline_.get(), "asrc");
-    attach("aout", &onAudioSample);
+    takeFrom("aout", &onAudioSample);
   }
   const GstHandle<GstBus> bus(gst_element_get_bus(pipeline_.get()));
   gst_bus_set_sync_handler(bus.get(), reinterpret_cast<GstBusSyncHandler>(&onMessage), this, nullptr);
-  if (gst_element_set_state(pipeline_.get(), GST_STATE_PLAYING) == GST_STATE_CHANGE_FAILURE) {
-    *problem = "the encoder could not be started";
-    return false;
-  }
-  return true;
+}
+
+void Encoder::takeFrom(const char* name, NewSample* onSample) {
+  GstAppSinkCallbacks callbacks{};
+  callbacks.new_sample = reinterpret_cast<GstFlowReturn (*)(GstAppSink*, gpointer)>(onSample);
+  callbacks.eos = reinterpret_cast<void (*)(GstAppSink*, gpointer)>(&onEos);
+  const GstHandle<GstElement> sink = elementNamed(pipeline_.get(), name);
+  gst_app_sink_set_callbacks(GST_APP_SINK(sink.get()), &callbacks, this, nullptr);
+  ++open_streams_;
 }
 
 Encoder::~Encoder() {
-  if (!pipeline_) return;
   gst_element_set_state(pipeline_.get(), GST_STATE_NULL);
   const GstHandle<GstBus> bus(gst_element_get_bus(pipeline_.get()));
   gst_bus_set_sync_handler(bus.get(), nullptr, nullptr, nullptr);
@@ -154,27 +108,16 @@ void Encoder::pushVideo(GstBuffer* buffer, std::uint32_t place, bool forceKey) {
 
 void Encoder::pushAudio(const float* samples, std::uint32_t count) {
   if (failed()) return;
-  const std::size_t bytes = std::size_t{count} * static_cast<std::size_t>(audio_->channels) * sizeof(float);
-  GstBuffer* buffer = gst_buffer_new_allocate(nullptr, bytes, nullptr);
-  GstMapInfo map;
-  if (gst_buffer_map(buffer, &map, GST_MAP_WRITE) == FALSE) {
-    gst_buffer_unref(buffer);
-    return;
-  }
-  if (samples != nullptr) {
-    std::transform(samples, samples + bytes / sizeof(float), reinterpret_cast<float*>(map.data), soundLevel);
-  } else {
-    std::memset(map.data, 0, bytes);
-  }
-  gst_buffer_unmap(buffer, &map);
+  BufferHandle buffer = soundBuffer(samples, std::size_t{count} * static_cast<std::size_t>(audio_->channels));
+  if (!buffer) return;
   const auto time = [this](std::int64_t position) {
     return gst_util_uint64_scale(static_cast<guint64>(position), GST_SECOND,
                                  static_cast<guint64>(audio_->sampleRate));
   };
-  GST_BUFFER_PTS(buffer) = time(audio_pushed_);
+  GST_BUFFER_PTS(buffer.get()) = time(audio_pushed_);
   audio_pushed_ += count;
-  GST_BUFFER_DURATION(buffer) = time(audio_pushed_) - GST_BUFFER_PTS(buffer);
-  gst_app_src_push_buffer(GST_APP_SRC(audio_source_.get()), buffer);
+  GST_BUFFER_DURATION(buffer.get()) = time(audio_pushed_) - GST_BUFFER_PTS(buffer.get());
+  gst_app_src_push_buffer(GST_APP_SRC(audio_source_.get()), buffer.release());
 }
 
 bool Encoder::finish(std::int64_t totalSamples, std::chrono::milliseconds limit) {

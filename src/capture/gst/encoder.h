@@ -1,4 +1,4 @@
-// Raw frames and samples of one movie in, H.264 and AAC samples out.
+// Encodes the raw frames and samples of one movie to H.264 and AAC.
 #pragma once
 #include <atomic>
 #include <condition_variable>
@@ -9,48 +9,28 @@
 #include <optional>
 #include <string>
 
-#include "capture/api/capture_settings.h"
-#include "capture/api/picture.h"
+#include "capture/gst/encoding.h"
 #include "capture/gst/gst_handles.h"
-#include "capture/movie/movie_file.h"
+#include "capture/movie/growing_movie.h"
+#include "support/result.h"
 
 namespace lmx {
 
-struct VideoEncoding {
-  PictureSize size;
-  FrameRate frameRate;
-  RecordingQuality quality = RecordingQuality::better;
-};
-struct AudioEncoding {
-  int sampleRate = 48000;
-  int channels = 2;
-  int bitRate = 128000;
-};
-
-/// Kilobits a second for a picture: grows with its pixels, less than in proportion.
-int videoBitRate(const VideoEncoding& video);
-/// The encoder's effort: what a small machine sustains live.
-const char* speedPreset(const VideoEncoding& video);
-/// Units a second of a video track; a frame then lasts frameRate.denominator * 1000 / … of them, without a
-/// remainder.
-std::uint32_t videoTimescale(FrameRate rate);
-std::uint32_t frameDuration(FrameRate rate);
-
-/// Where encoded samples go; called on the encoder's threads, one thread a track.
+/// Takes what is encoded. Called on the encoder's threads, one per track.
 struct EncoderOutput {
-  std::function<void(std::uint32_t track, TrackFormat format)>
-      onFormat;  ///< once a track, before its samples
+  /// Once a track, before its samples.
+  std::function<void(std::uint32_t track, TrackFormat format)> onFormat;
   std::function<void(EncodedSample sample)> onSample;
+  /// Once at most: nothing more is encoded then. On any thread.
   std::function<void(std::string problem)> onError;
 };
 
-/// Feeding belongs to one thread. Track 0 is the video where there is one; the sound follows.
+/// Fed by one thread. Track 0 is the picture, if there is one; the sound follows.
 class Encoder {
  public:
-  /// @return null with the reason in `*problem`.
-  static std::unique_ptr<Encoder> create(const std::optional<VideoEncoding>& video,
-                                         const std::optional<AudioEncoding>& audio, EncoderOutput output,
-                                         std::string* problem);
+  /// Starts an encoder. The error says in words why there is none.
+  static Result<std::unique_ptr<Encoder>> create(const MovieEncoding& movie, EncoderOutput output);
+  /// Stops it. The output is not called any more afterwards.
   ~Encoder();
   Encoder(const Encoder&) = delete;
   Encoder& operator=(const Encoder&) = delete;
@@ -58,15 +38,18 @@ class Encoder {
   /// Encodes `buffer` as frame number `place`; blocks while the encoder is more than a few frames behind.
   /// Does nothing once it has failed.
   void pushVideo(GstBuffer* buffer, std::uint32_t place, bool forceKey);
-  /// Encodes `count` samples of all channels from `samples` on; null for silence.
+  /// Encodes `count` samples of each channel, interleaved, from `samples` on; null for silence. Blocks and
+  /// fails like pushVideo.
   void pushAudio(const float* samples, std::uint32_t count);
   /// Ends the streams and waits until all is out. Sound behind `totalSamples` is dropped.
-  /// @return false when it did not come to its end within `limit`.
+  /// @return false when it has failed, or did not come to its end within `limit`
   bool finish(std::int64_t totalSamples, std::chrono::milliseconds limit);
 
  private:
-  Encoder(std::optional<VideoEncoding> video, std::optional<AudioEncoding> audio, EncoderOutput output);
-  bool build(std::string* problem);
+  using NewSample = GstFlowReturn(GstElement*, gpointer) noexcept;
+  Encoder(const MovieEncoding& movie, EncoderOutput output);
+  void attach(GstHandle<GstElement> pipeline);
+  void takeFrom(const char* sink, NewSample* onSample);
   static GstFlowReturn onVideoSample(GstElement* sink, gpointer self) noexcept;
   static GstFlowReturn onAudioSample(GstElement* sink, gpointer self) noexcept;
   static void onEos(GstElement* sink, gpointer self) noexcept;

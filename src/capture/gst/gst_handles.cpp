@@ -1,4 +1,4 @@
-// Starting GStreamer and building pipelines.
+// Starts GStreamer and builds pipelines.
 #include "capture/gst/gst_handles.h"
 
 #include <mutex>
@@ -14,16 +14,13 @@ void ensureGStreamer() {
   });
 }
 
-GstHandle<GstElement> newPipeline(const std::string& description, std::string* problem) {
+Result<GstHandle<GstElement>> newPipeline(const std::string& description) {
   ensureGStreamer();
   GError* raw = nullptr;
   GstElement* element =
       gst_parse_launch_full(description.c_str(), nullptr, GST_PARSE_FLAG_FATAL_ERRORS, &raw);
   const ErrorHandle error(raw);
-  if (element == nullptr) {
-    *problem = error ? error->message : "the pipeline could not be built";
-    return nullptr;
-  }
+  if (element == nullptr) return Error{error ? error->message : "the pipeline could not be built"};
   gst_object_ref_sink(element);
   return GstHandle<GstElement>(element);
 }

@@ -5,6 +5,8 @@
 #include <memory>
 #include <string>
 
+#include "support/result.h"
+
 namespace lmx {
 
 struct GstObjectUnref {
@@ -34,8 +36,8 @@ using GText = std::unique_ptr<char, GFree>;
 /// Initialises GStreamer once in the process; cheap afterwards. Thread-safe.
 void ensureGStreamer();
 
-/// Builds a pipeline from its description. @return null with the reason in `*problem`.
-GstHandle<GstElement> newPipeline(const std::string& description, std::string* problem);
+/// Builds a pipeline from its description. The error is GStreamer's message.
+Result<GstHandle<GstElement>> newPipeline(const std::string& description);
 
 /// An element of `pipeline` by name; null when there is none.
 GstHandle<GstElement> elementNamed(GstElement* pipeline, const char* name);

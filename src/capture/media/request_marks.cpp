@@ -1,9 +1,16 @@
-// Marks into spans.
+// From marks to spans.
 #include "capture/media/request_marks.h"
 
 #include <algorithm>
 
 namespace lmx {
+namespace {
+
+auto named(const std::string& uuid) {
+  return [&uuid](const Request& request) { return request.uuid == uuid; };
+}
+
+}  // namespace
 
 double commonSeconds(const std::vector<Span>& a, const std::vector<Span>& b, double now) {
   double total = 0;
@@ -22,7 +29,7 @@ bool Request::wanted(double t) const {
 }
 
 void RequestMarks::start(const std::string& uuid, double t, SharedDictionary parameters) {
-  Request* request = mutableFind(uuid);
+  Request* request = editable(uuid);
   if (request == nullptr) {
     if (!parameters) parameters = std::make_shared<const Dictionary>();
     request =
@@ -36,18 +43,18 @@ void RequestMarks::start(const std::string& uuid, double t, SharedDictionary par
 }
 
 void RequestMarks::stop(const std::string& uuid, double t) {
-  Request* request = mutableFind(uuid);
+  Request* request = editable(uuid);
   if (request == nullptr || request->spans.empty()) return;
   Span& last = request->spans.back();
   last.stop = std::max(last.start, std::min(last.stop, t));
 }
 
 void RequestMarks::cancel(const std::string& uuid) {
-  if (Request* request = mutableFind(uuid)) request->cancelled = true;
+  if (Request* request = editable(uuid)) request->cancelled = true;
 }
 
 void RequestMarks::markDone(const std::string& uuid) {
-  if (Request* request = mutableFind(uuid)) request->done = true;
+  if (Request* request = editable(uuid)) request->done = true;
 }
 
 void RequestMarks::pause(double t) {
@@ -90,13 +97,13 @@ double RequestMarks::elapsed(const std::string& uuid, double now) const {
 }
 
 const Request* RequestMarks::find(const std::string& uuid) const {
-  const auto found =
-      std::find_if(requests_.begin(), requests_.end(), [&](const auto& r) { return r.uuid == uuid; });
+  const auto found = std::find_if(requests_.begin(), requests_.end(), named(uuid));
   return found == requests_.end() ? nullptr : &*found;
 }
 
-Request* RequestMarks::mutableFind(const std::string& uuid) {
-  return const_cast<Request*>(find(uuid));  // NOLINT: this object is not const here
+Request* RequestMarks::editable(const std::string& uuid) {
+  const auto found = std::find_if(requests_.begin(), requests_.end(), named(uuid));
+  return found == requests_.end() ? nullptr : &*found;
 }
 
 bool RequestMarks::othersPending(const std::string& uuid) const {

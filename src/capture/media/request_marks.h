@@ -1,7 +1,6 @@
-// The marks of a capture's requests: when is something to be recorded, and for whom? Pure.
+// The marks of a capture's requests: what is to be recorded when, and for whom. Pure.
 #pragma once
 #include <limits>
-#include <map>
 #include <string>
 #include <vector>
 
@@ -9,7 +8,7 @@
 
 namespace lmx {
 
-/// Half-open, in seconds of the capture session's running time, which no step of the wall clock moves.
+/// Half-open, in seconds of the pipeline's running time: a step of the wall clock does not move it.
 struct Span {
   double start = 0;
   double stop = std::numeric_limits<double>::infinity();
@@ -33,11 +32,11 @@ struct Request {
   [[nodiscard]] bool pending() const { return !cancelled && !done; }
 };
 
-/// Not thread-safe; its owner locks.
+/// All times are running time in seconds. Not thread-safe; its owner locks.
 class RequestMarks {
  public:
-  /// Opens a span. A request that is open already stays as it is. A start before the end of the last span
-  /// counts from there.
+  /// Opens a span. Does nothing while the request has an open span. A start before the end of the last span
+  /// counts from that end. `parameters` are kept with the first span only; null counts as empty.
   void start(const std::string& uuid, double t, SharedDictionary parameters);
   /// Closes the open span, or cuts the last one shorter; never before its start. An unknown request is
   /// ignored.
@@ -50,20 +49,22 @@ class RequestMarks {
 
   /// Whether a frame of time `t` is to be recorded.
   [[nodiscard]] bool wanted(double t) const;
-  /// Whether a span begins after `previous` and not after `t`: the frame must then stand by itself.
+  /// Whether a span begins after `previous` and not after `t`. The frame at `t` must then be a key frame, so
+  /// that the request's movie can begin with it.
   [[nodiscard]] bool startsBetween(double previous, double t) const;
-  /// Whether a request that began by `t` would get no frame at all unless this one is taken.
+  /// Whether a request has begun and ended by `t`. A movie that has no frame yet then takes the one at `t`,
+  /// so that the request still gets a picture.
   [[nodiscard]] bool starving(double t) const;
 
   /// Recorded seconds of a request before `now`, pauses left out; 0 for an unknown one.
   [[nodiscard]] double elapsed(const std::string& uuid, double now) const;
   [[nodiscard]] const Request* find(const std::string& uuid) const;
   [[nodiscard]] const std::vector<Request>& requests() const { return requests_; }
-  /// A request that is neither cancelled nor done, other than `uuid`.
+  /// Whether a request other than `uuid` is neither cancelled nor done.
   [[nodiscard]] bool othersPending(const std::string& uuid) const;
 
  private:
-  Request* mutableFind(const std::string& uuid);
+  [[nodiscard]] Request* editable(const std::string& uuid);
   std::vector<Request> requests_;
   std::vector<Span> pauses_;
 };

@@ -1,59 +1,15 @@
-// Building movie boxes.
+// Headers of fragmented and of whole movies.
 #include "capture/movie/movie_boxes.h"
 
 #include <algorithm>
 #include <string_view>
 
+#include "capture/movie/box_writer.h"
+
 namespace lmx {
 namespace {
 
 constexpr std::uint32_t kMovieTimescale = 90000;
-
-/// Appends big-endian fields; boxes nest and get their sizes when they end.
-class BoxWriter {
- public:
-  explicit BoxWriter(Bytes& out) : out_(out) {}
-
-  template <class Body>
-  void box(std::string_view type, Body body) {
-    const std::size_t start = out_.size();
-    u32(0);
-    text(type);
-    body();
-    patch32(start, static_cast<std::uint32_t>(out_.size() - start));
-  }
-  template <class Body>
-  void fullBox(std::string_view type, std::uint8_t version, std::uint32_t flags, Body body) {
-    box(type, [&] {
-      u32(static_cast<std::uint32_t>(version) << 24 | flags);
-      body();
-    });
-  }
-  void u8(unsigned v) { out_.push_back(static_cast<std::uint8_t>(v)); }
-  void u16(unsigned v) {
-    u8(v >> 8 & 0xFF);
-    u8(v & 0xFF);
-  }
-  void u32(std::uint32_t v) {
-    u16(v >> 16);
-    u16(v & 0xFFFF);
-  }
-  void u64(std::uint64_t v) {
-    u32(static_cast<std::uint32_t>(v >> 32));
-    u32(static_cast<std::uint32_t>(v));
-  }
-  void zeros(std::size_t n) { out_.insert(out_.end(), n, 0); }
-  void text(std::string_view t) { out_.insert(out_.end(), t.begin(), t.end()); }
-  void bytes(std::span<const std::uint8_t> b) { out_.insert(out_.end(), b.begin(), b.end()); }
-  [[nodiscard]] std::size_t size() const { return out_.size(); }
-  void patch32(std::size_t at, std::uint32_t v) {
-    for (int i = 0; i < 4; ++i)
-      out_[at + static_cast<std::size_t>(i)] = static_cast<std::uint8_t>(v >> (24 - 8 * i));
-  }
-
- private:
-  Bytes& out_;
-};
 
 void identityMatrix(BoxWriter& w) {
   for (const std::uint32_t v : {0x00010000U, 0U, 0U, 0U, 0x00010000U, 0U, 0U, 0U, 0x40000000U}) w.u32(v);
@@ -111,7 +67,37 @@ void dataInformationBox(BoxWriter& w) {
   });
 }
 
-/// A track; `sampleTables` writes what follows "stsd".
+void mediaHeaderBox(BoxWriter& w, std::uint32_t timescale, std::uint64_t duration) {
+  w.fullBox("mdhd", 1, 0, [&] {
+    w.u64(0);
+    w.u64(0);
+    w.u32(timescale);
+    w.u64(duration);
+    w.u16(0x55C4);  // language undetermined
+    w.u16(0);
+  });
+}
+
+/// @param sampleTables  writes what follows "stsd"
+template <class Tables>
+void mediaInformationBox(BoxWriter& w, const TrackFormat& format, Tables sampleTables) {
+  w.box("minf", [&] {
+    if (format.isVideo) {
+      w.fullBox("vmhd", 0, 1, [&] { w.zeros(8); });
+    } else {
+      w.fullBox("smhd", 0, 0, [&] { w.zeros(4); });
+    }
+    handlerBox(w, "dhlr", "url ", "DataHandler");
+    dataInformationBox(w);
+    w.box("stbl", [&] {
+      w.bytes(format.sampleDescription);
+      sampleTables();
+    });
+  });
+}
+
+/// @param mediaDuration  timescale units of the track
+/// @param sampleTables  writes what follows "stsd"
 template <class Tables>
 void trackBox(BoxWriter& w, const TrackFormat& format, std::uint32_t number, std::uint64_t mediaDuration,
               Tables sampleTables) {
@@ -119,29 +105,10 @@ void trackBox(BoxWriter& w, const TrackFormat& format, std::uint32_t number, std
   w.box("trak", [&] {
     trackHeaderBox(w, format, number, movieDuration);
     w.box("mdia", [&] {
-      w.fullBox("mdhd", 1, 0, [&] {
-        w.u64(0);
-        w.u64(0);
-        w.u32(format.timescale);
-        w.u64(mediaDuration);
-        w.u16(0x55C4);  // language undetermined
-        w.u16(0);
-      });
+      mediaHeaderBox(w, format.timescale, mediaDuration);
       handlerBox(w, "mhlr", format.isVideo ? "vide" : "soun",
                  format.isVideo ? "VideoHandler" : "SoundHandler");
-      w.box("minf", [&] {
-        if (format.isVideo) {
-          w.fullBox("vmhd", 0, 1, [&] { w.zeros(8); });
-        } else {
-          w.fullBox("smhd", 0, 0, [&] { w.zeros(4); });
-        }
-        handlerBox(w, "dhlr", "url ", "DataHandler");
-        dataInformationBox(w);
-        w.box("stbl", [&] {
-          w.bytes(format.sampleDescription);
-          sampleTables();
-        });
-      });
+      mediaInformationBox(w, format, sampleTables);
     });
   });
 }
@@ -211,119 +178,7 @@ void fullSampleTables(BoxWriter& w, const TrackIndex& track) {
   chunkOffsetBox(w, track.chunks);
 }
 
-/// A descriptor of ISO/IEC 14496-1 with a one-byte length.
-void descriptorHead(BoxWriter& w, unsigned tag, std::size_t length) {
-  w.u8(tag);
-  w.u8(static_cast<unsigned>(length));
-}
-
-void elementaryStreamBox(BoxWriter& w, std::span<const std::uint8_t> config) {
-  w.fullBox("esds", 0, 0, [&] {
-    const std::size_t specific = 2 + config.size();
-    const std::size_t decoder = 2 + 13 + specific;
-    descriptorHead(w, 3, 3 + decoder + 3);
-    w.u16(2);
-    w.u8(0);
-    descriptorHead(w, 4, 13 + specific);
-    w.u8(0x40);  // MPEG-4 audio
-    w.u8(0x15);  // audio stream
-    w.zeros(3);
-    w.u32(0);
-    w.u32(0);
-    descriptorHead(w, 5, config.size());
-    w.bytes(config);
-    descriptorHead(w, 6, 1);
-    w.u8(2);
-  });
-}
-
-constexpr std::uint32_t kSyncFlags = 0x02000000;     // depends on no other sample
-constexpr std::uint32_t kNotSyncFlags = 0x01010000;  // depends on others, is no key frame
-
-void trackFragmentBox(BoxWriter& w, const TrackFragment& track, std::size_t* dataOffsetAt) {
-  w.box("traf", [&] {
-    w.fullBox("tfhd", 0, 0x020000, [&] { w.u32(track.trackNumber); });  // offsets count from the moof
-    w.fullBox("tfdt", 1, 0, [&] { w.u64(track.baseTime); });
-    // data offset, and for each sample: duration, size, flags
-    w.fullBox("trun", 0, 0x000701, [&] {
-      w.u32(static_cast<std::uint32_t>(track.samples.size()));
-      *dataOffsetAt = w.size();
-      w.u32(0);
-      for (const FragmentSample& sample : track.samples) {
-        w.u32(sample.duration);
-        w.u32(sample.size);
-        w.u32(sample.sync ? kSyncFlags : kNotSyncFlags);
-      }
-    });
-  });
-}
-
-std::uint64_t bytesOf(const TrackFragment& track) {
-  std::uint64_t total = 0;
-  for (const FragmentSample& sample : track.samples) total += sample.size;
-  return total;
-}
-
 }  // namespace
-
-Bytes videoSampleDescription(std::uint16_t width, std::uint16_t height, std::span<const std::uint8_t> avcC) {
-  Bytes out;
-  BoxWriter w(out);
-  w.fullBox("stsd", 0, 0, [&] {
-    w.u32(1);
-    w.box("avc1", [&] {
-      w.zeros(6);
-      w.u16(1);
-      w.zeros(16);
-      w.u16(width);
-      w.u16(height);
-      w.u32(0x00480000);  // 72 dpi
-      w.u32(0x00480000);
-      w.u32(0);
-      w.u16(1);
-      w.u8(5);
-      w.text("H.264");
-      w.zeros(26);
-      w.u16(24);
-      w.u16(0xFFFF);
-      w.box("avcC", [&] { w.bytes(avcC); });
-    });
-  });
-  return out;
-}
-
-Bytes audioSampleDescription(std::uint32_t sampleRate, std::uint16_t channels,
-                             std::span<const std::uint8_t> config) {
-  Bytes out;
-  BoxWriter w(out);
-  w.fullBox("stsd", 0, 0, [&] {
-    w.u32(1);
-    w.box("mp4a", [&] {
-      w.zeros(6);
-      w.u16(1);
-      w.u16(1);  // version 1: QuickTime's own form for compressed sound
-      w.u16(0);
-      w.u32(0);
-      w.u16(channels);
-      w.u16(16);
-      w.u16(0xFFFE);
-      w.u16(0);
-      w.u32(sampleRate << 16);
-      w.u32(1024);
-      w.u32(0);
-      w.u32(0);
-      w.u32(2);
-      w.box("wave", [&] {
-        w.box("frma", [&] { w.text("mp4a"); });
-        w.box("mp4a", [&] { w.u32(0); });
-        elementaryStreamBox(w, config);
-        w.u32(8);
-        w.u32(0);
-      });
-    });
-  });
-  return out;
-}
 
 Bytes fileStart() {
   Bytes out;
@@ -354,24 +209,6 @@ Bytes fragmentedHeader(const std::vector<TrackFormat>& tracks) {
       }
     });
   });
-  return out;
-}
-
-Bytes fragmentHeader(std::uint32_t sequence, const std::vector<TrackFragment>& tracks) {
-  Bytes out;
-  BoxWriter w(out);
-  std::vector<std::size_t> offsetsAt(tracks.size());
-  w.box("moof", [&] {
-    w.fullBox("mfhd", 0, 0, [&] { w.u32(sequence); });
-    for (std::size_t i = 0; i < tracks.size(); ++i) trackFragmentBox(w, tracks[i], &offsetsAt[i]);
-  });
-  std::uint64_t data = out.size() + 8;
-  for (std::size_t i = 0; i < tracks.size(); ++i) {
-    w.patch32(offsetsAt[i], static_cast<std::uint32_t>(data));
-    data += bytesOf(tracks[i]);
-  }
-  w.u32(static_cast<std::uint32_t>(data - out.size()));
-  w.text("mdat");
   return out;
 }
 

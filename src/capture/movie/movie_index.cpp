@@ -1,4 +1,4 @@
-// Growing a movie's index.
+// Adds samples to an index, and totals it.
 #include "capture/movie/movie_index.h"
 
 #include <algorithm>

@@ -1,15 +1,13 @@
-// What a movie holds: its tracks, every sample's size, place and time. Built while writing or by reading a
-// file back.
+// What a movie holds: its tracks, and the size, place and time of every sample. Pure.
 #pragma once
 #include <cstdint>
-#include <optional>
 #include <vector>
 
 namespace lmx {
 
 using Bytes = std::vector<std::uint8_t>;
 
-/// What of a track does not change while it grows.
+/// What is fixed about a track before its first sample.
 struct TrackFormat {
   bool isVideo = false;
   std::uint32_t timescale = 0;  ///< units a second
@@ -39,34 +37,23 @@ struct TrackIndex {
   std::vector<DurationRun> durations;
   std::uint64_t totalDuration = 0;  ///< timescale units
 
-  /// Appends a sample of the newest chunk.
+  /// Appends a sample to the newest chunk; there must be one.
   void addSample(std::uint32_t size, std::uint32_t duration, bool sync);
   [[nodiscard]] double seconds() const {
     return format.timescale == 0 ? 0 : static_cast<double>(totalDuration) / format.timescale;
   }
 };
 
+/// Built while a movie is written, or by reading one back.
 struct MovieIndex {
   std::vector<TrackIndex> tracks;
   std::uint64_t mediaEnd = 0;  ///< file offset behind the last whole fragment
 
+  /// The first track of its kind; null when there is none.
   [[nodiscard]] const TrackIndex* video() const;
   [[nodiscard]] const TrackIndex* audio() const;
   /// Length of the longest track, seconds.
   [[nodiscard]] double seconds() const;
-};
-
-/// A sample as it goes into a fragment.
-struct FragmentSample {
-  std::uint32_t size = 0;
-  std::uint32_t duration = 0;
-  bool sync = true;
-};
-struct TrackFragment {
-  std::uint32_t trackNumber = 0;  ///< from 1
-  bool isVideo = false;
-  std::uint64_t baseTime = 0;  ///< decode time of the first sample, timescale units
-  std::vector<FragmentSample> samples;
 };
 
 }  // namespace lmx

@@ -1,115 +1,80 @@
-// An open camera and microphone: raw frames and samples on one monotonic clock, shared by all who need them.
+// An open camera and microphone: raw frames and samples on one monotonic clock.
 #pragma once
 #include <atomic>
-#include <chrono>
-#include <cstdint>
-#include <functional>
 #include <memory>
-#include <mutex>
 #include <optional>
-#include <string>
 #include <thread>
-#include <vector>
 
 #include "capture/api/capture_framework.h"
 #include "capture/gst/gst_handles.h"
-#include "capture/source/device_id.h"
+#include "capture/source/capture_consumers.h"
+#include "capture/source/capture_source.h"
+#include "capture/source/silence_watch.h"
+#include "support/result.h"
 
 namespace lmx {
 
-/// What to open. Two users that ask for the same share one pipeline.
-struct CaptureSource {
-  std::optional<std::string> videoDevice;
-  std::optional<std::string> audioDevice;
-  FrameRate frameRate;
-  int sampleRate = 48000;
-  int channels = 2;
-  [[nodiscard]] std::string key() const;
-};
-
-/// Gets what is captured, on streaming threads. Must return quickly: copy, queue, return.
-class CaptureConsumer {
- public:
-  virtual ~CaptureConsumer() = default;
-  /// @param buffer  an I420 frame of the pipeline's size (a reference for the consumer)
-  /// @param runningTime  seconds
-  virtual void onVideo(BufferHandle buffer, double runningTime) = 0;
-  /// @param buffer  interleaved 32-bit float samples
-  virtual void onAudio(BufferHandle buffer, double runningTime) = 0;
-  virtual void onCaptureError(const CaptureError& error) = 0;
-};
-
+/// Running time counts the seconds since the pipeline started; setting the wall clock does not affect it.
+/// Thread-safe but for its destruction, which closes the devices and waits for the streaming threads.
 class CapturePipeline : public CaptureSession {
  public:
-  /// A user's hold on a pipeline. The device is closed when the last one goes, before anybody can open it
-  /// again. Never drop the last one on a streaming thread.
-  using Lease = std::shared_ptr<CapturePipeline>;
-
-  /// Opens the devices, or joins the pipeline that has them open. Blocks while a device opens. Thread-safe.
-  /// @return null with `*error` set.
-  static Lease acquire(const CaptureSource& source, CaptureError* error);
-
+  /// Opens the devices and, unless they are of "speed=max", starts the flow. Blocks for as long as that
+  /// takes, at most some seconds.
+  static Result<std::shared_ptr<CapturePipeline>, CaptureError> open(const CaptureSource& source);
   ~CapturePipeline() override;
+
   [[nodiscard]] bool isRunning() const override { return running_; }
-
-  /// Starts the flow, when it does not run yet. Only pipelines of "speed=max" wait for this.
+  /// Starts the flow if it does not run yet.
   void start();
-  void addConsumer(const std::shared_ptr<CaptureConsumer>& consumer);
-  void removeConsumer(const CaptureConsumer* consumer);
+  [[nodiscard]] CaptureConsumers& consumers() { return consumers_; }
 
-  /// Running time that corresponds to a wall-clock time (seconds since 2001-01-01 UTC), by today's wall
-  /// clock.
-  [[nodiscard]] double runningTimeAt(double wallTime) const;
-  /// Running time now.
+  /// Running time now, seconds.
   [[nodiscard]] double runningTime() const;
+  /// Running time that corresponds to a wall-clock time (seconds since 2001-01-01 UTC) as the clock is set
+  /// now.
+  [[nodiscard]] double runningTimeAt(double wallTime) const;
   /// Wall-clock time of running time 0.
   [[nodiscard]] double wallOffset() const;
+  /// False for devices of "speed=max", which deliver as fast as their consumers take.
   [[nodiscard]] bool realTime() const { return real_time_; }
 
-  [[nodiscard]] const CaptureSource& source() const { return source_; }
   /// Size of the frames, pixels; 0 before the first frame of a device whose size is not known beforehand.
-  [[nodiscard]] PictureSize size() const;
+  [[nodiscard]] PictureSize size() const { return {width_, height_}; }
 
  private:
   explicit CapturePipeline(const CaptureSource& source);
-  static Lease lease(const std::string& key, const std::shared_ptr<CapturePipeline>& pipeline);
+  void attach(GstHandle<GstElement> pipeline);
+  [[nodiscard]] std::optional<CaptureError> settle();
+  void begin();
 
-  bool open(CaptureError* error);
-  std::string describe(std::string* problem);
-  bool addHardware(CaptureError* error);
-  bool settle(CaptureError* error);
-  void attachSinks();
+  static GstFlowReturn newVideoSample(GstElement* sink, gpointer self) noexcept;
+  static GstFlowReturn newAudioSample(GstElement* sink, gpointer self) noexcept;
+  void deliver(CaptureConsumers::Medium medium, GstSample* sample);
+  void noteSize(GstSample* sample);
+
   void watchBus();
   void handleMessage(GstMessage* message);
   void checkForSilence();
   void loopFile(bool flush);
-  void report(const CaptureError& error);
+  [[nodiscard]] std::optional<CaptureError> pendingError() const;
   [[nodiscard]] CaptureError errorFrom(GstMessage* message) const;
-  void close();
-
-  static GstFlowReturn newVideoSample(GstElement* sink, gpointer self) noexcept;
-  static GstFlowReturn newAudioSample(GstElement* sink, gpointer self) noexcept;
-  void deliver(GstElement* sink, bool video);
 
   const CaptureSource source_;
-  DeviceID video_;
-  DeviceID audio_;
-  bool real_time_ = true;
+  const DeviceID video_;
+  const DeviceID audio_;
+  const bool real_time_;
   double opened_at_ = 0;  ///< wall clock at running time 0, when not in real time
 
   GstHandle<GstElement> pipeline_;
+  GstHandle<GstBus> bus_;
   GstHandle<GstElement> video_sink_;
   GstHandle<GstElement> audio_sink_;
+  CaptureConsumers consumers_;
+  SilenceWatch silence_;
   std::atomic<bool> running_{false};
   std::atomic<bool> ending_{false};
-  std::atomic<std::int64_t> last_video_ms_{0};  // steady clock
-  std::atomic<std::int64_t> last_audio_ms_{0};
   std::atomic<int> width_{0};
   std::atomic<int> height_{0};
-
-  mutable std::mutex consumers_mutex_;
-  std::vector<std::weak_ptr<CaptureConsumer>> consumers_;  // guarded by consumers_mutex_
-  std::optional<CaptureError> failure_;                    // guarded by consumers_mutex_
 
   std::thread bus_thread_;  // last: it uses everything above
 };

@@ -1,4 +1,4 @@
-// Taking device identifiers apart.
+// Parses device identifiers.
 #include "capture/source/device_id.h"
 
 #include <algorithm>

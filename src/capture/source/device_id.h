@@ -10,15 +10,17 @@ namespace lmx {
 
 enum class DeviceKind { hardware, file, network, test, unknown };
 
-/// "test://video?size=640x360&fps=25" and the like, taken apart.
+/// A parsed identifier, such as "v4l2:usb-1" or "test://video?size=640x360&lost-after=2".
 struct DeviceID {
   DeviceKind kind = DeviceKind::unknown;
   std::string text;                            ///< as given
   std::string name;                            ///< without scheme and options: "video", "/path/a.mov"
   std::map<std::string, std::string> options;  ///< test devices only
 
+  /// The value of a synthetic device's option; nothing without that option.
   [[nodiscard]] std::optional<double> seconds(const std::string& option) const;
-  /// The synthetic devices' "speed=max": as fast as the machine can, for tests of hours of media.
+  /// Whether it is a synthetic device with "speed=max": it delivers as fast as the machine can, for tests
+  /// with hours of media.
   [[nodiscard]] bool asFastAsPossible() const;
 };
 DeviceID parseDeviceID(const std::string& text);

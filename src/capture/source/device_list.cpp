@@ -1,4 +1,4 @@
-// Choosing among devices and putting them in words.
+// Chooses default devices and describes devices in words.
 #include "capture/source/device_list.h"
 
 #include <algorithm>
@@ -20,7 +20,7 @@ double numberFrom(const GValue* value) {
   return G_VALUE_HOLDS_INT(value) ? g_value_get_int(value) : 0;
 }
 
-/// A field's values: one, those of a list, or the two ends of a range.
+/// The values of a field: a single one, those of a list, or both ends of a range.
 Numbers numbersOf(const GstStructure* structure, const char* field) {
   const GValue* value = gst_structure_get_value(structure, field);
   Numbers numbers;

@@ -9,15 +9,16 @@
 
 namespace lmx {
 
-/// What "Automatic" takes: the first camera or the first microphone.
+/// What "Automatic" takes: the first camera or the first microphone; null when there is none.
 const HardwareDevice* firstDevice(const std::vector<HardwareDevice>& devices, bool video);
 
-/// The camera's own microphone, else the first one.
+/// The camera's own microphone, else the first one, if there is any.
 CaptureCatalog::PreferredAudio microphoneFor(const std::vector<HardwareDevice>& devices,
                                              const std::string& cameraID);
 
-/// For people: by media type, each device's identifier as the preferences want it, its name, its formats,
-/// which one "Automatic" takes and a camera's microphone; last the devices that need no hardware.
+/// A list for people, by media type: each device's identifier as it goes into the preferences, its name and
+/// formats, a camera's microphone, and which device "Automatic" takes; then the devices that need no
+/// hardware.
 std::string deviceListText(const std::vector<HardwareDevice>& devices);
 
 /// Picture sizes with their frame rates, or sample rates with their channels, the largest first.

@@ -1,4 +1,4 @@
-// Listing cameras and microphones through GStreamer's device monitor.
+// Lists cameras and microphones through GStreamer's device monitor.
 #include "capture/source/devices.h"
 
 #include <algorithm>
@@ -22,8 +22,8 @@ std::string firstOf(const GstStructure* properties, std::initializer_list<const 
   return {};
 }
 
-/// An identifier that survives a restart: the place it is plugged in or its serial number, before any /dev
-/// name.
+/// An identifier that survives a restart: the place where the device is plugged in or its serial number
+/// rather than a /dev name.
 std::string uniqueIdentifier(const GstStructure* properties, bool isVideo) {
   const std::string node = property(properties, "node.name");
   if (!node.empty()) return "pipewire:" + node;
@@ -70,8 +70,7 @@ std::vector<HardwareDevice> listHardware() {
     if (isMonitorOfASpeaker(device.get())) continue;
     const bool isVideo = gst_device_has_classes(device.get(), "Video/Source");
     HardwareDevice described = describeDevice(std::move(device), isVideo);
-    // A microphone is listed once for each sound server's face: the name and the place tell that it is the
-    // same.
+    // A microphone is listed once for each interface of the sound server; name and place are the same.
     const std::string same = (isVideo ? "v" : "a") + described.name + described.parent;
     if (seen.insert(same).second) devices.push_back(std::move(described));
   }

@@ -1,4 +1,4 @@
-// The capture devices of the machine.
+// Lists the capture devices of the machine.
 #pragma once
 #include <optional>
 #include <string>
@@ -22,7 +22,7 @@ struct HardwareDevice {
 /// What is plugged in now, cameras first, each device once. Blocks for some milliseconds. Thread-safe.
 std::vector<HardwareDevice> listHardware();
 
-/// The plugged-in device of that identifier.
+/// The plugged-in device with that identifier; nothing when there is none.
 std::optional<HardwareDevice> findHardware(const std::string& uniqueID);
 
 }  // namespace lmx

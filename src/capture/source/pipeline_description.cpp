@@ -6,7 +6,7 @@
 namespace lmx {
 namespace {
 
-// Live sources pace themselves; a file is paced by its sinks.
+// A live source sets its own pace; a file is paced by its sinks.
 std::string sink(const std::string& name, bool paced) {
   return "appsink name=" + name + (paced ? " sync=true" : " sync=false") +
          " max-buffers=0 enable-last-sample=false qos=false ";
@@ -46,7 +46,8 @@ std::string testVideo(const DeviceID& id, FrameRate rate) {
 }
 
 std::string testAudio(const DeviceID& id, int sampleRate, int channels) {
-  // A tick every second of running time: with the frame numbers it proves picture and sound to be together.
+  // A tick at every second of running time: compared with the frame numbers it shows whether picture and
+  // sound are in sync.
   return string_with_format(
              "audiotestsrc name=asource is-live=%s wave=ticks freq=1000 samplesperbuffer=%d ! "
              "audio/x-raw,format=F32LE,layout=interleaved,rate=%d,channels=%d ! ",

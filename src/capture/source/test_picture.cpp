@@ -1,4 +1,4 @@
-// Bit row and clock.
+// Draws and reads the bit row, draws the clock.
 #include "capture/source/test_picture.h"
 
 #include <algorithm>

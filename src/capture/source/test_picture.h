@@ -17,7 +17,7 @@ struct LumaPlane {
 
 /// 32 cells across the top, each width/32 wide and height/18 tall, most significant bit left, white for 1.
 void drawFrameNumber(const LumaPlane& plane, std::uint32_t number);
-/// Reads it back from the middles of the cells.
+/// Reads the number back from the centres of the cells.
 std::uint32_t readFrameNumber(const LumaPlane& plane);
 /// Draws digits, ":" and "." in the lower left corner, about 1/10 of the picture high.
 void drawClock(const LumaPlane& plane, const std::string& text);

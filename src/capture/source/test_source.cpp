@@ -1,4 +1,4 @@
-// Pad probes behind the synthetic sources.
+// Pad probes that draw, correct the sound and simulate faults.
 #include "capture/source/test_source.h"
 
 #include <gst/audio/audio.h>
@@ -53,7 +53,7 @@ void draw(GstBuffer* buffer, const Probe& probe) {
   drawFrameNumber(plane, number);
   drawClock(plane, clockText(number * probe.frameSeconds));
   for (const guint component : {1U, 2U}) {
-    // No colour behind the bit row and the clock: people read them too.
+    // No colour behind the bit row and the clock, so that people can read them, too.
     const int width = size.width / 2;
     const int height = size.height / 2;
     const int step = GST_VIDEO_FRAME_PLANE_STRIDE(&frame, component);
@@ -67,8 +67,8 @@ void draw(GstBuffer* buffer, const Probe& probe) {
   gst_video_frame_unmap(&frame);
 }
 
-/// Makes silence of what lies between the ticks. The source leaves a tick's first sample as it finds it in
-/// memory, which may be louder than any sound.
+/// Silences what lies between the ticks. The source leaves the first sample of a tick uninitialised: it may
+/// be louder than any sound.
 void clearBetweenTicks(GstPad* pad, GstBuffer* buffer) {
   const CapsHandle caps(gst_pad_get_current_caps(pad));
   GstAudioInfo format;

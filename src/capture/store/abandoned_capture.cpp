@@ -1,4 +1,6 @@
-// What an earlier process left of a capture, read back with as much distrust as a power cut deserves.
+// Reads a capture that a crash or a power cut ended. Nothing it left can be trusted.
+#include "capture/store/abandoned_capture.h"
+
 #include <sys/stat.h>
 
 #include <algorithm>
@@ -6,16 +8,20 @@
 #include <cmath>
 #include <cstring>
 #include <fstream>
+#include <limits>
 #include <sstream>
 
-#include "capture/store/finished_capture.h"
+#include "capture/movie/movie_finish.h"
+#include "capture/movie/movie_reader.h"
+#include "capture/store/capture_files.h"
+#include "model/codes.h"
 #include "platform/log.h"
 #include "support/time_value.h"
 
 namespace lmx {
 namespace {
 
-/// What a writer that died may have left behind its last whole fragment: one fragment is half a second.
+/// How much a killed writer may have left behind its last whole fragment. A fragment is half a second.
 constexpr std::uint64_t kTornTailLimit = 16U << 20;
 /// The same where there is no whole fragment at all.
 constexpr std::uint64_t kTornStartLimit = 2U << 20;
@@ -42,36 +48,37 @@ double writtenAt(const std::string& path) {
          kReferenceDateOffset;
 }
 
-/// All of the media as one recording, for a journal that can't be trusted: who of several requests wanted
-/// what, and whether one was cancelled, is not known any more, and too much can be cut away later.
+/// All of the media as one recording, for a journal that can't be trusted. Which request wanted what is not
+/// known any more; too much is better than too little, since it can be cut away later.
 CaptureRecord wholeOf(const CaptureRecord& damaged, const MovieIndex& index, const std::string& folder) {
   const TrackIndex& lead = index.tracks.front();
   CaptureRecord record;
-  record.recordingType = recordingTypeCode(index.video() != nullptr, index.audio() != nullptr);
+  record.recordingType = recordingTypeOf(index.video() != nullptr, index.audio() != nullptr);
   record.frameSeconds = lead.seconds() / static_cast<double>(lead.sizes.size());
-  record.wallOffset = writtenAt(folder + "/" + FinishedCapture::kMediaName) - lead.seconds();
+  record.wallOffset = writtenAt(folder + "/" + kMediaName) - lead.seconds();
   record.runs.push_back({.sessionTime = 0, .firstFrame = 0});
   SharedDictionary parameters;
   if (!damaged.marks.requests().empty()) parameters = damaged.marks.requests().front().parameters;
-  if (!lookUp(parameters, "RecordingMetadata_RECORDING_UUID")) {
+  if (!lookUp(parameters, kRecordingUuidKey)) {
     parameters = std::make_shared<const Dictionary>(
-        Dictionary{{"RecordingMetadata_RECORDING_UUID", folder.substr(folder.rfind('/') + 1)}});
+        Dictionary{{kRecordingUuidKey, folder.substr(folder.rfind('/') + 1)}});
   }
   record.marks.start("recovered", 0, parameters);
   return record;
 }
 
-/// Whether `index` can be of a movie whose writer has died, rather than of a file that a disk has damaged.
+/// Whether the file looks like a movie whose writer was killed, rather than like one that the disk damaged.
 bool makesSense(const MovieIndex& index, std::uint64_t fileSize) {
   const TrackIndex& lead = index.tracks.front();
   return lead.sizes.empty() ? fileSize <= index.mediaEnd + kTornStartLimit : lead.totalDuration > 0;
 }
 
 std::uint32_t framesIn(const MovieIndex& index, double frameSeconds) {
-  return static_cast<std::uint32_t>(std::floor(index.tracks.front().seconds() / frameSeconds + 1e-3));
+  const double frames = std::floor(index.tracks.front().seconds() / frameSeconds + 1e-3);
+  return static_cast<std::uint32_t>(std::min(frames, double{std::numeric_limits<std::uint32_t>::max()}));
 }
 
-/// Frames of the movie that all of the media have become, for its document; 0 when there is no such movie.
+/// Length of the movie that the media were moved to, in frames, for its document; 0 when there is none.
 std::uint32_t framesOfTheMovie(const CaptureRecord& record) {
   for (const auto& [uuid, path] : record.movies) {
     const Request* request = record.marks.find(uuid);
@@ -82,6 +89,7 @@ std::uint32_t framesOfTheMovie(const CaptureRecord& record) {
   return 0;
 }
 
+/// Logs that the capture stays as it is. @return null
 std::shared_ptr<FinishedCapture> leftAlone(const std::string& path, const char* why) {
   LMPLogMessage(
       nullptr, kLogError,
@@ -90,18 +98,47 @@ std::shared_ptr<FinishedCapture> leftAlone(const std::string& path, const char* 
   return nullptr;
 }
 
+/// The folder's journal, locked.
+Result<std::shared_ptr<Journal>> openJournal(const std::string& path, bool hasMedia) {
+  auto journal = Journal::open(path);
+  // No live capture has media but no journal: the journal is made first and removed last.
+  if (!journal && journal.error().systemError == ENOENT && hasMedia) return Journal::create(path);
+  return journal;
+}
+
+/// The record to make movies by: the journal's if it can be trusted.
+CaptureRecord trusted(CaptureRecord record, const MovieIndex& index, const std::string& folder) {
+  if (record.intact && !record.runs.empty()) return record;
+  LMPLogMessage(nullptr, kLogError,
+                "The journal of %s is damaged: all that was captured is kept as one recording",
+                folder.c_str());
+  return wholeOf(record, index, folder);
+}
+
+/// Makes the media one whole movie. @return whether they may go once they have been used
+MediaAfterUse finishMedia(const std::string& media, std::uint64_t mediaSize, const MovieIndex& index) {
+  if (mediaSize > index.mediaEnd + kTornTailLimit) {
+    LMPLogMessage(nullptr, kLogError,
+                  "%s can be read up to %.0f s only; the movie ends there, and the file stays as it is",
+                  media.c_str(), index.seconds());
+    return MediaAfterUse::keep;
+  }
+  if (const int error = finishMovieInPlace(media, index))
+    LMPLogMessage(nullptr, kLogWarning, "%s stays fragmented: %s", media.c_str(), std::strerror(error));
+  return MediaAfterUse::remove;
+}
+
 }  // namespace
 
-std::shared_ptr<FinishedCapture> FinishedCapture::openAbandoned(const std::string& folder) {
+std::shared_ptr<FinishedCapture> openAbandonedCapture(const std::string& folder) {
   const std::string journalPath = folder + "/" + kJournalName;
   const std::string media = folder + "/" + kMediaName;
   const std::uint64_t mediaSize = sizeOf(media);
-  std::shared_ptr<Journal> journal = Journal::open(journalPath, true);
-  // Media without a journal are nobody's: a capture makes its journal first and removes it last.
-  if (!journal && errno == ENOENT && mediaSize > 0) journal = Journal::open(journalPath, false);
+  const auto journal = openJournal(journalPath, mediaSize > 0);
   if (!journal) {
-    if (errno == EWOULDBLOCK || errno == ENOENT) return nullptr;
-    return leftAlone(journalPath, std::strerror(errno));
+    const int error = journal.error().systemError;
+    if (error == EWOULDBLOCK || error == ENOENT) return nullptr;
+    return leftAlone(journalPath, std::strerror(error));
   }
   const auto text = readAll(journalPath);
   if (!text) return leftAlone(journalPath, "input/output error");
@@ -112,26 +149,12 @@ std::shared_ptr<FinishedCapture> FinishedCapture::openAbandoned(const std::strin
   CaptureRecord record = parseJournal(*text);
   if (!index || index->tracks.front().sizes.empty()) {
     const std::uint32_t frames = mediaSize == 0 ? framesOfTheMovie(record) : 0;
-    return std::make_shared<FinishedCapture>(folder, std::move(journal), std::move(record), frames);
+    return std::make_shared<FinishedCapture>(folder, *journal, std::move(record), frames);
   }
-  if (!record.intact || record.runs.empty()) {
-    LMPLogMessage(nullptr, kLogError,
-                  "The journal of %s is damaged: all that was captured is kept as one recording",
-                  folder.c_str());
-    record = wholeOf(record, *index, folder);
-  }
+  record = trusted(std::move(record), *index, folder);
   const std::uint32_t frames = framesIn(*index, record.frameSeconds);
-  const bool torn = mediaSize > index->mediaEnd + kTornTailLimit;
-  if (torn) {
-    LMPLogMessage(nullptr, kLogError,
-                  "%s can be read up to %.0f s only; the movie ends there, and the file stays as it is",
-                  media.c_str(), index->seconds());
-  } else if (const int error = finishMovieInPlace(media, *index)) {
-    LMPLogMessage(nullptr, kLogWarning, "%s stays fragmented: %s", media.c_str(), std::strerror(error));
-  }
-  auto capture = std::make_shared<FinishedCapture>(folder, std::move(journal), std::move(record), frames);
-  capture->keep_media_ = torn;
-  return capture;
+  return std::make_shared<FinishedCapture>(folder, *journal, std::move(record), frames,
+                                           finishMedia(media, mediaSize, *index));
 }
 
 }  // namespace lmx

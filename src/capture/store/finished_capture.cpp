@@ -1,16 +1,18 @@
-// Movies out of a closed capture.
+// Makes the movies of a closed capture and removes it.
 #include "capture/store/finished_capture.h"
 
-#include <dirent.h>
-#include <fcntl.h>
-#include <sys/stat.h>
 #include <unistd.h>
 
 #include <algorithm>
 #include <cerrno>
-#include <cmath>
+#include <cstdio>
 #include <cstring>
+#include <iterator>
 
+#include "capture/movie/movie_reader.h"
+#include "capture/store/capture_files.h"
+#include "capture/store/movie_names.h"
+#include "capture/store/request_frames.h"
 #include "platform/directories.h"
 #include "platform/log.h"
 #include "platform/paths.h"
@@ -25,58 +27,35 @@ CaptureError diskError(int error, const std::string& what) {
           what + ": " + std::strerror(error)};
 }
 
-/// `name` cut to leave room for an ending: file systems take 255 bytes. A character is not cut in two.
-std::string fitting(std::string name) {
-  std::size_t length = std::min<std::size_t>(name.size(), 200);
-  while (length > 0 && length < name.size() && (static_cast<unsigned char>(name[length]) & 0xC0) == 0x80)
-    --length;
-  name.resize(length);
-  return name;
-}
-
-/// `stem` + first free of "", "-1", "-2" … such that neither a movie nor its document has the name.
-std::string freeStem(const std::string& stem) {
-  std::string free = stem;
-  for (int i = 1; exists(free + ".mov") || exists(free + ".xml"); ++i) free = stem + "-" + std::to_string(i);
-  return free;
-}
-
-/// An earlier movie of the same name may still wait for its submission: it gets another name, and its
-/// document with it. @return 0, or the errno when it stays in the way
-int setAside(const std::string& path) {
-  if (!exists(path)) return 0;
-  const std::string stem = path.ends_with(".mov") ? path.substr(0, path.size() - 4) : path;
-  const std::string directory = directoryOf(path);
-  const std::string aside =
-      freeStem(directory + "/" + fitting(stem.substr(stem.rfind('/') + 1)) + "-replaced");
-  if (rename(path.c_str(), (aside + ".mov").c_str()) != 0) return errno;
-  LMPLogMessage(nullptr, kLogWarning, "%s was there already, it is now %s.mov", path.c_str(), aside.c_str());
-  if (exists(stem + ".xml") && rename((stem + ".xml").c_str(), (aside + ".xml").c_str()) != 0) return errno;
-  return 0;
-}
-
 int moveFile(const std::string& from, const std::string& to) {
   if (rename(from.c_str(), to.c_str()) != 0) return errno;
   return syncDirectory(directoryOf(to));
 }
 
 std::string fileNameFor(const Request& request) {
-  std::string name = lookUp(request.parameters, "RecordingMetadata_RECORDING_UUID").value_or("test");
+  std::string name = lookUp(request.parameters, kRecordingUuidKey).value_or("test");
   std::replace(name.begin(), name.end(), '/', '_');
-  name = fitting(std::move(name));
+  name = fittingName(std::move(name));
   return name.empty() ? "test" : name;
+}
+
+std::string recoveredPath(const Request& request, const std::string& repository) {
+  const std::string stem = repository + "/" + fileNameFor(request);
+  return (exists(stem + ".mov") ? freeStem(stem + "-recovered") : stem) + ".mov";
 }
 
 }  // namespace
 
-std::string captureFolderOf(const std::string& repository) { return repository + "/.lmxagentd"; }
-
 FinishedCapture::FinishedCapture(std::string folder, std::shared_ptr<Journal> journal, CaptureRecord record,
-                                 std::uint32_t totalFrames)
+                                 std::uint32_t totalFrames, MediaAfterUse media)
     : folder_(std::move(folder)),
+      media_(folder_ + "/" + kMediaName),
       journal_(std::move(journal)),
-      record_(std::move(record)),
-      total_frames_(totalFrames) {}
+      total_frames_(totalFrames),
+      media_after_use_(media),
+      record_(std::move(record)) {}
+
+// ---- one movie
 
 std::optional<CaptureError> FinishedCapture::makeMovie(const std::string& uuid, const std::string& path) {
   const std::lock_guard lock(mutex_);
@@ -88,27 +67,32 @@ std::optional<CaptureError> FinishedCapture::makeMovie(const std::string& uuid, 
 
 std::optional<CaptureError> FinishedCapture::makeMovieLocked(const Request& request,
                                                              const std::string& path) {
-  const auto ranges = framesOf(request, record_.runs, record_.frameSeconds, total_frames_);
+  const auto ranges = framesFor(request);
   if (ranges.empty())
     return CaptureError{CaptureError::kDomain, kNoMedia, "nothing was captured for " + path};
   journal_->movie(request.uuid, path);
-  journal_->sync();
+  (void)journal_->sync();  // when it fails the movie is worth making all the same
   if (const int error = setAside(path)) {
     return diskError(error, "an earlier movie is in the way of " + path);
   }
-  if (!keep_media_ && coversAll(ranges, total_frames_) && !record_.marks.othersPending(request.uuid)) {
-    const int error = moveFile(media(), path);
+  if (needsAllMedia(request, ranges)) {
+    const int error = moveFile(media_, path);
     if (error == 0) return std::nullopt;
     if (error != EXDEV) return diskError(error, "could not move the movie to " + path);
   }
   return copyFrames(ranges, path);
 }
 
+bool FinishedCapture::needsAllMedia(const Request& request, const std::vector<FrameRange>& ranges) const {
+  return media_after_use_ == MediaAfterUse::remove && coversAll(ranges, total_frames_) &&
+         !record_.marks.othersPending(request.uuid);
+}
+
 std::optional<CaptureError> FinishedCapture::copyFrames(const std::vector<FrameRange>& ranges,
                                                         const std::string& path) {
-  const auto index = readMovieIndex(media());
-  if (!index) return CaptureError{CaptureError::kDomain, kWriteFailed, media() + " can't be read"};
-  // In the capture's own folder: no other capture writes there, and what a crash leaves goes with it.
+  const auto index = readMovieIndex(media_);
+  if (!index) return CaptureError{CaptureError::kDomain, kWriteFailed, media_ + " can't be read"};
+  // Written in the capture's own folder: no other capture writes there, and a crash's leftovers go with it.
   int error = copyOver(*index, ranges, folder_ + "/" + kPartName, path);
   if (error == EXDEV)
     error = copyOver(*index, ranges, path + "." + folder_.substr(folder_.rfind('/') + 1) + ".part", path);
@@ -116,12 +100,51 @@ std::optional<CaptureError> FinishedCapture::copyFrames(const std::vector<FrameR
   return diskError(error, "could not write " + path);
 }
 
+/// Copies into `temporary` and renames it to `path`. @return 0 or the errno; nothing is left then
 int FinishedCapture::copyOver(const MovieIndex& index, const std::vector<FrameRange>& ranges,
                               const std::string& temporary, const std::string& path) {
-  int error = copyMovieRanges(media(), index, ranges, record_.frameSeconds, temporary);
+  int error = copyMovieRanges(media_, index, ranges, record_.frameSeconds, temporary);
   if (error == 0) error = moveFile(temporary, path);
   if (error != 0) unlink(temporary.c_str());
   return error;
+}
+
+// ---- all that is pending
+
+std::vector<RecoveredRecording> FinishedCapture::recoverPending(const std::string& repository) {
+  const std::lock_guard lock(mutex_);
+  std::vector<RecoveredRecording> recovered;
+  const std::vector<Request> requests = record_.marks.requests();
+  for (const Request& request : requests) {
+    if (!request.pending()) continue;
+    if (auto recording = recover(request, repository)) recovered.push_back(std::move(*recording));
+  }
+  removeIfResolvedLocked();
+  return recovered;
+}
+
+std::optional<RecoveredRecording> FinishedCapture::recover(const Request& request,
+                                                           const std::string& repository) {
+  const auto made = record_.movies.find(request.uuid);
+  const bool onlyLacksItsDocument = made != record_.movies.end() && exists(made->second) && !exists(media_);
+  if (onlyLacksItsDocument) return describe(request, made->second);
+  const std::string path = recoveredPath(request, repository);
+  if (const auto error = makeMovieLocked(request, path)) {
+    giveUp(request, *error);
+    return std::nullopt;
+  }
+  return describe(request, path);
+}
+
+/// For good if there are no media for the request; for now if the disk is to blame.
+void FinishedCapture::giveUp(const Request& request, const CaptureError& error) {
+  const bool nothing = error.code == kNoMedia;
+  LMPLogMessage(nullptr, nothing ? kLogWarning : kLogError, "Unfinished recording in %s: %s%s",
+                folder_.c_str(), error.message.c_str(),
+                nothing ? "" : "; its media stay there for another try at the next start");
+  if (!nothing) return;
+  record_.marks.markDone(request.uuid);
+  journal_->done(request.uuid);
 }
 
 RecoveredRecording FinishedCapture::describe(const Request& request, const std::string& path) {
@@ -130,50 +153,31 @@ RecoveredRecording FinishedCapture::describe(const Request& request, const std::
   recording.parameters = request.parameters;
   recording.recordingType = record_.recordingType;
   recording.forget = [self = shared_from_this(), uuid = request.uuid] { self->handedOver(uuid); };
+  const std::vector<FrameRange> ranges = framesFor(request);
+  if (ranges.empty()) return recording;
+  recording.startTime = wallTimeOf(ranges.front().first);
+  recording.stopTime = wallTimeOf(ranges.back().end - 1) + record_.frameSeconds;
   std::uint32_t frames = 0;
-  for (const FrameRange& range : framesOf(request, record_.runs, record_.frameSeconds, total_frames_)) {
-    frames += range.end - range.first;
-    for (const MovieRun& run : record_.runs) {
-      if (run.firstFrame > range.first) break;
-      const double at = run.sessionTime + record_.wallOffset;
-      if (recording.startTime == 0)
-        recording.startTime = at + (range.first - run.firstFrame) * record_.frameSeconds;
-      recording.stopTime = at + (range.end - run.firstFrame) * record_.frameSeconds;
-    }
-  }
+  for (const FrameRange& range : ranges) frames += range.end - range.first;
   recording.duration = frames * record_.frameSeconds;
   return recording;
 }
 
-std::vector<RecoveredRecording> FinishedCapture::recoverPending(const std::string& repository) {
-  const std::lock_guard lock(mutex_);
-  std::vector<RecoveredRecording> recovered;
-  const std::vector<Request> requests = record_.marks.requests();
-  for (const Request& request : requests) {
-    if (!request.pending()) continue;
-    const auto made = record_.movies.find(request.uuid);
-    if (made != record_.movies.end() && exists(made->second) && !exists(media())) {
-      recovered.push_back(
-          describe(request, made->second));  // it had its movie, only the document was missing
-      continue;
-    }
-    const std::string stem = repository + "/" + fileNameFor(request);
-    const std::string path = (exists(stem + ".mov") ? freeStem(stem + "-recovered") : stem) + ".mov";
-    if (const auto error = makeMovieLocked(request, path)) {
-      const bool nothing = error->code == kNoMedia;
-      LMPLogMessage(nullptr, nothing ? kLogWarning : kLogError, "Unfinished recording in %s: %s%s",
-                    folder_.c_str(), error->message.c_str(),
-                    nothing ? "" : "; its media stay there for another try at the next start");
-      if (!nothing) continue;
-      record_.marks.markDone(request.uuid);
-      journal_->done(request.uuid);
-      continue;
-    }
-    recovered.push_back(describe(request, path));
-  }
-  removeIfResolvedLocked();
-  return recovered;
+/// When `frame` was captured, seconds since 2001-01-01 UTC.
+double FinishedCapture::wallTimeOf(std::uint32_t frame) const {
+  const auto& runs = record_.runs;
+  const auto after =
+      std::find_if(runs.begin(), runs.end(), [frame](const MovieRun& run) { return run.firstFrame > frame; });
+  if (after == runs.begin()) return record_.wallOffset;
+  const MovieRun& run = *std::prev(after);
+  return record_.wallOffset + run.sessionTime + (frame - run.firstFrame) * record_.frameSeconds;
 }
+
+std::vector<FrameRange> FinishedCapture::framesFor(const Request& request) const {
+  return framesOf(request, record_.runs, record_.frameSeconds, total_frames_);
+}
+
+// ---- the end
 
 void FinishedCapture::handedOver(const std::string& uuid) {
   const std::lock_guard lock(mutex_);
@@ -188,12 +192,8 @@ void FinishedCapture::removeIfResolved() {
 }
 
 void FinishedCapture::removeIfResolvedLocked() {
-  if (keep_media_ || record_.marks.othersPending({})) return;
-  unlink(media().c_str());
-  unlink((folder_ + "/" + kPartName).c_str());
-  unlink((folder_ + "/" + kJournalName).c_str());
-  rmdir(folder_.c_str());
-  rmdir(directoryOf(folder_).c_str());  // only succeeds for the last capture
+  if (media_after_use_ == MediaAfterUse::keep || record_.marks.othersPending({})) return;
+  removeCaptureFiles(folder_);
 }
 
 }  // namespace lmx

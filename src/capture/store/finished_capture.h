@@ -1,4 +1,4 @@
-// What a capture left on the disk, and the movies that are made of it.
+// A closed capture on the disk, and the movies made from it.
 #pragma once
 #include <memory>
 #include <mutex>
@@ -7,34 +7,31 @@
 #include <vector>
 
 #include "capture/api/capture_framework.h"
+#include "capture/movie/movie_copy.h"
 #include "capture/movie/movie_index.h"
+#include "capture/store/capture_record.h"
 #include "capture/store/journal.h"
 
 namespace lmx {
 
-/// Directory of all captures in progress inside a repository.
-std::string captureFolderOf(const std::string& repository);
+/// What becomes of the media once every request has its movie. They are kept if part of them can't be read:
+/// somebody may still be able to rescue it.
+enum class MediaAfterUse { remove, keep };
 
 /// A closed capture: its folder with the journal and the media. Thread-safe; its operations may take as long
 /// as the disk needs.
 class FinishedCapture : public std::enable_shared_from_this<FinishedCapture> {
  public:
-  static constexpr const char* kJournalName = "journal";
-  static constexpr const char* kMediaName = "media.mov";
-  static constexpr const char* kPartName = "movie.part";
-
   /// @param totalFrames  frames of the movie's clock that were recorded
   FinishedCapture(std::string folder, std::shared_ptr<Journal> journal, CaptureRecord record,
-                  std::uint32_t totalFrames);
-  /// The capture of an earlier process. Null when another process is still recording it, or when it can't be
-  /// read (logged): it is then left as it is. A damaged journal makes all of the media one recording.
-  static std::shared_ptr<FinishedCapture> openAbandoned(const std::string& folder);
+                  std::uint32_t totalFrames, MediaAfterUse media = MediaAfterUse::remove);
 
-  /// Makes the movie of a request at `path`. When it is all of the media and nobody else needs that, the file
-  /// just moves; else its frames are copied. A file that bears the name already is set aside, never
-  /// overwritten.
+  /// Makes the movie of a request at `path`. If it is all of the media and no other request needs them, the
+  /// file just moves; else its frames are copied. A file that has the name is set aside, never overwritten.
+  /// @return nothing on success
   std::optional<CaptureError> makeMovie(const std::string& uuid, const std::string& path);
-  /// Makes movies of all requests that are neither cancelled nor handed over.
+  /// Makes movies of all requests that are neither cancelled nor handed over. Those that can't be made for
+  /// now (logged) stay pending.
   std::vector<RecoveredRecording> recoverPending(const std::string& repository);
   /// The movie of `uuid` and its document are in place. The folder goes when nothing in it is needed any
   /// more.
@@ -43,21 +40,26 @@ class FinishedCapture : public std::enable_shared_from_this<FinishedCapture> {
   void removeIfResolved();
 
  private:
+  // All of these: with mutex_ held.
   std::optional<CaptureError> makeMovieLocked(const Request& request, const std::string& path);
+  [[nodiscard]] bool needsAllMedia(const Request& request, const std::vector<FrameRange>& ranges) const;
   std::optional<CaptureError> copyFrames(const std::vector<FrameRange>& ranges, const std::string& path);
-  /// Copies into `temporary` and renames it to `path`. @return 0 or the errno; nothing is left then
   int copyOver(const MovieIndex& index, const std::vector<FrameRange>& ranges, const std::string& temporary,
                const std::string& path);
+  std::optional<RecoveredRecording> recover(const Request& request, const std::string& repository);
+  void giveUp(const Request& request, const CaptureError& error);
   RecoveredRecording describe(const Request& request, const std::string& path);
-  [[nodiscard]] std::string media() const { return folder_ + "/" + kMediaName; }
+  [[nodiscard]] double wallTimeOf(std::uint32_t frame) const;
+  [[nodiscard]] std::vector<FrameRange> framesFor(const Request& request) const;
   void removeIfResolvedLocked();
 
-  std::mutex mutex_;
   const std::string folder_;
-  std::shared_ptr<Journal> journal_;
-  CaptureRecord record_;  // guarded by mutex_
+  const std::string media_;  ///< path
+  const std::shared_ptr<Journal> journal_;
   const std::uint32_t total_frames_;
-  bool keep_media_ = false;  ///< a part that can't be read may still be of use to somebody; set before use
+  const MediaAfterUse media_after_use_;
+  std::mutex mutex_;
+  CaptureRecord record_;  // guarded by mutex_
 };
 
 }  // namespace lmx

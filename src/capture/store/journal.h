@@ -1,65 +1,52 @@
-// The journal of a capture: what a restart must know to finish it.
+// Writes the journal of a capture: what a restart must know to finish it. parseJournal reads it back.
 #pragma once
 #include <memory>
-#include <optional>
+#include <mutex>
 #include <string>
-#include <vector>
 
-#include "capture/media/request_marks.h"
-#include "capture/media/span_cutter.h"
-#include "capture/movie/movie_file.h"
+#include "capture/media/frame_cutter.h"
+#include "capture/store/journal_line.h"
+#include "support/dictionary.h"
+#include "support/result.h"
 #include "support/unique_fd.h"
 
 namespace lmx {
 
-/// The number that stands for the kind of a recording in journals and documents.
-constexpr int recordingTypeCode(bool video, bool audio) { return video ? (audio ? 2 : 3) : 1; }
-
-/// What a journal says, read back. Pure data.
-struct CaptureRecord {
-  bool intact = false;  ///< it names the capture and a request, and every whole line was understood
-  int recordingType = 0;
-  double frameSeconds = 0;
-  double wallOffset = 0;  ///< add it to running time to get seconds since 2001-01-01 UTC
-  std::vector<MovieRun> runs;
-  RequestMarks marks;
-  std::map<std::string, std::string> movies;  ///< request → path it was, or was about to be, given
-};
-
-/// Reads what it understands and skips the rest: a torn last line is no damage, any other is.
-CaptureRecord parseJournal(const std::string& text);
-
-/// The frames of `request` among those of `runs`. Ranges ascend; ranges that touch are joined.
-std::vector<FrameRange> framesOf(const Request& request, const std::vector<MovieRun>& runs,
-                                 double frameSeconds, std::uint32_t totalFrames);
-/// Whether `ranges` are all of the frames.
-bool coversAll(const std::vector<FrameRange>& ranges, std::uint32_t totalFrames);
-
-/// Appends to a journal. Each line is one write, so a killed process loses at most the line it was writing;
-/// sync() makes them survive a power cut. Holding it open locks it: another process then leaves the capture
-/// alone. Thread-safe.
+/// An open journal. Each line is one write, so a killed process loses at most the line it was writing; sync()
+/// makes the lines survive a power cut. A line that can't be written is logged and left out. While it is open
+/// it is locked: another process then leaves the capture alone. Thread-safe. All times are running time in
+/// seconds.
 class Journal {
  public:
-  /// Creates (or, with `existing`, opens) the journal and locks it. @return null with errno set on failure
-  /// (EWOULDBLOCK: locked).
-  static std::unique_ptr<Journal> open(const std::string& path, bool existing);
+  /// A new journal at `path`; replaces one that nobody has open.
+  static Result<std::shared_ptr<Journal>> create(const std::string& path);
+  /// The journal that an earlier process left at `path`. EWOULDBLOCK when its writer still lives.
+  static Result<std::shared_ptr<Journal>> open(const std::string& path);
 
+  /// @param recordingType  a RecordingTypeCode
+  /// @param frameSeconds  of the movie's clock
+  /// @param wallOffset  add it to running time to get seconds since 2001-01-01 UTC
   void capture(int recordingType, double frameSeconds, double wallOffset);
-  void run(const MovieRun& run);
+  /// A run has begun; its length is found in the movie.
+  void run(const MovieRun& begun);
+  /// Passwords among `parameters` are left out.
   void start(const std::string& uuid, double t, const SharedDictionary& parameters);
   void stop(const std::string& uuid, double t);
   void cancel(const std::string& uuid);
   void pause(double t);
   void resume(double t);
+  /// The request is about to get its movie at `path`.
   void movie(const std::string& uuid, const std::string& path);
+  /// Movie and document of the request are in place.
   void done(const std::string& uuid);
   /// @return 0 or the errno
-  int sync();
+  [[nodiscard]] int sync() const;
 
  private:
   explicit Journal(UniqueFd file) : file_(std::move(file)) {}
-  void append(const std::vector<std::string>& words);
-  UniqueFd file_;
+  void append(const JournalWords& words);
+  std::mutex mutex_;  ///< one line at a time, with the repair of one that could be written in part only
+  const UniqueFd file_;
 };
 
 }  // namespace lmx

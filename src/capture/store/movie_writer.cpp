@@ -1,4 +1,4 @@
-// Fragments to the disk.
+// Collecting samples to fragments, writing and syncing them.
 #include "capture/store/movie_writer.h"
 
 #include <algorithm>
@@ -10,6 +10,12 @@
 namespace lmx {
 
 using namespace std::chrono_literals;
+
+namespace {
+
+constexpr auto kSyncInterval = 1s;
+
+}  // namespace
 
 MovieWriter::MovieWriter(GrowingMovie movie, std::size_t trackCount, Journal& journal,
                          std::function<void(int)> onError)
@@ -43,26 +49,28 @@ bool MovieWriter::fragmentDue() const {
 
 void MovieWriter::run() {
   auto lastSync = std::chrono::steady_clock::now();
-  for (;;) {
-    std::vector<EncodedSample> samples;
-    bool last = false;
-    {
-      std::unique_lock lock(mutex_);
-      changed_.wait(lock, [this] { return ending_ || fragmentDue(); });
-      last = ending_;
-      samples.swap(queue_);
-      queued_bytes_ = 0;
-      lead_duration_ = 0;
-      changed_.notify_all();
-    }
-    if (error_ == 0) writeFragment(std::move(samples));
-    if (last) return;
+  for (bool last = false; !last;) {
+    const Fragment fragment = takeFragment();
+    last = fragment.last;
+    if (error_ == 0) writeFragment(fragment.samples);
     const auto now = std::chrono::steady_clock::now();
-    if (error_ == 0 && now - lastSync >= 1s) {
-      lastSync = now;
-      syncToDisk();
-    }
+    if (last || error_ != 0 || now - lastSync < kSyncInterval) continue;
+    lastSync = now;
+    syncToDisk();
   }
+}
+
+/// Waits until a fragment is due or the movie ends.
+MovieWriter::Fragment MovieWriter::takeFragment() {
+  Fragment fragment;
+  std::unique_lock lock(mutex_);
+  changed_.wait(lock, [this] { return ending_ || fragmentDue(); });
+  fragment.last = ending_;
+  fragment.samples.swap(queue_);
+  queued_bytes_ = 0;
+  lead_duration_ = 0;
+  changed_.notify_all();
+  return fragment;
 }
 
 void MovieWriter::syncToDisk() {
@@ -75,18 +83,12 @@ void MovieWriter::syncToDisk() {
                 std::strerror(error));
 }
 
-void MovieWriter::writeFragment(std::vector<EncodedSample> samples) {
+void MovieWriter::writeFragment(const std::vector<EncodedSample>& samples) {
   if (samples.empty()) return;
   int error = 0;
   if (!movie_.begun()) {
-    std::vector<TrackFormat> formats;
-    {
-      const std::lock_guard lock(mutex_);
-      for (const auto& format : formats_) {
-        if (!format) return;  // ended before every track had begun: there is no movie
-        formats.push_back(*format);
-      }
-    }
+    const std::vector<TrackFormat> formats = knownFormats();
+    if (formats.empty()) return;  // ended before every track had begun: there is no movie
     error = movie_.begin(formats);
   }
   if (error == 0) error = movie_.append(samples);
@@ -97,6 +99,17 @@ void MovieWriter::writeFragment(std::vector<EncodedSample> samples) {
     changed_.notify_all();
   }
   on_error_(error);
+}
+
+/// The formats of all tracks; empty as long as one is missing.
+std::vector<TrackFormat> MovieWriter::knownFormats() {
+  std::vector<TrackFormat> formats;
+  const std::lock_guard lock(mutex_);
+  for (const auto& format : formats_) {
+    if (!format) return {};
+    formats.push_back(*format);
+  }
+  return formats;
 }
 
 int MovieWriter::finish() {

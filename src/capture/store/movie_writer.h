@@ -1,45 +1,54 @@
-// The thread that brings encoded samples to the disk, half a second at a time.
+// Writes encoded samples to the disk on a thread of its own, half a second at a time.
 #pragma once
 #include <atomic>
 #include <condition_variable>
-#include <deque>
 #include <functional>
 #include <mutex>
-#include <string>
+#include <optional>
 #include <thread>
 #include <vector>
 
-#include "capture/movie/movie_file.h"
+#include "capture/movie/growing_movie.h"
 #include "capture/store/journal.h"
 
 namespace lmx {
 
-/// Samples come from the encoder's threads; a bounded queue keeps them until the disk has them.
+/// Samples come from the encoder's threads and wait in a bounded queue until they are written. Every second
+/// the movie and the journal are synced.
 class MovieWriter {
  public:
-  /// @param trackCount  how many formats will come before anything can be written
+  /// Starts the thread.
+  /// @param trackCount  how many formats must be known before anything can be written
+  /// @param journal  must outlive the writer
   /// @param onError  called once, on the writer's thread, with the errno of a failed write
   MovieWriter(GrowingMovie movie, std::size_t trackCount, Journal& journal, std::function<void(int)> onError);
   ~MovieWriter();
   MovieWriter(const MovieWriter&) = delete;
   MovieWriter& operator=(const MovieWriter&) = delete;
 
+  // Encoder threads.
   void setFormat(std::uint32_t track, TrackFormat format);
-  /// Waits while more than kQueueLimit bytes are queued: a disk that is too slow for the movie slows the
-  /// encoder down and then costs frames, never memory.
+  /// Queues a sample. Waits while the queue holds more than kQueueLimit bytes: a disk that is too slow makes
+  /// the encoder wait and then costs frames, never memory. After a failed write samples are dropped.
   void add(EncodedSample sample);
-  /// Writes what is left, makes the movie whole and ends the thread. @return 0 or the errno.
+  /// Writes what is queued, makes the movie whole and ends the thread. @return 0 or the errno
   int finish();
-  /// The errno of the first sync that failed, 0 when none has. The disk has then lost something of what it
-  /// was given, and says so only once: later syncs succeed. Thread-safe.
+  /// The errno of the first sync that failed; 0 when none has. Part of the data is lost then, although later
+  /// syncs succeed: the kernel reports such a loss only once. Thread-safe.
   [[nodiscard]] int syncError() const { return sync_error_; }
-  /// After finish().
+  /// Valid after finish().
   [[nodiscard]] const MovieIndex& index() const { return movie_.index(); }
 
  private:
   static constexpr std::size_t kQueueLimit = 64U << 20;
+  struct Fragment {
+    std::vector<EncodedSample> samples;
+    bool last = false;
+  };
   void run();
-  void writeFragment(std::vector<EncodedSample> samples);
+  Fragment takeFragment();
+  void writeFragment(const std::vector<EncodedSample>& samples);
+  [[nodiscard]] std::vector<TrackFormat> knownFormats();
   void syncToDisk();
   [[nodiscard]] bool fragmentDue() const;
 

@@ -88,6 +88,10 @@ struct Capture {
     controller->setDelegate(reports);
   }
   bool prepare() { return controller->prepareRecording(settings, nullptr); }
+  /// Wall-clock time of running time 0, once prepared.
+  [[nodiscard]] double zero() const {
+    return std::dynamic_pointer_cast<CapturePipeline>(controller->session())->wallOffset();
+  }
 
   LMRRecordingContext settings;
   std::shared_ptr<Reports> reports = std::make_shared<Reports>();

@@ -7,6 +7,7 @@
 #include <fstream>
 #include <thread>
 
+#include "model/codes.h"
 #include "support/time_value.h"
 #include "tests/unit/capture/capture_harness.h"
 #include "tests/unit/capture/failing_sync.h"
@@ -35,7 +36,7 @@ constexpr double kTickLead = 479.0 / 48000.0;
 std::string recordFast(const Folder& folder, Capture& capture, const std::vector<Span>& spans,
                        const std::string& name = "R") {
   EXPECT_TRUE(capture.prepare());
-  const double zero = capture.controller->pipeline()->wallOffset();
+  const double zero = capture.zero();
   for (const Span& span : spans) {
     capture.controller->setStartWithUUID("R", zero + span.start, parametersFor("R"));
     capture.controller->setStopWithUUID("R", zero + span.stop);
@@ -294,14 +295,14 @@ TEST(LiveRecording, PauseWithoutMarksLeavesTheMediaOut) {
   capture.controller->startRecording();
   std::this_thread::sleep_for(400ms);
   capture.controller->pauseRecording();
-  EXPECT_EQ(capture.controller->recordingState(), 4);
+  EXPECT_EQ(capture.controller->recordingState(), kCapturePaused);
   std::this_thread::sleep_for(500ms);
   capture.controller->resumeRecording();
-  EXPECT_EQ(capture.controller->recordingState(), 3);
+  EXPECT_EQ(capture.controller->recordingState(), kCaptureRecording);
   std::this_thread::sleep_for(400ms);
   capture.controller->stopRecording();
   ASSERT_EQ(capture.reports->wait(), Kind::complete);
-  EXPECT_EQ(capture.controller->recordingState(), 0);
+  EXPECT_EQ(capture.controller->recordingState(), kCaptureIdle);
   ASSERT_FALSE(capture.controller->processRequestWithUUID("R", folder.file("R.mov")));
   const auto runs = numberRuns(decodeMovie(folder.file("R.mov")).frameNumbers);
   ASSERT_EQ(runs.size(), 2U);
@@ -313,7 +314,7 @@ TEST(LiveRecording, MaximalDurationEndsIt) {
   Capture capture(folder, kFastVideo, kFastAudio);
   capture.settings.maxDurationMinutes = 1;
   ASSERT_TRUE(capture.prepare());
-  const double zero = capture.controller->pipeline()->wallOffset();
+  const double zero = capture.zero();
   capture.controller->setStartWithUUID("R", zero, parametersFor("R"));
   capture.controller->setStopWithUUID("R", zero + 61);
   capture.controller->startRecording();
@@ -346,10 +347,11 @@ TEST_P(LostDevice, EndsTheRecordingWithWhatThereIs) {
 
 INSTANTIATE_TEST_SUITE_P(
     Faults, LostDevice,
-    ::testing::Values(Fault{"test://video?size=320x180&lost-after=1", "test://audio", 1002},
-                      Fault{"test://video?size=320x180&eos-after=1", "test://audio?eos-after=1", 1203},
-                      Fault{"test://video?size=320x180&silent-after=1", "test://audio", 1300},
-                      Fault{"test://video?size=320x180", "test://audio?silent-after=1", 1302}));
+    ::testing::Values(Fault{"test://video?size=320x180&lost-after=1", "test://audio", kDeviceNotFound},
+                      Fault{"test://video?size=320x180&eos-after=1", "test://audio?eos-after=1",
+                            kStreamEnded},
+                      Fault{"test://video?size=320x180&silent-after=1", "test://audio", kDeviceSilent},
+                      Fault{"test://video?size=320x180", "test://audio?silent-after=1", kAudioSilent}));
 
 TEST(Preparing, AMissingDeviceIsNamed) {
   const Folder folder;

@@ -21,14 +21,13 @@ using namespace std::chrono_literals;
 TEST(Encoder, AFailureIsToldOnceAndDoesNotHoldUpItsFeeder) {
   ensureGStreamer();
   testing::Journal problems;
-  std::string problem;
   EncoderOutput output;
   output.onFormat = [](std::uint32_t, TrackFormat) {};
   output.onSample = [](EncodedSample) {};
   output.onError = [&](const std::string& what) { problems.add(what); };
-  std::shared_ptr<Encoder> encoder =
-      Encoder::create(VideoEncoding{{160, 90}, frameRateFrom(30)}, std::nullopt, output, &problem);
-  ASSERT_TRUE(encoder) << problem;
+  auto created = Encoder::create({VideoEncoding{{160, 90}, frameRateFrom(30)}, std::nullopt}, output);
+  ASSERT_TRUE(created) << created.error().message;
+  std::shared_ptr<Encoder> encoder = *std::move(created);
   std::promise<void> fed;
   std::thread feeder([encoder, &fed] {
     const BufferHandle tooSmall(gst_buffer_new_allocate(nullptr, 16, nullptr));  // no picture fits into it
@@ -50,14 +49,14 @@ TEST(Encoder, SoundThatIsNoSoundDoesNotEndIt) {
   constexpr float kNone = std::numeric_limits<float>::quiet_NaN();
   constexpr float kEndless = std::numeric_limits<float>::infinity();
   testing::Journal problems;
-  std::string problem;
   std::atomic<int> packets{0};
   EncoderOutput output;
   output.onFormat = [](std::uint32_t, TrackFormat) {};
   output.onSample = [&](const EncodedSample&) { ++packets; };
   output.onError = [&](const std::string& what) { problems.add(what); };
-  const auto encoder = Encoder::create(std::nullopt, AudioEncoding{}, output, &problem);
-  ASSERT_TRUE(encoder) << problem;
+  const auto created = Encoder::create({std::nullopt, AudioEncoding{}}, output);
+  ASSERT_TRUE(created) << created.error().message;
+  const auto& encoder = *created;
   std::vector<float> samples(std::size_t{2} * 480, 0.1F);
   for (int i = 0; i < 100; ++i) {
     samples[static_cast<std::size_t>(i)] = std::array{kNone, kEndless, -kEndless, 1e30F, 153.0F}[i % 5];

@@ -52,10 +52,6 @@ void takeSound(GstSample* sample, DecodedMovie& movie) {
   gst_buffer_unmap(gst_sample_get_buffer(sample), &map);
 }
 
-}  // namespace
-
-namespace {
-
 std::string launchLine(const std::string& path, Streams streams) {
   const std::string queue = " d. ! queue max-size-buffers=0 max-size-time=0 max-size-bytes=0 ! ";
   std::string line = "uridecodebin name=d uri=file://" + path;
@@ -83,8 +79,12 @@ bool drain(GstElement* sink, Take take) {
 
 DecodedMovie decodeMovie(const std::string& path, Streams streams) {
   DecodedMovie movie;
-  const auto pipeline = newPipeline(launchLine(path, streams), &movie.problem);
-  if (!pipeline) return movie;
+  const auto launched = newPipeline(launchLine(path, streams));
+  if (!launched) {
+    movie.problem = launched.error().message;
+    return movie;
+  }
+  const auto& pipeline = *launched;
   const auto video = elementNamed(pipeline.get(), "v");
   const auto audio = elementNamed(pipeline.get(), "a");
   gst_element_set_state(pipeline.get(), GST_STATE_PLAYING);

@@ -21,7 +21,7 @@ using Kind = testing::Reports::Kind;
 std::string makeSource(const Folder& folder) {
   Capture capture(folder, "test://video?size=320x180&speed=max", "test://audio?speed=max");
   EXPECT_TRUE(capture.prepare());
-  const double zero = capture.controller->pipeline()->wallOffset();
+  const double zero = capture.zero();
   capture.controller->setStartWithUUID("source", zero, parametersFor("source"));
   capture.controller->setStopWithUUID("source", zero + 2);
   capture.controller->startRecording();

@@ -1,0 +1,100 @@
+// Records one capture: cuts raw media along the marks that arrive meanwhile and writes a growing movie.
+#pragma once
+#include <atomic>
+#include <condition_variable>
+#include <cstdint>
+#include <functional>
+#include <memory>
+#include <mutex>
+#include <optional>
+#include <string>
+
+#include "capture/api/capture_framework.h"
+#include "capture/media_cutter.h"
+#include "capture/media_queue.h"
+#include "capture/movie_output.h"
+#include "capture/recording_plan.h"
+#include "capture/source/pipeline_registry.h"
+#include "capture/store/capture_files.h"
+#include "capture/store/capture_marks.h"
+#include "capture/store/finished_capture.h"
+
+namespace lmx {
+
+/// Owns the capture's devices, files and recording thread from open() until the file is closed. Streaming
+/// threads queue; the recording thread cuts and feeds the encoder; the encoder's threads hand samples to the
+/// writer's thread. The recording thread keeps the recorder alive until it has ended. Thread-safe.
+class CaptureRecorder : public CaptureConsumer, public std::enable_shared_from_this<CaptureRecorder> {
+ public:
+  using Ending = CaptureMarks::Ending;
+  struct Outcome {
+    bool cancelled = false;
+    std::optional<CaptureError> error;
+  };
+
+  /// Opens the devices and makes the capture's files. Blocks for as long as that takes.
+  static Result<std::shared_ptr<CaptureRecorder>, CaptureError> open(const RecordingPlan& plan);
+  /// Starts the recording thread; once. `onEnd` is called there when the file is closed and the devices are
+  /// given back, and keeps alive what it holds until then.
+  void run(std::function<void(const Outcome&)> onEnd);
+
+  /// Starts devices that wait for it ("speed=max"). All others deliver already.
+  void startFlow();
+  /// Decides that the recording ends; the recording thread does the rest. Only the first call counts.
+  void end(Ending how);
+
+  [[nodiscard]] CaptureMarks& marks() { return marks_; }
+  /// Running time now; in a closed capture the time at which it ended.
+  [[nodiscard]] double runningTime() const;
+  /// Running time of a wall-clock time, seconds since 2001-01-01 UTC.
+  [[nodiscard]] double runningTimeAt(double wallTime) const;
+  /// Media written so far.
+  [[nodiscard]] std::int64_t recordedMilliseconds() const;
+  [[nodiscard]] std::optional<CaptureError> error() const;
+  /// The open devices; null once they have been given back.
+  [[nodiscard]] PipelineLease pipeline() const;
+  /// The closed capture; null while it records.
+  [[nodiscard]] std::shared_ptr<FinishedCapture> finished() const;
+  /// Waits until the capture is closed.
+  [[nodiscard]] std::shared_ptr<FinishedCapture> waitUntilFinished() const;
+
+  void onVideo(BufferHandle buffer, double runningTime) override;
+  void onAudio(BufferHandle buffer, double runningTime) override;
+  void onCaptureError(const CaptureError& error) override;
+
+ private:
+  CaptureRecorder(const RecordingPlan& plan, PipelineLease pipeline, CaptureFiles files);
+
+  // The recording thread.
+  Outcome record();
+  void recordUntilTheEnd();
+  void feed(MediaQueue::Batch batch);
+  [[nodiscard]] bool reachedEnd() const;
+  void checkLimits();
+  std::uint32_t closeMovie();
+  void publish(CapturePipeline& pipeline, std::uint32_t totalFrames);
+  [[nodiscard]] double endOfMedia(const CapturePipeline& pipeline) const;
+
+  // Any thread.
+  void fail(const CaptureError& error);
+
+  const RecordingPlan plan_;
+  const double frame_seconds_;  ///< of the movie's clock
+  const std::string folder_;
+  const std::shared_ptr<Journal> journal_;
+  CaptureMarks marks_;
+  MediaQueue queue_;
+  std::unique_ptr<MovieOutput> movie_;  // recording thread
+  MediaCutter cutter_;                  // recording thread
+  bool limit_reached_ = false;          // recording thread
+  std::atomic<std::uint32_t> recorded_frames_{0};
+
+  mutable std::mutex mutex_;
+  mutable std::condition_variable finished_set_;
+  PipelineLease pipeline_;                     // guarded by mutex_: null once the capture is closed
+  double closed_at_ = 0;                       // guarded by mutex_: running time when the capture ended
+  std::optional<CaptureError> error_;          // guarded by mutex_: the first one
+  std::shared_ptr<FinishedCapture> finished_;  // guarded by mutex_
+};
+
+}  // namespace lmx

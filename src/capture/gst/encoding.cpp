@@ -1,0 +1,73 @@
+// Chooses bit rates and time scales, and writes the encoder's launch line.
+#include "capture/gst/encoding.h"
+
+#include <algorithm>
+#include <cmath>
+
+#include "support/format.h"
+
+namespace lmx {
+namespace {
+
+constexpr double kSoundGrainSeconds = 0.01;
+
+std::string videoDescription(const VideoEncoding& video) {
+  const FrameRate rate = video.frameRate;
+  const int keyInterval = std::max(1, static_cast<int>(std::lround(1.0 / rate.frameSeconds())));
+  return string_with_format(
+      "appsrc name=vsrc format=time block=true max-buffers=8 max-bytes=0 max-time=0 stream-type=stream "
+      "caps=video/x-raw,format=I420,width=%d,height=%d,framerate=%d/%d,pixel-aspect-ratio=1/1 ! "
+      "x264enc tune=zerolatency speed-preset=%s bitrate=%d key-int-max=%d byte-stream=false aud=false "
+      "option-string=scenecut=0 ! video/x-h264,stream-format=avc,alignment=au ! "
+      "appsink name=vout sync=false async=false max-buffers=0 enable-last-sample=false ",
+      video.size.width, video.size.height, rate.numerator, rate.denominator, speedPreset(video),
+      videoBitRate(video), keyInterval);
+}
+
+std::string audioDescription(const AudioEncoding& audio) {
+  return string_with_format(
+      "appsrc name=asrc format=time block=true max-buffers=64 max-bytes=0 max-time=0 stream-type=stream "
+      "caps=audio/x-raw,format=F32LE,layout=interleaved,rate=%d,channels=%d%s ! "
+      "avenc_aac bitrate=%d ! appsink name=aout sync=false async=false max-buffers=0 "
+      "enable-last-sample=false ",
+      audio.sampleRate, audio.channels, audio.channels == 2 ? ",channel-mask=(bitmask)0x3" : "",
+      audio.bitRate);
+}
+
+}  // namespace
+
+double MovieEncoding::frameSeconds() const {
+  return video ? video->frameRate.frameSeconds() : kSoundGrainSeconds;
+}
+
+int videoBitRate(const VideoEncoding& video) {
+  static constexpr double kFactor[] = {0.75, 1.0, 1.6};
+  const double megapixels = video.size.width * video.size.height / video.frameRate.frameSeconds() / 1e6;
+  // About 2.5 Mbit/s at 720p30 and 4.5 at 1080p30: slides and a speaker, sharp text.
+  const double kilobits = 205.0 * std::pow(megapixels, 0.75);
+  return std::max(150, static_cast<int>(kilobits * kFactor[static_cast<int>(video.quality)]));
+}
+
+const char* speedPreset(const VideoEncoding& video) {
+  const bool upTo720p = video.size.width * video.size.height <= 1280 * 720;
+  if (video.quality == RecordingQuality::good || !upTo720p) return "superfast";
+  return "veryfast";
+}
+
+std::uint32_t videoTimescale(FrameRate rate) {
+  std::uint32_t scale = static_cast<std::uint32_t>(rate.numerator);
+  while (scale < 10000) scale *= 10;
+  return scale;
+}
+
+std::uint32_t frameDuration(FrameRate rate) {
+  return videoTimescale(rate) / static_cast<std::uint32_t>(rate.numerator) *
+         static_cast<std::uint32_t>(rate.denominator);
+}
+
+std::string encoderDescription(const MovieEncoding& movie) {
+  return (movie.video ? videoDescription(*movie.video) : "") +
+         (movie.audio ? audioDescription(*movie.audio) : "");
+}
+
+}  // namespace lmx

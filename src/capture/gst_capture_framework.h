@@ -1,0 +1,34 @@
+// The capture framework on GStreamer.
+#pragma once
+#include <memory>
+#include <optional>
+#include <string>
+#include <vector>
+
+#include "capture/api/capture_framework.h"
+
+namespace lmx {
+
+/// Cheap to make: plug-ins are loaded by warmUp or by the first use. Listing devices blocks for some
+/// milliseconds. Thread-safe.
+class GstCaptureFramework : public CaptureFramework {
+ public:
+  std::optional<std::string> defaultVideoDevice() override;
+  /// Nothing: cameras with a microphone of their own count as two devices; files and streams are never a
+  /// default.
+  std::optional<std::string> defaultMuxedDevice() override { return std::nullopt; }
+  bool hasDevice(const std::string& uniqueID) override;
+  PreferredAudio preferredAudioDevice(const std::string& videoDevice) override;
+  bool audioDeviceUsable(const std::optional<std::string>& audioDevice) override;
+  std::optional<LMRCompressionOptions> compressionOptions(MediaType media, RecordingQuality quality) override;
+
+  std::shared_ptr<LMRCaptureController> newCaptureController() override;
+  std::unique_ptr<LMRPreviewController> newPreviewController(
+      std::shared_ptr<CaptureSession> session) override;
+
+  void warmUp() override;
+  std::string deviceInformation() override;
+  std::vector<RecoveredRecording> recoverUnfinished(const std::string& repository) override;
+};
+
+}  // namespace lmx

@@ -1,0 +1,66 @@
+// Cuts raw media along a capture's marks and feeds the movie with them.
+#pragma once
+#include <cstdint>
+#include <functional>
+#include <optional>
+#include <vector>
+
+#include "capture/media/frame_cutter.h"
+#include "capture/media/sound_cutter.h"
+#include "capture/media_queue.h"
+#include "capture/movie_output.h"
+#include "capture/store/capture_marks.h"
+
+namespace lmx {
+
+/// Decides frame by frame whether it is recorded; sound follows the decisions on the picture. Where there is
+/// only sound, virtual frames of 10 ms stand for the picture: the same cuts, the same clock. Recording
+/// thread only.
+class MediaCutter {
+ public:
+  /// What the cutter reads and writes; all of it must outlive the cutter.
+  struct Surroundings {
+    const CaptureMarks& marks;
+    Journal& journal;
+    MovieOutput& movie;
+    std::function<PictureSize()> pictureSize;  ///< asked once the first frame is here
+  };
+  MediaCutter(const MovieEncoding& encoding, Surroundings surroundings);
+
+  /// Frames ascend in time.
+  void feedFrame(const RawMedium& frame);
+  /// Chunks ascend in time. They are kept until the frames beside them have been decided.
+  void feedSound(RawMedia chunks);
+  /// Whether all frames before `end`, and the sound of those that were taken, have been fed.
+  [[nodiscard]] bool reaches(double end) const;
+  /// Gives the movie the sound that is left, and silence for what is missing. Nothing may be fed afterwards.
+  void close();
+
+  [[nodiscard]] const FrameCutter& frames() const { return frames_; }
+  /// Frames of the movie's clock that have been given to the movie.
+  [[nodiscard]] std::uint32_t recordedFrames() const { return recorded_frames_; }
+  /// Samples of each channel that have been given to the movie.
+  [[nodiscard]] std::int64_t samples() const { return sound_ ? sound_->position() : 0; }
+
+ private:
+  FrameDecision decide(double t);
+  void feedVirtualFrames(double until);
+  void cutChunk(const RawMedium& chunk);
+  void pushPieces(const RawMedium& chunk, const std::vector<SoundPiece>& pieces);
+  bool startMovie();
+  [[nodiscard]] double chunkSeconds(const RawMedium& chunk) const;
+  [[nodiscard]] double endOf(const RawMedium& chunk) const { return chunk.time + chunkSeconds(chunk); }
+
+  const bool has_video_;
+  const std::optional<AudioEncoding> audio_;
+  const Surroundings around_;
+  FrameCutter frames_;
+  std::optional<SoundCutter> sound_;
+  RawMedia pending_sound_;
+  double last_frame_time_ = -1e300;
+  std::uint32_t next_place_ = 0;  ///< in the movie, of the next frame to be encoded
+  std::optional<double> next_virtual_;
+  std::uint32_t recorded_frames_ = 0;
+};
+
+}  // namespace lmx

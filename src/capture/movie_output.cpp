@@ -1,0 +1,94 @@
+// Starting and ending encoder and writer.
+#include "capture/movie_output.h"
+
+#include <algorithm>
+#include <cerrno>
+#include <chrono>
+#include <cstring>
+
+#include "platform/log.h"
+
+namespace lmx {
+
+using namespace std::chrono_literals;
+
+namespace {
+
+constexpr auto kEncoderPatience = 10s;
+
+CaptureError writeError(int error, const std::string& what) {
+  return {CaptureError::kDomain, error == ENOSPC ? kNoSpace : kWriteFailed, what + std::strerror(error)};
+}
+
+}  // namespace
+
+MovieOutput::MovieOutput(const MovieEncoding& encoding, GrowingMovie movie, Journal& journal, OnError onError)
+    : encoding_(encoding), movie_(std::move(movie)), journal_(journal), on_error_(std::move(onError)) {}
+
+bool MovieOutput::start(PictureSize size) {
+  if (writer_) return encoder_ != nullptr;
+  if (encoding_.video) encoding_.video->size = size;
+  const std::size_t tracks = (encoding_.video ? 1 : 0) + (encoding_.audio ? 1 : 0);
+  writer_ = std::make_unique<MovieWriter>(std::move(movie_), tracks, journal_,
+                                          [this](int error) { reportWriteError(error); });
+  auto encoder = Encoder::create(encoding_, encoderOutput());
+  if (encoder) {
+    encoder_ = *std::move(encoder);
+  } else {
+    on_error_({CaptureError::kDomain, kEncoderFailed, encoder.error().message});
+  }
+  return encoder_ != nullptr;
+}
+
+EncoderOutput MovieOutput::encoderOutput() {
+  EncoderOutput output;
+  output.onFormat = [this](std::uint32_t track, TrackFormat format) {
+    writer_->setFormat(track, std::move(format));
+  };
+  output.onSample = [this](EncodedSample sample) { writer_->add(std::move(sample)); };
+  output.onError = [this](const std::string& problem) {
+    on_error_({CaptureError::kDomain, kEncoderFailed, problem});
+  };
+  return output;
+}
+
+void MovieOutput::pushFrame(GstBuffer* buffer, std::uint32_t place, bool forceKey) {
+  encoder_->pushVideo(buffer, place, forceKey);
+}
+
+void MovieOutput::pushSound(const float* samples, std::uint32_t count) {
+  encoder_->pushAudio(samples, count);
+}
+
+void MovieOutput::reportWriteError(int error) {
+  on_error_(writeError(error, "the movie can't be written any further: "));
+}
+
+void MovieOutput::close(std::int64_t totalSamples) {
+  if (encoder_ && !encoder_->finish(totalSamples, kEncoderPatience)) {
+    LMPLogMessage(nullptr, kLogError, "The encoder did not come to its end; the movie holds what it gave");
+  }
+  encoder_.reset();
+  if (writer_) finishWriting();
+}
+
+void MovieOutput::finishWriting() {
+  const int closeError = writer_->finish();
+  if (const int error = writer_->syncError()) {
+    on_error_(
+        {CaptureError::kDomain, kWriteFailed,
+         std::string("the movie may be damaged, the disk has not kept all of it: ") + std::strerror(error)});
+  }
+  if (closeError == 0) return;
+  LMPLogMessage(nullptr, kLogError, "The movie could not be closed in order (%s); it stays readable as it is",
+                std::strerror(closeError));
+}
+
+std::uint32_t MovieOutput::framesWritten(std::uint32_t frames) const {
+  if (!writer_ || writer_->index().mediaEnd == 0) return 0;
+  const TrackIndex* video = writer_->index().video();
+  // What a full disk or a failing encoder left out is not there to be copied.
+  return video == nullptr ? frames : std::min(frames, static_cast<std::uint32_t>(video->sizes.size()));
+}
+
+}  // namespace lmx

@@ -1,0 +1,55 @@
+// Encodes the raw frames and samples of a capture and writes the movie to the disk.
+#pragma once
+#include <cstdint>
+#include <functional>
+#include <memory>
+
+#include "capture/api/capture_framework.h"
+#include "capture/gst/encoder.h"
+#include "capture/movie/growing_movie.h"
+#include "capture/store/movie_writer.h"
+
+namespace lmx {
+
+/// The encoder with the writer behind it. Both start with the first frame or sample. Recording thread only.
+class MovieOutput {
+ public:
+  /// Gets the reason when nothing more can be written, possibly several times and on any thread. It must not
+  /// wait for the recording thread.
+  using OnError = std::function<void(const CaptureError& error)>;
+
+  /// @param movie  created, not begun
+  /// @param journal  must outlive the output
+  MovieOutput(const MovieEncoding& encoding, GrowingMovie movie, Journal& journal, OnError onError);
+
+  /// Starts the encoder unless it runs already. @param size  of the frames
+  /// @return false when it could not be started
+  bool start(PictureSize size);
+
+  // Once started. These wait while the encoder is behind.
+  /// Encodes `buffer` as frame number `place` of the movie.
+  void pushFrame(GstBuffer* buffer, std::uint32_t place, bool forceKey);
+  /// Encodes `count` samples of each channel, interleaved, from `samples` on; null for silence.
+  void pushSound(const float* samples, std::uint32_t count);
+
+  /// Ends the streams and makes the movie whole. What goes wrong is logged or reported to `onError`.
+  /// @param totalSamples  of each channel; what the encoder adds is dropped
+  void close(std::int64_t totalSamples);
+  /// How many of the `frames` that were recorded the closed movie holds.
+  [[nodiscard]] std::uint32_t framesWritten(std::uint32_t frames) const;
+  [[nodiscard]] bool started() const { return encoder_ != nullptr; }
+
+ private:
+  [[nodiscard]] EncoderOutput encoderOutput();
+  void reportWriteError(int error);
+  void finishWriting();
+
+  MovieEncoding encoding_;
+  GrowingMovie movie_;  ///< until the writer has it
+  Journal& journal_;
+  const OnError on_error_;
+  std::unique_ptr<MovieWriter> writer_;
+  std::unique_ptr<Encoder> encoder_;  // declared behind the writer, which its threads call
+};
+
+}  // namespace lmx

@@ -1,0 +1,53 @@
+// A look at a camera.
+#include "capture/preview_controller.h"
+
+#include <gtest/gtest.h>
+
+#include "tests/unit/capture/capture_harness.h"
+
+namespace lmx {
+namespace {
+
+using testing::Capture;
+using testing::Folder;
+
+constexpr const char* kCamera = "test://video?size=320x180";
+
+TEST(PreviewController, HasTheCameraOpenOnlyWhileItRuns) {
+  PreviewController preview(nullptr);
+  CaptureError error;
+  ASSERT_TRUE(preview.attachIOWithDevice(kCamera, &error));
+  EXPECT_FALSE(preview.isPreviewRunning());
+  EXPECT_EQ(preview.session(), nullptr);
+  preview.startPreview();
+  ASSERT_NE(preview.session(), nullptr);
+  EXPECT_TRUE(preview.session()->isRunning());
+  preview.stopPreview();
+  EXPECT_EQ(preview.session(), nullptr);
+}
+
+TEST(PreviewController, ACameraThatIsNotThereIsRefused) {
+  PreviewController preview(nullptr);
+  CaptureError error;
+  EXPECT_FALSE(preview.attachIOWithDevice("file:///nowhere.mov", &error));
+  EXPECT_EQ(error.code, kDeviceNotFound);
+}
+
+TEST(PreviewController, SharesItsDevicesWithARecording) {
+  PreviewController preview(nullptr);
+  CaptureError error;
+  ASSERT_TRUE(preview.attachIOWithDevice(kCamera, &error));
+  preview.addAudioDeviceWithID("test://audio");
+  preview.startPreview();
+  const Folder folder;
+  Capture capture(folder, kCamera, "test://audio");
+  ASSERT_TRUE(capture.prepare());
+  EXPECT_EQ(capture.controller->session().get(), preview.session().get());
+  capture.controller->cancelRecording();
+  ASSERT_EQ(capture.reports->wait(), testing::Reports::Kind::cancel);
+  EXPECT_EQ(capture.controller->session(), nullptr);
+  EXPECT_TRUE(preview.session()->isRunning()) << "the preview still needs them";
+}
+
+}  // namespace
+}  // namespace lmx
