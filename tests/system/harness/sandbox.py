@@ -194,8 +194,11 @@ def children_of(pid):
 
 
 def _state(task):
-    """The scheduler's letter for a thread; T when a signal has stopped it."""
-    return (task / "stat").read_text().rpartition(") ")[2][0]
+    """The scheduler's letter for a thread; T when a signal has stopped it, or when it has ended."""
+    try:
+        return (task / "stat").read_text().rpartition(") ")[2][0]
+    except (FileNotFoundError, ProcessLookupError):
+        return "T"
 
 
 def _name(pid):
