@@ -1,5 +1,4 @@
 """The harness's readers against known material: a reader that finds nothing would prove nothing."""
-import signal
 import subprocess
 
 import numpy
@@ -72,9 +71,9 @@ def test_a_broken_movie_is_a_failure(tmp_path):
 @pytest.mark.parametrize("way", ["local socket", "tunnel"])
 def test_what_the_daemon_has_not_read_is_seen(agent, server, way):
     with agent.connect() if way == "local socket" else server.peer as peer:
-        agent.sandbox.signal(signal.SIGSTOP)
+        agent.sandbox.freeze()
         peer.sendall(b"STATUS")
         assert not all_read(agent, peer)
-        agent.sandbox.signal(signal.SIGCONT)
+        agent.sandbox.thaw()
         wait_read(agent, peer)
         assert all_read(agent, peer)

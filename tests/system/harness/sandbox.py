@@ -150,6 +150,15 @@ class Sandbox:
     def signal(self, number):
         os.kill(self.daemon_pid, number)
 
+    def freeze(self):
+        """Stops the daemon, and returns when none of its threads runs any more."""
+        self.signal(signal.SIGSTOP)
+        tasks = Path(f"/proc/{self.daemon_pid}/task")
+        wait_until(lambda: all(_state(task) == "T" for task in tasks.iterdir()), what="the daemon standing still")
+
+    def thaw(self):
+        self.signal(signal.SIGCONT)
+
     def wait(self, timeout=20.0):
         """The daemon's exit status, 128 + n when signal n ended it. The process tree is gone afterwards."""
         try:
@@ -182,6 +191,14 @@ def children_of(pid):
         return [int(word) for word in Path(f"/proc/{pid}/task/{pid}/children").read_text().split()]
     except (FileNotFoundError, ProcessLookupError):
         return []
+
+
+def _state(task):
+    """The scheduler's letter for a thread; T when a signal has stopped it, or when it has ended."""
+    try:
+        return (task / "stat").read_text().rpartition(") ")[2][0]
+    except (FileNotFoundError, ProcessLookupError):
+        return "T"
 
 
 def _name(pid):
