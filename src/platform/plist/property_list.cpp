@@ -19,6 +19,7 @@
 
 #include "platform/directories.h"
 #include "platform/plist/property_list_guard.h"
+#include "platform/plist/property_list_xml.h"
 #include "support/unique_fd.h"
 #include "support/utf8.h"
 

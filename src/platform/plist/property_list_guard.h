@@ -1,4 +1,4 @@
-// Bounds on property lists, checked before a library sees them: it has none of its own. Pure.
+// Bounds on binary property lists, checked before a library sees them: it has none of its own. Pure.
 #pragma once
 #include <cstddef>
 #include <optional>
@@ -7,22 +7,9 @@
 
 namespace lmx {
 
-/// An XML document reduced to what a property list may hold, or why it is refused.
-struct XmlCheck {
-  std::string clean;                   ///< bare tags and their text: no comment, CDATA, attribute or DOCTYPE
-  std::optional<std::string> refused;  ///< depth, number of values, definitions, unbalanced or unknown tags
-};
-
-/// The parser gets `clean` instead of the document, so that nothing that it reads differently (a comment's
-/// end, a quoted bracket) can get past the bounds counted here.
-/// @param values  most values that it may hold
-XmlCheck checkXml(std::string_view text, std::size_t values);
-
 /// Why a binary property list must not be parsed (malformed tables, references in a circle, depth, values and
 /// bytes counted as often as they expand); nothing when it may.
+/// @param values  the most values that it may hold
 std::optional<std::string> refuseBinary(std::string_view bytes, std::size_t values);
-
-/// Stands for what a property list's XML can't hold: U+FFFD.
-inline constexpr std::string_view kReplacementCharacter = "\xEF\xBF\xBD";
 
 }  // namespace lmx

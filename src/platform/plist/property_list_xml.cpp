@@ -1,4 +1,6 @@
 // Reducing an XML document to the bare tags of a property list, and counting them.
+#include "platform/plist/property_list_xml.h"
+
 #include <algorithm>
 #include <array>
 #include <cctype>
@@ -9,7 +11,6 @@
 #include <vector>
 
 #include "platform/plist/property_list.h"
-#include "platform/plist/property_list_guard.h"
 #include "support/utf8.h"
 
 namespace lmx {
