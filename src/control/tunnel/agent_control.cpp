@@ -14,6 +14,7 @@
 
 #include "control/channel/back_off.h"
 #include "control/channel/plain_text.h"
+#include "control/protocol/reply.h"
 #include "control/tunnel/cluster_hosts.h"
 #include "control/tunnel/hello.h"
 #include "platform/net/connect_multiple.h"
@@ -158,7 +159,7 @@ void AgentControl::sendReply(const std::string& reply) {
   if (!hello_sent_) return context().logDebug("No reply before the hello: " + reply);
   if (!secret) return;
   const auto text = agent_encrypt_message(initialization_vector_, *secret,
-                                          agent_random_bytes(kRandomPrefix).append(plainReplyBytes(reply)));
+                                          agent_random_bytes(kRandomPrefix).append(replyBytes(reply)));
   if (!text) return;
   const int error = sendWhole(sockets().current(), *text + "\n", kSendPatience, wakeDescriptor());
   if (error == 0) return;

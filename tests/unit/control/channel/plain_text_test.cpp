@@ -1,4 +1,4 @@
-// Lines in, replies out, in plain text.
+// Commands as plain text.
 #include "control/channel/plain_text.h"
 
 #include <gtest/gtest.h>
@@ -7,11 +7,6 @@
 
 namespace lmx {
 namespace {
-
-TEST(PlainText, AsManyBytesAsCharactersGoOut) {
-  EXPECT_EQ(plainReplyBytes("cmdStatus=0"), "cmdStatus=0");
-  EXPECT_EQ(plainReplyBytes("CameraName=Hörsaal,x=12"), "CameraName=Hörsaal,x=1");
-}
 
 TEST(PlainText, LineThatIsNotUtf8IsIgnoredWithAnErrorLine) {
   testing::LogCapture log;
