@@ -70,11 +70,13 @@ void StatusCommand::handleSTATUS(const Dictionary* parameters) {
     return;
   }
   if (isTrue(parameters, "include_profile")) {
-    reply += "," + profileFields(context->server.machine_name.get(), context->server.tunnel_host.get(),
-                                 context->recording.capture_preset.get());
+    reply.append(",").append(profileFields(context->server.machine_name.get(),
+                                           context->server.tunnel_host.get(),
+                                           context->recording.capture_preset.get()));
   }
   if (preview) {
-    reply += "," + previewFields(audioLevels(powerLevels(session.get(), status.recordStatus)), *preview);
+    const auto levels = audioLevels(powerLevels(session.get(), status.recordStatus));
+    reply.append(",").append(previewFields(levels, *preview));
   } else if (include_preview && recordingTypeSupportsVideoPreview(session.get())) {
     LMPLogMessage(context->log_context(), kLogDebug, "preview buffer is NULL");
   }

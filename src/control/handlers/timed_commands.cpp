@@ -52,7 +52,8 @@ void TimedCommands::revoke(const Dictionary* parameters) {
 std::string TimedCommands::timerListReply() const {
   const auto context = context_.get();
   const std::string list = context ? propertyListXml(plistFrom(context->timedCmdList.entries())) : "";
-  return replyText(CommandError::none) + (list.empty() ? "" : ",timerlist=" + list);
+  const std::string done = replyText(CommandError::none);
+  return list.empty() ? done : done + ",timerlist=" + list;
 }
 
 /// @return whether it was added to the list
