@@ -1,179 +1,184 @@
-// A channel's beginning and end: its thread, its sockets, its fields.
+// What the control channels share: start, connect with back-off, receive until the connection is gone, stop.
 #include "control/channel/agent_control_base.h"
 
-#include <netdb.h>
-#include <sys/eventfd.h>
 #include <sys/socket.h>
-#include <unistd.h>
 
 #include <array>
+#include <cerrno>
+#include <chrono>
 #include <exception>
-#include <system_error>
 #include <utility>
 
+#include "control/channel/back_off.h"
+#include "control/protocol/command_text.h"
 #include "platform/net/socket_io.h"
-#include "record/agent_record.h"
+#include "support/format.h"
 
 namespace lmx {
 
-AgentControlBase::AgentControlBase(std::shared_ptr<AgentContext> context, AgentActions* actions,
-                                   ChannelClock& clock)
-    : clock_(clock),
-      actions_(actions),
-      agentContext_(std::move(context)),
-      wake_(::eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK)) {
-  properties.set(std::make_shared<const Dictionary>());
-}
+using namespace std::chrono_literals;
 
-AgentControlBase::~AgentControlBase() {
-  askToStop();
-  waitForThread();
-  closeSockets();
-}
+namespace {
+
+constexpr auto kReceiveWait = 2s;
+
+}  // namespace
+
+AgentControlBase::AgentControlBase(ChannelKind kind, std::shared_ptr<AgentContext> context,
+                                   AgentActions* actions, ChannelClock& clock)
+    : context_(std::move(context)),
+      actions_(actions),
+      clock_(clock),
+      handlers_(context_, actions, *this, kind),
+      dispatcher_(context_, handlers_, *this),
+      reconnect_reasons_(context_, clock) {}
 
 bool AgentControlBase::initWithAgentContext() {
-  LMPLogMessage(logContext(), kLogNotice, "Control module is starting...");
+  LMPLogMessage(context_.log(), kLogNotice, "Control module is starting...");
   if (registerForNetworkChange() == -1) return false;
-  if (!wake_.valid()) {  // nothing could stop its thread
-    LMPLogMessage(logContext(), kLogError, "Control module cannot be started");
-    return false;
-  }
   if (!clock_.now()) {  // without the time a lost server would never be noticed
-    LMPLogMessage(logContext(), kLogCritical, "Internal error occurred");
+    LMPLogMessage(context_.log(), kLogCritical, "Internal error occurred");
     return false;
   }
-  const std::scoped_lock gate(start_mutex_, thread_mutex_);
-  // Set before the thread exists: a stop that comes before its first instruction must not be undone by it.
-  running_ = true;
-  thread_ended_ = false;
-  try {
-    thread_context_ = std::thread(&AgentControlBase::threadBody, this);
-  } catch (const std::system_error&) {
-    running_ = false;
-    thread_ended_ = true;
-    LMPLogMessage(logContext(), kLogError, "Control module cannot be started");
-    return false;
-  }
-  thread_started_ = true;
-  LMPLogMessage(logContext(), kLogNotice, "Control module started with success");
-  return true;
-}
-
-void AgentControlBase::threadBody() noexcept {
-  { const std::lock_guard gate(start_mutex_); }  // its own messages come after those of the start
-  thread_id_ = std::this_thread::get_id();
-  try {
-    run();
-  } catch (const std::exception& problem) {
-    LMPLogMessage(logContext(), kLogCritical, "Control channel has ended: %s", problem.what());
-    closeSockets();  // a peer must not wait for answers that nobody gives
-  }
-  thread_id_ = std::thread::id();  // the system may give it to another thread from now on
-  thread_ended_ = true;
+  const auto announce = [this] {
+    LMPLogMessage(context_.log(), kLogNotice, "Control module started with success");
+  };
+  if (thread_.canBeStopped() && thread_.start([this] { runSafely(); }, announce)) return true;
+  LMPLogMessage(context_.log(), kLogError, "Control module cannot be started");
+  return false;
 }
 
 int AgentControlBase::registerForNetworkChange() {
   if (actions_ == nullptr) return 0;
-  network_watch_ = actions_->watchNetwork([this] { networkChanged(); });
+  network_watch_ = actions_->watchNetwork([this] { reconnect_reasons_.networkChanged(); });
   if (network_watch_) return 0;
-  LMPLogMessage(logContext(), kLogError,
+  LMPLogMessage(context_.log(), kLogError,
                 "Unable to create dynamic store for Netvane registration for Network Notification");
-  LMPLogMessage(logContext(), kLogError, "Unable to register for network notifications");
+  LMPLogMessage(context_.log(), kLogError, "Unable to register for network notifications");
   return -1;
 }
 
-void AgentControlBase::networkChanged() {
-  logInfo("A network transition was received.");
-  if (const auto now = clock_.now()) setNetTransitionTime(now->tv_sec);
+void AgentControlBase::runSafely() noexcept {
+  try {
+    run();
+  } catch (const std::exception& problem) {
+    LMPLogMessage(context_.log(), kLogCritical, "Control channel has ended: %s", problem.what());
+    sockets_.closeAll();  // a peer must not wait for answers that nobody gives
+  }
 }
 
-void AgentControlBase::askToStop() {
-  running_ = false;
-  const std::uint64_t one = 1;
-  // Can only fail when it is readable already.
-  [[maybe_unused]] const auto written = ::write(wake_.get(), &one, sizeof one);
+int AgentControlBase::run() {
+  while (running() && connectWithBackOff()) {
+    // Only now, when the new connection exists: a server never sees the agent without any.
+    disconnectOld();
+    receiveUntilGone();
+    sockets_.retireCurrent();
+  }
+  return 0;
+}
+
+/// @return false when the channel is to stop.
+bool AgentControlBase::connectWithBackOff() {
+  for (auto delay = kFirstBackOff; sockets_.current() == -1;) {
+    if (!running()) return false;
+    if (connect() != 1) continue;
+    context_.logInfo(string_with_format("Failed to connect to server, retrying in %d seconds.",
+                                        static_cast<int>(delay.count())));
+    // A stop ends the sleep at once.
+    if (running()) clock_.sleep(delay, wakeDescriptor(), sockets_.previousIfAlive());
+    if (takeBackPreviousPeer()) break;
+    delay = nextBackOff(delay);
+  }
+  return true;
+}
+
+/// Gives the previous peer its place again if it has said something: one that lost it to a change of the
+/// network, or to ten minutes without a command, knows nothing of that, and its STOP must not be lost.
+/// @return whether it has
+bool AgentControlBase::takeBackPreviousPeer() {
+  if (!sockets_.previousSpeaks()) return false;
+  previousPeerSpeaks();
+  context_.logDebug("The previous peer speaks again");
+  sockets_.restorePrevious();
+  return true;
+}
+
+void AgentControlBase::receiveUntilGone() {
+  peer_has_gone_ = false;
+  while (running()) {
+    if (reconnect_reasons_.mustReconnect()) return;
+    if (!waitForPacket()) {
+      peer_has_gone_ = true;
+      return;
+    }
+  }
+}
+
+/// @return false when the connection is gone.
+bool AgentControlBase::waitForPacket() {
+  const int socket = sockets_.current();
+  if (socket == -1) return false;
+  auto readiness = awaitReadable(socket, wakeDescriptor(), kReceiveWait);
+  while (readiness == Readiness::interrupted && running()) {
+    clock_.sleep(1ms, wakeDescriptor());
+    readiness = awaitReadable(socket, wakeDescriptor(), kReceiveWait);
+  }
+  if (readiness == Readiness::readable && running()) return receivePacket(socket);
+  return readiness != Readiness::badDescriptor;
+}
+
+bool AgentControlBase::receivePacket(int socket) {
+  std::array<char, 1024> buffer{};
+  const ssize_t received = ::recv(socket, buffer.data(), buffer.size(), MSG_DONTWAIT);
+  if (received == 0) return connected();
+  if (received < 0) return errno != EBADF && errno != ECONNRESET && errno != ETIMEDOUT;
+  packetReceived(buffer.data(), static_cast<std::uint32_t>(received));
+  return true;
+}
+
+void AgentControlBase::packetReceived(const char* bytes, std::uint32_t size) {
+  try {
+    const auto result = partial_command_.feed(std::string_view(bytes, size));
+    if (result.appended) LMPLogMessage(context_.log(), kLogDebug, "Appending to existing partial command");
+    if (result.dropped) {
+      LMPLogMessage(context_.log(), kLogError, "Command of more than %zu bytes without an end dropped",
+                    kPartialCommandLimit);
+    }
+    if (!result.line) return;
+    if (const auto text = commandFromReceivedData(*result.line))
+      dispatcher_.execute(std::string(trimLineBreaks(*text)), !requiresAuthentication());
+  } catch (const std::exception& problem) {
+    // One command that can't be executed must not cost the channel.
+    LMPLogMessage(context_.log(), kLogCritical, "Internal error occurred: %s", problem.what());
+  }
 }
 
 void AgentControlBase::stop() {
   askToStop();
-  const auto context = agentContext();
+  const auto context = context_.get();
   if (!context) {  // the channel has stopped itself before
-    if (!onOwnThread()) waitForThread();
+    if (!thread_.isCurrent()) thread_.waitUntilEnded();
     return;
   }
   LMPLogMessage(context->log_context(), kLogNotice, "Control module is stopping...");
-  if (!onOwnThread() && waitForThread()) {
-    closeSockets();  // a peer that still saw the old connection open would count two channels after a restart
+  if (!thread_.isCurrent() && thread_.waitUntilEnded()) {
+    sockets_.closeAll();  // a peer that still saw the old connection open would count two channels after a
+                          // restart
     return;
   }
   disconnect();
-  properties.set(nullptr);
-  agentContext_.set(nullptr);
+  handlers_.recording().properties.set(nullptr);
+  context_.release();
 }
 
-/// @return false when there never was a thread.
-bool AgentControlBase::waitForThread() {
-  const std::lock_guard lock(thread_mutex_);
-  if (thread_context_.joinable()) thread_context_.join();
-  return thread_started_;
+void AgentControlBase::disconnect() {
+  context_.logInfo("Disconnecting from tunnel...");
+  sockets_.closeCurrent();
 }
 
-void AgentControlBase::closeSockets() {
-  const std::lock_guard lock(send_mutex_);
-  for (auto* socket : {&serverSocket_, &serverSocketDumped_}) UniqueFd closing(socket->exchange(-1));
-}
-
-bool AgentControlBase::connected() const {
-  const int socket = serverSocket_;
-  return socket != -1 && peerIsConnected(socket);
-}
-
-void AgentControlBase::closeOnce(std::atomic<int>& socket) {
-  const std::lock_guard lock(send_mutex_);
-  const int current = socket.exchange(-1);
-  logInfo("Disconnecting from tunnel...");
-  const UniqueFd closing(current);
-}
-
-void AgentControlBase::disconnect() { closeOnce(serverSocket_); }
-void AgentControlBase::disconnectOld() { closeOnce(serverSocketDumped_); }
-
-namespace {
-
-struct AddressListDeleter {
-  void operator()(addrinfo* list) const noexcept { ::freeaddrinfo(list); }
-};
-
-}  // namespace
-
-std::string AgentControlBase::dnsResolveName(const std::string& host) {
-  addrinfo hints{};
-  hints.ai_flags = AI_CANONNAME;
-  addrinfo* found = nullptr;
-  if (::getaddrinfo(host.c_str(), nullptr, &hints, &found) != 0) return {};
-  const std::unique_ptr<addrinfo, AddressListDeleter> list(found);
-  std::array<char, 255> text{};
-  if (list->ai_canonname == nullptr || ::getnameinfo(list->ai_addr, list->ai_addrlen, text.data(),
-                                                     text.size(), nullptr, 0, NI_NUMERICHOST) != 0) {
-    return {};
-  }
-  return text.data();
-}
-
-LMPLogContext AgentControlBase::logContext() const {
-  const auto context = agentContext();
-  return context ? context->log_context() : nullptr;
-}
-void AgentControlBase::logDebug(const std::string& message) const {
-  if (const auto context = agentContext()) context->logDebug(message);
-}
-void AgentControlBase::logInfo(const std::string& message) const {
-  if (const auto context = agentContext()) context->logInfo(message);
-}
-
-std::shared_ptr<AgentRecord> AgentControlBase::session() const {
-  const auto context = agentContext();
-  return context ? context->record_context() : nullptr;
+void AgentControlBase::disconnectOld() {
+  context_.logInfo("Disconnecting from tunnel...");
+  sockets_.closePrevious();
 }
 
 }  // namespace lmx

@@ -1,7 +1,9 @@
 // A channel without any peer: it runs commands whose own channel is gone.
 #pragma once
+#include <memory>
 #include <optional>
 #include <string>
+#include <utility>
 
 #include "control/channel/agent_control_base.h"
 
@@ -10,16 +12,16 @@ namespace lmx {
 /// Never started. Replies are logged at debug level and go nowhere.
 class DetachedChannel final : public AgentControlBase {
  public:
-  using AgentControlBase::AgentControlBase;
+  DetachedChannel(std::shared_ptr<AgentContext> context, AgentActions* actions)
+      : AgentControlBase(ChannelKind::detached, std::move(context), actions, systemChannelClock()) {}
   ~DetachedChannel() override { stop(); }
-
-  [[nodiscard]] bool requiresAuthentication() const override { return false; }
-  void setAuthenticated(bool) override {}
 
  protected:
   int connect() override { return 1; }
   std::optional<std::string> commandFromReceivedData(const std::string&) override { return std::nullopt; }
-  void sendReply(const std::string& reply) override { logDebug("Nobody to send the reply to: " + reply); }
+  void sendReply(const std::string& reply) override {
+    context().logDebug("Nobody to send the reply to: " + reply);
+  }
 };
 
 }  // namespace lmx

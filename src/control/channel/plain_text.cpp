@@ -1,8 +1,9 @@
-// The unencrypted transport of the listening channels: lines in, replies without a terminator out.
+// Commands and replies as plain text.
 #include "control/channel/plain_text.h"
 
 #include <chrono>
 
+#include "control/protocol/reply.h"
 #include "platform/net/socket_io.h"
 #include "support/utf8.h"
 
@@ -19,10 +20,8 @@ std::optional<std::string> plainCommand(const std::string& line, LMPLogContext l
   return std::nullopt;
 }
 
-std::string_view plainReplyBytes(std::string_view reply) { return reply.substr(0, characterCount(reply)); }
-
 int sendPlainReply(int socket, std::string_view reply, int wake) {
-  return sendWhole(socket, plainReplyBytes(reply), kReplyPatience, wake);
+  return sendWhole(socket, replyBytes(reply), kReplyPatience, wake);
 }
 
 }  // namespace lmx

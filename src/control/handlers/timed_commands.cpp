@@ -1,172 +1,131 @@
-// TIMEDCMD: commands that run later, their list and its file.
-#include <sys/stat.h>
+// TIMEDCMD: commands that run later.
+#include "control/handlers/timed_commands.h"
 
-#include <cerrno>
-#include <cstring>
+#include <ctime>
+#include <memory>
+#include <utility>
 
-#include "control/channel/agent_control_base.h"
+#include "control/handlers/timers_file.h"
+#include "control/protocol/reply.h"
 #include "platform/directories.h"
 #include "platform/identifiers.h"
 #include "platform/paths.h"
-#include "platform/plist/property_list.h"
 #include "support/date_text.h"
 
 namespace lmx {
 namespace {
 
 constexpr std::string_view kManagement = "TIMER";
-constexpr const char* kDone = "cmdStatus=0";
-constexpr const char* kNotScheduled = "cmdStatus=31";
-constexpr const char* kNoSuchTimer = "cmdStatus=37";
-constexpr const char* kRevoked = "cmdStatus=38";
 
-/// Our own file, however long the list has grown: only what no schedule can be is refused.
-constexpr PlistLimits kTimersLimits{.bytes = 64U << 20, .values = 1'000'000};
+TimersFile timersFile() { return TimersFile(systemPath(kTimersFile)); }
 
-PlistValue plistFrom(const std::vector<TimedCommandList::Entry>& entries) {
-  PlistArray array;
-  for (const auto& entry : entries) {
-    PlistDictionary item;
-    for (const auto& [key, value] : *entry) item.emplace(key, value);
-    array.emplace_back(std::move(item));
-  }
-  return array;
-}
-
-/// An element of the file; null when it is no dictionary of texts.
-SharedDictionary entryFrom(const PlistValue& value) {
-  const PlistDictionary* item = value.dictionary();
-  if (item == nullptr) return nullptr;
-  Dictionary entry;
-  for (const auto& [key, text] : *item) {
-    if (text.string() == nullptr) return nullptr;
-    entry.emplace(key, *text.string());
-  }
+SharedDictionary withIdentity(Dictionary entry) {
+  if (!entry.contains("TimerID")) entry.emplace("TimerID", newUUIDString());
   return std::make_shared<const Dictionary>(std::move(entry));
-}
-
-struct TimersFile {
-  std::vector<SharedDictionary> entries;
-  std::string problem;  ///< why not all of it could be read; empty: nothing is wrong
-};
-
-TimersFile readTimers(const std::string& path) {
-  TimersFile result;
-  const PlistResult file = readPropertyList(path, kTimersLimits);
-  if (!file) {
-    if (file.error().systemError != ENOENT) result.problem = file.error().message;
-    return result;
-  }
-  const auto* array = std::get_if<PlistArray>(&file->value);
-  if (array == nullptr) {
-    result.problem = "its top level is not an array";
-    return result;
-  }
-  for (const PlistValue& value : *array) {
-    if (auto entry = entryFrom(value)) {
-      result.entries.push_back(std::move(entry));
-    } else {
-      result.problem = "not all of its elements are dictionaries of strings";
-    }
-  }
-  return result;
 }
 
 }  // namespace
 
-void AgentControlBase::handleTIMEDCMD(const Dictionary* parameters) {
-  const auto context = agentContext();
-  if (!context) return sendReply(kNotScheduled);
+void TimedCommands::handleTIMEDCMD(const Dictionary* parameters) {
+  if (!context_.get()) return reply(CommandError::missingParameter);
   const std::string command = lookUp(parameters, "command").value_or("");
   if (!command.starts_with(kManagement)) {
-    scheduleCommand(parameters, TimerOrigin::peer);
-    return;
+    scheduleCommand(parameters, Origin::peer);
+  } else if (command == "TIMERLIST") {
+    replies_.sendReply(timerListReply());
+  } else if (command == "TIMERREVOKE") {
+    revoke(parameters);
+  } else {
+    reply(CommandError::none);
   }
-  if (command == "TIMERLIST") return sendReply(timerListReply());
-  if (command == "TIMERREVOKE") {
-    const auto timerID = lookUp(parameters, "TimerID");
-    if (!timerID || !context->timedCmdList.removeTimer(*timerID)) return sendReply(kNoSuchTimer);
-    writeTimerListToDisk();
-  }
-  sendReply(kDone);
 }
 
-std::string AgentControlBase::timerListReply() {
-  const auto context = agentContext();
-  const std::string list = propertyListXml(plistFrom(context->timedCmdList.entries()));
-  return list.empty() ? std::string(kDone) : std::string(kDone) + ",timerlist=" + list;
+void TimedCommands::revoke(const Dictionary* parameters) {
+  const auto context = context_.get();
+  const auto timerID = lookUp(parameters, "TimerID");
+  if (!context || !timerID || !context->timedCmdList.removeTimer(*timerID))
+    return reply(CommandError::noSuchTimer);
+  writeTimerListToDisk();
+  reply(CommandError::none);
 }
 
-/// @param origin  of the file: an entry that is waiting already stays alone, since twice in the list it would
-/// run twice; and the file is not written here, since a crash before its last entry is read must not lose
-/// that
+std::string TimedCommands::timerListReply() const {
+  const auto context = context_.get();
+  const std::string list = context ? propertyListXml(plistFrom(context->timedCmdList.entries())) : "";
+  const std::string done = replyText(CommandError::none);
+  return list.empty() ? done : done + ",timerlist=" + list;
+}
+
 /// @return whether it was added to the list
-bool AgentControlBase::scheduleCommand(const Dictionary* parameters, TimerOrigin origin) {
-  const auto context = agentContext();
+bool TimedCommands::scheduleCommand(const Dictionary* parameters, Origin origin) {
   const auto date = dateFromText(lookUp(parameters, "time").value_or(""));
   const std::string command = lookUp(parameters, "command").value_or("(null)");
   const std::time_t now = std::time(nullptr);
   const std::string when = dateText(date.value_or(now)).value_or("?");
   if (date && *date <= now) {
-    logInfo("Not scheduling " + command + " command. The timer has expired: " + when);
-    sendReply(kNotScheduled);
+    context_.logInfo("Not scheduling " + command + " command. The timer has expired: " + when);
+    reply(CommandError::missingParameter);
     return false;
   }
   // A TIMEDCMD within a TIMEDCMD would schedule itself again and again.
-  if (handlerForVerb(command) == nullptr || command == "TIMEDCMD") {
-    logInfo("Not scheduling unknown command: " + command);
-    sendReply(kNotScheduled);
+  if (verbs_.handlerForVerb(command) == nullptr || command == "TIMEDCMD") {
+    context_.logInfo("Not scheduling unknown command: " + command);
+    reply(CommandError::missingParameter);
     return false;
   }
-  Dictionary entry = *parameters;
-  if (!entry.contains("TimerID")) entry.emplace("TimerID", newUUIDString());
-  const auto shared = std::make_shared<const Dictionary>(std::move(entry));
-  if (!context->timedCmdList.append(shared, origin == TimerOrigin::file)) return false;
-  logInfo("Scheduling " + command + " command to run at: " + when);
-  if (origin == TimerOrigin::peer) writeTimerListToDisk();
-  if (actions_ != nullptr) actions_->scheduleTimedCommand(shared, date.value_or(now), kind());
-  sendReply(kDone);
+  const SharedDictionary entry = withIdentity(*parameters);
+  if (!append(entry, origin)) return false;
+  context_.logInfo("Scheduling " + command + " command to run at: " + when);
+  if (origin == Origin::peer) writeTimerListToDisk();
+  if (actions_ != nullptr) actions_->scheduleTimedCommand(entry, date.value_or(now), channel_);
+  reply(CommandError::none);
   return true;
 }
 
-void AgentControlBase::completeTimedCommand(const SharedDictionary& entry) {
-  const auto context = agentContext();
-  if (!context) return;
-  if (!context->timedCmdList.takeIfListed(entry)) {
-    logInfo("Not running deferred command");
-    return sendReply(kRevoked);
-  }
-  const std::string command = lookUp(entry, "command").value_or("");
-  logInfo("Running deferred command: " + command);
-  writeTimerListToDisk();
-  if (const Handler handler = handlerForVerb(command)) (this->*handler)(entry.get());
+/// An entry of the file that is waiting already stays alone, since twice in the list it would run twice.
+bool TimedCommands::append(const SharedDictionary& entry, Origin origin) {
+  const auto context = context_.get();
+  return context && context->timedCmdList.append(entry, origin == Origin::file);
 }
 
-void AgentControlBase::writeTimerListToDisk() {
-  const auto context = agentContext();
+void TimedCommands::completeTimedCommand(const SharedDictionary& entry) {
+  const auto context = context_.get();
   if (!context) return;
-  const bool written = context->timedCmdList.persist([](const auto& entries) {
-    const std::string path = systemPath(kTimersFile);
-    ::chmod(path.c_str(), 0600);  // the new file takes over the mode of the old one, and passwords are in it
-    return writePropertyList(path, plistFrom(entries), 0600) == 0;
-  });
+  if (!context->timedCmdList.takeIfListed(entry)) {
+    context_.logInfo("Not running deferred command");
+    return reply(CommandError::timerRevoked);
+  }
+  const std::string command = lookUp(entry, "command").value_or("");
+  context_.logInfo("Running deferred command: " + command);
+  writeTimerListToDisk();
+  if (const auto* handler = verbs_.handlerForVerb(command)) (*handler)(entry.get());
+}
+
+void TimedCommands::writeTimerListToDisk() {
+  const auto context = context_.get();
+  if (!context) return;
+  const bool written =
+      context->timedCmdList.persist([](const auto& entries) { return timersFile().write(entries); });
   if (!written) context->logWarn("Unable to write timer file.");
 }
 
-void AgentControlBase::loadTimedCommands() {
-  const std::string path = systemPath(kTimersFile);
-  const TimersFile file = readTimers(path);
+void TimedCommands::loadTimedCommands() {
+  const TimersFile file = timersFile();
+  const TimerEntries read = file.read();
   bool kept = false;
-  if (!file.problem.empty()) {
-    const std::string copy = keepUnderAnotherName(path);
+  if (!read.problem.empty()) {
+    const std::string copy = keepUnderAnotherName(file.path());
     kept = !copy.empty();
-    LMPLogMessage(logContext(), kLogError, "The timers file %s can't be used: %s. It is kept as %s.",
-                  path.c_str(), file.problem.c_str(), copy.empty() ? "it is" : copy.c_str());
+    LMPLogMessage(context_.log(), kLogError, "The timers file %s can't be used: %s. It is kept as %s.",
+                  file.path().c_str(), read.problem.c_str(), kept ? copy.c_str() : "it is");
   }
-  // Once its content is safe under another name, the file is made readable again.
-  bool added = kept;
-  for (const SharedDictionary& entry : file.entries) added |= scheduleCommand(entry.get(), TimerOrigin::file);
-  if (added) writeTimerListToDisk();
+  // Once its content is safe under another name, the file is made readable again. It is written only when all
+  // of it has been read: a crash before that must not lose the last entries.
+  bool changed = kept;
+  for (const auto& entry : read.entries) changed |= scheduleCommand(entry.get(), Origin::file);
+  if (changed) writeTimerListToDisk();
 }
+
+void TimedCommands::reply(CommandError error) { replies_.sendReply(replyText(error)); }
 
 }  // namespace lmx

@@ -33,7 +33,7 @@ void AgentControlUnix::cleanup() {
 int AgentControlUnix::run() {
   const int listening = localConnect();
   if (listening != 0 && running()) {
-    LMPLogMessage(logContext(), kLogError, "The local control socket %s could not be set up: %s",
+    LMPLogMessage(context().log(), kLogError, "The local control socket %s could not be set up: %s",
                   systemPath(kLocalSocket).c_str(), std::strerror(listening));
   }
   const int result = listening == 0 ? AgentControlBase::run() : -1;
@@ -43,7 +43,7 @@ int AgentControlUnix::run() {
 
 /// Sets up the listener and waits for the first peer. @return 0, or the errno of the set-up.
 int AgentControlUnix::localConnect() {
-  logInfo("Connecting local pipe");
+  context().logInfo("Connecting local pipe");
   const std::string path = systemPath(kLocalSocket);
   const auto address = localSocketAddress(path);
   if (!address) return ENAMETOOLONG;
@@ -63,13 +63,13 @@ int AgentControlUnix::localConnect() {
 }
 
 std::optional<std::string> AgentControlUnix::commandFromReceivedData(const std::string& line) {
-  return plainCommand(line, logContext());
+  return plainCommand(line, context().log());
 }
 
 void AgentControlUnix::sendReply(const std::string& reply) {
-  const std::lock_guard lock(sendMutex());
-  const int error = sendPlainReply(serverSocket(), reply, wakeDescriptor());
-  if (error != 0) logDebug(string_with_format("Could not answer to tunnel (errno = %d)", error));
+  const std::lock_guard lock(sockets().sendMutex());
+  const int error = sendPlainReply(sockets().current(), reply, wakeDescriptor());
+  if (error != 0) context().logDebug(string_with_format("Could not answer to tunnel (errno = %d)", error));
 }
 
 }  // namespace lmx

@@ -3,8 +3,12 @@
 #include <memory>
 #include <optional>
 #include <string>
+#include <utility>
 
 #include "control/channel/agent_control_base.h"
+#include "control/channel/peer_acceptor.h"
+#include "support/shared_value.h"
+#include "support/unique_fd.h"
 
 namespace lmx {
 
@@ -12,16 +16,14 @@ namespace lmx {
 /// can't be set up leaves the channel in place without a thread to serve it.
 class AgentControlUnix final : public AgentControlBase {
  public:
-  using AgentControlBase::AgentControlBase;
+  AgentControlUnix(std::shared_ptr<AgentContext> context, AgentActions* actions,
+                   ChannelClock& clock = systemChannelClock())
+      : AgentControlBase(ChannelKind::local, std::move(context), actions, clock) {}
   /// Removes the socket file and runs stop.
   ~AgentControlUnix() override;
 
   /// Removes the socket file, when this channel made one. Thread-safe.
   void cleanup();
-
-  [[nodiscard]] bool requiresAuthentication() const override { return false; }
-  void setAuthenticated(bool) override {}
-  [[nodiscard]] ChannelKind kind() const override { return ChannelKind::local; }
 
  protected:
   int run() override;
@@ -31,8 +33,9 @@ class AgentControlUnix final : public AgentControlBase {
 
  private:
   int localConnect();
-  int localAccept() { return acceptPeer(localDomainSocket_.get()); }
+  int localAccept() { return acceptor_.acceptPeer(localDomainSocket_.get()); }
 
+  PeerAcceptor acceptor_{context(), sockets(), clock(), wakeDescriptor()};
   UniqueFd localDomainSocket_;            // channel thread only
   SharedValue<std::string> socket_path_;  // empty while no file of ours is there
 };

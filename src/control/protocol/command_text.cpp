@@ -6,6 +6,8 @@
 #include <cstdlib>
 #include <limits>
 
+#include "model/metadata_keys.h"
+
 namespace lmx {
 namespace {
 
@@ -40,7 +42,7 @@ std::int32_t decimalValue(const std::string& text) {
 }
 
 std::string withoutSecrets(std::string_view command) {
-  constexpr auto kKey = "RecordingMetadata_AGENT_PASSWORD="sv;
+  static const std::string kKey = std::string(metadata_key::kAgentPassword) + "=";
   std::string shown;
   for (auto found = command.find(kKey); found != std::string_view::npos; found = command.find(kKey)) {
     shown.append(command.substr(0, found + kKey.size())).append("****");

@@ -1,7 +1,6 @@
 // Small text rules of the command protocol: what is trimmed, what is counted, what is hidden from the log.
 #pragma once
 #include <cstdint>
-#include <optional>
 #include <string>
 #include <string_view>
 

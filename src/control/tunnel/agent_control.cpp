@@ -14,7 +14,9 @@
 
 #include "control/channel/back_off.h"
 #include "control/channel/plain_text.h"
+#include "control/protocol/reply.h"
 #include "control/tunnel/cluster_hosts.h"
+#include "control/tunnel/hello.h"
 #include "platform/net/connect_multiple.h"
 #include "platform/net/socket_io.h"
 #include "support/base64.h"
@@ -23,7 +25,6 @@
 namespace lmx {
 namespace {
 
-constexpr double kProtocolVersion = 100;
 constexpr const char* kRejected = "ERR Unbound agent";
 constexpr int kHelloNotSent = 24;
 constexpr int kNotConnected = 1;
@@ -37,16 +38,18 @@ CipherBlock newVector() {
   return vector;
 }
 
-std::vector<std::string> hostsToTry(const AgentContext& context) {
-  std::vector<std::string> hosts = clusterHostArray(context.server_info.get().get());
-  if (hosts.empty()) hosts.push_back(context.server.tunnel_host.get().value_or(""));
+/// @param members  of the server's cluster; null when none are known
+std::vector<std::string> hostsToTry(const PlistDictionary* members, const ServerSettings& server) {
+  std::vector<std::string> hosts = clusterHostArray(members);
+  if (hosts.empty()) hosts.push_back(server.tunnel_host.get().value_or(""));
   return hosts;
 }
 
 }  // namespace
 
 AgentControl::AgentControl(std::shared_ptr<AgentContext> context, AgentActions* actions, ChannelClock& clock)
-    : AgentControlBase(std::move(context), actions, clock), initialization_vector_(newVector()) {}
+    : AgentControlBase(ChannelKind::tunnel, std::move(context), actions, clock),
+      initialization_vector_(newVector()) {}
 
 AgentControl::~AgentControl() { stop(); }
 
@@ -60,7 +63,7 @@ bool AgentControl::wasDroppedAtOnce() const {
 /// channel's own time-out may never come.
 void AgentControl::watchPeer() {
   const auto set = [this](int level, int option, int value) {
-    ::setsockopt(serverSocket(), level, option, &value, sizeof value);
+    ::setsockopt(sockets().current(), level, option, &value, sizeof value);
   };
   set(SOL_SOCKET, SO_KEEPALIVE, 1);
   set(IPPROTO_TCP, TCP_KEEPIDLE, 60);
@@ -70,73 +73,72 @@ void AgentControl::watchPeer() {
 }
 
 int AgentControl::connect() {
-  const auto context = agentContext();
-  if (!context) return kNotConnected;
+  const auto agent = context().get();
+  if (!agent) return kNotConnected;
   if (wasDroppedAtOnce()) {
     connected_at_ = std::nullopt;
-    logDebug("The server has closed the last connection without a word");
+    context().logDebug("The server has closed the last connection without a word");
     return kNotConnected;
   }
-  const std::string port = context->server.tunnel_port.get().value_or("");
-  logInfo("Connecting to lmxserverd tunnel at " + context->server.tunnel_host.get().value_or("(null)") + ":" +
-          port);
+  const std::string port = agent->server.tunnel_port.get().value_or("");
+  context().logInfo("Connecting to lmxserverd tunnel at " +
+                    agent->server.tunnel_host.get().value_or("(null)") + ":" + port);
   hello_sent_ = false;
   disconnect();
   int socket = -1;
-  if (lmp_connect_multiple(hostsToTry(*context), port, &socket, wakeDescriptor()) == -1) return kNotConnected;
-  setServerSocket(socket);
+  const auto members = agent->server_info.get();
+  if (lmp_connect_multiple(hostsToTry(members.get(), agent->server), port, &socket, wakeDescriptor()) == -1)
+    return kNotConnected;
+  sockets().setCurrent(socket);
   connected_at_ = std::chrono::steady_clock::now();
   spoken_to_ = false;
   watchPeer();
-  logPeer();
+  logPeer(agent->server);
   if (sendAGENT() == 0) return 0;
   disconnect();
   return kNotConnected;
 }
 
 /// Only an IPv4 peer has its address in the line; for any other the configured names stand.
-void AgentControl::logPeer() {
-  const auto context = agentContext();
+void AgentControl::logPeer(const ServerSettings& server) {
   sockaddr_in peer{};
   socklen_t size = sizeof peer;
   char address[INET_ADDRSTRLEN] = "";
-  if (getpeername(serverSocket(), reinterpret_cast<sockaddr*>(&peer), &size) == 0 &&
+  if (getpeername(sockets().current(), reinterpret_cast<sockaddr*>(&peer), &size) == 0 &&
       peer.sin_family == AF_INET && inet_ntop(AF_INET, &peer.sin_addr, address, sizeof address) != nullptr) {
-    LMPLogMessage(logContext(), kLogInfo, "Connected to %s:%d", address, ntohs(peer.sin_port));
+    LMPLogMessage(context().log(), kLogInfo, "Connected to %s:%d", address, ntohs(peer.sin_port));
   } else {
-    LMPLogMessage(logContext(), kLogInfo, "Connected to %s:%s",
-                  context->server.tunnel_host.get().value_or("").c_str(),
-                  context->server.tunnel_port.get().value_or("").c_str());
+    LMPLogMessage(context().log(), kLogInfo, "Connected to %s:%s",
+                  server.tunnel_host.get().value_or("").c_str(),
+                  server.tunnel_port.get().value_or("").c_str());
   }
 }
 
-std::string AgentControl::hello(const AgentContext& context, const std::string& vectorText) {
-  return "AGENT protocol=1,agent_uuid=" + context.server.machine_uuid.get().value_or("(null)") +
-         ",iv=" + vectorText + string_with_format(",version=%.0f", kProtocolVersion) +
-         (context.state.running.get() ? "" : ",agent_recording_status=offline") + "\n";
-}
-
 int AgentControl::sendAGENT() {
-  const auto context = agentContext();
-  if (!context) return kNotConnected;
-  logDebug("Sending AGENT information...");
+  const auto agent = context().get();
+  if (!agent) return kNotConnected;
+  context().logDebug("Sending AGENT information...");
+  const auto hello = [&agent](const std::string& vector) {
+    return helloLine(agent->server.machine_uuid.get(), vector, agent->state.running.get());
+  };
   const std::string vector = lmp_encode_base64(
       {reinterpret_cast<const char*>(initialization_vector_.data()), initialization_vector_.size()});
-  const int error = sendWhole(serverSocket(), hello(*context, vector), kSendPatience, wakeDescriptor());
-  if (error != 0) logDebug(string_with_format("Could not send AGENT to tunnel (errno = %d)", error));
+  const int error = sendWhole(sockets().current(), hello(vector), kSendPatience, wakeDescriptor());
+  if (error != 0)
+    context().logDebug(string_with_format("Could not send AGENT to tunnel (errno = %d)", error));
   hello_sent_ = error == 0;
-  context->state.agent_sent_or_fail.set(true);
-  logInfo("Sent: " + hello(*context, "*"));
+  agent->state.agent_sent_or_fail.set(true);
+  context().logInfo("Sent: " + hello("*"));
   return error == 0 ? 0 : kHelloNotSent;
 }
 
 std::optional<std::string> AgentControl::commandFromReceivedData(const std::string& line) {
-  const auto context = agentContext();
-  const auto secret = context ? context->server.shared_secret.get() : std::nullopt;
+  const auto agent = context().get();
+  const auto secret = agent ? agent->server.shared_secret.get() : std::nullopt;
   if (secret) {
     const auto plaintext = agent_decrypt_message(initialization_vector_, *secret, line);
     spoken_to_ = spoken_to_ || plaintext;
-    if (plaintext) return plainCommand(messageIn(*plaintext), logContext());
+    if (plaintext) return plainCommand(messageIn(*plaintext), context().log());
   }
   // To the byte: a refusal in one piece still has its line feed and is taken for noise. Servers have come to
   // rely on that.
@@ -145,25 +147,25 @@ std::optional<std::string> AgentControl::commandFromReceivedData(const std::stri
 }
 
 void AgentControl::serverRejected() {
-  LMPLogMessage(logContext(), kLogWarning, "Server rejected agent connection, sleeping for one minute.");
-  if (const auto context = agentContext()) context->state.serverRejectTime.set(std::time(nullptr));
+  LMPLogMessage(context().log(), kLogWarning, "Server rejected agent connection, sleeping for one minute.");
+  if (const auto agent = context().get()) agent->state.serverRejectTime.set(std::time(nullptr));
   askToStop();
 }
 
 void AgentControl::sendReply(const std::string& reply) {
-  const auto context = agentContext();
-  const auto secret = context ? context->server.shared_secret.get() : std::nullopt;
-  const std::lock_guard lock(sendMutex());
-  if (!hello_sent_) return logDebug("No reply before the hello: " + reply);
+  const auto agent = context().get();
+  const auto secret = agent ? agent->server.shared_secret.get() : std::nullopt;
+  const std::lock_guard lock(sockets().sendMutex());
+  if (!hello_sent_) return context().logDebug("No reply before the hello: " + reply);
   if (!secret) return;
   const auto text = agent_encrypt_message(initialization_vector_, *secret,
-                                          agent_random_bytes(kRandomPrefix).append(plainReplyBytes(reply)));
+                                          agent_random_bytes(kRandomPrefix).append(replyBytes(reply)));
   if (!text) return;
-  const int error = sendWhole(serverSocket(), *text + "\n", kSendPatience, wakeDescriptor());
+  const int error = sendWhole(sockets().current(), *text + "\n", kSendPatience, wakeDescriptor());
   if (error == 0) return;
-  logDebug(string_with_format("Could not answer to tunnel (errno = %d)", error));
+  context().logDebug(string_with_format("Could not answer to tunnel (errno = %d)", error));
   // Half a line would garble the next reply: the connection is of no use any more.
-  if (error == ETIMEDOUT) ::shutdown(serverSocket(), SHUT_RDWR);
+  if (error == ETIMEDOUT) ::shutdown(sockets().current(), SHUT_RDWR);
 }
 
 }  // namespace lmx

@@ -19,16 +19,6 @@ class AgentControl final : public AgentControlBase {
                ChannelClock& clock = systemChannelClock());
   ~AgentControl() override;
 
-  [[nodiscard]] bool requiresAuthentication() const override { return false; }
-  void setAuthenticated(bool) override {}
-  [[nodiscard]] ChannelKind kind() const override { return ChannelKind::tunnel; }
-
-  /// Announces the agent on the connection. @return 0; 24 when it could not be sent, 1 without a context.
-  /// Channel thread.
-  int sendAGENT();
-  /// The line that announces the agent: who it is, the vector, and whether it can record.
-  [[nodiscard]] static std::string hello(const AgentContext& context, const std::string& vectorText);
-
  protected:
   int connect() override;
   std::optional<std::string> commandFromReceivedData(const std::string& line) override;
@@ -36,9 +26,11 @@ class AgentControl final : public AgentControlBase {
   void previousPeerSpeaks() override { hello_sent_ = true; }  // on that connection, and with the same vector
 
  private:
+  /// Announces the agent on the connection. @return 0; 24 when it could not be sent, 1 without a context.
+  int sendAGENT();
   [[nodiscard]] bool wasDroppedAtOnce() const;
   void watchPeer();
-  void logPeer();
+  void logPeer(const ServerSettings& server);
   void serverRejected();
 
   const CipherBlock initialization_vector_;

@@ -2,8 +2,8 @@
 #include "postprocess/properties_document.h"
 
 #include <gmock/gmock.h>
-#include <pugixml.hpp>
 #include <sys/stat.h>
+#include <pugixml.hpp>
 
 #include "tests/unit/postprocess/submit_fixture.h"
 

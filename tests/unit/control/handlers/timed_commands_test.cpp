@@ -1,4 +1,6 @@
 // TIMEDCMD: replies, list, file and deferred execution; time is what the entries say.
+#include "control/handlers/timed_commands.h"
+
 #include <gmock/gmock.h>
 #include <signal.h>
 #include <sys/wait.h>
@@ -9,11 +11,13 @@
 #include <regex>
 #include <thread>
 
+#include "control/handlers/command_handlers.h"
+#include "control/protocol/command_parser.h"
 #include "platform/paths.h"
 #include "platform/plist/property_list.h"
 #include "record/agent_record.h"
 #include "support/date_text.h"
-#include "tests/unit/control/channel/scripted_channel.h"
+#include "tests/unit/control/handlers/collected_replies.h"
 #include "tests/unit/doubles/log_capture.h"
 #include "tests/unit/doubles/scripted_actions.h"
 #include "tests/unit/doubles/scripted_capture.h"
@@ -26,13 +30,13 @@ using ::testing::ElementsAre;
 using ::testing::IsEmpty;
 using Lines = std::vector<std::string>;
 
-class TimedCommand : public ::testing::Test {
+class TimedCommandsTest : public ::testing::Test {
  protected:
-  TimedCommand() {
+  TimedCommandsTest() {
     ::unlink(file().c_str());
     session_->captureController.set(capture_);
   }
-  ~TimedCommand() override { ::unlink(file().c_str()); }
+  ~TimedCommandsTest() override { ::unlink(file().c_str()); }
 
   static std::string file() { return systemPath(kTimersFile); }
   /// The file as it is on the disk.
@@ -43,18 +47,27 @@ class TimedCommand : public ::testing::Test {
   std::string in(std::time_t seconds) const { return *dateText(now_ + seconds); }
   /// Runs one line. @return its reply
   std::string run(const std::string& line) {
-    const std::size_t before = channel_.replies().size();
-    channel_.receive(line + "\n");
-    const Lines replies = channel_.replies();
+    const std::size_t before = replies_.all().size();
+    const Command command = parseCommand(line);
+    timed_.handleTIMEDCMD(command.parameters ? &*command.parameters : nullptr);
+    const Lines replies = replies_.all();
     EXPECT_EQ(replies.size(), before + 1) << line;
     return replies.size() > before ? replies.back() : "";
+  }
+  void schedule(TimedCommands& timed, const std::string& id) const {
+    const Dictionary parameters{{"command", "STOP"}, {"time", in(600)}, {"TimerID", id}};
+    timed.handleTIMEDCMD(&parameters);
+  }
+  static void revoke(TimedCommands& timed, const std::string& id) {
+    const Dictionary parameters{{"command", "TIMERREVOKE"}, {"TimerID", id}};
+    timed.handleTIMEDCMD(&parameters);
   }
   std::vector<SharedDictionary> listed() { return context_->timedCmdList.entries(); }
   /// What the main loop does when the time of the n-th scheduled command has come.
   std::string fire(std::size_t n) {
-    const std::size_t before = channel_.replies().size();
-    channel_.completeTimedCommand(actions_.scheduled.at(n).entry);
-    const Lines replies = channel_.replies();
+    const std::size_t before = replies_.all().size();
+    timed_.completeTimedCommand(actions_.scheduled.at(n).entry);
+    const Lines replies = replies_.all();
     return replies.size() > before ? replies.back() : "";
   }
 
@@ -66,10 +79,13 @@ class TimedCommand : public ::testing::Test {
       std::make_shared<testing::ScriptedCaptureController>(journal_);
   std::shared_ptr<AgentContext> context_ = newAgentContext();
   std::shared_ptr<AgentRecord> session_ = context_->record_context();
-  testing::ScriptedChannel channel_{context_, &actions_};
+  ChannelContext held_{context_};
+  testing::CollectedReplies replies_;
+  CommandHandlers handlers_{held_, &actions_, replies_, ChannelKind::tunnel};
+  TimedCommands& timed_ = handlers_.timed();
 };
 
-TEST_F(TimedCommand, StartIsScheduledWithItsParametersAndAnIdentity) {
+TEST_F(TimedCommandsTest, StartIsScheduledWithItsParametersAndAnIdentity) {
   const std::string start = "command=START,time=" + in(600) +
                             ",RecordingMetadata_RECORDING_UUID=R1,RecordingMetadata_MAX_RECORDING_MINUTES=50,"
                             "RecordingMetadata_UNATTENDED_RECORDING_MINUTES=20";
@@ -94,19 +110,19 @@ TEST_F(TimedCommand, StartIsScheduledWithItsParametersAndAnIdentity) {
   EXPECT_THAT(journal_.entries(), ::testing::Contains("prepareCapture, waiting"));
 }
 
-TEST_F(TimedCommand, AServersOwnIdentityIsKept) {
+TEST_F(TimedCommandsTest, AServersOwnIdentityIsKept) {
   EXPECT_EQ(run("TIMEDCMD command=STOP,time=" + in(60) + ",TimerID=mine"), "cmdStatus=0");
   EXPECT_EQ(lookUp(listed()[0], "TimerID"), "mine");
 }
 
-TEST_F(TimedCommand, InThePastIs31AndNotStored) {
+TEST_F(TimedCommandsTest, InThePastIs31AndNotStored) {
   EXPECT_EQ(run("TIMEDCMD command=STOP,time=" + in(-1)), "cmdStatus=31");
   EXPECT_THAT(listed(), IsEmpty());
   EXPECT_FALSE(std::filesystem::exists(file()));
   EXPECT_TRUE(log_.contains(6, "Not scheduling STOP command. The timer has expired: " + in(-1)));
 }
 
-TEST_F(TimedCommand, AnUnknownCommandIs31) {
+TEST_F(TimedCommandsTest, AnUnknownCommandIs31) {
   for (const char* command : {"FOO", "start", "", "X-PREVIEW", "TIMEDCMD"}) {
     EXPECT_EQ(run("TIMEDCMD command=" + std::string(command) + ",time=" + in(60)), "cmdStatus=31") << command;
     EXPECT_TRUE(log_.contains(6, "Not scheduling unknown command: " + std::string(command)));
@@ -115,18 +131,18 @@ TEST_F(TimedCommand, AnUnknownCommandIs31) {
   EXPECT_THAT(listed(), IsEmpty());
 }
 
-TEST_F(TimedCommand, WithoutAUsableTimeRunsAtOnce) {
+TEST_F(TimedCommandsTest, WithoutAUsableTimeRunsAtOnce) {
   EXPECT_EQ(run("TIMEDCMD command=STOP"), "cmdStatus=0");
   EXPECT_EQ(run("TIMEDCMD command=STOP,time=tomorrow"), "cmdStatus=0");
   ASSERT_EQ(actions_.scheduled.size(), 2U);
   for (const auto& one : actions_.scheduled) EXPECT_LE(one.date, std::time(nullptr));
 }
 
-TEST_F(TimedCommand, ASecondAheadIsTheFuture) {
+TEST_F(TimedCommandsTest, ASecondAheadIsTheFuture) {
   EXPECT_EQ(run("TIMEDCMD command=STOP,time=" + *dateText(std::time(nullptr) + 1)), "cmdStatus=0");
 }
 
-TEST_F(TimedCommand, OffsetsAndLeapDaysAreUnderstood) {
+TEST_F(TimedCommandsTest, OffsetsAndLeapDaysAreUnderstood) {
   for (const char* time :
        {"2096-02-29 10:00:00 +0000", "2030-01-01 10:00:00 +0530", "2030-01-01 10:00:00 -0800"}) {
     EXPECT_EQ(run("TIMEDCMD command=STOP,time=" + std::string(time)), "cmdStatus=0");
@@ -135,17 +151,17 @@ TEST_F(TimedCommand, OffsetsAndLeapDaysAreUnderstood) {
   EXPECT_EQ(actions_.scheduled[2].date - actions_.scheduled[1].date, (5 * 60 + 30 + 8 * 60) * 60);
 }
 
-TEST_F(TimedCommand, AnEmptyListIsAnEmptyArray) {
+TEST_F(TimedCommandsTest, AnEmptyListIsAnEmptyArray) {
   const std::string reply = run("TIMEDCMD command=TIMERLIST");
   ASSERT_TRUE(reply.starts_with("cmdStatus=0,timerlist=<?xml")) << reply;
   EXPECT_EQ(parsePropertyList(reply.substr(22)).value(), PlistValue(PlistArray()));
 }
 
-TEST_F(TimedCommand, TheListIsAPropertyListOfTheEntries) {
+TEST_F(TimedCommandsTest, TheListIsAPropertyListOfTheEntries) {
   run("TIMEDCMD command=STOP,time=" + in(60) + ",TimerID=A,RecordingMetadata_TITLE=Fish & Chips <1>");
   run("TIMEDCMD command=PAUSE,time=" + in(30) + ",TimerID=B");
   const std::string reply = run("TIMEDCMD command=TIMERLIST");
-  const PlistValue list = *parsePropertyList(reply.substr(22)).value().value();
+  const PlistValue list = parsePropertyList(reply.substr(22)).value().value();
   EXPECT_EQ(list, PlistValue(
                       PlistArray{PlistDictionary{{"command", "STOP"},
                                                  {"time", in(60)},
@@ -155,7 +171,7 @@ TEST_F(TimedCommand, TheListIsAPropertyListOfTheEntries) {
   EXPECT_EQ(PlistValue(stored()), list);
 }
 
-TEST_F(TimedCommand, ARevokedOneDoesNotRun) {
+TEST_F(TimedCommandsTest, ARevokedOneDoesNotRun) {
   run("TIMEDCMD command=STOP,time=" + in(60) + ",TimerID=A");
   EXPECT_EQ(run("TIMEDCMD command=TIMERREVOKE,TimerID=A"), "cmdStatus=0");
   EXPECT_THAT(stored(), IsEmpty());
@@ -164,7 +180,7 @@ TEST_F(TimedCommand, ARevokedOneDoesNotRun) {
   EXPECT_EQ(journal_.entries(), Lines{"scheduleTimedCommand STOP"});
 }
 
-TEST_F(TimedCommand, RevokingWhatIsNotThereIs37) {
+TEST_F(TimedCommandsTest, RevokingWhatIsNotThereIs37) {
   EXPECT_EQ(run("TIMEDCMD command=TIMERREVOKE,TimerID=A"), "cmdStatus=37");
   EXPECT_EQ(run("TIMEDCMD command=TIMERREVOKE"), "cmdStatus=37");
   run("TIMEDCMD command=STOP,time=" + in(60) + ",TimerID=A");
@@ -172,13 +188,13 @@ TEST_F(TimedCommand, RevokingWhatIsNotThereIs37) {
   EXPECT_EQ(listed().size(), 1U);
 }
 
-TEST_F(TimedCommand, OtherManagementIsDoneByDoingNothing) {
+TEST_F(TimedCommandsTest, OtherManagementIsDoneByDoingNothing) {
   EXPECT_EQ(run("TIMEDCMD command=TIMERX,time=" + in(60)), "cmdStatus=0");
   EXPECT_EQ(run("TIMEDCMD command=TIMER"), "cmdStatus=0");
   EXPECT_THAT(listed(), IsEmpty());
 }
 
-TEST_F(TimedCommand, EqualEntriesEachRun) {
+TEST_F(TimedCommandsTest, EqualEntriesEachRun) {
   const std::string same = "TIMEDCMD command=STOP,time=" + in(60) + ",TimerID=A";
   run(same);
   run(same);
@@ -190,7 +206,7 @@ TEST_F(TimedCommand, EqualEntriesEachRun) {
   EXPECT_THAT(listed(), IsEmpty());
 }
 
-TEST_F(TimedCommand, AFileThatCannotBeWrittenIsAWarning) {
+TEST_F(TimedCommandsTest, AFileThatCannotBeWrittenIsAWarning) {
   const std::string state = directoryOf(file());
   std::filesystem::rename(state, state + ".away");
   EXPECT_EQ(run("TIMEDCMD command=STOP,time=" + in(60)), "cmdStatus=0");
@@ -199,21 +215,21 @@ TEST_F(TimedCommand, AFileThatCannotBeWrittenIsAWarning) {
   EXPECT_EQ(listed().size(), 1U);
 }
 
-TEST_F(TimedCommand, TheFileIsForItsOwnerAlone) {
+TEST_F(TimedCommandsTest, TheFileIsForItsOwnerAlone) {
   run("TIMEDCMD command=STOP,time=" + in(60) + ",RecordingMetadata_AGENT_PASSWORD=geheim");
   EXPECT_EQ(std::filesystem::status(file()).permissions(),
             std::filesystem::perms::owner_read | std::filesystem::perms::owner_write);
 }
 
-TEST_F(TimedCommand, ManyThreadsKeepListAndFileInStep) {
+TEST_F(TimedCommandsTest, ManyThreadsKeepListAndFileInStep) {
   std::vector<std::thread> threads;
   for (int thread = 0; thread < 4; ++thread) {
     threads.emplace_back([&, thread] {
-      testing::ScriptedChannel channel(context_, nullptr);
+      CommandHandlers handlers(held_, nullptr, replies_, ChannelKind::tunnel);
       for (int i = 0; i < 10; ++i) {
         const std::string id = std::to_string(thread) + "-" + std::to_string(i);
-        channel.receive("TIMEDCMD command=STOP,time=" + in(600) + ",TimerID=" + id + "\n");
-        if (i % 2 == 0) channel.receive("TIMEDCMD command=TIMERREVOKE,TimerID=" + id + "\n");
+        schedule(handlers.timed(), id);
+        if (i % 2 == 0) revoke(handlers.timed(), id);
       }
     });
   }
@@ -222,7 +238,7 @@ TEST_F(TimedCommand, ManyThreadsKeepListAndFileInStep) {
   EXPECT_EQ(stored().size(), 20U);
 }
 
-TEST_F(TimedCommand, AKillLeavesTheOldOrTheNewList) {
+TEST_F(TimedCommandsTest, AKillLeavesTheOldOrTheNewList) {
   std::mt19937 random(5);  // NOLINT: the same numbers every time
   for (int round = 0; round < 20; ++round) {
     ::unlink(file().c_str());
@@ -230,8 +246,8 @@ TEST_F(TimedCommand, AKillLeavesTheOldOrTheNewList) {
     const pid_t child = fork();
     if (child == 0) {
       for (;;) {
-        channel_.receive("TIMEDCMD command=STOP,time=" + in(600) + ",TimerID=A\n");
-        channel_.receive("TIMEDCMD command=TIMERREVOKE,TimerID=A\n");
+        schedule(timed_, "A");
+        revoke(timed_, "A");
       }
     }
     std::this_thread::sleep_for(std::chrono::microseconds(500 + random() % 20000));

@@ -18,6 +18,7 @@
 
 #include "platform/paths.h"
 #include "record/agent_record.h"
+#include "tests/unit/control/channel/turned_clock.h"
 #include "tests/unit/doubles/log_capture.h"
 #include "tests/unit/doubles/scripted_actions.h"
 
@@ -119,13 +120,19 @@ class LocalSocket : public ::testing::Test {
     start();
   }
   void start() {
-    channel_ = newControlChannel<AgentControlUnix>(context_, &actions_);
+    channel_ = newControlChannel<AgentControlUnix>(context_, &actions_, clock_);
     ASSERT_NE(channel_, nullptr);
+  }
+  /// Some seconds ago.
+  void changeNetwork() {
+    actions_.network_changed();
+    clock_.ahead_seconds += 2;
   }
 
   LogCapture log_;
   Journal journal_;
   ScriptedActions actions_{journal_};
+  testing::TurnedClock clock_;
   std::shared_ptr<AgentContext> context_ = newAgentContext();
   std::unique_ptr<AgentControlUnix> channel_;
 };
@@ -239,7 +246,7 @@ TEST_F(LocalSocket, APeerThatLostItsPlaceToANetworkChangeIsHeardAgain) {
   Peer peer;
   peer.send("x\n");
   ASSERT_TRUE(log_.waitFor(3, "Unknown command [x]"));
-  channel_->setNetTransitionTime(1);  // long ago
+  changeNetwork();
   ASSERT_TRUE(log_.waitFor(7, "The connection is made anew after a network change"));
   peer.send("STOP\n");
   EXPECT_EQ(peer.receiveUpTo("cmdStatus=0"), "cmdStatus=0");
@@ -251,7 +258,7 @@ TEST_F(LocalSocket, APeerThatLostItsPlaceMakesRoomForTheNext) {
   Peer first;
   first.send("x\n");
   ASSERT_TRUE(log_.waitFor(3, "Unknown command [x]"));
-  channel_->setNetTransitionTime(1);
+  changeNetwork();
   ASSERT_TRUE(log_.waitFor(7, "The connection is made anew after a network change"));
   Peer second;
   second.send("STOP\n");
@@ -260,7 +267,7 @@ TEST_F(LocalSocket, APeerThatLostItsPlaceMakesRoomForTheNext) {
 }
 
 TEST_F(LocalSocket, APeerThatIsGoneWithItsPlaceCostsNothing) {
-  channel_->setNetTransitionTime(1);  // the first peer loses its place as soon as it has it
+  changeNetwork();  // the first peer loses its place as soon as it has it
   {
     const Peer first;
     ASSERT_TRUE(log_.waitFor(7, "The connection is made anew after a network change"));
@@ -351,63 +358,6 @@ TEST_F(LocalSocket, RestartBindsAgain) {
     peer.send("STOP\n");
     EXPECT_EQ(peer.receiveUpTo("cmdStatus=0"), "cmdStatus=0");
   }
-}
-
-/// A channel whose waiting for a peer can be called by itself.
-class Acceptor final : public AgentControlBase {
- public:
-  using AgentControlBase::acceptPeer;
-  using AgentControlBase::AgentControlBase;
-  using AgentControlBase::serverSocket;
-  ~Acceptor() override { stop(); }
-  bool requiresAuthentication() const override { return false; }
-  void setAuthenticated(bool) override {}
-
- protected:
-  int connect() override { return -1; }
-  std::optional<std::string> commandFromReceivedData(const std::string& line) override { return line; }
-  void sendReply(const std::string&) override {}
-};
-
-class Accepting : public ::testing::Test {
- protected:
-  static int keepAliveOf(int socket) {
-    int on = -1;
-    socklen_t size = sizeof on;
-    return ::getsockopt(socket, SOL_SOCKET, SO_KEEPALIVE, &on, &size) == 0 ? on : -1;
-  }
-  [[nodiscard]] std::string lineFor(int peer) const {
-    return "accepted connection fd = " + std::to_string(peer) +
-           " from listen fd = " + std::to_string(listening_.get());
-  }
-  LogCapture log_;
-  UniqueFd listening_{::socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0)};
-  Acceptor channel_{newAgentContext(), nullptr};
-};
-
-TEST_F(Accepting, KeepAliveIsSetOnTheListeningSocketNotOnThePeers) {
-  sockaddr_un address{};
-  address.sun_family = AF_UNIX;  // with no path: the system picks a name
-  socklen_t size = sizeof address.sun_family;
-  ASSERT_EQ(::bind(listening_.get(), reinterpret_cast<const sockaddr*>(&address), size), 0);
-  ASSERT_EQ(::listen(listening_.get(), 1), 0);
-  size = sizeof address;
-  ASSERT_EQ(::getsockname(listening_.get(), reinterpret_cast<sockaddr*>(&address), &size), 0);
-  const UniqueFd peer(::socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0));
-  ASSERT_EQ(::connect(peer.get(), reinterpret_cast<const sockaddr*>(&address), size), 0);
-  EXPECT_EQ(channel_.acceptPeer(listening_.get()), 0);
-  EXPECT_GE(channel_.serverSocket(), 0);
-  EXPECT_TRUE(log_.contains(6, lineFor(channel_.serverSocket())));
-  EXPECT_EQ(keepAliveOf(listening_.get()), 1);
-  EXPECT_EQ(keepAliveOf(channel_.serverSocket()), 0);
-}
-
-TEST_F(Accepting, AFailureIsLoggedWithMinusOneAndTriedAgainAtOnce) {
-  const auto before = std::chrono::steady_clock::now();
-  EXPECT_EQ(channel_.acceptPeer(listening_.get()), -1);  // nobody has called listen
-  EXPECT_LT(std::chrono::steady_clock::now() - before, 1s);
-  EXPECT_EQ(channel_.serverSocket(), -1);
-  EXPECT_TRUE(log_.contains(6, lineFor(-1)));
 }
 
 }  // namespace

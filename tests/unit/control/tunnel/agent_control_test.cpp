@@ -13,9 +13,11 @@
 #include <iterator>
 #include <thread>
 
+#include "control/tunnel/message_cipher.h"
+#include "record/agent_record.h"
 #include "support/base64.h"
 #include "support/unique_fd.h"
-#include "tests/unit/control/channel/scripted_channel.h"
+#include "tests/unit/control/channel/turned_clock.h"
 #include "tests/unit/doubles/log_capture.h"
 #include "tests/unit/doubles/scripted_actions.h"
 #include "tests/unit/doubles/wait_until.h"
@@ -145,7 +147,8 @@ TEST_F(Tunnel, InItsBackOffItHearsThePreviousConnection) {
   ASSERT_TRUE(tunnel_.initWithAgentContext());
   const UniqueFd old = acceptWithHello();
   context_->server.tunnel_port.set("9");  // nobody there
-  tunnel_.setNetTransitionTime(1);
+  actions_.network_changed();
+  clock_.ahead_seconds = 2;
   ASSERT_TRUE(log_.waitFor(6, "Failed to connect to server, retrying in 5 seconds."));
   send(old, encrypted("STOP"));
   EXPECT_FALSE(PlayedServer::readLine(old).empty());

@@ -6,8 +6,6 @@
 #include <random>
 #include <string>
 
-#include "control/tunnel/agent_control.h"
-#include "record/agent_record.h"
 #include "support/base64.h"
 #include "tests/unit/doubles/log_capture.h"
 
@@ -99,17 +97,6 @@ TEST(RandomBytes, AreNotTheSameTwice) {
   EXPECT_NE(agent_random_bytes(32), agent_random_bytes(32));
   EXPECT_EQ(agent_random_bytes(32).size(), 32U);
   EXPECT_EQ(agent_random_bytes(0), "");
-}
-
-TEST(Hello, TellsWhoAndWhetherItCanRecord) {
-  const auto context = newAgentContext();
-  context->server.machine_uuid.set("C-1");
-  context->state.running.set(true);
-  EXPECT_EQ(AgentControl::hello(*context, "dmVjdG9y"),
-            "AGENT protocol=1,agent_uuid=C-1,iv=dmVjdG9y,version=100\n");
-  context->state.running.set(false);
-  EXPECT_EQ(AgentControl::hello(*context, "*"),
-            "AGENT protocol=1,agent_uuid=C-1,iv=*,version=100,agent_recording_status=offline\n");
 }
 
 }  // namespace

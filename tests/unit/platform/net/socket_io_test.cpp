@@ -1,4 +1,6 @@
 // Sending and waiting on real sockets.
+#include "platform/net/socket_io.h"
+
 #include <gtest/gtest.h>
 #include <sys/eventfd.h>
 #include <sys/socket.h>
@@ -8,10 +10,7 @@
 #include <cerrno>
 #include <thread>
 
-#include "control/channel/plain_text.h"
-#include "platform/net/socket_io.h"
 #include "support/unique_fd.h"
-#include "tests/unit/doubles/log_capture.h"
 
 namespace lmx {
 namespace {
@@ -77,18 +76,6 @@ TEST_F(SocketIo, WaitTellsAWakeAndABadDescriptor) {
   const UniqueFd wake(::eventfd(1, EFD_CLOEXEC));
   EXPECT_EQ(awaitReadable(ours_.get(), wake.get(), 30s), Readiness::woken);
   EXPECT_EQ(awaitReadable(9999, -1, 30s), Readiness::badDescriptor);
-}
-
-TEST(PlainText, AsManyBytesAsCharactersGoOut) {
-  EXPECT_EQ(plainReplyBytes("cmdStatus=0"), "cmdStatus=0");
-  EXPECT_EQ(plainReplyBytes("CameraName=Hörsaal,x=12"), "CameraName=Hörsaal,x=1");
-}
-
-TEST(PlainText, LineThatIsNotUtf8IsIgnoredWithAnErrorLine) {
-  testing::LogCapture log;
-  EXPECT_EQ(plainCommand("STATUS\n", nullptr), "STATUS\n");
-  EXPECT_EQ(plainCommand("START title=H\xF6rsaal\n", nullptr), std::nullopt);
-  EXPECT_TRUE(log.contains(3, "Command ignored because it is not UTF-8 text"));
 }
 
 }  // namespace

@@ -1,4 +1,4 @@
-// A channel's thread: start, back-off, reconnects, time-out and stop.
+// A channel's life: start, back-off, reconnects, chunks, and stop.
 #include <gtest/gtest.h>
 #include <poll.h>
 #include <sys/socket.h>
@@ -9,8 +9,8 @@
 #include <deque>
 #include <thread>
 
-#include "control/channel/back_off.h"
 #include "tests/unit/control/channel/scripted_channel.h"
+#include "tests/unit/control/channel/turned_clock.h"
 #include "tests/unit/doubles/log_capture.h"
 #include "tests/unit/doubles/scripted_actions.h"
 
@@ -24,32 +24,6 @@ using testing::ScriptedActions;
 using testing::ScriptedChannel;
 using testing::TurnedClock;
 using Lines = std::vector<std::string>;
-
-TEST(BackOff, TriplesUpToTwoMinutes) {
-  static_assert(nextBackOff(5s) == 15s);
-  EXPECT_EQ(nextBackOff(15s), 45s);
-  EXPECT_EQ(nextBackOff(45s), 120s);
-  EXPECT_EQ(nextBackOff(120s), 120s);
-  EXPECT_EQ(nextBackOff(200s), 200s);
-}
-
-TEST(LastContact, IsLostAfterMoreThanTenMinutes) {
-  const TimeValue last{1000, 500000};
-  EXPECT_FALSE(contactIsLost({1600, 500000}, last));
-  EXPECT_FALSE(contactIsLost({1600, 500999}, last));
-  EXPECT_TRUE(contactIsLost({1600, 501000}, last));
-  EXPECT_FALSE(contactIsLost({900, 0}, last));
-}
-
-TEST(ResolveName, NumericTextOfTheFirstAddress) {
-  EXPECT_EQ(AgentControlBase::dnsResolveName("127.0.0.1"), "127.0.0.1");
-  const std::string local = AgentControlBase::dnsResolveName("localhost");
-  EXPECT_TRUE(local == "127.0.0.1" || local == "::1") << local;
-}
-
-TEST(ResolveName, NameThatDoesNotResolveIsEmpty) {
-  EXPECT_EQ(AgentControlBase::dnsResolveName(std::string(300, 'x')), "");
-}
 
 /// Hands the channel one end of a new socket pair for each connection that the test allows.
 class Connections {
@@ -136,14 +110,6 @@ TEST_F(Lifecycle, StartIsLogged) {
   EXPECT_TRUE(log_.contains(5, "Control module started with success"));
 }
 
-TEST_F(Lifecycle, ANetworkTransitionIsLoggedAndNoted) {
-  start();
-  actions_.network_changed();
-  EXPECT_TRUE(log_.contains(6, "A network transition was received."));
-  EXPECT_NEAR(static_cast<double>(channel_.netTransitionTime()), static_cast<double>(std::time(nullptr)),
-              2.0);
-}
-
 TEST_F(Lifecycle, NoChannelWithoutNewsOfTheNetwork) {
   actions_.network_can_be_watched = false;
   EXPECT_FALSE(channel_.initWithAgentContext());
@@ -207,7 +173,7 @@ TEST_F(Lifecycle, ListenersFailureIsRetriedAtOnce) {
 
 TEST(Stop, EndsABackOffEarly) {
   LogCapture log;
-  ScriptedChannel channel(newAgentContext(), nullptr);  // on the real clock
+  ScriptedChannel channel(newAgentContext(), nullptr, systemChannelClock());
   channel.on_connect = [](ScriptedChannel&) { return 1; };
   ASSERT_TRUE(channel.initWithAgentContext());
   ASSERT_TRUE(log.waitFor(6, "Failed to connect to server, retrying in 5 seconds."));
@@ -219,30 +185,12 @@ TEST(Stop, EndsABackOffEarly) {
 TEST_F(Lifecycle, NetworkChangeMakesANewConnectionAndThenClosesTheOld) {
   start();
   const int first = connections_.peer(0);
-  channel_.setNetTransitionTime(lmp_gettimeofday()->tv_sec);
+  actions_.network_changed();
   clock_.ahead_seconds = 2;
   say(first, "x");  // one turn of the loop
   connections_.peer(1);
   EXPECT_TRUE(Connections::closes(first));
   EXPECT_TRUE(connections_.oldWasOpenAtConnect());
-  EXPECT_EQ(channel_.netTransitionTime(), 0);
-}
-
-TEST_F(Lifecycle, NetworkChangeIsActedUponOnlyInALaterSecond) {
-  context_->releaseRecord();  // its contact times would be compared with the frozen clock
-  clock_.frozen_at = 5000;
-  start();
-  const int first = connections_.peer(0);
-  channel_.setNetTransitionTime(5000);
-  say(first, "foo\n");
-  ASSERT_TRUE(log_.waitFor(3, "Unknown command [foo]"));
-  say(first, "bar\n");
-  ASSERT_TRUE(log_.waitFor(3, "Unknown command [bar]"));
-  EXPECT_EQ(channel_.netTransitionTime(), 5000);
-  clock_.frozen_at = 5001;
-  say(first, "x");
-  connections_.peer(1);
-  EXPECT_EQ(channel_.netTransitionTime(), 0);
 }
 
 TEST_F(Lifecycle, ContactLostForTenMinutesReconnectsAndClearsTheTime) {
@@ -256,17 +204,6 @@ TEST_F(Lifecycle, ContactLostForTenMinutesReconnectsAndClearsTheTime) {
   EXPECT_TRUE(log_.contains(5, "Too long since last contact from server.  Reconnecting..."));
   EXPECT_FALSE(context_->record_context()->lastContact.get().has_value());
   EXPECT_TRUE(Connections::closes(first));
-}
-
-TEST_F(Lifecycle, WithoutSessionContactIsNeverLost) {
-  start();
-  context_->releaseRecord();
-  clock_.ahead_seconds = 100000;
-  const int first = connections_.peer(0);
-  say(first, "foo\n");
-  EXPECT_TRUE(log_.waitFor(3, "Unknown command [foo]"));
-  say(first, "bar\n");
-  EXPECT_TRUE(log_.waitFor(3, "Unknown command [bar]"));
 }
 
 TEST_F(Lifecycle, PartialCommandOutlivesTheConnection) {
@@ -284,6 +221,54 @@ TEST_F(Lifecycle, ClosedPeerIsReplacedByTheNext) {
   EXPECT_TRUE(Connections::closes(connections_.peer(0)));
   say(second, "foo\n");
   EXPECT_TRUE(log_.waitFor(3, "Unknown command [foo]"));
+}
+
+TEST_F(Lifecycle, OnlyTheFirstLineOfAChunkRunsUntilTheNextChunk) {
+  channel_.receive("STOP\nfoo\n");
+  EXPECT_EQ(channel_.replies(), Lines{"cmdStatus=0"});
+  EXPECT_FALSE(log_.mentions("Unknown command"));
+  channel_.receive("bar\n");
+  EXPECT_TRUE(log_.contains(3, "Unknown command [foo\\nbar]"));
+}
+
+TEST_F(Lifecycle, LineOverTwoChunksRunsOnce) {
+  channel_.receive("ST");
+  EXPECT_TRUE(channel_.replies().empty());
+  channel_.receive("OP\n");
+  EXPECT_EQ(channel_.replies(), Lines{"cmdStatus=0"});
+}
+
+TEST_F(Lifecycle, AppendingIsLogged) {
+  channel_.receive("ST");
+  channel_.receive("OP");
+  EXPECT_EQ(log_.count(7, "Appending to existing partial command"), 1);
+}
+
+TEST_F(Lifecycle, CarriageReturnBeforeTheLineFeedIsTrimmed) {
+  channel_.receive("STOP\r\n");
+  EXPECT_EQ(channel_.replies(), Lines{"cmdStatus=0"});
+}
+
+TEST_F(Lifecycle, LineThatTheTransportRejectsIsIgnored) {
+  channel_.readable_lines = false;
+  channel_.receive("STATUS\n");
+  EXPECT_TRUE(channel_.replies().empty());
+  EXPECT_FALSE(context_->record_context()->lastContact.get().has_value());
+  EXPECT_FALSE(log_.mentions("Command"));
+}
+
+TEST_F(Lifecycle, ChannelThatAsksForAuthenticationRefuses) {
+  channel_.requires_authentication = true;
+  channel_.receive("STATUS\n");
+  EXPECT_EQ(channel_.replies(), Lines{"cmdStatus=36"});
+}
+
+TEST_F(Lifecycle, EndlessCommandIsDroppedWithOneErrorLine) {
+  const std::string chunk(1024, 'x');
+  for (int i = 0; i <= 1024; ++i) channel_.receive(chunk);
+  EXPECT_EQ(log_.count(3, "Command of more than 1048576 bytes without an end dropped"), 1);
+  channel_.receive("STOP\n");
+  EXPECT_EQ(channel_.replies(), Lines{"cmdStatus=0"});
 }
 
 TEST_F(Lifecycle, DisconnectIsLoggedAndClosesOnce) {
@@ -307,15 +292,6 @@ TEST_F(Lifecycle, DisconnectWithNothingOpenIsLoggedAllTheSame) {
   EXPECT_EQ(log_.count(6, "Disconnecting from tunnel..."), 2);
 }
 
-TEST_F(Lifecycle, PeerThatClosedItsSideIsNotConnected) {
-  std::array<int, 2> ends{};
-  ASSERT_EQ(::socketpair(AF_UNIX, SOCK_STREAM, 0, ends.data()), 0);
-  const UniqueFd peer(ends[1]);
-  channel_.useSocket(ends[0]);
-  ::shutdown(peer.get(), SHUT_WR);
-  EXPECT_FALSE(channel_.connected());
-}
-
 TEST_F(Lifecycle, StopReturnsWhenTheThreadHasEndedAndTheSocketsAreClosed) {
   start();
   const int peer = connections_.peer(0);
@@ -324,7 +300,6 @@ TEST_F(Lifecycle, StopReturnsWhenTheThreadHasEndedAndTheSocketsAreClosed) {
   EXPECT_LT(std::chrono::steady_clock::now() - before, 1s);
   EXPECT_TRUE(channel_.threadHasEnded());
   EXPECT_TRUE(Connections::closes(peer));
-  EXPECT_NE(channel_.agentContext(), nullptr);
   EXPECT_EQ(log_.count(5, "Control module is stopping..."), 1);
 }
 
@@ -351,8 +326,7 @@ TEST_F(Lifecycle, StopOnItsOwnThreadLetsGoOfTheContext) {
   EXPECT_TRUE(Connections::closes(peer));
   channel_.stop();
   EXPECT_TRUE(channel_.threadHasEnded());
-  EXPECT_EQ(channel_.agentContext(), nullptr);
-  EXPECT_EQ(channel_.properties.get(), nullptr);
+  EXPECT_EQ(context_.use_count(), 1);
 }
 
 TEST_F(Lifecycle, AskedToStopTheChannelFinishesTheCommandItExecutes) {

@@ -1,15 +1,17 @@
 // STATUS: what the recorder does, with the camera's profile and a preview image when asked for.
+#include "control/handlers/status_command.h"
+
 #include <fcntl.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
-#include "control/channel/agent_control_base.h"
+#include "control/handlers/status_reply.h"
 #include "control/protocol/audio_levels.h"
 #include "control/protocol/command_parser.h"
-#include "control/protocol/status_reply.h"
 #include "record/agent_record.h"
 #include "record/recording_status.h"
 #include "support/base64.h"
+#include "support/unique_fd.h"
 
 namespace lmx {
 namespace {
@@ -31,8 +33,8 @@ std::optional<std::string> base64OfFile(const std::string& path) {
   return lmp_encode_base64(std::string_view(bytes).substr(0, static_cast<std::size_t>(length)));
 }
 
-std::optional<std::string> previewImage(const AgentContext& context) {
-  const auto file = context.recording.preview_file.get();
+std::optional<std::string> previewImage(const RecordingDefaults& recording) {
+  const auto file = recording.preview_file.get();
   return file ? base64OfFile(*file) : std::nullopt;
 }
 
@@ -50,15 +52,15 @@ bool recordingTypeSupportsVideoPreview(const AgentRecord* session) {
 
 }  // namespace
 
-void AgentControlBase::handleSTATUS(const Dictionary* parameters) {
-  const auto context = agentContext();
+void StatusCommand::handleSTATUS(const Dictionary* parameters) {
+  const auto context = context_.get();
   if (!context) {
     LMPLogMessage(nullptr, kLogError, "No agent context");
     return;
   }
   const bool include_preview = isTrue(parameters, "include_preview");
   const auto session = context->record_context();
-  const auto preview = include_preview ? previewImage(*context) : std::nullopt;
+  const auto preview = include_preview ? previewImage(context->recording) : std::nullopt;
 
   RecordStatus status;
   const int cmdStatus = LXAgentRecordGetStatus(session, &status);
@@ -68,15 +70,17 @@ void AgentControlBase::handleSTATUS(const Dictionary* parameters) {
     return;
   }
   if (isTrue(parameters, "include_profile")) {
-    reply += "," + profileFields(context->server.machine_name.get(), context->server.tunnel_host.get(),
-                                 context->recording.capture_preset.get());
+    reply.append(",").append(profileFields(context->server.machine_name.get(),
+                                           context->server.tunnel_host.get(),
+                                           context->recording.capture_preset.get()));
   }
   if (preview) {
-    reply += "," + previewFields(audioLevels(powerLevels(session.get(), status.recordStatus)), *preview);
+    const auto levels = audioLevels(powerLevels(session.get(), status.recordStatus));
+    reply.append(",").append(previewFields(levels, *preview));
   } else if (include_preview && recordingTypeSupportsVideoPreview(session.get())) {
     LMPLogMessage(context->log_context(), kLogDebug, "preview buffer is NULL");
   }
-  sendReply(reply);
+  replies_.sendReply(reply);
 }
 
 }  // namespace lmx

@@ -1,17 +1,18 @@
 // The texts of the STATUS reply.
-#include "control/protocol/status_reply.h"
+#include "control/handlers/status_reply.h"
 
-#include "record/recording_status.h"
+#include "control/protocol/reply.h"
 #include "support/format.h"
 
 namespace lmx {
 
 std::string statusFields(int cmdStatus, const RecordStatus& status) {
-  return string_with_format(
-      "cmdStatus=%i,recordStatus=%i,start=%i,elapsedTime=%lld,stop=%i,hard_stop=%i,lastError=%i,"
-      "availDiskInMB=%.0f,totalDiskInMB=%.0f",
-      cmdStatus, status.recordStatus, status.start, static_cast<long long>(status.elapsedSeconds),
-      status.stop, status.hardStop, status.lastError, status.availableDiskMB, status.totalDiskMB);
+  const std::string fields = string_with_format(
+      ",recordStatus=%i,start=%i,elapsedTime=%lld,stop=%i,hard_stop=%i,lastError=%i,availDiskInMB=%.0f,"
+      "totalDiskInMB=%.0f",
+      status.recordStatus, status.start, static_cast<long long>(status.elapsedSeconds), status.stop,
+      status.hardStop, status.lastError, status.availableDiskMB, status.totalDiskMB);
+  return fields.empty() ? fields : replyText(cmdStatus) + fields;
 }
 
 std::string profileFields(const std::optional<std::string>& camera,

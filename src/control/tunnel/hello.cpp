@@ -1,0 +1,18 @@
+// The line by which the agent introduces itself to the server.
+#include "control/tunnel/hello.h"
+
+namespace lmx {
+namespace {
+
+constexpr int kProtocolVersion = 100;
+
+}  // namespace
+
+std::string helloLine(const std::optional<std::string>& agent_uuid, const std::string& vector,
+                      bool can_record) {
+  return "AGENT protocol=1,agent_uuid=" + agent_uuid.value_or("(null)") + ",iv=" + vector +
+         ",version=" + std::to_string(kProtocolVersion) +
+         (can_record ? "" : ",agent_recording_status=offline") + "\n";
+}
+
+}  // namespace lmx

@@ -1,0 +1,81 @@
+// The limits of a recording, and who submits it, from the parameters of a START.
+#include "control/handlers/recording_configuration.h"
+
+#include <gtest/gtest.h>
+
+#include <limits>
+
+namespace lmx {
+namespace {
+
+struct MinutesCase {
+  const char* minutes;
+  std::int32_t seconds;
+};
+
+TEST(HardStop, MinutesBecomeSeconds) {
+  constexpr auto kMost = std::numeric_limits<std::int32_t>::max();
+  for (const MinutesCase& c : {MinutesCase{"1.5", 90},
+                               {"0.01", 1},
+                               {"90.5", 5430},
+                               {"0", 0},
+                               {"-1", 0},
+                               {"0.008", 0},
+                               {"0.0084", 1},
+                               {"", 0},
+                               {"soon", 0},
+                               {"nan", 0},
+                               {"inf", 0},
+                               {"-inf", 0},
+                               {"1e400", 0},
+                               {"1e300", kMost},
+                               {"35791394.1", 2147483646},
+                               {"35791394.2", kMost},
+                               {"50 minutes", 3000}}) {
+    EXPECT_EQ(hardStopSeconds(c.minutes), c.seconds) << c.minutes;
+  }
+}
+
+class StopTimesOfStart : public ::testing::Test {
+ protected:
+  void configure(const char* key, const char* value) { configureStopTimes({{key, value}}, stop_times_); }
+  /// Seconds from now to the hard stop; -1 when there is none.
+  std::int64_t hardStopIn() {
+    const auto stop = stop_times_.hardStopTime.get();
+    return stop ? std::int64_t{stop->tv_sec} - std::int64_t{lmp_gettimeofday()->tv_sec} : -1;
+  }
+  StopTimes stop_times_;
+};
+
+TEST_F(StopTimesOfStart, MaximumMinutesSetTheHardStop) {
+  configure("RecordingMetadata_MAX_RECORDING_MINUTES", "1.5");
+  EXPECT_GE(hardStopIn(), 89);
+  EXPECT_LE(hardStopIn(), 90);
+}
+
+TEST_F(StopTimesOfStart, AHundredthOfAMinuteIsOneSecond) {
+  configure("RecordingMetadata_MAX_RECORDING_MINUTES", "0.01");
+  EXPECT_GE(hardStopIn(), 0);
+  EXPECT_LE(hardStopIn(), 1);
+}
+
+TEST_F(StopTimesOfStart, EmptyValuesLeaveThemAsTheyWere) {
+  configure("RecordingMetadata_MAX_RECORDING_MINUTES", "5");
+  configure("RecordingMetadata_UNATTENDED_RECORDING_MINUTES", "7");
+  configure("RecordingMetadata_MAX_RECORDING_MINUTES", "");
+  configure("RecordingMetadata_UNATTENDED_RECORDING_MINUTES", "");
+  EXPECT_GE(hardStopIn(), 0);
+  EXPECT_EQ(stop_times_.maxUnattendedRecordingMinutes.get(), 7);
+}
+
+TEST(SubmissionOfStart, EmptyAndMissingValuesLeaveItAsItWas) {
+  RunOptions options;
+  configureSubmission(
+      {{"RecordingMetadata_AGENT_USERNAME", "bob"}, {"RecordingMetadata_AGENT_PASSWORD", "sesame"}}, options);
+  configureSubmission({{"RecordingMetadata_AGENT_USERNAME", ""}}, options);
+  EXPECT_EQ(options.user.get(), "bob");
+  EXPECT_EQ(options.password.get(), "sesame");
+}
+
+}  // namespace
+}  // namespace lmx
