@@ -1,4 +1,4 @@
-// Connecting to a message bus.
+// Connects to a message bus.
 #include "platform/bus.h"
 
 #include <poll.h>
@@ -11,7 +11,8 @@
 namespace lmx {
 namespace {
 
-/// The session bus's address by hand: the library, asked for one where there is none, would start a bus.
+/// Finds the session bus's address without GIO: asked for a session bus where there is none, GIO would start
+/// one.
 std::optional<std::string> sessionBusAddress() {
   if (const char* address = std::getenv("DBUS_SESSION_BUS_ADDRESS")) return address;
   const char* directory = std::getenv("XDG_RUNTIME_DIR");
@@ -68,7 +69,7 @@ BusConnection connectToBus(GBusType type, const BusTimeLimit& limit, std::string
     *problem = takeMessage(error);
     return nullptr;
   }
-  // The end of the bus must not be the end of the agent.
+  // The agent must survive the loss of the bus.
   g_dbus_connection_set_exit_on_close(bus.get(), FALSE);
   return bus;
 }

@@ -1,4 +1,4 @@
-// The system log: messages formatted, made safe for one line, and sent as datagrams without ever blocking.
+// Formats messages, escapes control characters and sends them to the system log without blocking.
 #include "platform/log.h"
 
 #include <fcntl.h>
@@ -31,7 +31,7 @@ struct LogContext {
 
   const std::string program;
   const int facility;
-  std::mutex mutex;  ///< guards what follows, and keeps messages in order
+  std::mutex mutex;  ///< guards the members below and keeps messages in order
   UniqueFd socket;
   unsigned long lost = 0;
   std::chrono::steady_clock::time_point next_attempt{};
@@ -56,8 +56,8 @@ class ErrnoKeeper {
 };
 
 struct TestSink {
-  std::atomic<bool> active{false};  ///< lets ordinary messages pass without the lock
-  std::mutex mutex;                 ///< guards the two below and every call of the sink
+  std::atomic<bool> active{false};  ///< lets ordinary messages skip the lock
+  std::mutex mutex;                 ///< guards the members below and every call of the sink
   LogSink sink = nullptr;
   void* user = nullptr;
 };
@@ -67,7 +67,7 @@ TestSink& testSink() {
   return sink;
 }
 
-/// Never destroyed: threads log until the process has gone.
+/// Never destroyed: threads log until the process ends.
 LogContext& defaultContext() {
   static LogContext& context = *std::make_unique<LogContext>("lmxagentd", LOG_DAEMON).release();
   return context;
@@ -133,8 +133,8 @@ void appendEscaped(std::string& out, unsigned char byte) {
   out += text;
 }
 
-/// Makes the text safe for one line: a peer's bytes must forge neither log lines nor terminal commands
-/// (the C1 controls, encoded as C2 80 … C2 9F, are such commands too). One newline at the end stays.
+/// Escapes control characters, so that bytes from a peer can forge neither log lines nor terminal commands.
+/// This includes the C1 controls (encoded as C2 80 … C2 9F). Keeps one newline at the end.
 std::string escapeControls(std::string_view text) {
   const bool newline = !text.empty() && text.back() == '\n';
   if (newline) text.remove_suffix(1);
@@ -156,7 +156,8 @@ std::string escapeControls(std::string_view text) {
   const std::size_t limit = kMessageLimit - (newline ? 1 : 0);
   if (out.size() > limit) {
     std::size_t end = limit;
-    while (end > 0 && (static_cast<unsigned char>(out[end]) & 0xC0) == 0x80) --end;  // whole characters only
+    while (end > 0 && (static_cast<unsigned char>(out[end]) & 0xC0) == 0x80)
+      --end;  // don't split a character
     out.resize(end);
   }
   if (newline) out += '\n';
@@ -220,7 +221,7 @@ Sent sendOnce(int socket, std::string_view datagram) {
   }
 }
 
-/// Sends, connecting anew once when the log daemon has been restarted. Call with the context's lock held.
+/// Sends a message; reconnects once, in case the log daemon was restarted. Call with the context's lock held.
 bool deliver(LogContext& context, std::string_view datagram) {
   for (int attempt = 0; attempt < 2; ++attempt) {
     if (!ensureConnected(context)) return false;
@@ -243,7 +244,7 @@ void sendToLog(LogContext& context, int level, std::string_view text) {
     const std::string notice = std::to_string(context.lost) + " messages lost";
     if (deliver(context, datagramOf(context, kLogWarning, notice))) context.lost = 0;
   }
-  // A message that goes out behind lost ones that could not be told would hide the gap.
+  // While earlier losses are unreported, sending this message would hide the gap.
   if (context.lost > 0 || !deliver(context, datagramOf(context, level, text))) ++context.lost;
 }
 
@@ -261,7 +262,7 @@ Mirror readMirror() {
   return mirror;
 }
 
-/// Whether a write to standard error will not block and not raise SIGPIPE.
+/// Whether a write to standard error would neither block nor raise SIGPIPE.
 bool canWriteToStandardError() {
   pollfd fd{STDERR_FILENO, POLLOUT, 0};
   return poll(&fd, 1, 0) == 1 && (fd.revents & (POLLERR | POLLHUP | POLLNVAL)) == 0;
@@ -269,7 +270,7 @@ bool canWriteToStandardError() {
 
 void mirrorToStandardError(const LogContext& context, int level, std::string_view text) {
   static const Mirror mirror = readMirror();
-  // Asked each time: the descriptor may have been replaced since, by something that isn't ours to write to.
+  // Checked each time: the descriptor may since have been reused for something that isn't ours to write to.
   if (level > mirror.level || !(mirror.always || isatty(STDERR_FILENO) == 1)) return;
   if (!canWriteToStandardError()) return;
   std::string line = context.program + '[' + std::to_string(getpid()) + "] " + kLevelNames[level] + ": ";
@@ -318,7 +319,7 @@ void LMPLogMessage(LMPLogContext context, int level, const char* format, ...) {
     const std::string text = escapeControls(formatMessage(format, arguments));
     writeMessage(target, std::clamp(level, 0, static_cast<int>(kLogDebug)), text);
   } catch (const std::exception&) {
-    // No memory for the message: there is nobody left to tell.
+    // Out of memory: the message can't be reported anywhere.
   }
   va_end(arguments);
 }

@@ -1,4 +1,4 @@
-// systemd over D-Bus.
+// Talks to systemd over D-Bus.
 #include "platform/service_manager.h"
 
 #include <cstdlib>
@@ -30,7 +30,7 @@ constexpr Method managerMethod(const char* name) {
   return {kService, "/org/freedesktop/systemd1", "org.freedesktop.systemd1.Manager", name};
 }
 
-/// Calls on a connection of its own, connecting and answering together within the bus's time limit.
+/// Makes one call on a private connection. Connecting and the reply share the bus's time limit.
 Variant call(const Method& method, GVariant* floating_arguments, std::string* problem) try {
   const Variant arguments(floating_arguments == nullptr ? nullptr : g_variant_ref_sink(floating_arguments));
   const BusTimeLimit limit;
@@ -80,11 +80,11 @@ class SystemdServiceManager : public ServiceManager {
     if (!reply || !g_variant_is_of_type(reply.get(), G_VARIANT_TYPE("(s)"))) return false;
     const char* state = nullptr;
     g_variant_get(reply.get(), "(&s)", &state);
-    return std::string(state).starts_with("enabled");  // "enabled-runtime" too
+    return std::string(state).starts_with("enabled");  // includes "enabled-runtime"
   }
 
   int runShellCommand(const std::string& command) override {
-    return std::system(command.c_str());  // NOLINT: a fixed command, with no text from outside in it
+    return std::system(command.c_str());  // NOLINT: a fixed command without any external input
   }
 };
 
