@@ -1,4 +1,4 @@
-// Tests of formatting into a string.
+// Formatting into a string.
 #include "support/format.h"
 
 #include <gtest/gtest.h>
@@ -18,7 +18,7 @@ TEST(StringWithFormat, TextOfAnyLengthIsWhole) {
 }
 
 TEST(StringWithFormat, TextThatCannotBeFormattedIsEmpty) {
-  // A character that the C locale has no encoding for.
+  // A character without an encoding in the C locale.
   const wchar_t text[] = {0x20AC, 0};
   EXPECT_EQ(string_with_format("%ls", text), "");
 }

@@ -1,4 +1,4 @@
-// Tests of the recursive mutex.
+// The recursive mutex.
 #include "support/recursive_mutex.h"
 
 #include <gtest/gtest.h>

@@ -1,4 +1,4 @@
-// Numbers at the beginning of a text, and dates as text.
+// Numbers at the beginning of a text, and the text form of dates.
 #include "support/scan.h"
 
 #include <gtest/gtest.h>

@@ -1,4 +1,4 @@
-// Tests of time values.
+// Time values.
 #include "support/time_value.h"
 
 #include <gtest/gtest.h>
