@@ -1,4 +1,4 @@
-// Tests of child processes, with real ones.
+// Child processes, tested with real ones.
 #include "platform/child_process.h"
 
 #include <fcntl.h>
@@ -117,7 +117,7 @@ TEST(ChildProcess, SignalsAreAsIfNobodyHadTouchedThem) {
   const ChildResult result = run({"/bin/grep", "-E", "^Sig(Blk|Ign):", "/proc/self/status"});
   pthread_sigmask(SIG_SETMASK, &old, nullptr);
   std::signal(SIGUSR1, before);
-  // Two signals belong to the C library, which ignores them in every child that it starts.
+  // The C library reserves two signals and ignores them in every child that it starts.
   constexpr unsigned long long kLibrarySignals = 3ULL << 31;
   unsigned long long mask_of_blocked = 1;
   unsigned long long mask_of_ignored = 1;
@@ -128,11 +128,11 @@ TEST(ChildProcess, SignalsAreAsIfNobodyHadTouchedThem) {
 }
 
 TEST(ChildProcess, OurDescriptorsStayOurs) {
-  // One that somebody forgot to mark.
+  // A descriptor without close-on-exec.
   const UniqueFd forgotten(fcntl(STDIN_FILENO, F_DUPFD, 20));
   ASSERT_TRUE(forgotten.valid());
   const ChildResult result = run({"/bin/ls", "/proc/self/fd"});
-  EXPECT_EQ(result.output, "0\n1\n2\n3\n");  // the last one is its own, for the directory
+  EXPECT_EQ(result.output, "0\n1\n2\n3\n");  // 3 is ls's own descriptor for the directory
 }
 
 TEST(ChildProcess, LongRunIsReported) {

@@ -1,4 +1,4 @@
-// Tests of making directories and replacing files.
+// Creating directories and replacing files.
 #include "platform/directories.h"
 
 #include <fcntl.h>

@@ -1,4 +1,4 @@
-// Address messages as the kernel sends them.
+// Address messages in the form that the kernel sends.
 #include "platform/network_watcher.h"
 
 #include <arpa/inet.h>
@@ -54,7 +54,7 @@ TEST(AddressMessages, OthersAreNone) {
 }
 
 TEST(AddressMessages, BrokenOnesAreSurvived) {
-  std::mt19937 random(3);  // NOLINT: the same numbers every time
+  std::mt19937 random(3);  // NOLINT: a fixed seed makes the test repeatable
   std::set<InterfaceAddress> known;
   const std::string good = message(RTM_NEWADDR, 2, "192.0.2.1");
   for (std::size_t cut = 0; cut < good.size(); ++cut) applyAddressMessages(good.substr(0, cut), known);

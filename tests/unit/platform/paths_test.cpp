@@ -1,4 +1,4 @@
-// Tests of the fixed paths and of identifiers.
+// Fixed paths and unique identifiers.
 #include "platform/paths.h"
 
 #include <gmock/gmock.h>

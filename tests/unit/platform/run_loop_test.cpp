@@ -1,4 +1,4 @@
-// Tests of the run loop.
+// The run loop.
 #include "platform/run_loop.h"
 
 #include <gtest/gtest.h>
@@ -42,7 +42,7 @@ class Pipe {
   UniqueFd writing;
 };
 
-/// A thread that posts an action and waits for it, and is known to be waiting.
+/// A thread that posts an action and waits for it. Construction returns once it is waiting.
 class WaitingPoster {
  public:
   WaitingPoster(RunLoop& loop, RunLoop::Action action) {
@@ -50,7 +50,7 @@ class WaitingPoster {
       tid_ = gettid();
       result_ = loop.post(action, Wait::untilDone);
     });
-    // It sleeps in one place only.
+    // The thread sleeps only while it waits for the action.
     while (!sleeping()) std::this_thread::yield();
   }
   bool result() {
@@ -196,7 +196,7 @@ TEST(RunLoop, MissedBeatsAreNotMadeUp) {
   RunLoop loop;
   int beats = 0;
   const auto timer = loop.addRepeatingTimer(500ms, [&] { ++beats; });
-  std::this_thread::sleep_for(1100ms);  // nobody to wait for: time itself must pass
+  std::this_thread::sleep_for(1100ms);  // nothing to wait for: only time must pass
   EXPECT_EQ(loop.run(0ms), Turn::handledSource);
   EXPECT_EQ(loop.run(0ms), Turn::timedOut);
   EXPECT_EQ(beats, 1);
@@ -290,7 +290,7 @@ TEST(RunLoop, BusyDescriptorLeavesTheOthersTheirTurn) {
   const Pipe busy;
   const Pipe other;
   bool served = false;
-  const auto first = loop.watchReadable(busy.reading.get(), [] {});  // never read: always ready
+  const auto first = loop.watchReadable(busy.reading.get(), [] {});  // never read, so always ready
   const auto second = loop.watchReadable(other.reading.get(), [&] {
     other.take();
     served = true;
@@ -369,7 +369,7 @@ TEST(RunLoop, ManyPostersLoseNothing) {
   RunLoop loop;
   constexpr int kThreads = 4;
   constexpr int kEach = 500;
-  int total = 0;  // touched on this thread only
+  int total = 0;  // used on this thread only
   std::atomic<int> running{kThreads};
   std::vector<std::thread> posters;
   posters.reserve(kThreads);

@@ -1,4 +1,4 @@
-// Tests of binary property lists, the malicious ones above all.
+// Binary property lists, especially malicious ones.
 #include <gtest/gtest.h>
 
 #include <bit>
@@ -15,7 +15,7 @@ std::string bigEndian(std::uint64_t value, int size) {
   return out;
 }
 
-/// A binary property list of these objects, with two bytes for each offset and reference.
+/// A binary property list with these objects and two-byte offsets and references.
 std::string binary(const std::vector<std::string>& objects, std::uint64_t top = 0) {
   std::string out = "bplist00";
   std::string table;
@@ -39,7 +39,7 @@ std::string container(unsigned kind, std::size_t count, const std::vector<std::u
   return out;
 }
 std::string array(const std::vector<std::uint64_t>& items) { return container(0xA0, items.size(), items); }
-/// Keys first, then values.
+/// References to the keys come first, then those to the values.
 std::string dictionary(const std::vector<std::uint64_t>& references) {
   return container(0xD0, references.size() / 2, references);
 }
@@ -81,7 +81,7 @@ TEST(BinaryPropertyList, EveryKindOfValueIsRead) {
 }
 
 TEST(BinaryPropertyList, SharedValuesAreCountedAsOftenAsTheyExpand) {
-  // Six arrays of ten references each to the next: a million values in two hundred bytes.
+  // Six arrays, each with ten references to the next one: a million values in two hundred bytes.
   std::vector<std::string> objects;
   for (std::uint64_t level = 1; level <= 6; ++level)
     objects.push_back(array(std::vector<std::uint64_t>(10, level)));

@@ -1,4 +1,4 @@
-// Tests of property lists: values, XML, files. The binary form has a file of its own.
+// Property lists: values, XML, files. The binary form has its own test file.
 #include "platform/plist/property_list.h"
 
 #include <gtest/gtest.h>
@@ -158,7 +158,7 @@ TEST(PropertyList, MarkupThatIsNoneDoesNotFoolTheCount) {
 }
 
 TEST(PropertyList, MarkupThatHidesDepthIsStillCounted) {
-  // Each of these is read in different ways by different parsers.
+  // Parsers disagree about each of these.
   const std::string deep = repeated("<array>", 70) + repeated("</array>", 70);
   for (const std::string& hidden :
        {"<!-->" + deep + "<!-- -->", "<?>" + deep + "<? ?>", "<!--->" + deep + "<!-- -->"}) {
@@ -245,7 +245,7 @@ TEST(PropertyList, ByteOrderMarkIsSkipped) {
 
 TEST(PropertyList, EveryBeginningOfADocumentIsHandled) {
   const std::string text = propertyListXml(everyKind());
-  // Without its last tag no document is one.
+  // Without its last tag, no document is complete.
   for (std::size_t length = 0; length < text.rfind("</plist>"); ++length) {
     EXPECT_FALSE(parsePropertyList(text.substr(0, length)).value) << length;
   }
