@@ -1,4 +1,4 @@
-// The shared record: its defaults, the queue, the cluster information, its end.
+// The agent context: its defaults, the queue, the cluster information, its cleanup.
 #include "model/agent_context.h"
 
 #include <gtest/gtest.h>
