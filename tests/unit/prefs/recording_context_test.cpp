@@ -1,4 +1,4 @@
-// Building and refusing the settings of a capture.
+// Building and rejecting capture settings.
 #include "prefs/recording_context.h"
 
 #include <gmock/gmock.h>
@@ -31,7 +31,7 @@ class RecordingContext : public testing::PrefsFixture {
     return builder().newRecordingContext(type);
   }
   RecordingContextBuilder builder() { return {prefs_, kFile, *catalog_}; }
-  /// The reason of the refusal; also proves that the next attempt will read the file afresh.
+  /// The reason for the refusal. Also checks that the next attempt reads the file again.
   std::string reasonOfRefusal(const std::function<void(RecordingContextBuilder&)>& step) {
     prefs_.getFromPrefsFile("RecordingType");
     try {
@@ -159,7 +159,7 @@ TEST_F(RecordingContext, ANamedCameraIsTakenUnchecked) {
   catalog_->microphone_of["gone"] = "microphone";
   const auto context = build();
   EXPECT_EQ(context->videoDeviceID, "gone");
-  EXPECT_EQ(context->audioDeviceID, std::nullopt);  // the microphone of a camera that is not there
+  EXPECT_EQ(context->audioDeviceID, std::nullopt);  // the microphone of an unknown camera
 }
 
 TEST_F(RecordingContext, ACameraWithoutMicrophoneLeavesTheAudioDeviceOpen) {
@@ -342,7 +342,7 @@ TEST_F(RecordingContext, TheAdHocOneNeedsARepositoryToo) {
   }
 }
 
-// In words.
+// Descriptions.
 
 TEST(DescribeRecordingContext, SaysWhatIsOnAndWhere) {
   LMRRecordingContext context;

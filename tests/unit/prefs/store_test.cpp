@@ -1,4 +1,4 @@
-// Reading the preferences: the file, its cache, and the layered domain.
+// Reading the preferences: the file, its cache and the layered domain.
 #include <gmock/gmock.h>
 
 #include <algorithm>
