@@ -100,7 +100,7 @@ TEST_F(Prepare, ADurationBelowOneIsNoLimit) {
 
 TEST_F(Prepare, ASegmentLengthGoesBeforeTheDuration) {
   PlistDictionary preferences = testing::capturePreferences(repository_.path());
-  // What counts is the length alone, cut to 32 bits, not whether continuous recording is on.
+  // Only the length matters, truncated to 32 bits, even when continuous recording is off.
   preferences["ContinuousRecording"] =
       PlistDictionary{{"Enabled", false}, {"RecordingSegmentLength", std::int64_t{0x100000005}}};
   testing::writePreferences(preferences);
@@ -225,7 +225,7 @@ TEST_F(Prepare, AVolumeThatCannotBeMeasuredPassesTheThreshold) {
 }
 
 TEST_F(Prepare, DeadlinesAreLeftAlone) {
-  // One that passes while the camera opens must still end the recording at its first check.
+  // A deadline that passes while the camera opens must still end the recording at its first check.
   session_->stop_times.hardStopTime.set(TimeValue{1000, 0});
   ASSERT_EQ(prepare(), 0);
   EXPECT_TRUE(session_->stop_times.hardStopTime.get() ||

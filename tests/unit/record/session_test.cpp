@@ -1,4 +1,4 @@
-// The session: its state when new, its copy and its end.
+// The session: its initial state, its copies and its cleanup.
 #include "capture/api/capture_framework.h"
 #include "record/agent_record.h"
 #include "record/create_preview.h"

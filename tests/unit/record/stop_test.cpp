@@ -1,4 +1,4 @@
-// Stopping a recording through the engine, and its status.
+// Stopping a recording through the engine, and the recorder's status.
 #include <chrono>
 
 #include "record/recording_status.h"
@@ -10,7 +10,7 @@ namespace {
 
 using testing::ScriptedCaptureController;
 
-/// A session that records with a controller of the test's own.
+/// A session that records with the test's own controller.
 class Stop : public EngineTest {
  protected:
   Stop() {
@@ -101,7 +101,7 @@ TEST_F(Stop, AdhocStopsTheControllerDirectly) {
   EXPECT_EQ(journalCount("stopCapture"), 0);
 }
 
-/// The one slow test: the bound is part of the behaviour.
+/// Slow, because the ten-second limit is part of the behaviour.
 TEST_F(Stop, OfAControllerThatNeverShutsDownEndsAfterTenSeconds) {
   controller_->shut_down = false;
   const auto before = std::chrono::steady_clock::now();
