@@ -37,7 +37,7 @@ class Gathering : public testing::SubmitFixture {
             {"RecordingMetadata_VIDEO_MAXIMUM_FRAME_RATE", "25"},
             {"RecordingMetadata_DATA_MEDIA_EXTENSION", ".mov"}};
   }
-  /// `complete` with `more` in place of what has the same name, less `less`.
+  /// `complete` with the values of `more` replaced or added and those of `less` removed.
   static Dictionary completeWith(const Dictionary& more, const std::vector<std::string>& less = {}) {
     Dictionary all = complete();
     for (const auto& [name, value] : more) all[name] = value;

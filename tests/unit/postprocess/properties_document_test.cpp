@@ -20,7 +20,7 @@ class PropertiesDocument : public testing::SubmitFixture {
     job_.properties = std::move(properties);
     return propertiesXml(job_.properties);
   }
-  /// What a reader finds in the document.
+  /// The properties that a reader finds in the document.
   static Dictionary parsed(const std::string& document) {
     pugi::xml_document xml;
     const auto result = xml.load_buffer(document.data(), document.size(),

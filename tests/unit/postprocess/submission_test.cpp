@@ -1,4 +1,4 @@
-// The submission of a job, with a scripted tool and with a real one.
+// Submission of a job, with a scripted tool and with a real one.
 #include "postprocess/submission.h"
 
 #include <gmock/gmock.h>
@@ -232,7 +232,7 @@ class FileRecording : public SubmissionJob {
   static std::string elsewhere() { return kRoot_ + "/elsewhere"; }
 
   static inline const std::string kRoot_ = testing::kTestRoot.path();
-  const std::string movie_ = std::string(200000, 'm') + "end";  // more than one buffer
+  const std::string movie_ = std::string(200000, 'm') + "end";  // more than one copy buffer
 };
 
 TEST_F(FileRecording, IsCopiedIntoTheRepositoryBeforeTheToolRuns) {
@@ -242,7 +242,7 @@ TEST_F(FileRecording, IsCopiedIntoTheRepositoryBeforeTheToolRuns) {
   EXPECT_EQ(seen, movie_);
   EXPECT_EQ(contentOf(inRepository("NEW.xml")), "talk's document");
   EXPECT_EQ(contentOf(elsewhere() + "/talk.mov"), movie_);
-  EXPECT_EQ(filesInRepository(), 4U);  // nothing temporary
+  EXPECT_EQ(filesInRepository(), 4U);  // no temporary file left
 }
 
 TEST_F(FileRecording, TheCopiesStayWhenTheToolFails) {
@@ -272,12 +272,12 @@ TEST_F(FileRecording, AMissingMovieIsADebugLineAndLeavesNothingTemporary) {
   EXPECT_EQ(job_.addRecording(children_), 0);
   EXPECT_TRUE(log_.contains(kLogDebug, "\"" + elsewhere() + "/talk.mov\" was not copied to \"" +
                                            inRepository("NEW.mov") + "\": No such file or directory"));
-  EXPECT_EQ(filesInRepository(), 3U);  // the two of the fixture and the document
+  EXPECT_EQ(filesInRepository(), 3U);  // two from the fixture, plus the document
 }
 
 TEST_F(FileRecording, AMovieThatCannotBeReadLeavesNoHalfCopy) {
   std::filesystem::remove(elsewhere() + "/talk.mov");
-  std::filesystem::create_directory(elsewhere() + "/talk.mov");  // opens, but does not read
+  std::filesystem::create_directory(elsewhere() + "/talk.mov");  // can be opened but not read
   EXPECT_EQ(job_.addRecording(children_), 0);
   EXPECT_TRUE(log_.contains(kLogDebug, "\"" + elsewhere() + "/talk.mov\" was not copied to \"" +
                                            inRepository("NEW.mov") + "\": Is a directory"));
@@ -305,7 +305,7 @@ TEST_F(FileRecording, AWorkflowWithoutPasswordIsCopiedAllTheSame) {
   EXPECT_EQ(contentOf(inRepository("NEW.mov")), movie_);
 }
 
-// A real child.
+// Tests with a real child process.
 
 class RealTool : public SubmissionJob {
  protected:
