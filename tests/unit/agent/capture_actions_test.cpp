@@ -1,4 +1,4 @@
-// The actions of the main thread, the engine's callbacks and the loss of the device.
+// Main-thread actions, engine callbacks and loss of the device.
 #include <chrono>
 #include <csignal>
 #include <ctime>
@@ -38,12 +38,12 @@ TEST_F(Actions, PrepareLeavesItsResultInTheStatus) {
 
 TEST_F(Actions, APreparationThatRunsOutOfMemoryIsNoRecording) {
   framework_->on_new_controller = [](auto&) { throw std::bad_alloc(); };
-  context_->state.status.set(0);  // what a START sets beforehand
+  context_->state.status.set(0);  // as a START does beforehand
   agent_.mainRunLoop().adoptThread();
   EXPECT_TRUE(agent_.perform(&AgentActions::prepareCapture, Wait::untilDone));
   EXPECT_EQ(context_->state.status.get(), kRecordNotRunning);
   framework_->on_new_controller = nullptr;
-  start("R1");  // finds no lock that was left behind
+  start("R1");  // succeeds: no lock was left held
 }
 
 TEST_F(Actions, PreviewActionsLogAndSucceedAlsoWithoutACamera) {
@@ -135,7 +135,7 @@ TEST_F(Actions, AdhocStopMarksTheShiftedStopThenStopsTheRecording) {
   const auto controller = start("R1");
   context_->options.adhoc.set(true);
   context_->state.timeshift_seconds.set(20);
-  setContinuous();  // a submission instead of another stop
+  setContinuous();  // submits instead of stopping again
   const double before = secondsSinceReferenceDate();
   agent_.stopCapture();
   const auto mark = controller->marks().back();
@@ -270,7 +270,7 @@ TEST_F(Actions, CallbacksLogTheirLines) {
                                 {3, "An error occurred during recording (4)"}}));
 }
 
-/// Ends in the two-second pause that is part of the behaviour.
+/// Takes two seconds, because the behaviour under test includes a pause.
 TEST_F(Actions, ALostDeviceWaitsForTheQueue) {
   const auto delegate = std::make_shared<LMRCaptureDelegate>(nullptr);
   delegate->recordError.set(CaptureError{CaptureError::kDomain, kDeviceRemoved, "gone"});

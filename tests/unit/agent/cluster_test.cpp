@@ -1,4 +1,4 @@
-// Cluster information from a scripted tool and from the cache on the disk.
+// Cluster information from a scripted tool and from the cache on disk.
 #include <gmock/gmock.h>
 
 #include "tests/unit/agent/agent_fixture.h"

@@ -19,7 +19,7 @@ class DaemonFiles : public AgentTest {
     fs::remove_all(systemPath(kPidFile));
     fs::remove_all(systemPath(kTimeShiftFile));
   }
-  /// One turn of the main loop, which is where the time shift is read.
+  /// Runs one turn of the main loop, which reads the time shift.
   void turn() {
     agent_.mainRunLoop().post([this] { context_->state.running.set(false); }, Wait::no);
     EXPECT_EQ(agent_.mainLoop().appLoop(), 0);
@@ -49,7 +49,7 @@ TEST_F(DaemonFiles, PidFileThatCannotBeMadeIsAFailureWithoutALine) {
 }
 
 TEST_F(DaemonFiles, PidFileThatAccessIsDeniedToIsOnlyLogged) {
-  // The effective user of this thread alone: root is denied nothing.
+  // Changes the effective user of this thread only: root is never denied access.
   if (geteuid() != 0) GTEST_SKIP() << "needs root to become somebody else";
   fs::permissions(systemPath("/var/run"), fs::perms{0700});
   fs::permissions(systemPath(""), fs::perms{0755});

@@ -1,4 +1,4 @@
-// The watch over free space, against a volume that really has some and a controller that deletes as scripted.
+// The free-space monitor with a real volume and a controller that deletes as scripted.
 #include <gmock/gmock.h>
 
 #include "tests/unit/agent/agent_fixture.h"

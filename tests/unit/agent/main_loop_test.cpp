@@ -1,4 +1,4 @@
-// The turns of the main loop: a missed device, forgotten previews, the server's refusal, and how it ends.
+// Main-loop turns: a missing device, forgotten previews, the server's refusal, and how the loop ends.
 #include <unistd.h>
 
 #include <cstdio>
@@ -13,14 +13,14 @@
 namespace lmx {
 namespace {
 
-/// The main loop's checks, a turn at a time.
+/// Runs the main loop's checks one turn at a time.
 class MainLoopTest : public AgentTest {
  protected:
   static constexpr const char* kOffline =
       "Unable to acquire the specified video device. The agent will remain offline until the device becomes "
       "available.";
 
-  /// @return whether the loop would have gone on after this turn.
+  /// @return whether the loop would have continued after this turn
   bool turn() {
     bool goesOn = false;
     agent_.mainRunLoop().post(
@@ -66,7 +66,7 @@ TEST_F(MainLoopTest, ASecondSignalWhileTheTunnelClosesIsHarmless) {
     checkedDevice(11);
     ASSERT_TRUE(turn());  // opens the tunnel
     agent_.mainRunLoop().post([&] { agent_.shutDownControl(); }, Wait::no);
-    agent_.shutDownControl();  // turns the loop until the tunnel's thread has ended
+    agent_.shutDownControl();  // runs the loop until the tunnel's thread has ended
     turnTheLoop();
   }
   EXPECT_EQ(log_.count(7, "Process shutDownControl"), 40);
@@ -145,10 +145,10 @@ TEST_F(MainLoopTest, ARunLoopThatWasStoppedEndsItInOrder) {
   EXPECT_TRUE(context_->state.running.get());
 }
 
-// The thread sanitizer can't follow the forks of these tests.
+// The thread sanitizer does not support the forks of these tests.
 #if !defined(__SANITIZE_THREAD__)
 
-/// The log of a process that is about to end, on its standard error.
+/// Copies the log to standard error, for a process that is about to end.
 void tellOnStandardError(void*, int level, const std::string& text) {
   std::fprintf(stderr, "%d %s\n", level, text.c_str());
 }
@@ -159,7 +159,7 @@ class Refusal : public MainLoopTest {
   static constexpr int kWentOn = 7;
 
   Refusal() { GTEST_FLAG_SET(death_test_style, "threadsafe"); }
-  /// One turn, which may end the process; else kWentOn does.
+  /// Runs one turn, which may end the process; otherwise ends it with kWentOn.
   [[noreturn]] void turnAfter(int seconds) {
     setLogSinkForTesting(tellOnStandardError, nullptr);
     context_->state.serverRejectTime.set(std::time(nullptr) - seconds);

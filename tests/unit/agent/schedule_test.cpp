@@ -1,4 +1,4 @@
-// The schedule against a clock that the test names, and the main loop that runs due commands.
+// The schedule with a clock set by the test, and the main loop that runs due commands.
 #include "agent/schedule.h"
 
 #include <gmock/gmock.h>

@@ -1,4 +1,4 @@
-// The way of a stopped recording to its job: movie, document, queue.
+// How a stopped recording becomes a job: movie, document, queue.
 #include "capture/api/capture_framework.h"
 #include "model/codes.h"
 #include "postprocess/properties_document.h"
@@ -12,7 +12,7 @@ using testing::readFile;
 
 class StoppedRecording : public AgentTest {
  protected:
-  /// Stops the capture, has it report, and turns the loop for the hand-over.
+  /// Stops the capture, makes it report, and runs the loop for the hand-over.
   void stopAndReport(const Controller& controller) {
     agent_.stopRecording();
     reportEnd(controller);
@@ -122,7 +122,8 @@ TEST_F(StoppedRecording, ASecondOneThatHasStartedMeanwhileHasItsOwnMovieParamete
   turnTheLoop();
   const auto job1 = nextJob();
   ASSERT_NE(job1, nullptr);
-  EXPECT_EQ(session_->recordingType.get(), kRecordingTypeAudio);  // the report is not for the second one
+  EXPECT_EQ(session_->recordingType.get(),
+            kRecordingTypeAudio);  // the report does not concern the second one
   EXPECT_TRUE(session_->audioOnlyMode.get());
   stopAndReport(second);
   const auto job2 = nextJob();
@@ -146,7 +147,7 @@ TEST_F(StoppedRecording, AHandedOverOneDoesNotMakeASessionIdleThatHasGoneOn) {
   reportEnd(first);
   turnTheLoop();
   EXPECT_TRUE(testing::waitUntil([&] { return journalCount("requestHandedOver request of R1") == 1; }));
-  EXPECT_NE(nextJob(), nullptr);  // it holds the capture too
+  EXPECT_NE(nextJob(), nullptr);  // the job holds the capture, too
   EXPECT_TRUE(testing::waitUntil([&] { return first.use_count() == 1; }));
   EXPECT_EQ(session_->status.get(), kRecorderRecording);
 }
@@ -257,7 +258,7 @@ TEST_F(StoppedRecording, OfAFileSurvivesARefusedRequestForSound) {
 
 TEST_F(StoppedRecording, ThatEndedByItselfIsSubmittedThoughItsReportIsStillToCome) {
   const auto first = start("R1");
-  first->shut_down = true;  // the disk is full, say; its files are being closed
+  first->shut_down = true;  // the disk is full, for example, and the files are being closed
   agent_.stopRecording();
   const auto second = start("R2");
   reportEnd(first);
