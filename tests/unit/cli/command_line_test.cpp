@@ -1,4 +1,4 @@
-// The options: what they set, what they print, with which exit code the program is to end.
+// Command-line options: what they set, what they print, and the exit code.
 #include "cli/command_line.h"
 
 #include <ctime>

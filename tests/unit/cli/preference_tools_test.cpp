@@ -1,4 +1,4 @@
-// The tools that change the preferences file: the preview path and the camera-bind test.
+// Tools that change the preferences file: the preview path and the camera-bind test.
 #include "cli/preference_tools.h"
 
 #include <gmock/gmock.h>
@@ -248,7 +248,7 @@ TEST(BindCommand, NamesAreSingleWordsWhateverTheyHold) {
 }
 
 TEST(BindCommand, IsCutAfter255Bytes) {
-  // "/usr/bin/lumex --bind Fake-Camera -u " is 37 bytes, " -s " 4.
+  // "/usr/bin/lumex --bind Fake-Camera -u " is 37 bytes, " -s " is 4.
   const auto inServer = bindCommand("u", std::string(300, 's'));
   EXPECT_EQ(inServer.back(), std::string(255 - 37 - 1 - 4, 's'));
   const auto inUser = bindCommand(std::string(300, 'u'), "s");
