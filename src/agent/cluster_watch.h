@@ -47,7 +47,7 @@ class ClusterWatch {
   /// @param limit  the tool is killed after this time
   int clusterInformationFromSpecificHostOnly(const std::string& host, SharedPlist& members,
                                              std::chrono::milliseconds limit) const;
-  /// Tries the entries from `index` on. @return as clusterInformation
+  /// Tries the entry at `index`. @return as clusterInformation
   int clusterInformationWithMember(std::size_t index, const std::vector<std::string>& hosts,
                                    SharedPlist& members, std::chrono::milliseconds limit) const;
 
