@@ -83,7 +83,7 @@ TEST_F(Actions, ResumeIsReportedOnlyWhenItChangesSomething) {
   EXPECT_EQ(log_.count(7, "Process resumeCapture"), 2);
 }
 
-TEST_F(Actions, PauseAndResumeLeaveTheStatus) {
+TEST_F(Actions, PauseAndResumeKeepTheStatus) {
   start("R1");
   context_->state.status.set(9);
   agent_.pauseCapture();
@@ -158,7 +158,7 @@ TEST_F(Actions, StopRecordingWithoutParametersIsACancelLineAndNothingElse) {
   EXPECT_EQ(journalCount("controller stopRecording"), 0);
 }
 
-TEST_F(Actions, StopRecordingIsContentWithAFilePath) {
+TEST_F(Actions, StopRecordingAcceptsAFilePathInsteadOfAUuid) {
   start("R1");
   setParameters({{"RecordingMetadata_ADHOC_FILE_PATH", movie("chosen.mov")}});
   agent_.stopRecording();
@@ -198,7 +198,7 @@ TEST_F(Actions, SignalsRunTheirActions) {
   }
 }
 
-TEST_F(Actions, AHangUpCancelsTheCaptureAndTheAgentGoesOn) {
+TEST_F(Actions, AHangUpCancelsTheCaptureAndTheAgentContinues) {
   start("R1");
   const std::int64_t before = std::time(nullptr);
   agent_.signal(SIGHUP);
@@ -235,7 +235,7 @@ TEST_F(Actions, OtherSignalNumbersAreIgnored) {
   EXPECT_TRUE(context_->state.running.get());
 }
 
-TEST_F(Actions, PerformedFromAnotherThreadTheyRunInTheLoop) {
+TEST_F(Actions, ActionsFromAnotherThreadRunInTheLoop) {
   session_->status.set(kRecorderRecording);
   std::atomic<bool> done{false};
   std::thread poster([&] {
@@ -290,7 +290,7 @@ TEST_F(Actions, ALostDeviceWaitsForTheQueue) {
   EXPECT_TRUE(log_.contains(2, "The capture device has been disconnected."));
 }
 
-TEST_F(Actions, ADeviceThatIsThereKeepsTheLoop) {
+TEST_F(Actions, APresentDeviceKeepsTheLoopRunning) {
   EXPECT_FALSE(agent_.devices().deviceDisconnected());
   start("R1");
   EXPECT_FALSE(agent_.devices().deviceDisconnected());

@@ -38,12 +38,12 @@ class MainLoopTest : public AgentTest {
   }
 };
 
-TEST_F(MainLoopTest, ADeviceThatIsNotMissedIsNotLookedFor) {
+TEST_F(MainLoopTest, APresentDeviceIsNotLookedFor) {
   EXPECT_TRUE(turn());
   EXPECT_EQ(session_->previewController.get(), nullptr);
 }
 
-TEST_F(MainLoopTest, AMissedDeviceIsLookedForAfterMoreThanTenSeconds) {
+TEST_F(MainLoopTest, AMissingDeviceIsLookedForAfterMoreThanTenSeconds) {
   checkedDevice(9);
   EXPECT_TRUE(turn());
   EXPECT_EQ(session_->previewController.get(), nullptr);
@@ -94,7 +94,7 @@ TEST_F(MainLoopTest, ADeviceThatFailedGetsOneMoreRetryWithAWarning) {
   EXPECT_EQ(log_.count(4, kOffline), 1);
 }
 
-TEST_F(MainLoopTest, ADeviceThatIsBackForgetsTheWarning) {
+TEST_F(MainLoopTest, AReturningDeviceClearsTheWarning) {
   agent_.shutDownControlBecauseDeviceFailed();
   checkedDevice(11);
   EXPECT_TRUE(turn());
@@ -104,7 +104,7 @@ TEST_F(MainLoopTest, ADeviceThatIsBackForgetsTheWarning) {
   EXPECT_FALSE(log_.mentions(kOffline));
 }
 
-TEST_F(MainLoopTest, PreferencesThatAreGoneAtTheRetryEndTheDaemon) {
+TEST_F(MainLoopTest, MissingPreferencesAtTheRetryEndTheDaemon) {
   framework_->audio_device_usable = false;
   checkedDevice(11);
   EXPECT_FALSE(turn());
@@ -113,7 +113,7 @@ TEST_F(MainLoopTest, PreferencesThatAreGoneAtTheRetryEndTheDaemon) {
                             "for preference: RecordingAudioInput"));
 }
 
-TEST_F(MainLoopTest, APreviewThatNobodyAsksForIsStoppedAfterSixteenSeconds) {
+TEST_F(MainLoopTest, AnUnrequestedPreviewIsStoppedAfterSixteenSeconds) {
   const auto preview = LXAgentRecordCreatePreviewController("camera", std::nullopt, false, 400, nullptr);
   ASSERT_NE(preview, nullptr);
   session_->previewController.set(preview);
@@ -131,7 +131,7 @@ TEST_F(MainLoopTest, APreviewThatNobodyAsksForIsStoppedAfterSixteenSeconds) {
   EXPECT_TRUE(log_.contains(7, "Process stopPreview"));
 }
 
-TEST_F(MainLoopTest, ALostDeviceEndsItWithOne) {
+TEST_F(MainLoopTest, ALostDeviceEndsTheLoopWithOne) {
   const auto delegate = std::make_shared<LMRCaptureDelegate>(nullptr);
   delegate->recordError.set(CaptureError{CaptureError::kDomain, kDeviceRemoved, "gone"});
   session_->captureControllerDelegate.set(delegate);
@@ -139,7 +139,7 @@ TEST_F(MainLoopTest, ALostDeviceEndsItWithOne) {
   EXPECT_FALSE(context_->state.running.get());
 }
 
-TEST_F(MainLoopTest, ARunLoopThatWasStoppedEndsItInOrder) {
+TEST_F(MainLoopTest, AStoppedRunLoopEndsTheLoopWithZero) {
   agent_.mainRunLoop().stop();
   EXPECT_EQ(agent_.mainLoop().appLoop(), 0);
   EXPECT_TRUE(context_->state.running.get());
@@ -172,9 +172,11 @@ TEST_F(Refusal, EndsTheProcessWithZeroAfterAMinute) {
   EXPECT_EXIT(turnAfter(60), ::testing::ExitedWithCode(0), kLine);
 }
 
-TEST_F(Refusal, IsNotActedUponEarlier) { EXPECT_EXIT(turnAfter(57), ::testing::ExitedWithCode(kWentOn), ""); }
+TEST_F(Refusal, IsIgnoredBeforeAMinute) {
+  EXPECT_EXIT(turnAfter(57), ::testing::ExitedWithCode(kWentOn), "");
+}
 
-TEST_F(Refusal, IsNeverActedUponInAdhocMode) {
+TEST_F(Refusal, IsIgnoredInAdhocMode) {
   context_->options.adhoc.set(true);
   EXPECT_EXIT(turnAfter(1000), ::testing::ExitedWithCode(kWentOn), "");
   context_->options.adhoc.set(false);

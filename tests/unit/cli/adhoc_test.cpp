@@ -58,7 +58,7 @@ class AdHocMode : public AgentTest {
   }
 };
 
-TEST_F(AdHocMode, WithoutADaemonSaysNothing) {
+TEST_F(AdHocMode, WithoutADaemonPrintsNothing) {
   context_->options.adhoc_request_type.set(1);
   EXPECT_EQ(run(), "");
   EXPECT_TRUE(log_.contains(6, "lmxagentd (version 100) starting..."));
@@ -91,7 +91,7 @@ TEST_F(AdHocMode, CutsALongReply) {
   conversation.get();
 }
 
-TEST_F(AdHocMode, ADaemonThatHangsUpHasNothingToSay) {
+TEST_F(AdHocMode, AHangUpPrintsAnEmptyReply) {
   PlayedDaemon daemon;
   context_->options.adhoc_request_type.set(1);
   auto conversation = std::async(std::launch::async, [&] {
@@ -126,7 +126,7 @@ TEST_P(AdHocRecording, LastsUntilASignal) {
 
 INSTANTIATE_TEST_SUITE_P(Signals, AdHocRecording, ::testing::Values(SIGINT, SIGTERM));
 
-TEST_F(AdHocMode, AnInterruptIsHeardWhileTheDaemonIsBusy) {
+TEST_F(AdHocMode, AnInterruptWorksWhileTheDaemonIsBusy) {
   PlayedDaemon daemon;  // leaves the connection in its backlog, as when it serves another peer
   context_->options.submit_disabled.set(true);
   auto conversation = std::async(std::launch::async, [&] {
@@ -142,7 +142,7 @@ TEST_F(AdHocMode, AnInterruptIsHeardWhileTheDaemonIsBusy) {
   EXPECT_TRUE(printed.ends_with("received: <empty>\nsent STOP, received: cmdStatus=0\n")) << printed;
 }
 
-TEST_F(AdHocMode, AnUnknownRequestStartsButDoesNotStay) {
+TEST_F(AdHocMode, AnUnknownRequestStartsARecordingButDoesNotWait) {
   PlayedDaemon daemon;
   context_->options.submit_disabled.set(true);
   context_->options.adhoc_request_type.set(9);

@@ -35,7 +35,7 @@ TEST(ChildProcess, OutputAndStatusAreCollected) {
   EXPECT_TRUE(shell("exit 0").succeeded());
 }
 
-TEST(ChildProcess, ArgumentsArriveAsTheyAre) {
+TEST(ChildProcess, ArgumentsArePassedUnchanged) {
   const ChildResult result = run({"/usr/bin/printf", "%s|", "a b", "", "$HOME", "*", "'\"", "\xC3\xA4;"});
   EXPECT_EQ(result.output, "a b||$HOME|*|'\"|\xC3\xA4;|");
 }
@@ -73,7 +73,7 @@ TEST(ChildProcess, ChildThatHangsIsKilledAtTheLimit) {
   EXPECT_LT(taken, 20s);
 }
 
-TEST(ChildProcess, ChildWithinTheLimitIsLeftAlone) {
+TEST(ChildProcess, ChildWithinTheLimitIsNotKilled) {
   ChildOptions options;
   options.limit = 60s;
   EXPECT_TRUE(shell("exit 0", options).succeeded());
@@ -107,7 +107,7 @@ TEST(ChildProcess, GrandchildHoldingTheOutputIsNotAwaited) {
   EXPECT_LT(Clock::now() - begin, 6s);
 }
 
-TEST(ChildProcess, SignalsAreAsIfNobodyHadTouchedThem) {
+TEST(ChildProcess, ChildHasDefaultSignalMaskAndDispositions) {
   const auto before = std::signal(SIGUSR1, SIG_IGN);
   sigset_t blocked;
   sigset_t old;
@@ -127,7 +127,7 @@ TEST(ChildProcess, SignalsAreAsIfNobodyHadTouchedThem) {
   EXPECT_EQ(mask_of_ignored & ~kLibrarySignals, 0U);
 }
 
-TEST(ChildProcess, OurDescriptorsStayOurs) {
+TEST(ChildProcess, DescriptorsAreNotInherited) {
   // A descriptor without close-on-exec.
   const UniqueFd forgotten(fcntl(STDIN_FILENO, F_DUPFD, 20));
   ASSERT_TRUE(forgotten.valid());
@@ -146,7 +146,7 @@ TEST(ChildProcess, LongRunIsReported) {
   EXPECT_GE(reports[1], 40ms);
 }
 
-TEST(ChildProcess, IgnoredChildSignalIsNotTakenForSuccess) {
+TEST(ChildProcess, IgnoredSigchldIsNotReportedAsSuccess) {
   const auto before = std::signal(SIGCHLD, SIG_IGN);
   const ChildResult result = shell("exit 1");
   std::signal(SIGCHLD, before);

@@ -92,7 +92,7 @@ TEST(Log, DatagramHasPriorityTimeProgramAndProcess) {
   EXPECT_THAT(daemon.receive().value_or(""), ::testing::MatchesRegex(expected));
 }
 
-TEST(Log, FacilitiesGoOutAsTheSystemKnowsThem) {
+TEST(Log, FacilityNamesMapToSyslogFacilities) {
   struct Case {
     const char* name;
     int code;
@@ -112,7 +112,7 @@ TEST(Log, FacilitiesGoOutAsTheSystemKnowsThem) {
   }
 }
 
-TEST(Log, LevelsOutOfRangeAreTheNearestOnes) {
+TEST(Log, LevelsOutOfRangeAreClamped) {
   LogDaemon daemon;
   const Context context = newContext("user");
   LMPLogMessage(context.get(), 99, "x");
@@ -127,7 +127,7 @@ TEST(Log, ContextNeedsAProgramAndAFacility) {
   LMPLogDestroyContext(nullptr);
 }
 
-TEST(Log, ContextIsMadeWithNobodyListening) { EXPECT_NE(newContext(), nullptr); }
+TEST(Log, ContextIsCreatedWithoutALogDaemon) { EXPECT_NE(newContext(), nullptr); }
 
 TEST(Log, ControlCharactersAreEscaped) {
   struct Case {
@@ -166,7 +166,7 @@ TEST(Log, MessageEndsAtEightKibibytes) {
   EXPECT_LE(daemon.receiveText().size(), 8192U);
 }
 
-TEST(Log, MessageThatCannotBeFormattedIsNotSwallowed) {
+TEST(Log, UnformattableMessageIsLoggedAsItsFormat) {
   const wchar_t text[] = {0x20AC, 0};  // has no encoding in the C locale
   const LogCapture capture;
   LMPLogMessage(nullptr, kLogError, "name: %ls", text);
@@ -180,7 +180,7 @@ TEST(Log, ErrnoIsKept) {
   EXPECT_EQ(errno, EDOM);
 }
 
-TEST(Log, FullSocketNeverBlocksAndTheLossIsToldOnce) {
+TEST(Log, FullSocketNeverBlocksAndTheLossIsReportedOnce) {
   LogDaemon daemon;
   const Context context = newContext();
   constexpr int kSent = 2000;

@@ -155,7 +155,7 @@ TEST(Notifications, NoSessionBusIsStartedWhereThereIsNone) {
   if (runtime != nullptr) setenv("XDG_RUNTIME_DIR", kept.c_str(), 1);
 }
 
-TEST(Notifications, NameThatIsNoneIsExplained) {
+TEST(Notifications, InvalidNameIsExplained) {
   const Addresses addresses(kNowhere);
   const LogCapture log;
   notify_post("x.not a name");
@@ -163,7 +163,7 @@ TEST(Notifications, NameThatIsNoneIsExplained) {
       kLogDebug, "Notification x.not a name was not sent on the system bus: not a name for a signal"));
 }
 
-TEST(Notifications, MuteBusIsGivenUp) {
+TEST(Notifications, UnresponsiveBusTimesOut) {
   const MuteBus bus;
   const Addresses addresses(bus.address());
   const LogCapture log;

@@ -29,7 +29,7 @@ std::string message(int type, unsigned interface, const char* address, int famil
   return {reinterpret_cast<const char*>(&m), sizeof m};
 }
 
-TEST(AddressMessages, ComingAndGoingAreChanges) {
+TEST(AddressMessages, AddedAndRemovedAddressesAreChanges) {
   std::set<InterfaceAddress> known;
   EXPECT_TRUE(applyAddressMessages(message(RTM_NEWADDR, 2, "192.0.2.1"), known));
   EXPECT_FALSE(applyAddressMessages(message(RTM_NEWADDR, 2, "192.0.2.1"), known)) << "a renewed lease";
@@ -39,21 +39,21 @@ TEST(AddressMessages, ComingAndGoingAreChanges) {
   EXPECT_EQ(known.size(), 1U);
 }
 
-TEST(AddressMessages, SeveralCanComeAtOnce) {
+TEST(AddressMessages, OneBufferMayHoldSeveral) {
   std::set<InterfaceAddress> known;
   const std::string both = message(RTM_NEWADDR, 2, "192.0.2.1") + message(RTM_NEWADDR, 2, "192.0.2.2");
   EXPECT_TRUE(applyAddressMessages(both, known));
   EXPECT_EQ(known.size(), 2U);
 }
 
-TEST(AddressMessages, OthersAreNone) {
+TEST(AddressMessages, OtherMessagesAreNoChange) {
   std::set<InterfaceAddress> known;
   EXPECT_FALSE(applyAddressMessages(message(RTM_NEWADDR, 2, "192.0.2.1", AF_INET6), known));
   EXPECT_FALSE(applyAddressMessages(message(RTM_NEWLINK, 2, "192.0.2.1"), known));
   EXPECT_FALSE(applyAddressMessages("", known));
 }
 
-TEST(AddressMessages, BrokenOnesAreSurvived) {
+TEST(AddressMessages, SurvivesMalformedMessages) {
   std::mt19937 random(3);  // NOLINT: a fixed seed makes the test repeatable
   std::set<InterfaceAddress> known;
   const std::string good = message(RTM_NEWADDR, 2, "192.0.2.1");

@@ -12,7 +12,7 @@
 namespace lmx {
 namespace {
 
-TEST(SystemPath, StandsBehindTheRoot) {
+TEST(SystemPath, IsPrefixedWithTheRoot) {
   EXPECT_EQ(systemPath(kPidFile), testing::kTestRoot.path() + "/var/run/lmxagentd.pid");
 }
 

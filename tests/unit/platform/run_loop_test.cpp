@@ -71,7 +71,7 @@ class WaitingPoster {
   bool result_ = false;
 };
 
-TEST(RunLoop, PostedActionsRunOneATurnInTheirOrder) {
+TEST(RunLoop, PostedActionsRunInOrderOnePerTurn) {
   RunLoop loop;
   std::string order;
   for (const char c : {'a', 'b', 'c'}) EXPECT_TRUE(loop.post([&, c] { order += c; }, Wait::no));
@@ -122,7 +122,7 @@ TEST(RunLoop, WaitingOnTheOwnerThreadRunsAtOnce) {
   EXPECT_TRUE(ran);
 }
 
-TEST(RunLoop, OwnerIsWhoRanItLast) {
+TEST(RunLoop, RunMakesTheCallerTheOwner) {
   RunLoop loop;
   EXPECT_FALSE(loop.isOwnerThread());
   loop.run(0ms);
@@ -192,7 +192,7 @@ TEST(RunLoop, TimerRunsAfterEachInterval) {
   }
 }
 
-TEST(RunLoop, MissedBeatsAreNotMadeUp) {
+TEST(RunLoop, MissedTimerIntervalsAreNotMadeUp) {
   RunLoop loop;
   int beats = 0;
   const auto timer = loop.addRepeatingTimer(500ms, [&] { ++beats; });
@@ -211,7 +211,7 @@ TEST(RunLoop, RemovedTimerIsSilent) {
   EXPECT_FALSE(ran);
 }
 
-TEST(RunLoop, TimerMayRemoveItselfAndKeepsWhatItHolds) {
+TEST(RunLoop, TimerMayRemoveItselfAndKeepsItsCapturesMeanwhile) {
   RunLoop loop;
   std::unique_ptr<RunLoop::Source> timer;
   int seen = 0;
@@ -285,7 +285,7 @@ TEST(RunLoop, PostedActionsGoBeforeTimersAndWatches) {
   EXPECT_EQ(order, "ptw");
 }
 
-TEST(RunLoop, BusyDescriptorLeavesTheOthersTheirTurn) {
+TEST(RunLoop, BusyDescriptorDoesNotStarveOthers) {
   RunLoop loop;
   const Pipe busy;
   const Pipe other;
@@ -334,7 +334,7 @@ TEST(RunLoop, TurnsMayBeNestedInAnAction) {
   EXPECT_EQ(loop.run(0ms), Turn::timedOut);
 }
 
-TEST(RunLoop, NestedTurnDoesNotEnterARunningSourceAgain) {
+TEST(RunLoop, NestedTurnSkipsRunningSources) {
   RunLoop loop;
   const Pipe pipe;
   int depth = 0;
@@ -365,7 +365,7 @@ TEST(RunLoop, WaiterIsServedByANestedTurn) {
   EXPECT_TRUE(poster->result());
 }
 
-TEST(RunLoop, ManyPostersLoseNothing) {
+TEST(RunLoop, NoPostIsLostWithManyPosters) {
   RunLoop loop;
   constexpr int kThreads = 4;
   constexpr int kEach = 500;

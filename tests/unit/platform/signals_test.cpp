@@ -30,7 +30,7 @@ TEST(SignalSource, SignalBecomesAnActionOfTheLoop) {
   EXPECT_EQ(got, std::vector<int>{SIGUSR2});
 }
 
-TEST(SignalSource, OrderIsKept) {
+TEST(SignalSource, KeepsTheOrderOfSignals) {
   RunLoop loop;
   std::vector<int> got;
   const SignalSource source(loop, {SIGUSR1, SIGUSR2, SIGHUP}, [&](int number) { got.push_back(number); });

@@ -94,14 +94,14 @@ TEST(WorkQueue, ItemMayDispatchAnother) {
   EXPECT_TRUE(done.reaches(1));
 }
 
-TEST(WorkQueue, WhatAnItemHoldsMayDispatchAtItsEnd) {
+TEST(WorkQueue, DestructorOfACaptureMayDispatch) {
   static Counter done;
   std::shared_ptr<void> held(nullptr, [](void*) { dispatchAsync([] { done.add(1); }); });
   dispatchAsync([held = std::move(held)] {});
   EXPECT_TRUE(done.reaches(1));
 }
 
-TEST(WorkQueue, AnItemThatThrowsCostsOnlyItself) {
+TEST(WorkQueue, ExceptionEndsOnlyItsItem) {
   static Counter done;
   testing::LogCapture log;
   dispatchAsync([] { throw std::runtime_error("no such thing"); });

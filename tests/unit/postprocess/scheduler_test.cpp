@@ -72,7 +72,7 @@ TEST_F(Scheduler, TakesAJobThatCameWhileItSlept) {
   EXPECT_THAT(submitted(), ElementsAre("A"));
 }
 
-TEST_F(Scheduler, GoesOnAfterAFailedJob) {
+TEST_F(Scheduler, ContinuesAfterAFailedJob) {
   children_.results = {{ChildResult::End::exited, 1, {}}};
   add("A");
   add("B");
@@ -80,7 +80,7 @@ TEST_F(Scheduler, GoesOnAfterAFailedJob) {
   EXPECT_THAT(submitted(), ElementsAre("A", "B"));
 }
 
-TEST_F(Scheduler, EndsAfterTheJobInHandWhenTheAgentStops) {
+TEST_F(Scheduler, EndsAfterTheCurrentJobWhenTheAgentStops) {
   add("A");
   add("B");
   children_.on_run = [this](const ChildOptions&) { context_->state.running.set(false); };
@@ -90,7 +90,7 @@ TEST_F(Scheduler, EndsAfterTheJobInHandWhenTheAgentStops) {
   EXPECT_THAT(sleeps_, IsEmpty());
 }
 
-TEST_F(Scheduler, EndsAfterTheJobInHandWhenItIsCancelled) {
+TEST_F(Scheduler, EndsAfterTheCurrentJobWhenCancelled) {
   add("A");
   add("B");
   children_.on_run = [this](const ChildOptions&) { cancelled_ = true; };
@@ -173,7 +173,7 @@ TEST_F(Scheduler, AnIdleThreadEndsAtOnceWhenItIsCancelled) {
   EXPECT_LT(std::chrono::steady_clock::now() - asked, 4s);  // an uninterrupted sleep takes five seconds
 }
 
-TEST_F(Scheduler, ItsThreadOutlivesIt) {
+TEST_F(Scheduler, ThreadOutlivesTheScheduler) {
   GatedChildren gated;
   add("A");
   {

@@ -107,7 +107,7 @@ TEST_F(SubmissionJob, ANonZeroExitIsLoggedWithItsCodeAndKeepsTheFiles) {
   expectFilesKept();
 }
 
-TEST_F(SubmissionJob, AToolKilledByASignalCountsAsAShellWouldHaveIt) {
+TEST_F(SubmissionJob, AToolKilledByASignalHasAShellsExitCode) {
   children_.results = {{End::signalled, 9, {}}};
   EXPECT_EQ(job_.addRecording(children_), 1);
   EXPECT_THAT(log_.entries(), ElementsAre(kCommandLine, exitCode(137)));
@@ -151,7 +151,7 @@ TEST_F(SubmissionJob, AWorkflowIsSubmittedWithUserAndPassword) {
                                            " --workflow_uuid W-1 --user ada -p secret --delete "));
 }
 
-TEST_F(SubmissionJob, ThePasswordStandsInTheCommandLineOnly) {
+TEST_F(SubmissionJob, ThePasswordAppearsOnlyInTheCommandLine) {
   job_.adhoc_workflow_uuid = "W-1";
   context_->options.user.set("ada");
   context_->options.password.set("secret");
@@ -261,7 +261,7 @@ TEST_F(FileRecording, AnExistingCopyIsKeptAndTheSubmissionGoesOn) {
                                            inRepository("NEW.mov") + "\": File exists"));
 }
 
-TEST_F(FileRecording, ALinkThatLeadsNowhereIsAnExistingCopy) {
+TEST_F(FileRecording, ADanglingLinkCountsAsAnExistingCopy) {
   ASSERT_EQ(symlink("/nowhere/at/all", inRepository("NEW.mov").c_str()), 0);
   EXPECT_EQ(job_.addRecording(children_), 0);
   EXPECT_TRUE(std::filesystem::is_symlink(inRepository("NEW.mov")));
@@ -284,7 +284,7 @@ TEST_F(FileRecording, AMovieThatCannotBeReadLeavesNoHalfCopy) {
   EXPECT_EQ(filesInRepository(), 3U);
 }
 
-TEST_F(FileRecording, AnUnwritableRepositoryIsADebugLineEach) {
+TEST_F(FileRecording, AnUnwritableRepositoryIsOneDebugLinePerFile) {
   context_->recording.recording_repository_path.set(kRoot_ + "/missing");
   EXPECT_EQ(job_.addRecording(children_), 0);
   EXPECT_EQ(children_.runs().size(), 1U);
@@ -299,7 +299,7 @@ TEST_F(FileRecording, TheJobsOwnSessionDecidesWhatIsCopied) {
   EXPECT_FALSE(std::filesystem::exists(inRepository("NEW.mov")));
 }
 
-TEST_F(FileRecording, AWorkflowWithoutPasswordIsCopiedAllTheSame) {
+TEST_F(FileRecording, AWorkflowWithoutPasswordIsStillCopied) {
   job_.adhoc_workflow_uuid = "W-1";
   EXPECT_EQ(job_.addRecording(children_), 1);
   EXPECT_EQ(contentOf(inRepository("NEW.mov")), movie_);
@@ -319,7 +319,7 @@ class RealTool : public SubmissionJob {
   }
 };
 
-TEST_F(RealTool, GetsItsArgumentsAsTheyAre) {
+TEST_F(RealTool, GetsItsArgumentsUnchanged) {
   installTool("exit 0");
   job_.properties = {{"RecordingMetadata_RECORDING_UUID", "A B'$(id)\"*"}};
   EXPECT_EQ(job_.addRecordingWithCommentary(systemChildRunner()), 0);
@@ -346,7 +346,7 @@ TEST_F(RealTool, ASignalIsLoggedAsItsShellCode) {
   EXPECT_TRUE(log_.contains(exitCode(143).level, exitCode(143).text));
 }
 
-TEST_F(RealTool, ThatIsNotInstalledIsNamed) {
+TEST_F(RealTool, MissingToolIsNamedInTheLog) {
   EXPECT_EQ(job_.addRecordingWithCommentary(systemChildRunner()), -1);
   EXPECT_THAT(log_.entries(),
               ElementsAre(kStarting, kInProgress, kCommandLine,

@@ -268,7 +268,7 @@ TEST_F(Settings, AdHocModeSkipsBindingSecretAndRepository) {
   EXPECT_EQ(context_->recording.recording_type.get(), "Audio+Video");
 }
 
-TEST_F(Settings, WithoutASessionTheyFailAfterTheBinding) {
+TEST_F(Settings, WithoutASessionReadingFailsAfterTheBindingKeys) {
   context_->releaseRecord();
   EXPECT_FALSE(read(bound()));
   EXPECT_TRUE(log_.contains(kLogCritical, "Internal error occurred creating record context"));
@@ -288,7 +288,7 @@ TEST_F(Settings, AFailureKeepsTheFieldsBeforeItAndStoresWhatTheFailingKeyHad) {
   EXPECT_EQ(context_->server.tunnel_host.get(), "tunnel.example");
 }
 
-TEST_F(Settings, AnUnknownTypeIsStoredAllTheSame) {
+TEST_F(Settings, AnUnknownTypeIsStoredAnyway) {
   ASSERT_TRUE(read(bound()));
   PlistDictionary all = bound();
   all["RecordingType"] = "Hologram";
@@ -318,7 +318,7 @@ TEST_F(Settings, OnlyAFileRecordingReadsItsPath) {
   EXPECT_EQ(context_->record_context()->recordingType.get(), kRecordingTypeFile);
 }
 
-TEST_F(Settings, AnIntegerInTheFileServesWhereATextIsExpected) {
+TEST_F(Settings, AnIntegerIsAcceptedForAText) {
   PlistDictionary all = bound();
   all["RecordingDiskSpaceCutoffInMB"] = std::int64_t{512};
   ASSERT_TRUE(read(all));

@@ -91,7 +91,7 @@ TEST(ConnectMultiple, SocketBlocksAndIsClosedInChildren) {
   EXPECT_EQ(fcntl(attempt.socket.get(), F_GETFD) & FD_CLOEXEC, FD_CLOEXEC);
 }
 
-TEST(ConnectMultiple, UnreachableHostIsPassedOver) {
+TEST(ConnectMultiple, UnreachableHostIsSkipped) {
   const Listener listener;
   const Attempt attempt({"127.0.0.1:" + deadPort(), "no.such.host.invalid", "127.0.0.1"}, listener.port());
   EXPECT_EQ(attempt.result, 0);
@@ -118,7 +118,7 @@ TEST(ConnectMultiple, PortOfAnEntryWins) {
   EXPECT_EQ(attempt.result, 0);
 }
 
-TEST(ConnectMultiple, VersionSixAddressesStandInBrackets) {
+TEST(ConnectMultiple, IPv6AddressesAreAcceptedWithAndWithoutBrackets) {
   const Listener listener(AF_INET6);
   if (!listener.ready()) GTEST_SKIP() << "no IPv6 loopback here";
   EXPECT_EQ(Attempt({"[::1]:" + listener.port()}, deadPort()).result, 0);
@@ -126,7 +126,7 @@ TEST(ConnectMultiple, VersionSixAddressesStandInBrackets) {
   EXPECT_EQ(Attempt({"::1"}, listener.port()).result, 0);
 }
 
-TEST(ConnectMultiple, MalformedEntriesArePassedOver) {
+TEST(ConnectMultiple, MalformedEntriesAreSkipped) {
   const Listener listener;
   const std::string port = listener.port();
   for (const std::string& entry :
@@ -144,7 +144,7 @@ TEST(ConnectMultiple, PortIsDecimalText) {
   }
 }
 
-TEST(ConnectMultiple, MuteHostIsGivenUp) {
+TEST(ConnectMultiple, UnresponsiveHostTimesOut) {
   // With a full backlog further connections are dropped and never answered.
   const Listener listener(AF_INET, 0);
   std::vector<UniqueFd> fill;

@@ -120,7 +120,7 @@ TEST(BinaryPropertyList, SixtyFourLevelsAreTheLimit) {
   EXPECT_EQ(problemOf(nested(65)), "nested more than 64 levels");
 }
 
-TEST(BinaryPropertyList, ValueThatContainsItselfIsRefused) {
+TEST(BinaryPropertyList, SelfReferencesAreRejected) {
   EXPECT_EQ(problemOf(binary({array({0})})), "a value that contains itself");
   EXPECT_EQ(problemOf(binary({array({1}), dictionary({2, 0}), ascii("k")})), "a value that contains itself");
 }
@@ -130,21 +130,21 @@ TEST(BinaryPropertyList, KeysMustBeTexts) {
   EXPECT_EQ(problemOf(binary({dictionary({0, 1}), kTrue})), "a key that is not a text");
 }
 
-TEST(BinaryPropertyList, KindsWithoutAMeaningHereAreRefused) {
+TEST(BinaryPropertyList, UnsupportedKindsAreRejected) {
   for (const std::string& object : {std::string(1, '\0'), std::string("\x0F"), std::string("\x80\x01"),
                                     std::string("\xC0"), std::string("\x70"), std::string("\xF0")}) {
     EXPECT_EQ(problemOf(binary({object})), "a value of a kind that is not supported");
   }
 }
 
-TEST(BinaryPropertyList, TextsHoldNoNul) {
+TEST(BinaryPropertyList, TextsWithNulAreRejected) {
   EXPECT_EQ(problemOf(binary({ascii(std::string("a\0b", 3))})), "a NUL character");
   EXPECT_EQ(problemOf(binary({std::string("\x62\x00\x61\x00\x00", 5)})), "a NUL character");
   EXPECT_EQ(problemOf(binary({dictionary({1, 2}), ascii(std::string(1, '\0')), kTrue})), "a NUL character");
   EXPECT_EQ(parsePropertyList(binary({std::string("\x61\x01\x00", 3)})).value, PlistValue("\xC4\x80"));
 }
 
-TEST(BinaryPropertyList, DatesMustFit) {
+TEST(BinaryPropertyList, DatesOutOfRangeAreRejected) {
   EXPECT_EQ(problemOf(binary({date(1e300)})), "a date out of range");
   EXPECT_EQ(problemOf(binary({'\x33' + bigEndian(0x7FF8000000000000, 8)})), "a date out of range");
 }
@@ -172,7 +172,7 @@ TEST(BinaryPropertyList, MalformedTablesAreRefused) {
   EXPECT_EQ(problemOf("bplist00"), "too short for a binary property list");
 }
 
-TEST(BinaryPropertyList, EveryBeginningAndEveryFlippedBitIsHandled) {
+TEST(BinaryPropertyList, SurvivesTruncationAndEveryFlippedBit) {
   const std::string good = binary({dictionary({1, 2, 3, 4}), ascii("a"), ascii("b"), array({5, 6}), kTrue,
                                    real(1), std::string("\x61\x00\xE4", 3)});
   for (std::size_t length = 0; length < good.size(); ++length) parsePropertyList(good.substr(0, length));
