@@ -4,7 +4,7 @@
 
 namespace lmx {
 
-/// What is recorded, as numbered in preferences, journals and documents.
+/// What is recorded, as numbered in preferences, journals and properties documents.
 enum RecordingTypeCode : std::int32_t {
   kRecordingTypeNone = 0,
   kRecordingTypeAudio = 1,

@@ -1,4 +1,4 @@
-// The names of the recording types in preferences and documents.
+// The names of the recording types in preferences and properties documents.
 #pragma once
 #include <optional>
 #include <string>
