@@ -24,8 +24,7 @@ std::size_t PostProcessList::postProcessListCount() const {
 }
 
 void PostProcessList::clear() {
-  std::deque<std::shared_ptr<AgentSubmit>>
-      dropped;  // destroyed after the lock is released: destructors may run any code
+  std::deque<std::shared_ptr<AgentSubmit>> dropped;  // destroyed after unlocking: destructors run any code
   const std::lock_guard lock(mutex_);
   jobs_.swap(dropped);
 }

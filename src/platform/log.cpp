@@ -156,8 +156,7 @@ std::string escapeControls(std::string_view text) {
   const std::size_t limit = kMessageLimit - (newline ? 1 : 0);
   if (out.size() > limit) {
     std::size_t end = limit;
-    while (end > 0 && (static_cast<unsigned char>(out[end]) & 0xC0) == 0x80)
-      --end;  // don't split a character
+    while (end > 0 && (static_cast<unsigned char>(out[end]) & 0xC0) == 0x80) --end;  // whole characters
     out.resize(end);
   }
   if (newline) out += '\n';

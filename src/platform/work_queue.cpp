@@ -57,8 +57,7 @@ class Pool {
   [[noreturn]] void work() {
     prepareThread();
     for (;;) {
-      std::function<void()>
-          item;  // destroyed without the lock: destructors of the captures may dispatch again
+      std::function<void()> item;  // destroyed without the lock: its captures may dispatch again
       {
         std::unique_lock lock(mutex_);
         ++idle_;

@@ -11,10 +11,9 @@ namespace lmx {
 
 /// What the loop needs from its owner. All three must be set. They are called on the loop's thread.
 struct SchedulerHooks {
-  std::function<void(std::chrono::milliseconds)>
-      sleep;                          ///< waits at most this long before the list is checked again
-  std::function<bool()> cancelled;    ///< true: end, even with jobs in the list
-  std::function<void(bool)> setBusy;  ///< whether a job is being taken or run
+  std::function<void(std::chrono::milliseconds)> sleep;  ///< waits at most this long between checks
+  std::function<bool()> cancelled;                       ///< true: end, even with jobs in the list
+  std::function<void(bool)> setBusy;                     ///< whether a job is being taken or run
 };
 
 /// The body of the thread: takes jobs off the context's list and runs them while the context is `running`.

@@ -9,10 +9,9 @@ namespace lmx {
 
 /// One measurement of a volume.
 struct VolumeSpace {
-  std::uint64_t freeKilobytes =
-      ~std::uint64_t{0};      ///< units of 2^10 bytes; all ones when the measurement failed
-  double totalMegabytes = 0;  ///< units of 2^20 bytes; 0 when the measurement failed
-  int error = 0;              ///< errno of a failed measurement
+  std::uint64_t freeKilobytes = ~std::uint64_t{0};  ///< of 2^10 bytes; all ones if the measurement failed
+  double totalMegabytes = 0;                        ///< of 2^20 bytes; 0 if the measurement failed
+  int error = 0;                                    ///< errno of a failed measurement
 };
 VolumeSpace measureVolume(const std::string& path);
 

@@ -27,8 +27,7 @@ struct PlistValue {
   PlistValue() = default;
   PlistValue(const char* text) : value(std::string(text)) {}
   template <class T>
-  PlistValue(T v)
-      : value(std::move(v)) {}  // NOLINT: implicit on purpose, so that values can be written inline
+  PlistValue(T v) : value(std::move(v)) {}  // NOLINT: implicit, so that values can be written inline
   bool operator==(const PlistValue&) const = default;
 
   [[nodiscard]] const std::string* string() const { return std::get_if<std::string>(&value); }

@@ -177,8 +177,7 @@ class BinaryWalk {
   std::uint64_t table_ = 0;
   std::size_t nodes_ = 0;
   std::uint64_t expanded_bytes_ = 0;
-  std::set<std::uint64_t>
-      open_;  ///< containers being walked; meeting one again means that it contains itself
+  std::set<std::uint64_t> open_;  ///< containers being walked; finding one again means a cycle
   std::optional<std::string> problem_;
 };
 

@@ -11,8 +11,7 @@ namespace lmx {
 /// An XML document reduced to what a property list may contain, or the reason why it is rejected.
 struct XmlCheck {
   std::string clean;  ///< bare tags and their text: no comments, CDATA, attributes or DOCTYPE
-  std::optional<std::string>
-      refused;  ///< too deep, too many values, entity definitions, unbalanced or unknown tags
+  std::optional<std::string> refused;  ///< depth, number of values, definitions, unbalanced or unknown tags
 };
 
 /// The parser gets `clean` instead of the document. Otherwise something that it reads differently (the end of
