@@ -1,4 +1,4 @@
-// What the agent is given from outside.
+// The agent's external dependencies.
 #pragma once
 #include <memory>
 
@@ -9,10 +9,10 @@
 namespace lmx {
 
 inline constexpr double kVersion = 100;
-/// What the service manager knows the agent as.
+/// The agent's name for the service manager.
 inline constexpr const char* kServiceJob = "com.zandor.lmxagentd";
 
-/// Scripted in tests.
+/// Tests pass scripted ones.
 struct AgentEnvironment {
   std::shared_ptr<CaptureFramework> framework;
   std::shared_ptr<ServiceManager> serviceManager;

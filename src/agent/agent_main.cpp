@@ -1,4 +1,4 @@
-// Start-up and shut-down of the daemon.
+// Starts the daemon and shuts it down.
 #include "agent/agent_main.h"
 
 #include <syslog.h>
@@ -105,7 +105,7 @@ AgentMain::Start AgentMain::startServices() {
   }
   if (!devices_.deviceIsOffline() && !channels_.tunnel().openTunnel()) return Start::fatal;
   startListeners();
-  // Off this thread: a first recording should find the plug-ins loaded, but nobody should wait for them now.
+  // On a worker, so that start-up isn't delayed and the first recording finds the plug-ins loaded.
   dispatchAsync([framework = environment_.framework] { framework->warmUp(); });
   notify_post("com.zandor.lmxagentd.started");
   postDistributedNotification("com.zandor.lmxagentd.started");

@@ -1,4 +1,4 @@
-// The agent: puts its parts together, starts the daemon and ends it.
+// The agent: assembles its parts, starts the daemon and ends it.
 #pragma once
 #include <cstdint>
 #include <ctime>
@@ -25,26 +25,26 @@
 
 namespace lmx {
 
-/// One a process, made by the main thread and never destroyed while other threads run. "Main thread" is the
-/// one that made it. The actions are handed to the part that carries them out.
+/// One per process, created by the main thread and never destroyed while other threads run. "Main thread" is
+/// the thread that created it. Actions are forwarded to the part that implements them.
 class AgentMain final : public AgentActions {
  public:
   AgentMain(std::shared_ptr<AgentContext> context, AgentEnvironment environment);
   ~AgentMain() override;
 
-  /// Runs the daemon to its end. @return the exit status of the process
+  /// Runs the daemon until it ends. @return the exit status of the process
   int startupDaemon();
-  /// @return false when there is no log to be had (said on standard error)
+  /// @return false when no log can be opened (reported on standard error)
   bool setupLoggingContext();
   void setupSignalHandlers();
-  /// The disk-space and cluster timers and the schedule; each is acted on once at once.
+  /// Starts the disk-space and cluster timers and the schedule, and runs each once immediately.
   void startTimers();
-  /// Acts on a signal. Main thread.
+  /// Handles a signal. Main thread.
   void signal(int number);
 
   [[nodiscard]] const std::shared_ptr<AgentContext>& agentContext() const { return context_; }
   [[nodiscard]] const AgentEnvironment& environment() const { return environment_; }
-  // The parts, for who puts the process together and for tests.
+  // The parts, for the code that assembles the process and for tests.
   [[nodiscard]] RunLoop& mainRunLoop() { return loop_; }
   [[nodiscard]] MainLoop& mainLoop() { return main_loop_; }
   [[nodiscard]] DeviceWatch& devices() { return devices_; }
@@ -94,7 +94,7 @@ class AgentMain final : public AgentActions {
   const AgentEnvironment environment_;
   RunLoop loop_;
   std::unique_ptr<SignalSource> signals_;
-  std::shared_ptr<LMRRecordingContext> start_settings_;  ///< those of the start, until the services run
+  std::shared_ptr<LMRRecordingContext> start_settings_;  ///< capture settings used until the services run
   std::unique_ptr<AgentPreferences> agentPrefs_;
   PostProcessScheduler scheduler_;
   Submission submission_;

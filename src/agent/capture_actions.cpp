@@ -1,4 +1,4 @@
-// Driving the capture as commands and signals ask.
+// Drives the capture on behalf of commands and signals.
 #include "agent/capture_actions.h"
 
 #include "capture/api/capture_framework.h"
@@ -19,7 +19,7 @@ std::shared_ptr<LMRCaptureController> CaptureActions::captureController() const 
 void CaptureActions::prepareCapture() {
   context_.logDebug("Process prepareCapture");
   const SharedDictionary properties = context_.state.properties.get();
-  context_.state.status.set(kRecordNotRunning);  // what counts if this ends by an exception
+  context_.state.status.set(kRecordNotRunning);  // the result if an exception ends this function
   context_.state.status.set(LXAgentRecordPrepareCapture(
       context_, std::make_shared<const Dictionary>(properties ? *properties : Dictionary{})));
 }
@@ -80,7 +80,7 @@ void CaptureActions::stopOrCancelCapture(bool cancel) {
   const bool isFile =
       record && record->status.get() != kRecorderIdle && record->recordedType() == kRecordingTypeFile;
   if (isFile && !cancel) {
-    // No capture will report the end of a "File" recording: the engine's own stop does, and so makes its job.
+    // No capture reports the end of a "File" recording. The engine's own stop does that and creates the job.
     LXAgentRecordStopCapture(record);
   } else if (controller && !isFile) {
     submission_.rememberStopped(controller);
@@ -114,7 +114,7 @@ void CaptureActions::stopRecording() {
   }
   if (context_.recording.isContinuous()) {
     submission_.submitStoppedRecording();
-  } else if (!context_.options.adhoc.get()) {  // there stopCapture is what has called
+  } else if (!context_.options.adhoc.get()) {  // in ad-hoc mode stopCapture is the caller
     stopCapture();
   }
 }

@@ -1,4 +1,4 @@
-// The actions that touch the capture.
+// The actions that control the capture.
 #pragma once
 #include <memory>
 
@@ -9,7 +9,7 @@
 
 namespace lmx {
 
-/// Main thread only. Those that have a result leave it in the agent's `status`.
+/// Main thread only. Actions with a result store it in the agent's `status`.
 class CaptureActions {
  public:
   /// Both outlive the object.
@@ -25,13 +25,13 @@ class CaptureActions {
   void cancelCapture();
   void stopRecording();
   void setRecorderStatusToIdle();
-  /// What SIGUSR1 and SIGUSR2 ask for. In ad-hoc mode they only mark the recording.
+  /// Handles SIGUSR1 and SIGUSR2. In ad-hoc mode this only marks the recording.
   void pauseOrResume(bool pause);
 
   /// The session's capture; null when there is none.
   [[nodiscard]] std::shared_ptr<LMRCaptureController> captureController() const;
 
-  // The recording callbacks: one log line each. Any thread.
+  // The recording callbacks, each of which logs one line. Any thread.
   void recordDidStartWithFile(const std::string& file) const;
   void recordDidPauseWithFile(const std::string& file, std::int64_t elapsedSeconds) const;
   void recordDidResumeWithFile(const std::string& file) const;

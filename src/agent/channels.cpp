@@ -1,4 +1,4 @@
-// Finding a channel by its kind.
+// Opens the control channels and finds them by kind.
 #include "agent/channels.h"
 
 namespace lmx {

@@ -21,7 +21,7 @@ class Channels {
   [[nodiscard]] TunnelKeeper& tunnel() { return tunnel_; }
   /// @return false when the local channel can't be started
   bool openLocal();
-  /// The channel of that kind, else the one without a peer.
+  /// The channel of that kind, or the one without a peer when there is none.
   [[nodiscard]] AgentControlBase& channelOf(ChannelKind kind);
 
  private:

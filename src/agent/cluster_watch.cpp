@@ -1,4 +1,4 @@
-// Asking the tool, one member after another.
+// Queries the server's tool for cluster members, one host after another.
 #include "agent/cluster_watch.h"
 
 #include <thread>
@@ -12,8 +12,8 @@ namespace {
 
 using namespace std::chrono_literals;
 
-/// A tool that has not answered by then is killed: at start-up nothing else goes on meanwhile. The second one
-/// gets what the first has left.
+/// A tool that has not answered by then is killed, since start-up waits for it. The second query gets the
+/// time that the first one left.
 constexpr auto kQueryLimit = 30s;
 constexpr auto kFirstToolLimit = 20s;
 constexpr const char* kMembers = "cluster_members";
@@ -24,7 +24,7 @@ ClusterWatch::SharedPlist membersOf(const PlistResult& information) {
   return std::make_shared<const PlistDictionary>(*members->dictionary());
 }
 
-/// The status to hand on: never 0 for a tool that did not exit in order.
+/// The tool's status; never 0 for a tool that did not exit normally.
 int statusOf(const ChildResult& result) {
   if (result.end == ChildResult::End::exited) return result.status;
   return result.end == ChildResult::End::notStarted ? 127 : 128 + result.status;
@@ -92,7 +92,7 @@ int ClusterWatch::clusterInformation(const std::optional<std::string>& host, Sha
   }
   const auto left =
       std::chrono::duration_cast<std::chrono::milliseconds>(deadline - std::chrono::steady_clock::now());
-  // The first of the list is skipped: it is the server that has just failed.
+  // Skip the first member: it is the server that has just failed.
   const int result = clusterInformationWithMember(1, clusterHostArray(cached.get()), members, left);
   if (result != 0) {
     log_.logDebug("Unable to contact any member of the cluster.");
@@ -115,7 +115,7 @@ void ClusterWatch::learnCluster() {
 }
 
 void ClusterWatch::refreshClusterInformation() {
-  if (refreshing_.exchange(true)) return;  // the last one is still waiting for its tool
+  if (refreshing_.exchange(true)) return;  // the previous refresh is still waiting for its tool
   dispatchAsync([this] {
     const auto ended = [](std::atomic<bool>* refresh) { *refresh = false; };
     const std::unique_ptr<std::atomic<bool>, decltype(ended)> end_of_refresh(&refreshing_, ended);

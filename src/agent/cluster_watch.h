@@ -1,4 +1,4 @@
-// The members of the server's cluster: asked of the server's tool, else read from its cache.
+// Finds the members of the server's cluster with the server's tool, or else in the tool's cache.
 #pragma once
 #include <atomic>
 #include <chrono>
@@ -20,31 +20,31 @@ class ClusterWatch {
  public:
   using SharedPlist = std::shared_ptr<const PlistDictionary>;
 
-  /// All of them outlive the object.
-  /// @param server_info  gets the member dictionary; null when none is known
+  /// All arguments outlive the object.
+  /// @param server_info  receives the member dictionary; null when none is known
   ClusterWatch(const AgentLog& log, const ServerSettings& server, SharedValue<SharedPlist>& server_info,
                ChildRunner& children)
       : log_(log), server_(server), server_info_(server_info), children_(children) {}
-  /// Waits for a refresh that is under way.
+  /// Waits for a refresh in progress.
   ~ClusterWatch();
   ClusterWatch(const ClusterWatch&) = delete;
   ClusterWatch& operator=(const ClusterWatch&) = delete;
 
-  /// Asks for the first time and stores the answer. Blocks as clusterInformation does.
+  /// Makes the first query and stores the answer. Blocks as clusterInformation does.
   void learnCluster();
-  /// Asks again in the background and stores the answer; a failure keeps the old one. Does nothing while the
-  /// one before still waits for its tool.
+  /// Queries again in the background and stores the answer; a failure keeps the old one. Does nothing while
+  /// the previous refresh is still waiting for its tool.
   void refreshClusterInformation();
 
-  /// Asks `host`, else one of the cached members. Blocks while the tool runs, half a minute at most.
-  /// @param members  gets the member dictionary, null when there is none
-  /// @return 0, -1 when there was nobody to ask, else the tool's exit status
+  /// Queries `host`, or else one of the cached members. Blocks while the tool runs, at most half a minute.
+  /// @param members  receives the member dictionary; null when there is none
+  /// @return 0; -1 when there was no host to query; else the tool's exit status
   int clusterInformation(const std::optional<std::string>& host, SharedPlist& members) const;
-  /// The member dictionary that the tool has left on the disk, or null.
+  /// The member dictionary cached on disk by the tool, or null.
   static SharedPlist clusterInformationFromDisk();
 
  private:
-  /// @param limit  the tool is killed after that time
+  /// @param limit  the tool is killed after this time
   int clusterInformationFromSpecificHostOnly(const std::string& host, SharedPlist& members,
                                              std::chrono::milliseconds limit) const;
   /// Tries the entry at `index`. @return as clusterInformation

@@ -1,4 +1,4 @@
-// Probing, missing and finding the camera.
+// Probes the camera and looks for it when it is missing.
 #include "agent/device_watch.h"
 
 #include <unistd.h>
@@ -70,7 +70,7 @@ void DeviceWatch::retryDevice(std::int64_t now) {
   shouldDisplayOfflineMessage_ = false;
 }
 
-/// @return whether nothing is missing: an agent that records no picture has no camera to wait for
+/// @return whether nothing is missing. An agent that doesn't record video has no camera to wait for.
 bool DeviceWatch::openAgain(const LMRRecordingContext& settings) {
   const auto record = context_->record_context();
   record->previewController.set(nullptr);

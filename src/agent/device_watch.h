@@ -1,4 +1,4 @@
-// The camera: whether it is there, and looking for it again.
+// Checks whether the camera is present, and looks for it when it is missing.
 #pragma once
 #include <cstdint>
 #include <functional>
@@ -14,7 +14,7 @@ namespace lmx {
 class DeviceWatch {
  public:
   /// @param submission  outlives the object
-  /// @param deviceIsBack  called when a missed camera has been found; false ends the agent
+  /// @param deviceIsBack  called when a missing camera has been found; returning false ends the agent
   DeviceWatch(std::shared_ptr<AgentContext> context, std::shared_ptr<CaptureFramework> framework,
               const Submission& submission, std::function<bool()> deviceIsBack)
       : context_(std::move(context)),
@@ -22,23 +22,22 @@ class DeviceWatch {
         submission_(submission),
         device_is_back_(std::move(deviceIsBack)) {}
 
-  /// The capture settings that the preferences give now; null when they can't be used (logged).
+  /// The capture settings from the current preferences; null when they can't be used (logged).
   [[nodiscard]] std::shared_ptr<LMRRecordingContext> recordingContext() const;
 
-  /// Looks whether the camera of `settings` can be opened; without it the agent stays offline for now.
+  /// Checks whether the camera of `settings` can be opened. Without it the agent stays offline for now.
   void probeDevice(const LMRRecordingContext& settings);
   [[nodiscard]] bool deviceIsOffline() const { return device_offline_; }
-  /// Looks for a missed camera again, every eleven seconds. Ends the agent when it is still missing, after
-  /// one warning if it failed in use.
+  /// Looks for a missing camera every eleven seconds. If it is still missing the agent ends; after a failure
+  /// in use there is one warning and another attempt first.
   void retryDevice(std::int64_t now);
-  /// The camera failed in use: its absence is worth a warning.
+  /// The camera failed in use, so its absence is worth a warning.
   void deviceFailed() { shouldDisplayOfflineMessage_ = true; }
 
-  /// Whether the capture has lost its device, and the agent may end over it: a recording on its way to the
-  /// server, also one that is not in the queue yet, is brought there first. An ad-hoc client waits for
-  /// nothing.
+  /// Whether the capture has lost its device and the agent may end because of it. Recordings that are queued,
+  /// or about to be, are submitted first. An ad-hoc client does not wait.
   [[nodiscard]] bool deviceDisconnected() const;
-  /// Says so. In ad-hoc mode ends the process (69), else waits two seconds.
+  /// Logs the loss. Then ends the process (69) in ad-hoc mode, else waits two seconds.
   void announceLostDevice() const;
 
  private:

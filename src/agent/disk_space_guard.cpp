@@ -1,4 +1,4 @@
-// Measuring, freeing, stopping and starting again.
+// Measures free space, deletes old segments, and stops or restarts the recording.
 #include "agent/disk_space_guard.h"
 
 #include <cerrno>
@@ -14,7 +14,7 @@
 namespace lmx {
 namespace {
 
-/// Free megabytes, or the errno.
+/// Free megabytes, or the errno of a failed measurement.
 struct Measure {
   std::uint64_t megabytes = 0;
   int error = 0;
@@ -30,7 +30,7 @@ void removeIfEmpty(const std::string& directory) {
   if (std::filesystem::is_empty(directory, error) && !error) std::filesystem::remove(directory, error);
 }
 
-/// Has the controller delete segments, the oldest first, until there is enough or nothing more is gained.
+/// Has the controller delete the oldest segments until there is enough space or deleting gains nothing.
 Measure freeSpace(LMRCaptureController* controller, const std::string& volume, Measure now,
                   std::uint64_t wanted) {
   while (now.megabytes < wanted) {

@@ -1,4 +1,4 @@
-// The watch over the free space of the volume that movies are written to.
+// Monitors free space on the volume that movies are written to.
 #pragma once
 #include <cstdint>
 
@@ -13,8 +13,8 @@ class DiskSpaceGuard {
   /// Both outlive the object.
   DiskSpaceGuard(AgentContext& context, CaptureActions& capture) : context_(context), capture_(capture) {}
 
-  /// Stops recording when the movie's volume runs full, and in continuous mode starts it again. Ends the
-  /// agent when the volume can't be measured at all.
+  /// Stops recording when the movie's volume is nearly full. In continuous mode, starts recording again when
+  /// there is enough space. Ends the agent when the volume can't be measured.
   void checkDiskSpace();
 
  private:

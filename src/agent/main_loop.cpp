@@ -1,4 +1,4 @@
-// The main loop's turns.
+// Runs the periodic checks of the main loop.
 #include "agent/main_loop.h"
 
 #include <unistd.h>
@@ -68,7 +68,7 @@ void MainLoop::checkServerRefusal(std::int64_t now) {
   LMPLogMessage(parts_.context.log_context(), kLogCritical,
                 "Server rejected agent connection, restarting for retry.");
   std::fflush(nullptr);
-  _exit(exitStatus(ProcessEnd::orderly));  // the service manager starts the agent afresh
+  _exit(exitStatus(ProcessEnd::orderly));  // the service manager restarts the agent
 }
 
 }  // namespace lmx

@@ -1,4 +1,4 @@
-// The daemon's main loop: what happens between two turns of the run loop.
+// The daemon's main loop, which runs periodic checks between turns of the run loop.
 #pragma once
 #include <cstdint>
 #include <memory>
@@ -16,20 +16,20 @@ namespace lmx {
 /// Main thread only.
 class MainLoop {
  public:
-  /// What the loop looks after; all of them outlive it.
+  /// The parts that the loop drives. All of them outlive it.
   struct Parts {
     AgentContext& context;
     RunLoop& loop;
     CaptureActions& capture;
     DeviceWatch& devices;
     TimedCommandRunner& timed_commands;
-    ServiceManager* service_manager;  ///< null only in tests that change no preferences
+    ServiceManager* service_manager;  ///< null only in tests that don't change preferences
   };
   explicit MainLoop(const Parts& parts) : parts_(parts) {}
 
-  /// Has changes of the preferences file read from now on. @param preferences  outlives the loop
+  /// Watches the preferences file for changes from now on. @param preferences  outlives the loop
   void watchPreferences(AgentPreferences& preferences) { preferences_ = &preferences; }
-  /// Turns until the agent is told to end. @return 0 for an orderly end, 1 when the capture device was lost
+  /// Runs until the agent is asked to end. @return 0 for an orderly end, 1 when the capture device was lost
   int appLoop();
 
  private:

@@ -1,4 +1,4 @@
-// Writing and removing the PID file.
+// Writes and removes the PID file.
 #include "agent/pid_file.h"
 
 #include <fcntl.h>

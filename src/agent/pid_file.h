@@ -4,7 +4,7 @@
 
 namespace lmx {
 
-/// @return 0, or 1 when the file can't be made (access denied is only logged)
+/// @return 0, or 1 when the file can't be created (permission denied is only logged)
 int createPIDFile(const AgentLog& log);
 void removePIDFile();
 

@@ -1,4 +1,4 @@
-// Making the recording repository.
+// Creates the recording repository.
 #include "agent/recording_repository.h"
 
 #include <sys/stat.h>

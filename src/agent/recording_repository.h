@@ -6,7 +6,7 @@
 
 namespace lmx {
 
-/// Makes the directory `path` when it is missing. @return whether it exists afterwards (else logged)
+/// Creates the directory `path` if it is missing. @return whether it exists afterwards (logged if not)
 bool setupRecordingRepository(const AgentLog& log, const std::string& path);
 
 }  // namespace lmx

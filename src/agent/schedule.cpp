@@ -1,4 +1,4 @@
-// Commands sorted by their date.
+// Keeps commands sorted by date.
 #include "agent/schedule.h"
 
 #include <algorithm>

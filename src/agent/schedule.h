@@ -1,4 +1,4 @@
-// Timed commands waiting for their moment.
+// Timed commands that are not yet due.
 #pragma once
 #include <ctime>
 #include <mutex>
@@ -9,8 +9,8 @@
 
 namespace lmx {
 
-/// Compares with the wall clock at each look instead of counting down: after the clock has been set, a
-/// command still runs at the time it was given. Thread-safe.
+/// Compares dates with the wall clock at each check instead of counting down, so that a command runs at its
+/// date even when the clock is set. Thread-safe.
 class Schedule {
  public:
   struct Command {
@@ -20,9 +20,10 @@ class Schedule {
   };
 
   void add(Command command);
-  /// Takes the commands whose date is not after `now`, the earliest first, equal ones in the order of adding.
+  /// Takes the commands whose date is not after `now`, earliest first. Equal dates keep the order in which
+  /// they were added.
   std::vector<Command> takeDue(std::time_t now);
-  /// The earliest date; absent when nothing waits.
+  /// The earliest date; absent when there are no commands.
   [[nodiscard]] std::optional<std::time_t> next() const;
 
  private:

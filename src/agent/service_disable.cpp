@@ -1,4 +1,4 @@
-// Disabling the service, with the fallback.
+// Disables the service, with a fallback.
 #include "agent/service_disable.h"
 
 #include <unistd.h>
@@ -12,7 +12,7 @@
 namespace lmx {
 namespace {
 
-/// Threads are running: no destructor may.
+/// Skips destructors, because other threads are still running.
 [[noreturn]] void endProcess(ProcessEnd end) {
   std::fflush(nullptr);
   _exit(exitStatus(end));

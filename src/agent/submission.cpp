@@ -1,4 +1,4 @@
-// From the end of a capture to the queue.
+// Takes a recording from the end of its capture to the queue.
 #include "agent/submission.h"
 
 #include "capture/api/capture_framework.h"
@@ -20,14 +20,14 @@ SharedDictionary withUuid(const SharedDictionary& metadata, const std::optional<
   return std::make_shared<const Dictionary>(std::move(all));
 }
 
-/// The START parameters of what `stopped` recorded.
+/// The START parameters of the recording in `stopped`.
 SharedDictionary propertiesOf(const AgentContext& context, const AgentRecord& stopped) {
   const SharedDictionary own = stopped.request_properties.get();
   return own ? own : context.state.properties.get();
 }
 
-/// What describes it. A START that was refused meanwhile has taken over the request, and with it what is
-/// submitted; the metadata may still be those of the first.
+/// The metadata of that recording. The request comes first: a START refused in the meantime has replaced the
+/// request, and so what is submitted, while `metadata` may still be that of the first START.
 SharedDictionary metadataOf(const AgentContext& context, const AgentRecord& stopped) {
   if (SharedDictionary own = stopped.request_properties.get()) return own;
   SharedDictionary prepared = stopped.metadata.get();
@@ -40,7 +40,7 @@ TimeValue timeValueFrom(double secondsSinceReference) {
   return {whole, static_cast<suseconds_t>((seconds - static_cast<double>(whole)) * 1e6)};
 }
 
-/// Takes one off a counter at its own end, however that comes.
+/// Decrements a counter on destruction, so that every exit path does.
 class CountedDown {
  public:
   explicit CountedDown(std::atomic<int>& counter) : counter_(counter) {}
@@ -132,7 +132,7 @@ void Submission::submit(const std::shared_ptr<AgentRecord>& stopped) {
   });
 }
 
-/// The session, unless it has gone on to another capture.
+/// The session, unless it has moved on to another capture.
 std::shared_ptr<AgentRecord> Submission::sessionOf(const LMRCaptureController* controller) const {
   auto record = context_->record_context();
   return record && record->captureController.get().get() == controller ? record : nullptr;
@@ -145,12 +145,11 @@ void Submission::leaveError(const LMRCaptureController* controller) {
 void Submission::handOff(const std::shared_ptr<AgentRecord>& stopped, const std::string& path,
                          double elapsed) {
   const auto controller = stopped->captureController.get();
-  // An agent that is ending leaves the recording to the next start, which makes movie and document together.
+  // When the agent is ending, the next start makes both movie and document.
   if (!controller || !context_->state.running.get()) return;
   const bool settled = finishMovie(stopped, *controller, path, elapsed);
   if (!context_->state.running.get()) return;
-  // A movie or a document that could not be written stays in the capture's journal: the next start tries
-  // again.
+  // A movie or document that could not be written stays in the capture's journal. The next start tries again.
   if (settled) {
     controller->requestHandedOver(stopped->request_uuid.get());
     keepRecovered(controller->recoverAbandonedRequests());
@@ -164,7 +163,7 @@ bool Submission::finishMovie(const std::shared_ptr<AgentRecord>& stopped, LMRCap
   if (const auto cause = controller.lastError()) {
     LMPLogMessage(context_->log_context(), kLogError, "The capture of \"%s\" ended early: %s", path.c_str(),
                   cause->message.c_str());
-    // A lost device has its own way; what is left is a disk or an encoder that failed.
+    // A lost device is handled elsewhere. Otherwise a disk or an encoder has failed.
     if (!meansDeviceLost(cause)) leaveError(&controller);
   }
   if (!error) {
@@ -210,7 +209,7 @@ bool Submission::announceStop(const std::shared_ptr<AgentRecord>& session, const
 void Submission::recoverUnfinishedRecordings(std::shared_ptr<CaptureFramework> framework) {
   const auto repository = context_->recording.recording_repository_path.get();
   if (!repository) return;
-  // On a worker: a long recording may have to be copied, and the agent is to be commanded meanwhile.
+  // On a worker: a long recording may have to be copied, and the agent must accept commands meanwhile.
   dispatchAsync([this, repository, framework = std::move(framework)] {
     keepRecovered(framework->recoverUnfinished(*repository));
   });
@@ -225,7 +224,7 @@ void Submission::keepRecovered(const std::vector<RecoveredRecording>& recordings
     document.setPropertyValuesWithContext(
         context_, recording.path, timeValueFrom(recording.startTime), timeValueFrom(recording.stopTime),
         static_cast<std::int64_t>(recording.duration), recording.parameters, false);
-    // Without its document the movie stays in the journal, and the next start tries again.
+    // Without its document the movie stays in the journal. The next start tries again.
     if (!document.tryWriteProperties()) continue;
     recording.forget();
     LMPLogMessage(context_->log_context(), kLogNotice,

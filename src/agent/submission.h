@@ -1,4 +1,4 @@
-// The way of a stopped recording: movie, properties document, job.
+// Processes a stopped recording: movie, properties document, job.
 #pragma once
 #include <atomic>
 #include <map>
@@ -17,7 +17,7 @@ namespace lmx {
 
 class AgentActions;
 
-/// "Main thread" is the one that turns the loop.
+/// "Main thread" is the thread that runs the loop.
 class Submission {
  public:
   using Time = std::optional<TimeValue>;
@@ -27,37 +27,37 @@ class Submission {
              const PostProcessScheduler& scheduler)
       : context_(std::move(context)), actions_(actions), loop_(loop), scheduler_(scheduler) {}
 
-  /// Keeps the session as it is now, until the capture of `controller` reports: by then the session may have
-  /// gone on to the next recording. Main thread.
+  /// Keeps a copy of the session until the capture of `controller` reports, since the session may move on to
+  /// the next recording before that. Main thread.
   void rememberStopped(const std::shared_ptr<LMRCaptureController>& controller);
-  /// A capture came to its end: what it recorded is submitted. Any thread.
+  /// A capture has ended. Submits its recording. Any thread.
   void captureDidComplete(const void* controller);
-  /// A capture was cancelled: the session becomes idle unless it has gone on; what nobody cancelled is kept.
-  /// Any thread.
+  /// A capture was cancelled. The session becomes idle unless it has moved on, and requests that were not
+  /// cancelled are recovered. Any thread.
   void captureDidCancel(const void* controller);
-  /// Submits what the session records, while its capture goes on. Main thread.
+  /// Submits the session's recording while its capture continues. Main thread.
   void submitStoppedRecording();
 
   /// Logs the stop, writes the properties document and queues the job. Any thread.
-  /// @return false when the recording should have a document and has none
+  /// @return false when the recording should have a document but has none
   bool announceStop(const std::shared_ptr<AgentRecord>& session, const std::string& file,
                     const SharedDictionary& metadata, Time atTime, std::int64_t elapsedSeconds,
                     Time stoppedTime, bool canceled);
 
-  /// Makes movies of what an earlier process left unfinished in the repository, in the background.
+  /// Makes movies from recordings that an earlier process left unfinished in the repository. Runs in the
+  /// background.
   void recoverUnfinishedRecordings(std::shared_ptr<CaptureFramework> framework);
-  /// Puts recovered movies' documents beside them and logs one line each; nothing is submitted. Any thread.
+  /// Writes documents beside recovered movies and logs one line for each. Submits nothing. Any thread.
   void keepRecovered(const std::vector<RecoveredRecording>& recordings);
 
-  /// Whether no recording is on its way to the queue, in it, or in hand.
+  /// Whether no recording is being handed over, queued or submitted.
   [[nodiscard]] bool isIdle() const;
 
  private:
   std::shared_ptr<AgentRecord> takeStopped(const void* controller);
   void submit(const std::shared_ptr<AgentRecord>& stopped);
   void handOff(const std::shared_ptr<AgentRecord>& stopped, const std::string& path, double elapsed);
-  /// @return whether nothing is left to do for the recording: movie and document are there, or there was
-  /// nothing
+  /// @return whether the recording is settled: movie and document exist, or there was nothing to write
   bool finishMovie(const std::shared_ptr<AgentRecord>& stopped, LMRCaptureController& controller,
                    const std::string& path, double elapsed);
   void leaveError(const LMRCaptureController* controller);
@@ -69,9 +69,9 @@ class Submission {
   RunLoop& loop_;
   const PostProcessScheduler& scheduler_;
   std::map<const void*, std::shared_ptr<AgentRecord>> stopped_;  ///< by controller; main thread
-  /// The last capture whose report has been dealt with: nothing more is to be expected of it. Main thread.
+  /// The last capture whose report has been handled, so that no further report is expected. Main thread.
   std::weak_ptr<LMRCaptureController> reported_;
-  std::atomic<int> hand_offs_{0};  ///< captures that have ended and whose job is not in the list yet
+  std::atomic<int> hand_offs_{0};  ///< captures that have ended but whose job is not in the list yet
 };
 
 }  // namespace lmx

@@ -1,4 +1,4 @@
-// Reading the time-shift file.
+// Reads the time-shift file.
 #include "agent/time_shift.h"
 
 #include <unistd.h>

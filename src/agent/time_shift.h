@@ -1,4 +1,4 @@
-// The time shift that operators set.
+// The time shift, which operators set in a file.
 #pragma once
 #include "model/agent_state.h"
 

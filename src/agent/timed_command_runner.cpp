@@ -1,4 +1,4 @@
-// The schedule's turn in the main loop.
+// Schedules timed commands and runs them from the main loop.
 #include "agent/timed_command_runner.h"
 
 #include <algorithm>
@@ -11,7 +11,7 @@ namespace lmx {
 
 void TimedCommandRunner::scheduleTimedCommand(SharedDictionary entry, std::time_t date, ChannelKind channel) {
   schedule_.add({std::move(entry), date, channel});
-  loop_.post([] {}, Wait::no);  // the loop may be asleep past that date
+  loop_.post([] {}, Wait::no);  // wake the loop, which may be sleeping past that date
 }
 
 void TimedCommandRunner::loadSchedule() { channels_.channelOf(ChannelKind::tunnel).loadTimedCommands(); }
@@ -20,7 +20,7 @@ void TimedCommandRunner::runDueCommands(std::time_t now) {
   for (const Schedule::Command& command : schedule_.takeDue(now)) {
     try {
       channels_.channelOf(command.channel).completeTimedCommand(command.entry);
-    } catch (const std::exception& problem) {  // the commands behind it are still to run
+    } catch (const std::exception& problem) {  // the remaining commands must still run
       LMPLogMessage(log_.log_context(), kLogCritical, "A timed command failed: %s", problem.what());
     }
   }

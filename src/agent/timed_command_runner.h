@@ -1,4 +1,4 @@
-// Runs timed commands when their time has come.
+// Runs timed commands when they are due.
 #pragma once
 #include <chrono>
 #include <ctime>
@@ -11,16 +11,17 @@
 
 namespace lmx {
 
-/// Main thread only, but for scheduleTimedCommand.
+/// Main thread only, except scheduleTimedCommand.
 class TimedCommandRunner {
  public:
-  /// All of them outlive the object.
+  /// All arguments outlive the object.
   TimedCommandRunner(const AgentLog& log, Channels& channels, RunLoop& loop)
       : log_(log), channels_(channels), loop_(loop) {}
 
-  /// Has `entry` run at `date` (seconds since 1970, wall clock) by the channel of that kind. Any thread.
+  /// Schedules `entry` to run at `date` (seconds since 1970, wall clock) on the channel of that kind. Any
+  /// thread.
   void scheduleTimedCommand(SharedDictionary entry, std::time_t date, ChannelKind channel);
-  /// Schedules what an earlier process left in the timers file.
+  /// Schedules the commands that an earlier process left in the timers file.
   void loadSchedule();
   /// Runs the commands whose date is not after `now` (seconds since 1970).
   void runDueCommands(std::time_t now);

@@ -1,4 +1,4 @@
-// Opening and closing the tunnel.
+// Opens and closes the tunnel.
 #include "agent/tunnel_keeper.h"
 
 #include <chrono>
@@ -22,10 +22,10 @@ bool TunnelKeeper::openTunnel() {
 }
 
 void TunnelKeeper::closeTunnel() {
-  // Taken out first: the turns below may bring another signal, and with it this function again.
+  // Taken out first: the turns below may deliver another signal and call this function again.
   auto closing = std::exchange(agentControl_, nullptr);
   if (!closing) return;
-  // Its thread may be waiting for this one: the loop goes on until it has ended.
+  // The tunnel's thread may be waiting for this one, so the loop keeps running until it has ended.
   closing->askToStop();
   const auto deadline = std::chrono::steady_clock::now() + kThreadPatience;
   while (!closing->threadHasEnded() && std::chrono::steady_clock::now() < deadline) loop_.run(20ms);
@@ -35,7 +35,7 @@ void TunnelKeeper::closeTunnel() {
       "The tunnel's thread has not ended within %d seconds (a file system that does not answer?); it is "
       "left behind",
       static_cast<int>(kThreadPatience / 1s));
-  // It still uses the channel whenever it wakes up.
+  // The thread still uses the channel when it wakes up, so the channel is leaked.
   [[maybe_unused]] const AgentControl* left_behind = closing.release();
 }
 

@@ -1,4 +1,4 @@
-// Life of the server tunnel.
+// Manages the lifetime of the server tunnel.
 #pragma once
 #include <memory>
 
@@ -20,17 +20,17 @@ class TunnelKeeper {
   [[nodiscard]] AgentControl* tunnel() const { return agentControl_.get(); }
   /// @return false when it can't be started (logged)
   bool openTunnel();
-  /// Ends the tunnel. The loop turns meanwhile, since the tunnel's thread may be waiting for this one; a
-  /// thread that has not ended after ten seconds is left behind.
+  /// Ends the tunnel. Keeps running the loop, since the tunnel's thread may be waiting for this one. A thread
+  /// that has not ended after ten seconds is abandoned.
   void closeTunnel();
-  /// Leaves word with a server that understands it: a last hello that says offline. Ten seconds at most.
+  /// Sends a last hello that says offline, to a server that supports it. Takes at most ten seconds.
   void tellServerOfTheEnd();
 
  private:
   const std::shared_ptr<AgentContext> context_;
   AgentActions& actions_;
   RunLoop& loop_;
-  std::unique_ptr<AgentControl> agentControl_;  ///< null while the camera is away
+  std::unique_ptr<AgentControl> agentControl_;  ///< null while the camera is missing
 };
 
 }  // namespace lmx

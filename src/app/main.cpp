@@ -1,4 +1,4 @@
-// Process entry.
+// Entry point of the process.
 #include <unistd.h>
 
 #include <cstdio>
@@ -10,5 +10,5 @@
 int main(int argc, char** argv) {
   const int status = lmx::runAgentProcess(argc, argv, lmx::newCaptureFramework());
   std::fflush(nullptr);
-  _exit(status);  // without destructors: other threads are still running
+  _exit(status);  // skip destructors: other threads are still running
 }

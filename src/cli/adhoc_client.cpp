@@ -1,4 +1,4 @@
-// The conversation with the daemon.
+// Talks to the daemon in ad-hoc mode.
 #include "cli/adhoc_client.h"
 
 #include <chrono>
@@ -15,10 +15,10 @@ namespace {
 
 using namespace std::chrono_literals;
 
-/// A daemon that has not answered a STOP by then won't.
+/// A daemon that has not answered a STOP by then won't answer.
 constexpr std::chrono::seconds kStopPatience{30};
 
-/// One line of the conversation, out at once: standard output may be a pipe, and the recording long.
+/// Prints one line and flushes it: standard output may be a pipe, and the recording may be long.
 void say(const char* what, const std::string& text) {
   std::printf("%s%s\n", what, text.c_str());
   std::fflush(stdout);
@@ -39,8 +39,8 @@ int AdHocClient::startupAdHoc() {
   const std::string command = adHocCommand(context_.options);
   say("sending: ", command);
   std::string reply;
-  // The daemon serves one peer at a time: behind another one the answer may be far away, and an interrupt
-  // must still be heard.
+  // The daemon serves one peer at a time. The reply may have to wait for another peer, and an interrupt must
+  // still work.
   if (client_.execCommand(command, &reply, [this] { return handleSignals(); }) != 0) return 0;
   say("received: ", orEmpty(reply));
   return context_.options.adhoc_request_type.get() == kAdHocRecording ? recordAdHoc() : 0;
@@ -52,7 +52,7 @@ int AdHocClient::recordAdHoc() {
   std::string reply;
   client_.execCommand("STOP \n", &reply, [end] { return std::chrono::steady_clock::now() < end; });
   say("sent STOP, received: ", orEmpty(reply));
-  if (reply.empty()) {  // not sent again: by now it might end somebody else's recording
+  if (reply.empty()) {  // don't resend: by now it might stop somebody else's recording
     std::fputs(
         "lmxagentd: the daemon has not answered the STOP, the recording may still be running; ask it with "
         "--status\n",

@@ -1,4 +1,4 @@
-// Ad-hoc mode: has the running daemon do one thing, and for a recording stays until it is interrupted.
+// Ad-hoc mode: sends the running daemon one command, and during a recording runs until interrupted.
 #pragma once
 #include "agent/agent_main.h"
 #include "control/local/client_connect.h"
@@ -8,17 +8,17 @@ namespace lmx {
 /// Main thread.
 class AdHocClient {
  public:
-  /// @param agent  outlives the object; its loop and its signals are used
+  /// @param agent  outlives the object, which uses its loop and its signals
   explicit AdHocClient(AgentMain& agent) : agent_(agent), context_(*agent.agentContext()) {}
 
-  /// Sends one command to the running daemon; a recording lasts until an interrupt. @return the exit status
+  /// Sends one command to the running daemon. A recording lasts until an interrupt. @return the exit status
   int startupAdHoc();
 
  private:
   int recordAdHoc();
-  /// Until the process is told to end or a capture of its own loses its device.
+  /// Runs until the process is asked to end or a capture of its own loses its device.
   void appLoopAdHoc();
-  /// Acts on the signals that have come. @return whether the process is to go on
+  /// Handles pending signals. @return whether the process should continue
   bool handleSignals();
 
   AgentMain& agent_;

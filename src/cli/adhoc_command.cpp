@@ -1,4 +1,4 @@
-// Building the ad-hoc client's commands.
+// Builds the ad-hoc client's commands.
 #include "cli/adhoc_command.h"
 
 #include "model/codes.h"
@@ -6,7 +6,7 @@
 namespace lmx {
 namespace {
 
-/// The same for every ad-hoc start: a client knows no server that could have given out others.
+/// The same for every ad-hoc start, because no server assigns an identifier.
 constexpr const char* kRecordingUUID = "90201534-37B5-482F-AD57-C3762F5020E1";
 constexpr const char* kWorkflowUUID = "DEFA1587-A650-426E-92DA-01C5EB811705";
 

@@ -1,4 +1,4 @@
-// What the ad-hoc client asks of the daemon. Pure.
+// The commands that the ad-hoc client sends to the daemon. Pure.
 #pragma once
 #include <string>
 
@@ -6,7 +6,7 @@
 
 namespace lmx {
 
-/// The command line for the request in `options`, with its line feed. Values are put in as they are.
+/// The command for the request in `options`, with its line feed. Values are inserted unescaped.
 std::string adHocCommand(const RunOptions& options);
 
 }  // namespace lmx

@@ -1,4 +1,4 @@
-// Words of the bind command, positions in its answer.
+// Builds the bind command and extracts identifiers from its output.
 #include "cli/bind_command.h"
 
 namespace lmx {

@@ -1,4 +1,4 @@
-// The camera-bind test's command and what is read out of its answer. Pure.
+// The command of the camera-bind test, and the identifiers in its output. Pure.
 #pragma once
 #include <optional>
 #include <string>
@@ -6,11 +6,11 @@
 
 namespace lmx {
 
-/// Bytes of the tool's output that are looked at.
+/// How many bytes of the tool's output are examined.
 inline constexpr std::size_t kBindOutputLimit = 264;
 
-/// "/usr/bin/lumex --bind Fake-Camera -u USER -s SERVER", cut after 255 bytes, as the words that the tool
-/// gets: a name is one word whatever it holds, since no shell reads it.
+/// "/usr/bin/lumex --bind Fake-Camera -u USER -s SERVER", truncated after 255 bytes, as the tool's argument
+/// vector. No shell splits the words, so a name may contain anything.
 std::vector<std::string> bindCommand(const std::string& user, const std::string& server);
 
 struct BoundCamera {
@@ -18,8 +18,8 @@ struct BoundCamera {
   std::string serverUUID;
 };
 
-/// Finds both identifiers, 36 characters each, 19 and 66 characters behind the beginning of "Successfully
-/// bound ". Nothing when that is absent or an identifier is cut off.
+/// Finds both identifiers, 36 characters each, at offsets 19 and 66 from the start of "Successfully bound ".
+/// Nothing when that text is missing or an identifier is truncated.
 std::optional<BoundCamera> boundCamera(const std::string& output);
 
 }  // namespace lmx

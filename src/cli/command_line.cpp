@@ -1,4 +1,4 @@
-// Reading options with getopt.
+// Reads options with getopt.
 #include "cli/command_line.h"
 
 #include <getopt.h>
@@ -33,11 +33,11 @@ constexpr option kLongOptions[] = {{"unattended_minutes", required_argument, nul
                                    {"timerrevoke", required_argument, nullptr, 'R'},
                                    {nullptr, 0, nullptr, 0}};
 
-/// The date that lies `delay` (seconds, positive) ahead, as timers write it.
+/// The date `delay` (seconds, positive) from now, in the form that timers use.
 std::optional<std::string> dateAfter(const char* delay) {
   const auto seconds = scanReal(delay);
   const auto now = lmp_gettimeofday();
-  // Beyond ten thousand years no calendar can tell the date.
+  // A delay of more than 3000 years is a mistake.
   if (!now || !seconds || !(*seconds > 0) || *seconds > 1e11) return std::nullopt;
   const double begin = static_cast<double>(now->tv_sec) + static_cast<double>(now->tv_usec) * 1e-6;
   return dateText(static_cast<std::time_t>(begin + *seconds));
@@ -53,7 +53,7 @@ bool CommandLine::parseArgs(char* const* argv, int count, int* exitCode) {
 }
 
 bool CommandLine::readOptions(char* const* argv, int count, int& exitCode) {
-  optind = 0;  // GNU's way to begin anew
+  optind = 0;  // makes GNU getopt start over
   opterr = 1;
   for (int option = 0; (option = getopt_long(count, argv, kShortOptions, kLongOptions, nullptr)) != -1;) {
     if (takeToolOption(option) || takeAdHocOption(option)) continue;

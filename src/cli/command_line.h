@@ -7,22 +7,22 @@
 
 namespace lmx {
 
-/// Reads one command line. Its messages go to standard error.
+/// Parses one command line. Messages go to standard error.
 class CommandLine {
  public:
-  /// All of them outlive the object. @param options  gets what the options ask for
+  /// All arguments outlive the object. @param options  receives the values of the options
   CommandLine(RunOptions& options, CaptureFramework& framework, ChildRunner& children)
       : options_(options), framework_(framework), children_(children) {}
 
-  /// Reads the options and runs the tools among them. Call it once.
-  /// @return YES when the program is to go on to its start-up; NO when it is to exit with `*exitCode`
+  /// Reads the options and runs the tools they ask for. Call once.
+  /// @return YES when start-up should continue; NO when the program should exit with `*exitCode`
   bool parseArgs(char* const* argv, int count, int* exitCode);
 
  private:
   bool readOptions(char* const* argv, int count, int& exitCode);
-  /// An option that ends the reading.
+  /// Handles an option that ends the parsing.
   ProcessEnd stopAtOption(int option, const char* program);
-  /// @return whether it was one of these (and could be taken)
+  /// @return whether it was one of these options and its value was accepted
   bool takeToolOption(int option);
   bool takeAdHocOption(int option);
   void ask(AdHocRequest request);
@@ -32,9 +32,9 @@ class CommandLine {
   RunOptions& options_;
   CaptureFramework& framework_;
   ChildRunner& children_;
-  // What is asked of the tools that change the preferences file. The texts are argv's.
+  // Arguments of the tools that change the preferences file. The strings belong to argv.
   bool duration_given_ = false;
-  int number_ = 0;  ///< of the last -d or -Z that could be read: a later one that can't repeats it
+  int number_ = 0;  ///< value of the last valid -d or -Z; a later invalid one repeats it
   const char* server_ = nullptr;
   const char* preview_path_ = nullptr;
   const char* test_path_ = nullptr;

@@ -1,4 +1,4 @@
-// Settings and devices in words.
+// Prints settings and devices.
 #include "cli/information.h"
 
 #include <cstdio>

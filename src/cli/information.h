@@ -1,4 +1,4 @@
-// What -i prints.
+// The output of -i.
 #pragma once
 #include <string>
 
@@ -7,7 +7,7 @@
 
 namespace lmx {
 
-/// Prints "ad-hoc-prefs", "daemon-prefs" or "zq-device-list"; nothing for any other kind.
+/// Prints "ad-hoc-prefs", "daemon-prefs" or "zq-device-list". Prints nothing for any other kind.
 ProcessEnd printInformation(const std::string& kind, CaptureFramework& framework);
 
 }  // namespace lmx

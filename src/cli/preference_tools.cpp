@@ -1,4 +1,4 @@
-// Changing the preferences file from the command line.
+// Changes the preferences file from the command line.
 #include "cli/preference_tools.h"
 
 #include <cerrno>
@@ -23,8 +23,8 @@ constexpr int kShellSignalled = 128;
 
 bool given(const char* argument) { return argument != nullptr && *argument != '\0'; }
 
-/// The preferences as they stand, or the defaults. A file that is there but can't be read is kept under
-/// another name first. @return nothing when that failed.
+/// The current preferences, or the defaults. An unreadable file is first kept under another name.
+/// @return nothing when that failed
 std::optional<PlistDictionary> loadToChange(const std::string& path) {
   PlistResult file = readPropertyList(path);
   if (file && file->dictionary() != nullptr) return *file->dictionary();
@@ -57,7 +57,7 @@ int changePreferences(const PlistDictionary& always, const PlistDictionary& wher
   return 0;
 }
 
-/// The exit status as the shell would tell it; -1 when there was nothing to run the tool with.
+/// The exit status in a shell's convention; -1 when the tool could not be run at all.
 int shellStatus(const ChildResult& result) {
   switch (result.end) {
     case ChildResult::End::exited:
@@ -80,7 +80,7 @@ bool allGiven(const char* path, const char* user, const char* server) {
   return false;
 }
 
-/// Runs the tool. @return its exit status, messages written; `output` gets the beginning of what it said.
+/// Runs the tool and prints messages. @return its exit status; `output` receives the beginning of its output
 int runBindTool(std::vector<std::string> words, ChildRunner& children, std::string& output) {
   words[0] = systemPath(kLumexTool);
   ChildOptions options;
@@ -95,7 +95,7 @@ int runBindTool(std::vector<std::string> words, ChildRunner& children, std::stri
     return exitStatus(ProcessEnd::operatingSystem);
   }
   if (status != 0) std::fprintf(stderr, "Error: camera binding failed with exit status %d\n", status);
-  output = result.output.c_str();  // up to a first NUL
+  output = result.output.c_str();  // up to the first NUL
   return status;
 }
 

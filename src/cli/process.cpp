@@ -1,4 +1,4 @@
-// From main to the exit status.
+// Runs the process from main to its exit status.
 #include "cli/process.h"
 
 #include <malloc.h>
@@ -23,9 +23,9 @@ std::shared_ptr<ServiceManager> newServiceManager() {
 }
 
 int runAgent(int argc, char** argv, std::shared_ptr<CaptureFramework> framework) {
-  // The character type alone: numbers in replies must keep their decimal point.
+  // LC_CTYPE only: numbers in replies must keep their decimal point.
   if (std::setlocale(LC_CTYPE, "C.UTF-8") == nullptr) return exitStatus(ProcessEnd::operatingSystem);
-  // Never destroyed: it lives until the process ends.
+  // Never destroyed; it lives until the process ends.
   static AgentMain& agent =
       *std::make_unique<AgentMain>(
            newAgentContext(),
@@ -47,8 +47,7 @@ int runAgent(int argc, char** argv, std::shared_ptr<CaptureFramework> framework)
 }  // namespace
 
 int runAgentProcess(int argc, char** argv, std::shared_ptr<CaptureFramework> framework) {
-  // Many short-lived threads touch the heap: with an arena each, memory would grow from recording to
-  // recording.
+  // Many short-lived threads use the heap. With one arena each, memory would grow with every recording.
   mallopt(M_ARENA_MAX, 2);
   const int status = runAgent(argc, argv, std::move(framework));
   notify_post("com.zandor.lmxagentd.stopped");

@@ -1,4 +1,4 @@
-// The process around the agent.
+// Sets up and runs the agent process.
 #pragma once
 #include <memory>
 
@@ -6,8 +6,9 @@
 
 namespace lmx {
 
-/// Makes the agent, reads the command line, runs it and says goodbye. @return the exit status. The agent is
-/// not destroyed: threads that nobody joins may still reach it, so end the process without destructors.
+/// Creates the agent, reads the command line, runs the agent and announces its stop. @return the exit status.
+/// The agent is not destroyed, because threads that are never joined may still use it: exit without running
+/// destructors.
 int runAgentProcess(int argc, char** argv, std::shared_ptr<CaptureFramework> framework);
 
 }  // namespace lmx

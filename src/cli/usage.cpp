@@ -1,4 +1,4 @@
-// The usage text.
+// Prints the usage text.
 #include "cli/usage.h"
 
 #include <cstdio>

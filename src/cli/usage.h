@@ -4,7 +4,7 @@
 
 namespace lmx {
 
-/// Prints the usage text on standard error. @param tool  how the program was called
+/// Prints the usage text on standard error. @param tool  the name by which the program was called
 void usageForTool(const std::string& tool);
 /// The last component of argv[0]; empty for null.
 std::string toolNameFromPathArg(const char* argument);

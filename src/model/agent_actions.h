@@ -1,4 +1,4 @@
-// What the lower folders may ask of the agent: the actions of the main thread and the recording callbacks.
+// What lower layers may ask of the agent: main-thread actions and the recording callbacks.
 #pragma once
 #include <cstdint>
 #include <ctime>
@@ -15,27 +15,27 @@ namespace lmx {
 
 class AgentRecord;
 
-/// The control channels an agent can have.
+/// The kinds of control channel.
 enum class ChannelKind {
-  detached,  ///< no peer: what is left when a timer's own channel is gone
-  tunnel,    ///< the server's
+  detached,  ///< no peer; runs a timed command whose own channel is gone
+  tunnel,    ///< the tunnel to the server
   local,     ///< the local socket
   direct,    ///< the TCP port
 };
 
-/// Implemented by AgentMain. The actions of the capture run on the main thread only: other threads hand them
-/// over with perform(); the callbacks may come from any thread.
+/// Implemented by AgentMain. Capture actions run on the main thread only; other threads request them with
+/// perform(). Callbacks may come from any thread.
 class AgentActions {
  public:
   using Action = void (AgentActions::*)();
 
   virtual ~AgentActions() = default;
 
-  /// Runs `action` on the main thread. Waiting on the main thread itself runs it at once.
-  /// @return false when the main loop has ended and the action will not run.
+  /// Runs `action` on the main thread. With Wait::untilDone on the main thread itself it runs at once.
+  /// @return false when the main loop has ended and the action will not run
   virtual bool perform(Action action, Wait wait) = 0;
 
-  // Actions, main thread only. Those that have a result leave it in the context's `status`.
+  // Actions, main thread only. Those with a result store it in the context's `status`.
   virtual void prepareCapture() = 0;
   virtual void startPreview() = 0;
   virtual void stopPreview() = 0;
@@ -49,19 +49,19 @@ class AgentActions {
   virtual void shutDownControl() = 0;
   virtual void shutDownControlBecauseDeviceFailed() = 0;
 
-  /// A capture came to its end (delegate report, any thread): the main thread is asked to submit what it
-  /// recorded.
-  /// @param controller  identifies the capture; the session may have gone on to another one meanwhile
+  /// A capture has ended (delegate report, any thread). Asks the main thread to submit the recording.
+  /// @param controller  identifies the capture; the session may have moved on to another one
   virtual void captureDidComplete(const void* controller) = 0;
-  /// A capture was cancelled (delegate report, any thread): the session becomes idle unless it has gone on.
+  /// A capture was cancelled (delegate report, any thread). The session becomes idle unless it has moved on
+  /// to another capture.
   virtual void captureDidCancel(const void* controller) = 0;
 
-  /// Has `entry` run at `date` (seconds since 1970, wall clock) by the channel of that kind, on the main
-  /// thread. Any thread.
+  /// Schedules `entry` to run at `date` (seconds since 1970, wall clock) on the main thread, on the channel
+  /// of that kind. Any thread.
   virtual void scheduleTimedCommand(SharedDictionary entry, std::time_t date, ChannelKind channel) = 0;
 
-  /// Has `changed` called on the main thread whenever an IPv4 address of this machine comes or goes, for as
-  /// long as the result lives. Main thread, as the destruction of the result.
+  /// Calls `changed` on the main thread whenever an IPv4 address of this machine comes or goes, for as long
+  /// as the result lives. Call it, and destroy the result, on the main thread.
   /// @return null when the network can't be watched
   [[nodiscard]] virtual std::unique_ptr<RunLoop::Source> watchNetwork(std::function<void()> changed) = 0;
 
@@ -72,7 +72,7 @@ class AgentActions {
                                       std::int64_t elapsedSeconds) = 0;
   virtual void recordDidResumeWithFile(const std::string& file, const SharedDictionary& metadata) = 0;
   virtual void recordRuntimeErrorCallback(int code) = 0;
-  /// @param session  the session that recorded, or a copy of it (its type and request are read)
+  /// @param session  the session that recorded, or a copy of it; its type and request are read
   /// @param elapsedSeconds  whole seconds of media
   virtual void recordDidStopWithFile(const std::shared_ptr<AgentRecord>& session, const std::string& file,
                                      const SharedDictionary& metadata, std::optional<TimeValue> atTime,

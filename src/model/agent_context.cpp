@@ -1,4 +1,4 @@
-// The end of the shared record.
+// Takes the shared agent context apart at the end.
 #include "model/agent_context.h"
 
 namespace lmx {

@@ -1,4 +1,4 @@
-// The one shared record of the agent's settings and state, put together from its parts.
+// The agent's shared settings and state, assembled from their parts.
 #pragma once
 #include <cstddef>
 #include <memory>
@@ -20,15 +20,14 @@ namespace lmx {
 
 class AgentRecord;
 
-/// Shared by the main thread, the channel threads, the capture thread and the post-process thread: every part
-/// is thread-safe. Give a class the part that it needs rather than the whole. It lives until the process
-/// ends.
+/// Shared by the main thread, the channel threads, the capture thread and the post-process thread. Every part
+/// is thread-safe. Pass a class the part that it needs rather than the whole. Lives until the process ends.
 class AgentContext : public AgentLog {
  public:
   using Text = std::optional<std::string>;
   using SharedPlist = std::shared_ptr<const PlistDictionary>;
 
-  /// A new context with `record` as its session (newAgentContext in record/ makes both).
+  /// Creates a context with `record` as its session (newAgentContext in record/ creates both).
   template <class Record>
   explicit AgentContext(std::shared_ptr<Record> record)
       : record_context_(record), recording_settings_(record) {}
@@ -45,21 +44,21 @@ class AgentContext : public AgentLog {
   SharedValue<SharedPlist> server_info;
   TimedCommandList timedCmdList;
   PostProcessList post_process_list;
-  /// Serialises the actions of the recording engine.
+  /// Serialises the recording engine's actions.
   RecursiveMutex control_action_mutex;
 
   /// The recording session; null only after cleanup.
   [[nodiscard]] std::shared_ptr<AgentRecord> record_context() const { return record_context_.get(); }
-  /// The session's face towards the preferences.
+  /// The part of the session that the preferences set.
   [[nodiscard]] std::shared_ptr<RecordingSettings> recording_settings() const {
     return recording_settings_.get();
   }
-  /// Lets go of the session.
+  /// Releases the session.
   void releaseRecord();
 
-  /// Takes the context apart: `running` NO, session released, list emptied, log context closed. Runs once;
-  /// later calls do nothing. The process ends without it, since threads that nobody joins may still use the
-  /// context.
+  /// Takes the context apart: `running` becomes NO, the session is released, the list emptied and the log
+  /// context closed. Takes effect once; later calls do nothing. The process exits without calling it, since
+  /// threads that are never joined may still use the context.
   void cleanup();
 
  private:

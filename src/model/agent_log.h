@@ -1,4 +1,4 @@
-// The log that an agent writes to.
+// The log that the agent writes to.
 #pragma once
 #include <string>
 
@@ -7,14 +7,14 @@
 
 namespace lmx {
 
-/// Thread-safe. The default log until a context is set.
+/// Thread-safe. Writes to the default log until a context is set.
 class AgentLog {
  public:
   [[nodiscard]] LMPLogContext log_context() const { return context_.get(); }
-  /// Takes over `context` and closes the one before. No other thread may be using that one.
+  /// Takes over `context` and closes the previous one, which no other thread may be using.
   void open(LMPLogContext context) { LMPLogDestroyContext(context_.exchange(context)); }
 
-  // The message is logged as it stands: it is no format.
+  // The message is logged verbatim, not as a format string.
   void logDebug(const std::string& message) const { log(kLogDebug, message); }
   void logInfo(const std::string& message) const { log(kLogInfo, message); }
   void logWarn(const std::string& message) const { log(kLogWarning, message); }

@@ -1,4 +1,4 @@
-// The settings that the preferences file gives the agent.
+// The agent's settings from the preferences file.
 #pragma once
 #include <array>
 #include <cstdint>
@@ -10,29 +10,29 @@
 
 namespace lmx {
 
-/// Who the agent is, and how it reaches its server. Fields are thread-safe; a text that nobody has set is
+/// The agent's identity, and how it reaches its server. Fields are thread-safe. A text that was never set is
 /// absent.
 struct ServerSettings {
   using Text = std::optional<std::string>;
   using Secret = std::array<unsigned char, 16>;
 
   SharedValue<Text> machine_name;
-  SharedValue<Text> machine_uuid;  ///< the camera's
+  SharedValue<Text> machine_uuid;  ///< of the camera
   SharedValue<Text> server_uuid;
-  SharedValue<std::optional<Secret>> shared_secret;  ///< the tunnel's key
+  SharedValue<std::optional<Secret>> shared_secret;  ///< key of the tunnel
   SharedValue<std::uint16_t> tcp_listener_port;      ///< network byte order; 0: no direct TCP channel
   SharedValue<Text> lumex_url;
   SharedValue<Text> tunnel_host;
   SharedValue<Text> tunnel_port;
 };
 
-/// What is recorded and where it goes. Fields are thread-safe; a text that nobody has set is absent.
+/// What is recorded, and where it is written. Fields are thread-safe. A text that was never set is absent.
 struct RecordingDefaults {
   using Text = std::optional<std::string>;
 
   SharedValue<Text> recording_repository_path;
   SharedValue<Text> recording_type;
-  SharedValue<Text> input_file;    ///< of "File" recordings
+  SharedValue<Text> input_file;    ///< input of "File" recordings
   SharedValue<Text> preview_file;  ///< a picture to show instead of the camera's
   SharedValue<Text> preview_directory;
   SharedValue<Text> capture_preset;
@@ -43,7 +43,7 @@ struct RecordingDefaults {
   /// Absent only once the context has been taken apart.
   SharedValue<std::optional<LMRContinuousRecordingInfo>> continuous{LMRContinuousRecordingInfo{}};
 
-  /// Whether the capture runs all the time and commands only mark times.
+  /// Whether the capture runs all the time and commands only mark times in it.
   [[nodiscard]] bool isContinuous() const {
     const auto info = continuous.get();
     return info && info->enabled;

@@ -1,4 +1,4 @@
-// What the agent is doing: the state that its threads share.
+// The agent's current state, shared by its threads.
 #pragma once
 #include <cstdint>
 #include <optional>
@@ -13,11 +13,11 @@ namespace lmx {
 struct AgentState {
   SharedValue<bool> running;
   SharedValue<std::optional<TimeValue>> launch_time;
-  SharedValue<std::int64_t> last_device_check;  ///< seconds; below 1: no camera is being waited for
-  SharedValue<bool> agent_sent_or_fail;         ///< the tunnel's hello has been sent, or could not be
+  SharedValue<std::int64_t> last_device_check;  ///< seconds; below 1: not waiting for a camera
+  SharedValue<bool> agent_sent_or_fail;         ///< whether the tunnel's hello has been sent or has failed
   SharedValue<std::int32_t> timeshift_seconds;
   SharedValue<std::int32_t> status;            ///< result of the last capture action, a RecordError
-  SharedValue<std::int64_t> serverRejectTime;  ///< seconds; when the server last refused the agent, 0: never
+  SharedValue<std::int64_t> serverRejectTime;  ///< seconds; time of the server's last refusal, 0: never
   SharedValue<SharedDictionary> properties;    ///< the parameters of the last START
 };
 

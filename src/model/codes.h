@@ -1,11 +1,10 @@
-// The numbers that the agent shows the world: recording types, recorder states, results, replies, exit
-// statuses.
+// Numeric codes visible outside the agent: recording types, recorder states, results, replies, exit statuses.
 #pragma once
 #include <cstdint>
 
 namespace lmx {
 
-/// What is recorded, as preferences, journals and documents number it.
+/// What is recorded, as numbered in preferences, journals and properties documents.
 enum RecordingTypeCode : std::int32_t {
   kRecordingTypeNone = 0,
   kRecordingTypeAudio = 1,
@@ -14,24 +13,24 @@ enum RecordingTypeCode : std::int32_t {
   kRecordingTypeFile = 4,
 };
 
-/// The type of a recording with these media; at least one of them.
+/// The recording type for these media, of which at least one must be present.
 constexpr RecordingTypeCode recordingTypeOf(bool video, bool audio) {
   if (!video) return kRecordingTypeAudio;
   return audio ? kRecordingTypeAudioVideo : kRecordingTypeVideo;
 }
 
-/// What the recorder does, as STATUS tells it.
+/// The recorder's state, as STATUS reports it.
 enum RecorderStatus : std::int32_t { kRecorderIdle = 0, kRecorderPaused = 1, kRecorderRecording = 2 };
 
-/// What a capture does, as its controller tells it; any other value means neither.
+/// A capture's state, as its controller reports it; any other value means neither.
 enum CaptureState : std::int32_t { kCaptureIdle = 0, kCaptureRecording = 3, kCapturePaused = 4 };
 
-/// Results of the recording engine: the answer to START, and the last error that STATUS tells.
+/// Results of the recording engine: the reply to START, and the last error in STATUS.
 enum RecordError : std::int32_t {
   kRecordSuccess = 0,
-  kRecordInvalidType = 1,  ///< also: agent not running, no path, control-action mutex not available
+  kRecordInvalidType = 1,  ///< also: agent not running, no path, or the control-action mutex is not available
   kRecordInvalidArguments = 2,
-  kRecordNotRunning = 3,  ///< also: the framework refused to prepare
+  kRecordNotRunning = 3,  ///< also: the capture framework refused to prepare
   kRecordNotIdle = 4,
   kRecordLockFailed = 6,
   kRecordCannotWrite = 8,
@@ -40,17 +39,17 @@ enum RecordError : std::int32_t {
   kRecordNoDiskSpace = 30,
 };
 
-/// Why a command was not carried out.
+/// Why a command was not executed.
 enum class CommandError {
   none,
   noSession,         ///< no context or no recording session
   missingParameter,  ///< also: a timed command that can't be scheduled
   notAuthenticated,  ///< the peer must authenticate first
   noSuchTimer,
-  timerRevoked,  ///< the time of a revoked command has come
+  timerRevoked,  ///< the scheduled time of a revoked command has come
 };
 
-/// The number behind "cmdStatus=".
+/// The number after "cmdStatus=".
 constexpr std::int32_t replyCode(CommandError error) {
   switch (error) {
     case CommandError::none:
@@ -69,20 +68,20 @@ constexpr std::int32_t replyCode(CommandError error) {
   return 1;
 }
 
-/// How the process comes to its end.
+/// Why the process ends.
 enum class ProcessEnd {
   orderly,
   internalError,    ///< the daemon could not start, or lost its camera
-  usage,            ///< the command line can't be understood
-  deviceLost,       ///< in ad-hoc mode
-  software,         ///< an exception
-  operatingSystem,  ///< a lock, the locale, the log, a child process
+  usage,            ///< invalid command line
+  deviceLost,       ///< device lost in ad-hoc mode
+  software,         ///< an unexpected exception
+  operatingSystem,  ///< failure of a lock, the locale, the log or a child process
   cannotCreate,     ///< the preferences file can't be written
-  protocol,         ///< a tool gave an answer that makes no sense
+  protocol,         ///< a tool gave an invalid answer
   misconfigured,    ///< the service has been disabled
 };
 
-/// The exit status (sysexits.h); the manual page lists them.
+/// The exit status (sysexits.h). The manual page lists them.
 constexpr int exitStatus(ProcessEnd end) {
   switch (end) {
     case ProcessEnd::orderly:
@@ -107,7 +106,7 @@ constexpr int exitStatus(ProcessEnd end) {
   return 1;
 }
 
-/// What the ad-hoc client asks of the daemon; any other value counts as a recording.
+/// What the ad-hoc client requests from the daemon. Any other value counts as a recording.
 enum AdHocRequest : std::int32_t {
   kAdHocRecording = 0,
   kAdHocStatus = 1,

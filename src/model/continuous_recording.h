@@ -1,11 +1,11 @@
-// Continuous recording as the preferences describe it and the capture framework takes it.
+// Settings of continuous recording, as read from the preferences and passed to the capture framework.
 #pragma once
 #include <cstdint>
 
 namespace lmx {
 
 struct LMRContinuousRecordingInfo {
-  double cutoffPercentLeft = 0;     ///< free space in percent below which old segments go
+  double cutoffPercentLeft = 0;     ///< old segments are deleted below this percentage of free space
   std::uint64_t segmentLength = 0;  ///< minutes
   bool upload = false;
   bool enabled = false;

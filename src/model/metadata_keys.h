@@ -1,4 +1,4 @@
-// The keys of recording parameters and of the properties document that the agent itself reads or writes.
+// Keys of recording parameters and of the properties document that the agent itself reads or writes.
 #pragma once
 
 #include "model/codes.h"

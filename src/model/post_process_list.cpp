@@ -24,7 +24,7 @@ std::size_t PostProcessList::postProcessListCount() const {
 }
 
 void PostProcessList::clear() {
-  std::deque<std::shared_ptr<AgentSubmit>> dropped;  // outlives the lock: a destructor may do anything
+  std::deque<std::shared_ptr<AgentSubmit>> dropped;  // destroyed after unlocking: destructors run any code
   const std::lock_guard lock(mutex_);
   jobs_.swap(dropped);
 }

@@ -1,4 +1,4 @@
-// The queue of finished recordings that wait for their submission.
+// The queue of finished recordings that wait for submission.
 #pragma once
 #include <cstddef>
 #include <deque>
@@ -12,9 +12,8 @@ class AgentSubmit;
 /// First in, first out. Thread-safe.
 class PostProcessList {
  public:
-  /// Appends `job`.
   void postProcessListAddJob(std::shared_ptr<AgentSubmit> job);
-  /// Takes the oldest job off the list; null when it is empty.
+  /// Removes and returns the oldest job; null when the list is empty.
   std::shared_ptr<AgentSubmit> postProcessListNext();
   [[nodiscard]] std::size_t postProcessListCount() const;
   void clear();

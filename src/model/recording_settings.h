@@ -1,4 +1,4 @@
-// What the preferences set in the recording session; the rest of the session lies in record/.
+// The part of the recording session that the preferences set. record/ holds the rest of the session.
 #pragma once
 #include <cstdint>
 
@@ -11,7 +11,7 @@ namespace lmx {
 struct RecordingSettings {
   SharedValue<std::int32_t> recordingType{kRecordingTypeNone};
   SharedValue<std::uint32_t>
-      diskSpaceCutoffInMB;  ///< free space on the movie's volume that a start needs, megabytes
+      diskSpaceCutoffInMB;  ///< free space needed on the movie's volume to start, megabytes
 
  protected:
   ~RecordingSettings() = default;

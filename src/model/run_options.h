@@ -1,4 +1,4 @@
-// What the command line asks for.
+// Options from the command line.
 #pragma once
 #include <cstdint>
 #include <optional>
@@ -9,19 +9,19 @@
 
 namespace lmx {
 
-/// Fields are thread-safe. A text that nobody has set is absent, which is not the same as empty.
+/// Fields are thread-safe. A text that was never set is absent, which differs from empty.
 struct RunOptions {
   using Text = std::optional<std::string>;
 
   SharedValue<bool> adhoc;  ///< ad-hoc mode: a client of the running daemon
   SharedValue<Text> adhoc_output_file;
-  SharedValue<std::int32_t> duration{240};   ///< passed on as the greatest length of a recording, minutes
+  SharedValue<std::int32_t> duration{240};   ///< passed on as the maximum recording length, minutes
   SharedValue<std::int32_t> unattended{60};  ///< minutes
   SharedValue<std::int32_t> adhoc_request_type{kAdHocRecording};  ///< an AdHocRequest
-  SharedValue<Text> start_timer;                                  ///< when an ad-hoc recording is to begin
-  SharedValue<Text> timer_id;                                     ///< the timer to revoke
-  SharedValue<Text> user;      ///< of an ad-hoc submission; a START may name another
-  SharedValue<Text> password;  ///< the same
+  SharedValue<Text> start_timer;                                  ///< start time of an ad-hoc recording
+  SharedValue<Text> timer_id;                                     ///< identifier of the timer to revoke
+  SharedValue<Text> user;      ///< for ad-hoc submission; a START may override it
+  SharedValue<Text> password;  ///< likewise
   SharedValue<bool> submit_disabled;
 };
 

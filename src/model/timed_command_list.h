@@ -1,4 +1,4 @@
-// The commands that a server wants run later.
+// The commands that a server has scheduled for later.
 #pragma once
 #include <functional>
 #include <memory>
@@ -10,27 +10,28 @@
 
 namespace lmx {
 
-/// Entries in the order in which they were scheduled. An entry is the whole parameter dictionary of its
-/// TIMEDCMD, "TimerID" included, and never changes. Thread-safe.
+/// Entries are in the order in which they were scheduled. An entry is the complete, immutable parameter
+/// dictionary of its TIMEDCMD, including "TimerID". Thread-safe.
 class TimedCommandList {
  public:
   using Entry = SharedDictionary;
 
-  /// @return false when an entry of the same TimerID is there and `unlessKnown` is set
+  /// @return false when `unlessKnown` is set and there is an entry with the same TimerID
   bool append(Entry entry, bool unlessKnown = false);
-  /// Removes the first entry with that "TimerID". @return false when there is none
+  /// Removes the first entry with this "TimerID". @return false when there is none
   bool removeTimer(const std::string& timerID);
-  /// Takes `entry` itself out when the list holds one equal to it. @return false when it holds none
+  /// Removes `entry` itself. @return whether the list held an entry equal to it
   bool takeIfListed(const Entry& entry);
   [[nodiscard]] std::vector<Entry> entries() const;
-  /// Calls `write` with the entries as they are. Calls come one after another, so that of two changes the
-  /// later one is written last. @return what it returns
+  /// Calls `write` with the current entries. Calls are serialised, so that of two changes the later one is
+  /// written last.
+  /// @return the result of `write`
   bool persist(const std::function<bool(const std::vector<Entry>&)>& write);
 
  private:
   mutable std::mutex mutex_;
   std::vector<Entry> entries_;  // guarded by mutex_
-  std::mutex write_mutex_;      // held during persist; taken before mutex_
+  std::mutex write_mutex_;      // held during persist; lock it before mutex_
 };
 
 }  // namespace lmx

@@ -1,4 +1,4 @@
-// Connecting to a message bus.
+// Connects to a message bus.
 #include "platform/bus.h"
 
 #include <poll.h>
@@ -11,7 +11,8 @@
 namespace lmx {
 namespace {
 
-/// The session bus's address by hand: the library, asked for one where there is none, would start a bus.
+/// Finds the session bus's address without GIO: asked for a session bus where there is none, GIO would start
+/// one.
 std::optional<std::string> sessionBusAddress() {
   if (const char* address = std::getenv("DBUS_SESSION_BUS_ADDRESS")) return address;
   const char* directory = std::getenv("XDG_RUNTIME_DIR");

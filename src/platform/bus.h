@@ -1,4 +1,4 @@
-// Message buses with a time limit on everything, so that a mute bus can't hold the agent up.
+// Message bus connections with a time limit on every call, so that an unresponsive bus can't block the agent.
 #pragma once
 #include <gio/gio.h>
 
@@ -14,7 +14,7 @@ namespace lmx {
 
 inline constexpr std::chrono::milliseconds kBusLimit{2000};
 
-/// Cancels what uses cancellable() when `kBusLimit` has passed since the construction.
+/// Cancels every operation that uses cancellable() once `kBusLimit` has passed since construction.
 class BusTimeLimit {
  public:
   BusTimeLimit();
@@ -35,7 +35,7 @@ class BusTimeLimit {
 struct BusClose {
   void operator()(GDBusConnection* bus) const;
 };
-/// A connection of our own, not the one that the library shares: closed with its owner.
+/// A private connection, not the one that GIO shares within the process. Closed with its owner.
 using BusConnection = std::unique_ptr<GDBusConnection, BusClose>;
 
 /// Connects to the system or the session bus. Never starts a bus. Fails when there is none or it does not

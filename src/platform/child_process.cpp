@@ -1,4 +1,4 @@
-// Starting children and waiting for them.
+// Starts child processes and waits for them.
 #include "platform/child_process.h"
 
 #include <fcntl.h>
@@ -49,7 +49,7 @@ class SpawnSettings {
     if (argv.empty()) return EINVAL;
     std::vector<char*> words;
     for (const std::string& word : argv)
-      words.push_back(const_cast<char*>(word.c_str()));  // NOLINT: exec's type
+      words.push_back(const_cast<char*>(word.c_str()));  // NOLINT: the type exec takes
     words.push_back(nullptr);
     return posix_spawn(child, words[0], &actions_, &attributes_, words.data(), environ);
   }
@@ -59,7 +59,7 @@ class SpawnSettings {
   posix_spawnattr_t attributes_;
 };
 
-/// Reads what is there. @return false at the end of the output.
+/// Reads the output available now. @return false at end of file
 bool readOutput(int fd, std::string& output, std::size_t limit) {
   char buffer[16384];
   const ssize_t n = read(fd, buffer, sizeof buffer);
@@ -69,7 +69,7 @@ bool readOutput(int fd, std::string& output, std::size_t limit) {
   return true;
 }
 
-/// Waits for the end of a child, reading its output meanwhile.
+/// Waits for a child to end and reads its output in the meantime.
 class ChildWait {
  public:
   ChildWait(pid_t child, UniqueFd output, const ChildOptions& options)
@@ -95,8 +95,8 @@ class ChildWait {
   }
 
  private:
-  /// Whether there is a status to collect. Without a descriptor for the child (an old kernel, none free)
-  /// waitOnce sleeps briefly and this asks.
+  /// Whether the child's status can be collected. Without a pidfd (old kernel, no free descriptor) waitOnce
+  /// sleeps briefly and this polls.
   bool hasEnded() {
     if (handle_.valid() || ended_) return ended_;
     siginfo_t info{};
@@ -112,10 +112,10 @@ class ChildWait {
       reaped = waitpid(child_, &status, 0);
     } while (reaped < 0 && errno == EINTR);
     if (reaped < 0) {
-      result.status = errno;  // somebody else took the status (SIGCHLD ignored): never call that a success
+      result.status = errno;  // the status was reaped elsewhere (SIGCHLD ignored): never report success
       return result;
     }
-    // A child that ended by itself just before our signal has done its work.
+    // A child that exited just before our SIGKILL finished its work and counts as such.
     const bool by_us = killed && WIFSIGNALED(status) && WTERMSIG(status) == SIGKILL;
     result.end = by_us                 ? ChildResult::End::timedOut
                  : WIFSIGNALED(status) ? ChildResult::End::signalled
@@ -156,7 +156,7 @@ class ChildWait {
     if (options_.stillRunning) options_.stillRunning(elapsed);
   }
 
-  /// The rest of the output. A grandchild may hold the pipe open for ever: it gets a tenth of a second.
+  /// Reads the remaining output. A grandchild may keep the pipe open, so this waits at most 100 ms.
   void drain(std::string& output) {
     const auto deadline = Clock::now() + milliseconds(100);
     while (output_.valid()) {

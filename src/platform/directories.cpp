@@ -1,4 +1,5 @@
-// Directories made with their parents, and files replaced so that a power cut leaves the old or the new one.
+// Creates directories with their parents, and replaces files so that a power cut leaves the old or the new
+// one.
 #include "platform/directories.h"
 
 #include <fcntl.h>
@@ -20,7 +21,8 @@ bool isDirectory(const char* path) {
   return stat(path, &status) == 0 && S_ISDIR(status.st_mode);
 }
 
-/// mkdir for which an existing directory is success, whatever mkdir says (read-only file systems differ).
+/// mkdir that treats an existing directory as success, whatever errno the file system reports (read-only ones
+/// differ).
 int makeOne(const char* path, mode_t mode) {
   if (mkdir(path, mode) == 0) return 0;
   const int error = errno;
@@ -49,8 +51,8 @@ int takeOverAccess(int fd, const std::string& path, mode_t mode) {
   struct stat old {};
   if (stat(path.c_str(), &old) == 0 && S_ISREG(old.st_mode)) {
     mode = old.st_mode & 07777;
-    // Only root may give files away. When the owner can't be kept, access for others must not grow,
-    // and it does not: the mode stays the same.
+    // Only root may change the owner. Failing to keep it must not widen access for others, and it does not:
+    // the mode stays the same.
     if (fchown(fd, old.st_uid, old.st_gid) != 0 && errno != EPERM) return errno;
   }
   return fchmod(fd, mode) == 0 ? 0 : errno;
@@ -100,7 +102,7 @@ std::string keepUnderAnotherName(const std::string& path) {
     std::string copy = path + ".unreadable-" + std::to_string(number);
     if (link(path.c_str(), copy.c_str()) == 0) return copy;
     if (errno == EEXIST) continue;
-    // Some file systems have no second names: there the file moves.
+    // Some file systems have no hard links. There the file is renamed instead.
     const int error = errno;
     const bool noLinks = error == EPERM || error == EOPNOTSUPP || error == ENOSYS;
     const bool isFile = lstat(path.c_str(), &status) == 0 && S_ISREG(status.st_mode);

@@ -1,4 +1,4 @@
-// Making and syncing directories.
+// Creating and syncing directories, and replacing files atomically.
 #pragma once
 #include <sys/types.h>
 
@@ -13,14 +13,14 @@ int mkdir_p(const char* path, mode_t mode);
 /// Makes a rename or unlink in `directory` survive a power cut. @return 0 or the errno.
 int syncDirectory(const std::string& directory);
 
-/// Writes `content` beside `path`, syncs it, renames it over `path` and syncs the directory.
-/// The mode (and, where allowed, the owner) of an existing file is kept, else `mode` holds. @return 0 or the
-/// errno; on failure nothing is left behind.
+/// Writes `content` to a temporary file beside `path`, syncs it, renames it over `path` and syncs the
+/// directory. Keeps the mode of an existing file (and its owner where permitted); a new file gets `mode`.
+/// @return 0 or the errno; on failure no temporary file is left behind
 int writeFileAtomically(const std::string& path, const std::string& content, mode_t mode);
 
-/// Gives the file `path` a second name, "PATH.unreadable-N", so that replacing it loses nothing; needs no
-/// right to read it. Where a file can have one name only, the second replaces the first. @return that name,
-/// empty when it could not be done (errno tells why)
+/// Gives the file `path` a second name, "PATH.unreadable-N", so that replacing it loses nothing. Needs no
+/// read permission. Where hard links are not supported the file is renamed instead.
+/// @return the new name, or an empty string on failure (see errno)
 std::string keepUnderAnotherName(const std::string& path);
 
 }  // namespace lmx

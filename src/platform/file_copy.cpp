@@ -1,4 +1,4 @@
-// Copying beside the target, then renaming.
+// Copies to a temporary file beside the target, then renames it.
 #include "platform/file_copy.h"
 
 #include <fcntl.h>
@@ -33,13 +33,14 @@ int copyContents(int from, int to) {
 
 bool nameTaken(const std::string& path) {
   struct stat status {};
-  return lstat(path.c_str(), &status) == 0;  // also a link that leads nowhere
+  return lstat(path.c_str(), &status) == 0;  // true for a dangling link, too
 }
 
 /// @return 0 or the errno; EEXIST when the name is taken.
 int renameToFreeName(const std::string& from, const std::string& to) {
   if (renameat2(AT_FDCWD, from.c_str(), AT_FDCWD, to.c_str(), RENAME_NOREPLACE) == 0) return 0;
-  // Some file systems can't refuse to replace; there nothing but a look beforehand protects what is there.
+  // Some file systems don't support RENAME_NOREPLACE. There only a check beforehand protects an existing
+  // file.
   if (errno != EINVAL && errno != ENOSYS) return errno;
   if (nameTaken(to)) return EEXIST;
   return rename(from.c_str(), to.c_str()) == 0 ? 0 : errno;

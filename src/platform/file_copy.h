@@ -1,12 +1,12 @@
-// Copying a file without ever showing half of it.
+// Copies a file so that an incomplete copy is never visible under the target's name.
 #pragma once
 #include <string>
 
 namespace lmx {
 
-/// Copies `from` to the new name `to`, mode 0644, synced. The copy appears under its name only when it is
-/// whole.
-/// @return 0 or the errno; EEXIST when the name is taken, which is never replaced
+/// Copies `from` to the new name `to` with mode 0644 and syncs it. The copy appears under its name only once
+/// it is complete.
+/// @return 0 or the errno; EEXIST when `to` exists, which is never replaced
 int copyFileToNewName(const std::string& from, const std::string& to);
 
 }  // namespace lmx

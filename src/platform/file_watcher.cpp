@@ -1,4 +1,4 @@
-// Classifying what happened to a file.
+// Classifies what happened to a watched file.
 #include "platform/file_watcher.h"
 
 #include <fcntl.h>
@@ -18,7 +18,7 @@ constexpr std::uint32_t kDirectoryHints = IN_CREATE | IN_DELETE | IN_MOVED_FROM 
 
 long long nanoseconds(const timespec& time) { return time.tv_sec * 1000000000LL + time.tv_nsec; }
 
-/// Reads all pending events. @return whether there were any; `modified` is set when one is a write.
+/// Reads all pending events. @return whether there were any; sets `modified` when one of them is a write
 bool readHints(int inotify, bool& modified) {
   alignas(inotify_event) char buffer[4096];
   bool any = false;
@@ -40,7 +40,7 @@ FileWatcher::FileWatcher() = default;
 
 bool FileWatcher::open(const std::string& path) {
   path_ = path;
-  // Replaced between the open and the watch, the file would give no hint any more: then once again.
+  // A file replaced between open and watch would raise no further events. Then try again.
   for (int attempt = 0; attempt < 3; ++attempt) {
     close();
     file_.reset(::open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK));
@@ -48,7 +48,7 @@ bool FileWatcher::open(const std::string& path) {
     watch();
     if (!classify(false).deleted) return true;
   }
-  inotify_.reset();  // it never stands still: look at the state itself at every poll
+  inotify_.reset();  // it keeps changing: check the file itself at every poll
   return true;
 }
 
@@ -60,12 +60,12 @@ void FileWatcher::close() {
 void FileWatcher::watch() {
   inotify_.reset(inotify_init1(IN_NONBLOCK | IN_CLOEXEC));
   if (!inotify_.valid()) return;
-  // By the descriptor's own name: the path may name another file by now.
+  // Watch by descriptor: the path may already name another file.
   const std::string self = "/proc/self/fd/" + std::to_string(file_.get());
   const int watched = inotify_add_watch(inotify_.get(), self.c_str(), kFileHints);
-  // A symbolic link is replaced without any event on the file it pointed to: its directory tells.
+  // Replacing a symbolic link raises no event on its target, so watch the link's directory as well.
   const int directory = inotify_add_watch(inotify_.get(), directoryOf(path_).c_str(), kDirectoryHints);
-  if (watched < 0 || directory < 0) inotify_.reset();  // without hints every poll looks at the state itself
+  if (watched < 0 || directory < 0) inotify_.reset();  // without inotify every poll checks the file itself
 }
 
 FileEvents FileWatcher::poll() {
@@ -87,7 +87,7 @@ FileEvents FileWatcher::classify(bool modified) {
   const long long written_ns = nanoseconds(held.st_mtim);
   const long long changed_ns = nanoseconds(held.st_ctim);
   events.extended = held.st_size > size_;
-  // The clock of files ticks in milliseconds: of two writes within one tick only the hint tells.
+  // File timestamps tick in milliseconds. Of two writes within one tick, only the event reveals the second.
   events.written = modified || held.st_size != size_ || written_ns != modified_ns_;
   events.attributes = !events.written && changed_ns != changed_ns_;
   size_ = held.st_size;

@@ -1,4 +1,4 @@
-// Unique identifiers from libuuid.
+// Generates unique identifiers with libuuid.
 #include "platform/identifiers.h"
 
 #include <uuid.h>

@@ -48,8 +48,8 @@ class ErrnoKeeper {
 };
 
 struct TestSink {
-  std::atomic<bool> active{false};  ///< lets ordinary messages pass without the lock
-  std::mutex mutex;                 ///< guards the two below and every call of the sink
+  std::atomic<bool> active{false};  ///< lets ordinary messages skip the lock
+  std::mutex mutex;                 ///< guards the members below and every call of the sink
   LogSink sink = nullptr;
   void* user = nullptr;
 };
@@ -59,7 +59,7 @@ TestSink& testSink() {
   return sink;
 }
 
-/// Never destroyed: threads log until the process has gone.
+/// Never destroyed: threads log until the process ends.
 LogContext& defaultContext() {
   static LogContext& context = *std::make_unique<LogContext>("lmxagentd", LOG_DAEMON).release();
   return context;
@@ -86,7 +86,7 @@ Mirror readMirror() {
   return mirror;
 }
 
-/// Whether a write to standard error will not block and not raise SIGPIPE.
+/// Whether a write to standard error would neither block nor raise SIGPIPE.
 bool canWriteToStandardError() {
   pollfd fd{STDERR_FILENO, POLLOUT, 0};
   return poll(&fd, 1, 0) == 1 && (fd.revents & (POLLERR | POLLHUP | POLLNVAL)) == 0;
@@ -94,7 +94,7 @@ bool canWriteToStandardError() {
 
 void mirrorToStandardError(const LogContext& context, int level, std::string_view text) {
   static const Mirror mirror = readMirror();
-  // Asked each time: the descriptor may have been replaced since, by something that isn't ours to write to.
+  // Checked each time: the descriptor may since have been reused for something that isn't ours to write to.
   if (level > mirror.level || !(mirror.always || isatty(STDERR_FILENO) == 1)) return;
   if (!canWriteToStandardError()) return;
   std::string line = context.program + '[' + std::to_string(getpid()) + "] " + kLevelNames[level] + ": ";
@@ -146,7 +146,7 @@ void LMPLogMessage(LMPLogContext context, int level, const char* format, ...) {
     const std::string text = escapeControls(formatMessage(format, arguments));
     writeMessage(target, std::clamp(level, 0, static_cast<int>(kLogDebug)), text);
   } catch (const std::exception&) {
-    // No memory for the message: there is nobody left to tell.
+    // Out of memory: the message can't be reported anywhere.
   }
   va_end(arguments);
 }

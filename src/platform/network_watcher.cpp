@@ -1,4 +1,4 @@
-// rtnetlink address messages.
+// Watches addresses through rtnetlink messages.
 #include "platform/network_watcher.h"
 
 #include <ifaddrs.h>
@@ -35,7 +35,7 @@ std::set<InterfaceAddress> currentAddresses() {
   return known;
 }
 
-/// The address that a message with `size` bytes behind its header is about.
+/// The address in a message with a payload of `size` bytes.
 std::optional<InterfaceAddress> addressOf(const char* data, std::size_t size) {
   ifaddrmsg message{};
   if (size < sizeof message) return std::nullopt;
@@ -46,7 +46,7 @@ std::optional<InterfaceAddress> addressOf(const char* data, std::size_t size) {
     rtattr attribute{};
     std::memcpy(&attribute, data + at, sizeof attribute);
     if (attribute.rta_len < sizeof attribute || at + attribute.rta_len > size) break;
-    // The local address counts: on a point-to-point link the other one is the peer's.
+    // Use the local address: on a point-to-point link the other one is the peer's.
     const bool wanted = attribute.rta_type == IFA_LOCAL || (attribute.rta_type == IFA_ADDRESS && !found);
     if (wanted && attribute.rta_len >= RTA_LENGTH(sizeof(std::uint32_t))) {
       std::uint32_t address = 0;
@@ -97,7 +97,7 @@ bool NetworkWatcher::takeChanges() {
     const ssize_t size = ::recv(socket_.get(), buffer, sizeof buffer, 0);
     if (size > 0) {
       changed |= applyAddressMessages({buffer, static_cast<std::size_t>(size)}, known_);
-    } else if (size < 0 && errno == ENOBUFS) {  // messages were lost: look at all of it
+    } else if (size < 0 && errno == ENOBUFS) {  // messages were lost: read all addresses again
       auto now = currentAddresses();
       changed |= now != known_;
       known_ = std::move(now);
@@ -111,7 +111,7 @@ namespace {
 
 struct NetworkWatch final : RunLoop::Source {
   NetworkWatcher watcher;
-  std::unique_ptr<RunLoop::Source> source;  // last: it goes before the descriptor
+  std::unique_ptr<RunLoop::Source> source;  // last, so that it is destroyed before the descriptor
 };
 
 }  // namespace

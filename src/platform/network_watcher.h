@@ -12,21 +12,21 @@
 
 namespace lmx {
 
-/// Interface index and address (network order).
+/// Interface index and address (network byte order).
 using InterfaceAddress = std::pair<unsigned, std::uint32_t>;
 
-/// Takes the address messages in `bytes` into `known`. An address that is announced again, as a renewed lease
-/// does, is no change. @return whether `known` changed. Pure.
+/// Applies the address messages in `bytes` to `known`. An address announced again, as on a lease renewal, is
+/// no change. Pure. @return whether `known` changed
 bool applyAddressMessages(std::string_view bytes, std::set<InterfaceAddress>& known);
 
-/// One thread.
+/// For use on one thread.
 class NetworkWatcher {
  public:
   /// @return 0 or the errno
   int open();
-  /// Readable when there may be something to take; -1 before open.
+  /// Readable when takeChanges() has something to read; -1 before open().
   [[nodiscard]] int descriptor() const { return socket_.get(); }
-  /// Takes what has come. @return whether an address came or went since the last call
+  /// Reads the pending messages. @return whether an address came or went since the last call
   bool takeChanges();
 
  private:
@@ -34,7 +34,7 @@ class NetworkWatcher {
   std::set<InterfaceAddress> known_;
 };
 
-/// Has `changed` called on the thread of `loop` whenever an address comes or goes, for as long as the result
+/// Calls `changed` on the thread of `loop` whenever an address comes or goes, for as long as the result
 /// lives.
 /// @return null when the network can't be watched
 std::unique_ptr<RunLoop::Source> watchNetwork(RunLoop& loop, std::function<void()> changed);

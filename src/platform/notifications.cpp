@@ -1,4 +1,4 @@
-// D-Bus signals.
+// Sends notifications as D-Bus signals.
 #include "platform/notifications.h"
 
 #include <cctype>
@@ -20,7 +20,7 @@ std::string memberName(const std::string& name) {
   return member;
 }
 
-/// @return why the signal was not sent, or nothing.
+/// @return why the signal was not sent, or nothing on success
 std::optional<std::string> emitSignal(GBusType type, const std::string& name) {
   const std::string member = memberName(name);
   if (g_dbus_is_member_name(member.c_str()) == FALSE) return "not a name for a signal";

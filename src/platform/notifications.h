@@ -4,12 +4,12 @@
 
 namespace lmx {
 
-/// The BSD-style notification `name`: a D-Bus signal of that name (interface "com.zandor.lmxagentd",
-/// path "/com/zandor/lmxagentd", member = the part after the last dot, capitalised) on the system bus,
-/// flushed before it returns. No bus is no error: one debug line. Main thread.
+/// Posts the notification `name` as a D-Bus signal on the system bus (interface "com.zandor.lmxagentd", path
+/// "/com/zandor/lmxagentd", member = the part of `name` after the last dot, capitalised). The signal is
+/// flushed before this returns. A missing bus is no error and costs one debug line. Main thread.
 void notify_post(const std::string& name);
 
-/// The distributed notification `name`: the same signal on the session bus.
+/// Posts the notification `name` as the same signal on the session bus.
 void postDistributedNotification(const std::string& name);
 
 }  // namespace lmx

@@ -1,4 +1,4 @@
-// The root directory in front of the system's fixed paths.
+// Prefixes the system's fixed paths with the private root directory, if there is one.
 #include "platform/paths.h"
 
 #include <cstdlib>
@@ -17,7 +17,7 @@ std::string readRoot() {
 }  // namespace
 
 std::string systemPath(std::string_view fixedPath) {
-  // Never destroyed: threads that outlive main's statics still log, and so still ask for paths.
+  // Never destroyed: threads that outlive main's statics still log, and logging needs paths.
   static const std::string& root = *std::make_unique<std::string>(readRoot()).release();
   return root + std::string(fixedPath);
 }

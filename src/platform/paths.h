@@ -1,4 +1,4 @@
-// The fixed paths of the system, and the one directory that trials put in front of them.
+// The system's fixed paths, which a private root directory can prefix for trials and tests.
 #pragma once
 #include <string>
 #include <string_view>
@@ -19,12 +19,12 @@ inline constexpr std::string_view kLocalSocket = "/var/run/lmxagentd.comm";
 inline constexpr std::string_view kLumexTool = "/usr/bin/lumex";
 inline constexpr std::string_view kLogSocket = "/dev/log";
 
-/// `fixedPath` behind the directory named by LMXAGENTD_ROOT (read once); as it stands when that is
-/// unset or empty. Only for the system's own paths: what a user names (-f, preferences values) is never
-/// prefixed.
+/// `fixedPath` below the directory named by LMXAGENTD_ROOT (read once); unchanged when that is unset or
+/// empty. Only for the system's own paths: paths from the user (-f, preference values) are never prefixed.
 std::string systemPath(std::string_view fixedPath);
 
-/// The directory of `path`: everything before its last "/", "/" for a file in the root, "." without any "/".
+/// The directory part of `path`: everything before its last "/"; "/" for a file in the root, "." without any
+/// "/".
 std::string directoryOf(std::string_view path);
 
 }  // namespace lmx

@@ -1,4 +1,4 @@
-// The run loop: a queue, an eventfd and poll.
+// The run loop, built on a queue, an eventfd and poll.
 #include "platform/run_loop.h"
 
 #include <poll.h>
@@ -24,7 +24,7 @@ namespace {
 using Clock = std::chrono::steady_clock;
 constexpr std::chrono::milliseconds kLongestTurn = std::chrono::hours(24);
 
-/// The outcome that the poster of an action waits for. It outlives the loop when it must.
+/// The outcome that the poster of an action waits for. May outlive the loop.
 class Waiter {
  public:
   void finish(bool ran) {
@@ -48,22 +48,22 @@ class Waiter {
 
 struct Posted {
   RunLoop::Action action;
-  std::shared_ptr<Waiter> waiter;  ///< null when nobody waits
+  std::shared_ptr<Waiter> waiter;  ///< null when the poster doesn't wait
 };
 
-/// A timer or a watch. While its action runs it is not offered again, so that a nested turn can't recurse
-/// into it.
+/// A timer or a descriptor watch. It is not run again while its action runs, so that a nested turn can't
+/// recurse into it.
 struct Entry {
   RunLoop::Action action;
-  int fd = -1;                 ///< watches
-  Clock::duration interval{};  ///< timers
-  Clock::time_point due{};     ///< timers
+  int fd = -1;                 ///< watches only
+  Clock::duration interval{};  ///< timers only
+  Clock::time_point due{};     ///< timers only
   bool running = false;
   bool removed = false;
 };
 using Entries = std::vector<std::shared_ptr<Entry>>;
 
-/// Shares the entry with the loop, which forgets it at its next turn.
+/// Shares the entry with the loop, which removes it at its next turn.
 class EntrySource : public RunLoop::Source {
  public:
   explicit EntrySource(std::shared_ptr<Entry> entry) : entry_(std::move(entry)) {}
@@ -71,7 +71,7 @@ class EntrySource : public RunLoop::Source {
   EntrySource& operator=(const EntrySource&) = delete;
   ~EntrySource() override {
     entry_->removed = true;
-    // A running action must not lose what it has captured: the loop drops it afterwards.
+    // A running action must keep its captures. The loop drops them afterwards.
     if (!entry_->running) entry_->action = nullptr;
   }
 
@@ -79,7 +79,7 @@ class EntrySource : public RunLoop::Source {
   std::shared_ptr<Entry> entry_;
 };
 
-/// A failing action costs itself, not the loop.
+/// An exception ends the action, not the loop.
 void runGuarded(const RunLoop::Action& action) {
   try {
     action();
@@ -97,7 +97,7 @@ void runEntry(const std::shared_ptr<Entry>& entry) {
   if (entry->removed) entry->action = nullptr;
 }
 
-/// The next beat after `now`, in step with the earlier ones.
+/// The next due time after `now`, in phase with the earlier ones.
 Clock::time_point nextBeat(const Entry& timer, Clock::time_point now) {
   return timer.due + timer.interval * ((now - timer.due) / timer.interval + 1);
 }
@@ -109,7 +109,7 @@ struct RunLoop::Impl {
   std::atomic<std::thread::id> owner{};
   std::mutex mutex;
   std::deque<Posted> queue;  // guarded by mutex
-  bool rung = false;         // guarded by mutex: `wake` is readable
+  bool rung = false;         // guarded by mutex; true while `wake` is readable
   bool stopped = false;      // guarded by mutex
   Entries timers;            // owner thread
   Entries watches;           // owner thread
@@ -120,10 +120,10 @@ struct RunLoop::Impl {
     const std::uint64_t one = 1;
     rung = write(wake.get(), &one, sizeof one) == sizeof one;
   }
-  /// Takes the next posted action. @return false when the loop has stopped.
+  /// Takes the next posted action. @return false when the loop has stopped
   bool takePosted(std::optional<Posted>& posted);
   bool runDueTimer();
-  /// Waits for a descriptor, a post or `deadline`. @return whether a watch's action ran.
+  /// Waits for a descriptor, a post or `deadline`. @return whether a watch's action ran
   bool pollWatches(Clock::time_point deadline);
   [[nodiscard]] Clock::time_point nextDue(Clock::time_point deadline) const;
   void forgetRemoved();
@@ -147,12 +147,12 @@ bool RunLoop::post(Action action, Wait wait) {
       impl_->ring();
     }
   }
-  if (inline_run) runGuarded(action);  // NOLINT: moved from only when it is not run here
+  if (inline_run) runGuarded(action);  // NOLINT: moved from only when it does not run here
   return waiter == nullptr || waiter->wait();
 }
 
 void RunLoop::stop() {
-  std::deque<Posted> dropped;  // destroyed without the lock: what the actions hold may do anything
+  std::deque<Posted> dropped;  // destroyed without the lock: destructors of the captures may run any code
   {
     const std::lock_guard lock(impl_->mutex);
     impl_->stopped = true;
@@ -168,7 +168,7 @@ bool RunLoop::Impl::takePosted(std::optional<Posted>& posted) {
   const std::lock_guard lock(mutex);
   if (stopped) return false;
   if (rung) {
-    // Quiet again before looking: a post from here on rings anew, and nothing wakes the loop for nothing.
+    // Reset before looking at the queue: a later post signals again, and no wake-up is spurious.
     std::uint64_t count = 0;
     [[maybe_unused]] const ssize_t n = read(wake.get(), &count, sizeof count);
     rung = false;
@@ -183,7 +183,7 @@ bool RunLoop::Impl::runDueTimer() {
   const auto now = Clock::now();
   for (const auto& timer : timers) {
     if (timer->running || timer->removed || timer->due > now) continue;
-    const auto held = timer;  // the action may add timers, which moves the list
+    const auto held = timer;  // the action may add timers, which invalidates iterators
     held->due = nextBeat(*held, now);
     runEntry(held);
     return true;
@@ -200,7 +200,7 @@ Clock::time_point RunLoop::Impl::nextDue(Clock::time_point deadline) const {
 
 bool RunLoop::Impl::pollWatches(Clock::time_point deadline) {
   std::vector<pollfd> polled{{wake.get(), POLLIN, 0}};
-  // A negative descriptor is skipped by poll: indices stay those of the list.
+  // poll skips negative descriptors, so indices match those of the list.
   for (const auto& watch : watches) polled.push_back({watch->running ? -1 : watch->fd, POLLIN, 0});
   const auto left = std::max(Clock::duration::zero(), nextDue(deadline) - Clock::now());
   const auto seconds = std::chrono::floor<std::chrono::seconds>(left);
@@ -213,10 +213,10 @@ bool RunLoop::Impl::pollWatches(Clock::time_point deadline) {
     if ((events & POLLNVAL) != 0) {
       LMPLogMessage(nullptr, kLogCritical, "Descriptor %d was closed while the run loop watched it",
                     watch->fd);
-      watch->fd = -1;  // else every turn would end here at once
+      watch->fd = -1;  // otherwise poll would return at once every time
       return false;
     }
-    // To the end of the list: a busy descriptor must not keep the others waiting.
+    // Move to the end of the list, so that a busy descriptor can't starve the others.
     std::rotate(watches.begin() + static_cast<std::ptrdiff_t>(i),
                 watches.begin() + static_cast<std::ptrdiff_t>(i) + 1, watches.end());
     runEntry(watch);
@@ -239,7 +239,7 @@ RunLoop::Turn RunLoop::run(std::chrono::milliseconds limit) {
     if (!impl_->takePosted(posted)) return Turn::stopped;
     if (posted) {
       runGuarded(posted->action);
-      posted->action = nullptr;  // what it holds is gone before its poster goes on
+      posted->action = nullptr;  // release the captures before the poster continues
       if (posted->waiter) posted->waiter->finish(true);
       return Turn::handledSource;
     }

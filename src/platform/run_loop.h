@@ -1,4 +1,4 @@
-// A run loop: timers, descriptors and posted actions, all run by the one thread that calls run().
+// A run loop: timers, descriptors and posted actions, all run by the thread that calls run().
 #pragma once
 #include <chrono>
 #include <cstdint>
@@ -9,8 +9,8 @@ namespace lmx {
 
 enum class Wait { no, untilDone };
 
-/// Built on our own queue, eventfd and poll rather than on GLib's main context: the thread sanitizer can
-/// follow these, and one source a turn is exactly what the main loop wants.
+/// Built on its own queue, eventfd and poll instead of GLib's main context: the thread sanitizer can follow
+/// these, and the main loop needs to handle exactly one source per turn.
 class RunLoop {
  public:
   using Action = std::function<void()>;
@@ -21,36 +21,36 @@ class RunLoop {
   RunLoop(const RunLoop&) = delete;
   RunLoop& operator=(const RunLoop&) = delete;
 
-  /// Makes the calling thread the loop's owner. run() does so too; call it earlier when posts come before the
-  /// first turn.
+  /// Makes the calling thread the loop's owner. run() does so, too; call this first when actions are posted
+  /// before the first turn.
   void adoptThread();
 
-  /// Runs at most `limit`, returns after the first source handled (a posted action, a due timer or a ready
-  /// descriptor; posted actions first, in the order of posting). Owner thread only. May be nested in an
+  /// Waits at most `limit` and returns after the first source handled: a posted action, a due timer or a
+  /// ready descriptor. Posted actions come first, in order of posting. Owner thread only. May be nested in an
   /// action.
   Turn run(std::chrono::milliseconds limit);
 
   /// Runs `action` on the owner thread. Thread-safe. `untilDone` blocks the caller until it has run; on the
-  /// owner thread itself it runs at once. Hold no lock that `action` may take.
-  /// @return false when the loop has stopped and the action will not run.
+  /// owner thread it runs at once. Hold no lock that `action` may take.
+  /// @return false when the loop has stopped and the action will not run
   bool post(Action action, Wait wait);
 
-  /// Ends the loop: run() returns `stopped`, waiting posters wake with false, later posts are refused.
+  /// Ends the loop: run() returns `stopped`, waiting posters return false, later posts are refused.
   /// Thread-safe.
   void stop();
   [[nodiscard]] bool isOwnerThread() const;
 
-  /// Keeps a timer or a descriptor watch alive; its destruction (owner thread) removes it. It must not
-  /// outlive the loop.
+  /// Keeps a timer or a descriptor watch alive. Destroy it on the owner thread to remove it. Must not outlive
+  /// the loop.
   class Source {
    public:
     virtual ~Source() = default;
   };
-  /// Calls `action` every `interval` on the owner thread, first after one interval. Missed beats are not made
-  /// up.
+  /// Calls `action` every `interval` on the owner thread, first after one interval. Missed calls are not made
+  /// up for.
   [[nodiscard]] std::unique_ptr<Source> addRepeatingTimer(std::chrono::milliseconds interval, Action action);
-  /// Calls `action` whenever `fd` is readable, has hung up or has an error. The descriptor stays the
-  /// caller's.
+  /// Calls `action` whenever `fd` is readable, has hung up or has an error. The caller keeps ownership of
+  /// `fd`.
   [[nodiscard]] std::unique_ptr<Source> watchReadable(int fd, Action action);
 
  private:

@@ -1,4 +1,4 @@
-// systemd over D-Bus.
+// Talks to systemd over D-Bus.
 #include "platform/service_manager.h"
 
 #include <cstdlib>
@@ -79,7 +79,7 @@ class SystemdServiceManager : public ServiceManager {
   }
 
   int runShellCommand(const std::string& command) override {
-    return std::system(command.c_str());  // NOLINT: a fixed command, with no text from outside in it
+    return std::system(command.c_str());  // NOLINT: a fixed command without any external input
   }
 };
 

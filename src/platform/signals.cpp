@@ -1,4 +1,4 @@
-// From the handler through a pipe to the loop.
+// Passes signals from the handler through a pipe to the run loop.
 #include "platform/signals.h"
 
 #include <fcntl.h>
@@ -22,13 +22,13 @@ static_assert(std::atomic<int>::is_always_lock_free, "the handler may take no lo
 extern "C" void writeSignalNumber(int number) {
   const int saved = errno;
   const auto byte = static_cast<unsigned char>(number);
-  // A full pipe means that thousands are waiting already: one more tells nothing new.
+  // A full pipe means that thousands are already pending, so this one may be dropped.
   [[maybe_unused]] const ssize_t n = write(write_end.load(), &byte, 1);
   errno = saved;
 }
 
-/// The read end of the one pipe, made on first use. It is never closed: a handler that is still running on
-/// another thread must not write to a descriptor that has become something else.
+/// The read end of the pipe, created on first use. Never closed: a handler still running on another thread
+/// must not write to a reused descriptor.
 int signalPipe() {
   static const int read_end = [] {
     int ends[2];
@@ -57,8 +57,8 @@ SignalSource::SignalSource(RunLoop& loop, const std::vector<int>& signals, std::
   while (read(pipe, &stale, 1) == 1) {
   }
   const auto shared = std::make_shared<const std::function<void(int)>>(std::move(action));
-  // Posted rather than called: the watch is free again meanwhile, so that a turn of the loop within the
-  // action can deliver the next signal.
+  // Posted rather than called, which frees the watch: a turn of the loop within the action can then deliver
+  // the next signal.
   impl_->watch = loop.watchReadable(pipe, [&loop, pipe, shared] {
     unsigned char number = 0;
     if (read(pipe, &number, 1) == 1) loop.post([shared, number] { (*shared)(number); }, Wait::no);

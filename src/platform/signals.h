@@ -1,4 +1,4 @@
-// Signals turned into run-loop work.
+// Delivers signals as run-loop work.
 #pragma once
 #include <functional>
 #include <memory>
@@ -8,9 +8,9 @@
 
 namespace lmx {
 
-/// Installs one handler for `signals` (every signal blocked while it runs, SA_RESTART) that writes the number
-/// to a pipe; `action` then gets it on the loop's owner thread. One instance at a time; destruction restores
-/// the old handlers.
+/// Installs one handler for `signals` (SA_RESTART, every signal blocked while it runs) that writes the signal
+/// number to a pipe. `action` then receives it on the loop's owner thread. One instance at a time;
+/// destruction restores the old handlers.
 class SignalSource {
  public:
   SignalSource(RunLoop& loop, const std::vector<int>& signals, std::function<void(int)> action);

@@ -27,7 +27,7 @@ class Pool {
       if (idle_ < items_.size() && workers_ < kMaximumWorkers) startWorker();
       changed_.notify_one();
       if (workers_ > 0) return;
-      // Not even one thread to be had: late on this one is better than never.
+      // No thread could be started. Running the item late on this thread is better than never.
       item = std::move(items_.back());
       items_.pop_back();
     }
@@ -50,14 +50,14 @@ class Pool {
 
   static void prepareThread() {
     pthread_setname_np(pthread_self(), "lmx-background");
-    // Linux takes a thread's identifier here. Without the right to do it the work is still done.
+    // On Linux this sets the priority of one thread. Without permission the work is still done.
     setpriority(PRIO_PROCESS, static_cast<id_t>(gettid()), kNice);
   }
 
   [[noreturn]] void work() {
     prepareThread();
     for (;;) {
-      std::function<void()> item;  // destroyed without the lock: what it holds may dispatch again
+      std::function<void()> item;  // destroyed without the lock: its captures may dispatch again
       {
         std::unique_lock lock(mutex_);
         ++idle_;
@@ -70,7 +70,7 @@ class Pool {
     }
   }
 
-  /// A failing item costs itself, not the process and whatever it is recording.
+  /// An exception ends the item, not the process and its recording.
   static void runGuarded(const std::function<void()>& item) {
     try {
       item();
@@ -86,7 +86,7 @@ class Pool {
   std::size_t workers_ = 0;                  // guarded by mutex_
 };
 
-/// Never destroyed: workers run until the process has gone.
+/// Never destroyed: workers run until the process ends.
 Pool& pool() {
   static Pool& pool = *std::make_unique<Pool>().release();
   return pool;

@@ -1,13 +1,13 @@
-// The shared work queue: one-off work items on worker threads in the background.
+// The shared queue for background work.
 #pragma once
 #include <functional>
 
 namespace lmx {
 
-/// Runs `item` on a worker of the process-wide pool; up to four items run in parallel. Workers are niced, so
-/// that they do not disturb a running capture; they are started on demand, live until the process ends and
-/// are never joined. An exception out of an item is a critical log line and ends that item alone.
-/// Thread-safe.
+/// Runs `item` on a worker of the process-wide pool; up to four items run in parallel. Workers run at lower
+/// priority (nice), so that they don't disturb a running capture. They are started on demand, live until the
+/// process ends and are never joined. An exception from an item is logged as critical and ends only that
+/// item. Thread-safe.
 void dispatchAsync(std::function<void()> item);
 
 }  // namespace lmx

@@ -1,4 +1,4 @@
-// Describing a recording and submitting it.
+// Describes a recording and submits it.
 #include "postprocess/agent_submit.h"
 
 #include <unistd.h>
@@ -125,8 +125,8 @@ int AgentSubmit::addRecording(ChildRunner& children) {
   return submitWithTool(children, submissionArguments(request));
 }
 
-/// The tool looks for a recording in the repository: the input file of a "File" recording and its document go
-/// there.
+/// The tool looks for a recording in the repository, so the input file of a "File" recording and its document
+/// are copied there.
 void AgentSubmit::copyInputFile(const std::string& uuid) const {
   const std::string movie = recording_file_path.value_or("");
   const std::string copy = agentContext->recording.recording_repository_path.get().value_or("") + "/" + uuid;

@@ -1,4 +1,4 @@
-// One finished recording on its way to the server: its properties document and its submission.
+// A finished recording on its way to the server: its properties document and its submission.
 #pragma once
 #include <cstdint>
 #include <memory>
@@ -13,41 +13,42 @@
 
 namespace lmx {
 
-/// Made by the stop callback, then owned by the post-process list, then by the scheduler thread: one thread
-/// at a time.
+/// Created by the stop callback, then owned by the post-process list, then by the scheduler thread: one
+/// thread at a time.
 class AgentSubmit {
  public:
   using Text = std::optional<std::string>;
 
   Dictionary properties;
   std::shared_ptr<AgentContext> agentContext;
-  /// The session that recorded (the job's copy): its type goes into the document and decides what is copied,
-  /// since the current session may have gone on to another type. Absent: the context's session.
+  /// The session that recorded (the job's own copy). Its type goes into the document and decides what is
+  /// copied; the current session may have moved on to another type. Absent: the context's session is used.
   std::shared_ptr<AgentRecord> recorded;
   Text recording_file_path;
   Text properties_file_path;
   Text adhoc_workflow_uuid;
   bool canceled = false;
 
-  /// Gathers everything for the properties document. A failure is logged and ends the gathering; what is
-  /// there stays.
+  /// Gathers everything for the properties document. A failure is logged and ends the gathering; what was
+  /// gathered before is kept.
   /// @param duration  whole seconds of media
   void setPropertyValuesWithContext(std::shared_ptr<AgentContext> context, const Text& movie,
                                     std::optional<TimeValue> started_date,
                                     std::optional<TimeValue> stopped_date, std::int64_t duration,
                                     const SharedDictionary& user_properties, bool was_canceled);
-  /// Writes the document beside the movie, atomically; nothing without a path. @return false when it could
-  /// not be written, which is logged
+  /// Writes the document beside the movie, atomically; does nothing without a path.
+  /// @return false when it could not be written (logged)
   [[nodiscard]] bool tryWriteProperties() const;
-  /// The same for a recording that goes on to the tool. Always 0: a failed write is left to the tool to
-  /// complain of.
+  /// The same for a recording that goes on to the tool. Always returns 0: after a failed write the tool
+  /// reports the missing document.
   int writeProperties();
-  /// Whether the last writeProperties() has left a document behind.
+  /// Whether the last writeProperties() wrote a document.
   [[nodiscard]] bool documented() const { return documented_; }
 
-  /// The submission with its log lines. @return 0 when the job ended normally, -1 when the submission failed.
+  /// Submits the recording and logs the progress.
+  /// @return 0 when the job ended normally, -1 when the submission failed
   int addRecordingWithCommentary(ChildRunner& children);
-  /// Runs the tool. @return 0 when it exited with 0, else 1 (logged).
+  /// Runs the tool. @return 0 when it exited with 0, else 1 (logged)
   int addRecording(ChildRunner& children);
 
  private:

@@ -1,4 +1,4 @@
-// Writing properties as XML.
+// Writes properties as XML.
 #include "postprocess/properties_document.h"
 
 #include <pugixml.hpp>
@@ -13,7 +13,7 @@ namespace {
 
 constexpr std::string_view kSubstitute = "?";
 
-/// One "RecordingProperty" element: the key first, the value second.
+/// Appends one "RecordingProperty" element with the key first and the value second.
 void elementWithKey(pugi::xml_node parent, const std::string& key, const std::string& value) {
   pugi::xml_node element = parent.append_child("RecordingProperty");
   element.append_attribute("key").set_value(xmlText(key, kSubstitute).c_str());

@@ -7,10 +7,10 @@
 
 namespace lmx {
 
-/// The document's text: XML 1.0, UTF-8, one property an element.
+/// The document's text: XML 1.0 in UTF-8, one element per property.
 std::string propertiesXml(const Dictionary& properties);
 
-/// Where the document of `movie` goes: every ".mov" becomes ".xml"; a path without one gets ".xml" behind it
+/// The document's path for `movie`: every ".mov" becomes ".xml". A path without ".mov" gets ".xml" appended
 /// (logged), since the document must not overwrite the movie.
 std::string propertiesPathFor(const std::string& movie, LMPLogContext log);
 

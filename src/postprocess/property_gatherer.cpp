@@ -1,4 +1,4 @@
-// One property after another.
+// Adds the recording's properties one after another.
 #include "postprocess/property_gatherer.h"
 
 #include "model/codes.h"
@@ -28,7 +28,7 @@ bool PropertyGatherer::addIfMissing(const char* name, const Text& value) {
 }
 
 bool PropertyGatherer::addDates(const Time& started, const Time& stopped) {
-  // A time that nobody has set counts as 0: losing the rest of the document over it would be worse.
+  // A time that was never set is written as 0. Losing the rest of the document would be worse.
   const auto seconds = [](const Time& time) {
     return string_with_format("%d", static_cast<std::int32_t>(time ? time->tv_sec : 0));
   };
@@ -65,8 +65,8 @@ bool PropertyGatherer::addType(std::int32_t code) {
   return addValue(properties_, name == nullptr ? Text() : Text(name), metadata_key::kType);
 }
 
-/// Only where the property is there already, and then the add must fail: the agent never writes an image
-/// size itself, and a START that claims one for a picture whose size is known is in error.
+/// Does nothing unless the property is already there; then the add fails. This is intended: the agent never
+/// writes an image size itself, and a START that gives one for a picture of known size is in error.
 bool PropertyGatherer::addImageSide(const char* name, std::uint32_t pixels) {
   if (missing(name) || pixels == 0) return true;
   return addValue(properties_, string_with_format("%d", static_cast<int>(pixels)), name);

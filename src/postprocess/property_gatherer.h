@@ -1,4 +1,4 @@
-// Gathers what a properties document says beyond the parameters of its START.
+// Gathers the properties of a document that its START did not give.
 #pragma once
 #include <cstdint>
 #include <optional>
@@ -11,25 +11,26 @@
 
 namespace lmx {
 
-/// The value under `name`; absent when the name or the property is.
+/// The value for `name`; absent when the name or the property is absent.
 std::optional<std::string> getProperty(const Dictionary& properties, const std::optional<std::string>& name);
-/// false when either is absent or the name is already there: an existing value is never replaced.
+/// @return false when either is absent or the name already exists; existing values are never replaced
 bool addValue(Dictionary& properties, const std::optional<std::string>& value,
               const std::optional<std::string>& name);
 
-/// The steps that add properties. Each returns false when an add has failed, which ends the rest.
+/// The steps that add properties. Each returns false when an add fails, which skips the rest.
 class PropertyGatherer {
  public:
   using Text = std::optional<std::string>;
   using Time = std::optional<TimeValue>;
 
-  /// Both outlive the object. @param properties  is added to
+  /// Both arguments outlive the object. @param properties  receives the properties
   PropertyGatherer(Dictionary& properties, const RecordingDefaults& defaults)
       : properties_(properties), defaults_(defaults) {}
 
   bool addIfMissing(const char* name, const Text& value);
   bool addDates(const Time& started, const Time& stopped);
-  /// @param record  the session that recorded; may be null. @param duration  whole seconds of media
+  /// @param record  the session that recorded; may be null
+  /// @param duration  whole seconds of media
   bool addRecording(const AgentRecord* record, std::int64_t duration);
   bool addAudio();
   bool addExtension(const std::string& movie);

@@ -17,9 +17,9 @@ int agentPostProcessSchedulerRunLoop(AgentContext& context, ChildRunner& childre
                                      const SchedulerHooks& hooks) {
   context.logInfo("Post-Process Scheduler starts");
   while (context.state.running.get() && !hooks.cancelled()) {
-    hooks.setBusy(true);  // before the list is empty: between list and thread a job must not be overlooked
+    hooks.setBusy(true);  // set before taking the job, so that it is never neither listed nor busy
     if (const auto job = context.post_process_list.postProcessListNext()) {
-      job->addRecordingWithCommentary(children);  // a failure is logged there; the next job has its own luck
+      job->addRecordingWithCommentary(children);  // logs its own failures, which don't affect the next job
       continue;
     }
     hooks.setBusy(false);
@@ -30,7 +30,7 @@ int agentPostProcessSchedulerRunLoop(AgentContext& context, ChildRunner& childre
   return 0;
 }
 
-/// Owned by the scheduler and its thread: whichever ends last.
+/// Shared by the scheduler and its thread; the last of them destroys it.
 struct PostProcessScheduler::State {
   std::mutex mutex;
   std::condition_variable changed;

@@ -1,4 +1,4 @@
-// The thread that takes finished recordings to the server, oldest first, one at a time.
+// The thread that submits finished recordings to the server, oldest first, one at a time.
 #pragma once
 #include <chrono>
 #include <functional>
@@ -9,20 +9,20 @@
 
 namespace lmx {
 
-/// What the loop needs of whoever runs it. All three are set; they are called on the loop's thread.
+/// What the loop needs from its owner. All three must be set. They are called on the loop's thread.
 struct SchedulerHooks {
-  std::function<void(std::chrono::milliseconds)> sleep;  ///< waits at most that long between two empty looks
+  std::function<void(std::chrono::milliseconds)> sleep;  ///< waits at most this long between checks
   std::function<bool()> cancelled;                       ///< true: end, even with jobs in the list
   std::function<void(bool)> setBusy;                     ///< whether a job is being taken or run
 };
 
-/// The thread's body: takes jobs off the context's list and runs them while it is `running`; looks again at
-/// once after a job, after at most five seconds when there was none. Jobs still in the list at the end stay
-/// there: their files are on the disk. @return 0
+/// The body of the thread: takes jobs off the context's list and runs them while the context is `running`.
+/// Checks again at once after a job, and within five seconds when the list was empty. Jobs left at the end
+/// stay in the list; their files are on disk. @return 0
 int agentPostProcessSchedulerRunLoop(AgentContext& context, ChildRunner& children,
                                      const SchedulerHooks& hooks);
 
-/// Its thread is not joined: a submission may take hours, the end of the process does not wait for it.
+/// The thread is not joined: a submission may take hours, and the process does not wait for it to exit.
 class PostProcessScheduler {
  public:
   PostProcessScheduler();
@@ -30,11 +30,11 @@ class PostProcessScheduler {
   PostProcessScheduler(const PostProcessScheduler&) = delete;
   PostProcessScheduler& operator=(const PostProcessScheduler&) = delete;
 
-  /// Call it once.
+  /// Call once.
   /// @param children  lives until the process ends
-  /// @return false when the thread can't be made.
+  /// @return false when the thread can't be created
   bool start(std::shared_ptr<AgentContext> context, ChildRunner& children);
-  /// Asks the thread to end after the job in hand; an idle one ends at once. Thread-safe.
+  /// Asks the thread to end after the current job; an idle thread ends at once. Thread-safe.
   void cancel();
   /// Whether a job is being taken or run. Thread-safe.
   [[nodiscard]] bool busy() const;

@@ -1,4 +1,4 @@
-// The tool's arguments and its run.
+// Builds the submission tool's arguments and runs the tool.
 #include "postprocess/submission.h"
 
 #include <chrono>
@@ -55,7 +55,7 @@ int submitWithTool(ChildRunner& children, const std::vector<std::string>& argume
                   std::strerror(result.status));
     return failedBeforeTheTool();
   }
-  // A tool that a signal ended counts as a shell would have it.
+  // For a tool ended by a signal, use a shell's convention for the exit code.
   const int code = result.end == ChildResult::End::exited ? result.status : 128 + result.status;
   LMPLogMessage(nullptr, kLogCritical, "Error: unable to submit job, /usr/bin/lumex exit code: %i", code);
   return 1;

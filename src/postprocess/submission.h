@@ -1,4 +1,4 @@
-// Handing a recording to the server's tool.
+// Submits a recording with the server's tool.
 #pragma once
 #include <optional>
 #include <string>
@@ -11,22 +11,22 @@ namespace lmx {
 struct SubmissionRequest {
   std::string server;
   std::string recordingUUID;
-  /// Of an ad-hoc submission of `file`; absent for a recording of the repository.
+  /// For an ad-hoc submission of `file`; absent for a recording from the repository.
   std::optional<std::string> workflow = {};
-  // Read with a workflow only.
+  // Used only with a workflow.
   std::string file = {};
   std::string user = {};
   std::string password = {};
 };
 
-/// Everything behind the tool's name. Pure.
+/// The tool's arguments without its name. Pure.
 std::vector<std::string> submissionArguments(const SubmissionRequest& request);
 
-/// Runs the tool; blocks until it has ended, however long that takes. @return 0 when it exited with 0, else 1
-/// (logged)
+/// Runs the tool and blocks until it ends, however long that takes.
+/// @return 0 when it exited with 0, else 1 (logged)
 int submitWithTool(ChildRunner& children, const std::vector<std::string>& arguments);
 
-/// Logs that nothing could be submitted. @return 1
+/// Logs that the tool could not be run. @return 1
 int failedBeforeTheTool();
 
 }  // namespace lmx

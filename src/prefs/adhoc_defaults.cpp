@@ -1,4 +1,4 @@
-// The registered defaults.
+// Builds the registered defaults.
 #include "prefs/adhoc_defaults.h"
 
 namespace lmx {

@@ -1,10 +1,10 @@
-// What the preferences say as long as nobody has said anything.
+// Default preferences.
 #pragma once
 #include "platform/plist/property_list.h"
 
 namespace lmx {
 
-/// The registered defaults: the last layer of the preferences domain, and the beginning of a new file.
+/// The registered defaults: the last layer of the preferences domain, and the initial contents of a new file.
 PlistDictionary adHocDefaults();
 
 }  // namespace lmx

@@ -1,4 +1,4 @@
-// Reading, caching and watching the preferences file.
+// Reads, caches and watches the preferences file.
 #include "prefs/agent_preferences.h"
 
 #include <unistd.h>
@@ -24,8 +24,8 @@ bool missesSilently(const std::string& key) {
   return key == "RecordingPreviewIntervalInSeconds" || key == "PreviewPath";
 }
 
-/// The whole file; nothing when it is not there or can't be used.
-/// @param complained  whether an error line has named the file before; set when this writes one
+/// The whole file; nothing when it does not exist or can't be used.
+/// @param complained  whether an error line has named the file already; set when this writes one
 std::optional<PlistDictionary> loadFile(const std::string& path, bool& complained) {
   PlistResult file = readPropertyList(path);
   if (file && file->dictionary() != nullptr) return *file->dictionary();
@@ -37,18 +37,18 @@ std::optional<PlistDictionary> loadFile(const std::string& path, bool& complaine
   return std::nullopt;
 }
 
-/// A number as its decimal text, without an exponent; nothing for any other value.
+/// A number as decimal text without an exponent; nothing for any other value.
 std::optional<std::string> numberText(const PlistValue& value) {
   if (const auto* integer = std::get_if<std::int64_t>(&value.value)) return std::to_string(*integer);
   const auto* real = std::get_if<double>(&value.value);
   if (real == nullptr || !std::isfinite(*real)) return std::nullopt;
-  char text[512];  // the largest double has 309 digits, the smallest some 330 decimals
+  char text[512];  // the largest double has 309 digits, the smallest about 330 decimals
   const auto end = std::to_chars(text, text + sizeof text, *real, std::chars_format::fixed).ptr;
   return std::string(text, end);
 }
 
-/// The value when it has the type its key wants: a text, or for the continuous settings a dictionary. People
-/// write <integer> and <real> by habit: numbers count as their texts.
+/// The value, when it has the type that its key requires: a text, or a dictionary for the continuous
+/// settings. People often write <integer> and <real>, so numbers are accepted and converted to text.
 std::optional<PlistValue> typed(const std::string& key, const PlistValue& value) {
   const bool dictionaryWanted = key == kContinuous;
   if (dictionaryWanted ? value.dictionary() != nullptr : value.string() != nullptr) return value;
@@ -151,7 +151,7 @@ void AgentPreferences::migrateOldKeys() {
   const auto old = textOf(getFromPrefsFile("RecordingPreviewIntervalInSeconds"));
   if (!old || !prefsDict_) return;
   const auto seconds = static_cast<std::uint32_t>(std::atoi(old->c_str()));
-  // The old default of 3 s becomes the new default, not its equivalent.
+  // The old default of 3 s maps to the new default, not to its equivalent in milliseconds.
   const std::string milliseconds =
       seconds == 3
           ? "400"

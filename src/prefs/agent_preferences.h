@@ -1,4 +1,4 @@
-// The preferences file: reading, caching and watching it.
+// Reads, caches and watches the preferences file.
 #pragma once
 #include <array>
 #include <optional>
@@ -10,21 +10,21 @@
 
 namespace lmx {
 
-/// Thread-safe for reading; the watcher belongs to the main thread.
+/// Reading is thread-safe. The watcher belongs to the main thread.
 class AgentPreferences {
  public:
-  /// One way of reading a key: getFromPrefsFile or get.
+  /// The way to read a key: getFromPrefsFile or get.
   using Selector = std::optional<PlistValue> (AgentPreferences::*)(const std::string& key);
 
   AgentPreferences();
   AgentPreferences(const AgentPreferences&) = delete;
   AgentPreferences& operator=(const AgentPreferences&) = delete;
 
-  /// The value in the preferences file, through the cache of the whole file. A file that is there but can't
-  /// be read as a property list is an error line that names it, once until the cache is reset.
+  /// The value in the preferences file, read through a cache of the whole file. A file that exists but is not
+  /// a readable property list is logged as one error line that names it, once until the cache is reset.
   std::optional<PlistValue> getFromPrefsFile(const std::string& key);
   /// The value in the preferences domain: the user's "~/Library/Preferences/…" file, then the system file,
-  /// then the ad-hoc defaults. A text for every key but "ContinuousRecording", which is a dictionary.
+  /// then the ad-hoc defaults. Every value is a text, except "ContinuousRecording", which is a dictionary.
   std::optional<PlistValue> get(const std::string& key);
 
   void setupPrefsFileWatcher();
@@ -34,22 +34,22 @@ class AgentPreferences {
   /// The cached file; absent when nothing is cached.
   [[nodiscard]] std::optional<PlistDictionary> prefsDict();
 
-  /// Rewrites the obsolete preview interval in the file, once.
+  /// Replaces the obsolete preview-interval key in the file, once.
   void migrateOldKeys();
 
  private:
-  /// The preferences domain, the layer that wins first.
+  /// The layers of the preferences domain, highest priority first.
   std::array<std::optional<PlistDictionary>, 3> domainLayers();
 
   RecursiveMutex prefsCacheMutex_;
   // Guarded by prefsCacheMutex_:
   std::optional<PlistDictionary> prefsDict_;
-  bool complained_ = false;       ///< the system file's error line has been written since the last reset
-  bool user_complained_ = false;  ///< the user file's
+  bool complained_ = false;       ///< error line for the system file written since the last reset
+  bool user_complained_ = false;  ///< the same for the user's file
   FileWatcher watcher_;           // main thread only
 };
 
-/// The text in `value`; absent when it is absent or no text.
+/// The text in `value`; absent when `value` is absent or not a text.
 std::optional<std::string> textOf(const std::optional<PlistValue>& value);
 
 }  // namespace lmx

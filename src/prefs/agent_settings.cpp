@@ -1,4 +1,4 @@
-// Reading settings in their order, and judging them.
+// Reads and validates the settings in their order.
 #include "prefs/agent_settings.h"
 
 #include <arpa/inet.h>
@@ -19,8 +19,8 @@ using Text = std::optional<std::string>;
 
 bool empty(const Text& text) { return !text || text->empty(); }
 
-/// One reading of all settings. Each step stores what it finds first and judges it afterwards, so that a
-/// failing key leaves its field holding what was found.
+/// Reads all settings once. Each step stores the value before it validates it, so that a field with an
+/// invalid value still holds what was found.
 class SettingsReader {
  public:
   SettingsReader(AgentPreferences& prefs, AgentContext& context) : prefs_(prefs), context_(context) {}

@@ -1,4 +1,4 @@
-// Reading the continuous settings.
+// Reads and validates the continuous-recording settings.
 #include "prefs/continuous_settings.h"
 
 #include "platform/log.h"

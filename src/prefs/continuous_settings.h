@@ -7,7 +7,7 @@ namespace lmx {
 
 /// A missing key reads as 0 or false.
 LMRContinuousRecordingInfo continuousInfoFrom(const PlistDictionary& dictionary);
-/// Whether it is off, or on with a cut-off and a segment length; else an error line.
+/// Whether continuous recording is off, or on with a cut-off and a segment length. Logs an error otherwise.
 bool continuousInfoValid(const LMRContinuousRecordingInfo& info);
 
 }  // namespace lmx

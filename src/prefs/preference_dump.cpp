@@ -1,4 +1,4 @@
-// The keys that decide on recordings, with their values.
+// Prints the keys that control recordings, with their values.
 #include "prefs/preference_dump.h"
 
 #include <cstdio>

@@ -1,11 +1,11 @@
-// The recording settings on standard output, for the operator.
+// Prints the recording settings on standard output, for the operator.
 #pragma once
 
 namespace lmx {
 
-/// What the daemon reads from the preferences file.
+/// Settings that the daemon reads from the preferences file.
 void dumpDaemon();
-/// What the ad-hoc mode reads from the preferences domain.
+/// Settings that ad-hoc mode reads from the preferences domain.
 void dumpAdHoc();
 
 }  // namespace lmx

@@ -1,4 +1,4 @@
-// Choosing devices and compressions, checking what the preferences say.
+// Chooses devices and compressions, and validates the preferences.
 #include "prefs/recording_context.h"
 
 #include <cstdlib>

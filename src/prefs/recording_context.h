@@ -1,4 +1,4 @@
-// Builds the settings of a capture from the preferences, and refuses those that can't work.
+// Builds capture settings from the preferences, and rejects those that can't work.
 #pragma once
 #include <memory>
 #include <optional>
@@ -10,27 +10,28 @@
 
 namespace lmx {
 
-/// Raised for preferences that can't be used; name() is always "Preference Error", what() the reason.
+/// Raised for unusable preferences. name() is always "Preference Error"; what() gives the reason.
 class PreferenceError : public std::runtime_error {
  public:
   using std::runtime_error::runtime_error;
   [[nodiscard]] static const char* name() { return "Preference Error"; }
 };
 
-/// Builds the capture settings of one recording. One thread.
+/// Builds the capture settings of one recording. For use on one thread.
 class RecordingContextBuilder {
  public:
-  /// @param read  how each key is read; @param catalog  the devices and compressions to choose from
+  /// @param read  how to read each key
+  /// @param catalog  the available devices and compressions
   RecordingContextBuilder(AgentPreferences& prefs, AgentPreferences::Selector read, CaptureCatalog& catalog)
       : prefs_(prefs), read_(read), catalog_(catalog) {}
 
-  /// "RecordingType" as the capture framework numbers it. Throws PreferenceError.
+  /// "RecordingType" as the capture framework's number. Throws PreferenceError.
   CaptureType captureTypeFromPrefs();
   /// The settings for a recording of `type`. Throws PreferenceError.
   /// @return null when continuous capture is misconfigured (logged)
   std::shared_ptr<LMRRecordingContext> newRecordingContext(CaptureType type);
 
-  // Each resets the cache of the preferences, so that the next attempt reads the file afresh.
+  // Each resets the preferences cache, so that the next attempt reads the file again.
   [[noreturn]] void failInvalidCompression(const std::string& key, const std::string& value);
   [[noreturn]] void failInvalidDevice(const std::string& key, const std::string& value);
   [[noreturn]] void failInvalidPreference(const std::string& key, const std::string& value);
@@ -48,8 +49,8 @@ class RecordingContextBuilder {
   CaptureCatalog& catalog_;
 };
 
-// The settings for one recording, from new preferences. All throw PreferenceError; null when continuous
-// capture is misconfigured (logged).
+// The settings for one recording, from newly read preferences. All throw PreferenceError; null when
+// continuous capture is misconfigured (logged).
 std::shared_ptr<LMRRecordingContext> newRecordingContextForAdHoc(CaptureCatalog& catalog);
 std::shared_ptr<LMRRecordingContext> newRecordingContextForDaemon(CaptureCatalog& catalog);
 std::shared_ptr<LMRRecordingContext> newRecordingContextForDaemonWithRecordingType(CaptureCatalog& catalog,

@@ -1,4 +1,4 @@
-// One table of names and numbers.
+// The table of recording types, with names and numbers.
 #include "prefs/recording_types.h"
 
 namespace lmx {

@@ -1,4 +1,4 @@
-// The names of the recording types, as preferences and documents spell them.
+// The names of the recording types in preferences and properties documents.
 #pragma once
 #include <optional>
 #include <string>
@@ -9,11 +9,11 @@
 
 namespace lmx {
 
-/// The name of a type; null for a code that has none.
+/// The name of a type; null for an unknown code.
 const char* recTypeToString(int code);
-/// The code of a name; kRecordingTypeNone for an unknown or absent one.
+/// The code for a name; kRecordingTypeNone for an unknown or absent one.
 RecordingTypeCode recTypeToCode(const std::optional<std::string>& name);
-/// The capture framework's number for a name; picture and sound for an unknown one.
+/// The capture framework's number for a name; audio and video for an unknown one.
 CaptureType captureTypeFromString(std::string_view name);
 
 }  // namespace lmx

@@ -1,4 +1,4 @@
-// Reading the secret's property list.
+// Reads the secret's property list.
 #include "prefs/shared_secret.h"
 
 #include <algorithm>

@@ -7,8 +7,9 @@
 
 namespace lmx {
 
-/// Reads the secret shared with `server_uuid` from its file. An empty message: the file holds a text that is
-/// not the Base64 form of 16 bytes.
+/// Reads the secret shared with `server_uuid` from its file.
+/// @return the secret or an error; an empty error message means that the text in the file is not the Base64
+/// form of 16 bytes
 Result<ServerSettings::Secret> readSharedSecret(const std::string& server_uuid);
 
 }  // namespace lmx

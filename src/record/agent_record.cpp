@@ -1,4 +1,4 @@
-// The session's copy and its end.
+// Copies and cleans up the recording session.
 #include "record/agent_record.h"
 
 #include "model/agent_context.h"
@@ -64,8 +64,8 @@ std::shared_ptr<AgentRecord> AgentRecord::copy() const {
 
 void AgentRecord::cleanup() {
   if (cleaned_up_.exchange(true)) return;
-  // A copy describes a capture that has been stopped already; only the session itself may stop one. The
-  // pointer owns nothing: cleanup also runs in the destructor, where no owner is left.
+  // Only the session itself may stop a capture; a copy describes one that has already been stopped. The
+  // pointer is non-owning: cleanup also runs in the destructor, where no owner is left.
   if (status.get() == kRecorderRecording && !is_copy_) {
     LXAgentRecordStopCapture(std::shared_ptr<AgentRecord>(std::shared_ptr<AgentRecord>(), this));
   }

@@ -1,4 +1,4 @@
-// The recording session: settings, status, time marks and capture objects of the agent's one recorder.
+// The recording session: settings, status, time marks and capture objects of the agent's only recorder.
 #pragma once
 #include <cstdint>
 #include <memory>
@@ -22,8 +22,8 @@ class LMRCaptureController;
 class LMRCaptureDelegate;
 class MyLMRPreviewController;
 
-/// Every field is thread-safe: values are copied in and out. A time that is not set is absent. The
-/// statusAndTimingMutex makes several of them one step (prepare, stop and get-status hold it).
+/// Every field is thread-safe: values are copied in and out. A time that is not set is absent. Hold the
+/// statusAndTimingMutex to combine several accesses into one step (prepare, stop and get-status do).
 class AgentRecord : public RecordingSettings, public std::enable_shared_from_this<AgentRecord> {
  public:
   using Text = std::optional<std::string>;
@@ -40,52 +40,52 @@ class AgentRecord : public RecordingSettings, public std::enable_shared_from_thi
   SharedValue<std::string> recording_uuid;
   SharedValue<bool> audioOnlyMode;
   SharedValue<SharedDictionary> metadata;
-  /// Pixels; nobody sets them yet.
+  /// Pixels; not set anywhere yet.
   SharedValue<std::uint32_t> videoWidth;
   SharedValue<std::uint32_t> videoHeight;
 
-  // Who asked for it.
+  // Who requested it.
   SharedValue<std::string> request_uuid;
-  /// The START parameters that came with request_uuid: what the finished recording is named and described by,
-  /// even when a later START has replaced the agent's properties meanwhile.
+  /// The START parameters that came with request_uuid. They name and describe the finished recording even
+  /// when a later START has replaced the agent's properties.
   SharedValue<SharedDictionary> request_properties;
 
-  // How it stands.
+  // Its progress.
   SharedValue<std::int32_t> status{kRecorderIdle};
   SharedValue<std::int32_t> error{kRecordSuccess};
   SharedValue<Time> launchTime;  ///< when it was prepared
-  SharedValue<Time> startTime;   ///< when the capture thread began it
+  SharedValue<Time> startTime;   ///< when the capture thread started it
   SharedValue<Time> stopTime;
   SharedValue<Time> elapsedTime;
-  SharedValue<Time> lastContact;  ///< of a server or a client
+  SharedValue<Time> lastContact;  ///< from a server or a client
   StopTimes stop_times;
-  /// Whether the 15-second auto-shutoff timer of a capture thread is running for this session.
+  /// Whether a capture thread's 15-second auto-shutoff timer runs for this session.
   SharedValue<bool> autoShutoffCheckTimer;
 
-  // Who does it.
+  // The objects that record.
   SharedValue<std::shared_ptr<MyLMRPreviewController>> previewController;
   SharedValue<std::shared_ptr<LMRCaptureController>> captureController;
   SharedValue<std::shared_ptr<LMRCaptureDelegate>> captureControllerDelegate;
   SharedValue<std::shared_ptr<CaptureThread>> captureThread;
 
-  /// The type of the recording that was prepared last; the configured type may change under it. Falls back to
-  /// the configured type before the first one.
+  /// The type of the recording prepared last, since the configured type may change meanwhile. Before the
+  /// first one, the configured type.
   [[nodiscard]] std::int32_t recordedType() const;
   void setRecordedType(std::int32_t type) { recordedType_.set(type); }
 
-  /// @return the lock's result, 0 when locked. Recursive.
+  /// @return the lock's result; 0 when locked. Recursive.
   int lockStatusAndTimingMutex() { return statusAndTimingLock_.lock(); }
   int unlockStatusAndTimingMutex() { return statusAndTimingLock_.unlock(); }
 
-  /// Stamps the last contact; while a recording is active or paused also moves the soft stop.
+  /// Sets the time of the last contact. While a recording is active or paused this also moves the soft stop.
   void updateLastContact();
-  /// When the recording began. The capture thread may not have stamped its start yet when a recording is
-  /// stopped at once: then the time at which it was prepared.
+  /// When the recording began. If it was stopped before the capture thread set the start time, this is the
+  /// time at which it was prepared.
   [[nodiscard]] Time beginning() const;
 
-  /// A copy with own values, own (unlocked) mutexes and shared capture objects; no timer.
+  /// A copy with its own values and its own unlocked mutexes, but shared capture objects. It has no timer.
   [[nodiscard]] std::shared_ptr<AgentRecord> copy() const;
-  /// Stops a running capture and lets go of everything. Runs once.
+  /// Stops a running capture and releases everything. Takes effect once.
   void cleanup();
 
  private:
@@ -95,7 +95,7 @@ class AgentRecord : public RecordingSettings, public std::enable_shared_from_thi
   RecursiveMutex statusAndTimingLock_;
 };
 
-/// A new context with a new session.
+/// Creates a context with a new session.
 std::shared_ptr<AgentContext> newAgentContext();
 
 }  // namespace lmx

@@ -1,4 +1,4 @@
-// The end of a recording that nobody ended.
+// Stops recordings automatically.
 #include "record/auto_shutoff.h"
 
 #include <cstdlib>
@@ -10,7 +10,7 @@
 namespace lmx {
 namespace {
 
-/// Forgets `deadline` if it is still `known`: meanwhile the session may have gone on to the next recording.
+/// Clears `deadline` if it still equals `known`. The session may have moved on to the next recording.
 void forget(SharedValue<StopTimes::Time>& deadline, const StopTimes::Time& known) {
   const auto now = deadline.get();
   const bool same = now.has_value() == known.has_value() && (!now || lmp_diff_timeval(*now, *known) == 0);

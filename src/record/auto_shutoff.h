@@ -4,10 +4,10 @@
 
 namespace lmx {
 
-/// Stops the recording when a deadline has passed. Capture thread, every 15 seconds.
+/// Stops the recording when a deadline has passed. Runs on the capture thread every 15 seconds.
 void checkForAutoShutoffConditions(AgentRecord& session);
-/// Ends the recording: marks the stop and waits for the main thread's stopRecording. Ends the process in
-/// ad-hoc mode. Always 0.
+/// Ends the recording: marks the stop and waits for stopRecording on the main thread. In ad-hoc mode it ends
+/// the process. @return 0
 int doAutoShutoff(AgentRecord& session);
 
 }  // namespace lmx

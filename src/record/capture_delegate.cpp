@@ -1,4 +1,4 @@
-// Capture reports on their way to the main thread.
+// Passes capture reports on to the main thread.
 #include "record/capture_delegate.h"
 
 #include <algorithm>
@@ -21,8 +21,8 @@ bool meansDeviceLost(const std::optional<CaptureError>& error) {
 }
 
 void LMRCaptureDelegate::lmrCaptureDidComplete(const std::optional<CaptureError>& error) {
-  // The agent first: once the error can be seen, the main loop must know that there is still something to
-  // submit.
+  // Notify the agent first: by the time the error is visible, the main loop must know that a submission is
+  // pending.
   if (AgentActions* actions = engineEnvironment().actions) actions->captureDidComplete(controller_);
   if (error) recordError.set(error);
   resetDefaultRecordingType();
@@ -39,7 +39,7 @@ bool LMRCaptureDelegate::deviceDisconnected() const { return meansDeviceLost(rec
 void LMRCaptureDelegate::resetDefaultRecordingType() const {
   const auto context = engineEnvironment().context;
   const auto session = context ? context->record_context() : nullptr;
-  // A session that records on already has another controller: its type is that of the new recording.
+  // A session that is already recording again has another controller and the new recording's type.
   if (!session || session->captureController.get().get() != controller_) return;
   session->recordingType.set(recTypeToCode(context->recording.recording_type.get()));
   session->audioOnlyMode.set(false);

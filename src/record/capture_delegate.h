@@ -1,4 +1,4 @@
-// Receives the reports of a capture controller and hands them to the main thread.
+// Receives the reports of a capture controller and passes them to the main thread.
 #pragma once
 #include <optional>
 
@@ -7,19 +7,19 @@
 
 namespace lmx {
 
-/// One delegate a controller: a late report of an earlier capture can't be taken for one of the current
-/// capture.
+/// One delegate per controller, so that a late report of an earlier capture isn't attributed to the current
+/// one.
 class LMRCaptureDelegate : public CaptureControllerDelegate {
  public:
-  /// @param controller  the one that reports here; only compared, never used
+  /// @param controller  the reporting controller; compared but never dereferenced
   explicit LMRCaptureDelegate(const void* controller) : controller_(controller) {}
 
   void lmrCaptureDidComplete(const std::optional<CaptureError>& error) override;
   void lmrCaptureDidCancel(const std::optional<CaptureError>& error) override;
 
-  /// Whether the last error reported says that a device was lost.
+  /// Whether the last reported error means that a device was lost.
   [[nodiscard]] bool deviceDisconnected() const;
-  /// Puts the configured recording type back after a request for sound only.
+  /// Restores the configured recording type after an audio-only request.
   void resetDefaultRecordingType() const;
 
   SharedValue<std::optional<CaptureError>> recordError;  ///< the last error reported
@@ -28,7 +28,7 @@ class LMRCaptureDelegate : public CaptureControllerDelegate {
   const void* controller_;
 };
 
-/// Whether `error` belongs to the framework's domain and means that a device was lost.
+/// Whether `error` is in the framework's domain and means that a device was lost.
 bool meansDeviceLost(const std::optional<CaptureError>& error);
 
 }  // namespace lmx

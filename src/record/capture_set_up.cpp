@@ -1,4 +1,4 @@
-// From the preferences to a capture that is ready to start.
+// Builds a ready capture from the preferences.
 #include "record/capture_set_up.h"
 
 #include <cstdlib>

@@ -4,7 +4,7 @@
 
 namespace lmx {
 
-/// Makes a controller with its delegate for the context's session and has it prepare. Main thread.
+/// Creates a controller and its delegate for the context's session and prepares the capture. Main thread.
 /// @return 0, or 3 when the capture framework refuses
 int LXAgentRecordPrepareCaptureController(AgentContext& context);
 

@@ -1,4 +1,4 @@
-// The capture thread's body.
+// The body of the capture thread.
 #include "record/capture_thread.h"
 
 #include <atomic>
@@ -23,8 +23,8 @@ struct CaptureThread::State {
 
 namespace {
 
-/// The capture thread's body: starts the capture, then checks the stop times every 15 seconds until the
-/// controller has shut down. `cancelled` ends it earlier.
+/// Starts the capture, then checks the stop times every 15 seconds until the controller has shut down or
+/// `cancelled` ends it.
 void videoRunLoop(const std::shared_ptr<AgentRecord>& session,
                   const std::shared_ptr<LMRCaptureController>& controller,
                   const std::atomic<bool>& cancelled) {

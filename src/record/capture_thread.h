@@ -1,4 +1,4 @@
-// The thread that runs while a recording is active: starts the capture and checks the stop times.
+// The thread that runs while a recording is active. It starts the capture and checks the stop times.
 #pragma once
 #include <memory>
 
@@ -9,14 +9,14 @@ namespace lmx {
 class AgentRecord;
 class LMRCaptureController;
 
-/// Owns no thread handle: the thread keeps the session alive itself, ends with the capture, and is never
-/// joined (a stop may be waiting on it from the main thread). cancel() asks it to end at its next turn, at
-/// most 0.25 s later.
+/// Owns no thread handle. The thread keeps the session alive, ends with the capture and is never joined,
+/// because a stop may be waiting for the main thread on it. cancel() makes it end at its next turn, within
+/// 0.25 s.
 class CaptureThread {
  public:
   /// Starts a thread that runs videoRunLoop on `session`.
-  /// @param controller  its capture; null for a recording of a file
-  /// @return null when no thread could be made (logged).
+  /// @param controller  the session's capture; null for a recording of a file
+  /// @return null when no thread could be created (logged)
   static std::shared_ptr<CaptureThread> start(std::shared_ptr<AgentRecord> session,
                                               std::shared_ptr<LMRCaptureController> controller);
   void cancel();

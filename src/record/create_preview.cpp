@@ -1,4 +1,4 @@
-// Opens the camera for a look at it.
+// Opens the camera for preview frames.
 #include "record/create_preview.h"
 
 #include "capture/api/capture_framework.h"

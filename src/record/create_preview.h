@@ -1,4 +1,4 @@
-// Opens the camera for a look at it.
+// Opens the camera for preview frames.
 #pragma once
 #include <cstdint>
 #include <memory>
@@ -9,7 +9,7 @@
 
 namespace lmx {
 
-/// A controller that has the camera open, or null (logged).
+/// @return a controller that has opened the camera, or null (logged)
 std::shared_ptr<MyLMRPreviewController> LXAgentRecordCreatePreviewController(
     const std::optional<std::string>& videoDevice, const std::optional<std::string>& audioDevice,
     bool addAudio, std::int64_t intervalMilliseconds, std::shared_ptr<CaptureSession> session);

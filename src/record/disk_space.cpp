@@ -1,4 +1,4 @@
-// Measuring a volume with one system call.
+// Measures the space on a volume.
 #include "record/disk_space.h"
 
 #include <sys/vfs.h>

@@ -1,4 +1,4 @@
-// The engine's environment, in the one place where it can be reached.
+// Holds the engine's environment, which is reached only through here.
 #include "record/engine_environment.h"
 
 #include <utility>
@@ -11,7 +11,7 @@ namespace lmx {
 namespace {
 
 SharedValue<EngineEnvironment>& environmentSlot() {
-  // Reached by threads that outlive main: never destroyed.
+  // Never destroyed: threads that outlive main use it.
   static SharedValue<EngineEnvironment>& slot = *std::make_unique<SharedValue<EngineEnvironment>>().release();
   return slot;
 }

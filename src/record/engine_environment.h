@@ -1,4 +1,4 @@
-// What the recording engine works with.
+// The objects that the recording engine works with.
 #pragma once
 #include <memory>
 
@@ -9,8 +9,8 @@
 
 namespace lmx {
 
-/// Set once at start-up before any thread starts, and reached by the engine's plain functions. Any of them
-/// may be absent in tests.
+/// Set at start-up before any thread starts; used by the engine's free functions. In tests any of them may be
+/// absent.
 struct EngineEnvironment {
   std::shared_ptr<AgentContext> context;
   AgentActions* actions = nullptr;  ///< lives until the process ends
@@ -19,10 +19,10 @@ struct EngineEnvironment {
 void setEngineEnvironment(EngineEnvironment environment);
 EngineEnvironment engineEnvironment();
 
-/// Tells the agent of an error of the engine, a RecordError.
+/// Reports an engine error, a RecordError, to the agent.
 void reportRuntimeError(int code);
 
-/// Logs that `function` was called with arguments that make no sense. @return kRecordInvalidArguments
+/// Logs that `function` was called with invalid arguments. @return kRecordInvalidArguments
 int invalidArguments(const char* function);
 
 }  // namespace lmx

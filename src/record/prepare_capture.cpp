@@ -1,4 +1,4 @@
-// What is recorded where, and the beginning of it.
+// Decides what to record and where, and starts the recording.
 #include "record/prepare_capture.h"
 
 #include <cerrno>
@@ -20,7 +20,7 @@
 namespace lmx {
 namespace {
 
-/// What is to be recorded where; nothing when the movie path can't be formed.
+/// The movie's path and whether only audio is recorded.
 struct MovieChoice {
   std::optional<std::string> path;
   bool audioOnly = false;
@@ -60,7 +60,7 @@ void logPrepareFailure(AgentRecord& session, int result) {
   LMPLogMessage(nullptr, kLogError, "_LXAgentRecordPrepareCaptureSync received error");
 }
 
-/// The type to record. Looked up once: the session's own may be put back by the end of an earlier capture.
+/// The type to record. Determined once, because the end of an earlier capture may reset the session's type.
 std::int32_t wantedType(const AgentRecord& session, const SharedDictionary& metadata, bool adhoc) {
   const std::int32_t type = session.recordingType.get();
   const bool soundOnly = !adhoc && type != kRecordingTypeFile && isAudioOnly(metadata);
@@ -84,7 +84,7 @@ int prepareByType(AgentContext& context, AgentRecord& session, std::int32_t type
   return result;
 }
 
-/// @return kRecordSuccess, or kRecordNotRunning when there is no thread to record with.
+/// @return kRecordSuccess, or kRecordNotRunning when no capture thread could be started
 int beginCapture(AgentRecord& session, SharedDictionary metadata) {
   session.launchTime.set(lmp_gettimeofday());
   session.elapsedTime.set(TimeValue{});
@@ -106,8 +106,7 @@ int beginCapture(AgentRecord& session, SharedDictionary metadata) {
   return kRecordSuccess;
 }
 
-/// After a refused request for sound only the configured type counts again; a capture that is running has its
-/// own.
+/// Restores the configured type after a refused audio-only request. A running capture keeps its own type.
 void restoreType(const AgentContext& context, AgentRecord& session) {
   const RecordingTypeCode code = recTypeToCode(context.recording.recording_type.get());
   if (code != kRecordingTypeNone) session.recordingType.set(code);

@@ -1,4 +1,4 @@
-// Prepares and starts the agent's one recording.
+// Prepares and starts the agent's only recording.
 #pragma once
 #include <optional>
 #include <string>
@@ -8,9 +8,9 @@
 
 namespace lmx {
 
-/// Prepares and starts a recording with `metadata`. Main thread. @return a RecordError.
+/// Prepares and starts a recording with `metadata`. Main thread. @return a RecordError
 int LXAgentRecordPrepareCapture(AgentContext& context, SharedDictionary metadata);
-/// The same for the movie `path`, with the control-action mutex held.
+/// The same for the movie `path`. The caller holds the control-action mutex.
 int LXAgentRecordPrepareCaptureSync(AgentContext& context, const std::optional<std::string>& path,
                                     SharedDictionary metadata);
 

@@ -1,4 +1,4 @@
-// Keeping and handing out preview frames.
+// Stores preview frames and hands them out.
 #include "record/preview_controller.h"
 
 #include <ctime>

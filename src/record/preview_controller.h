@@ -1,4 +1,5 @@
-// The preview controller with the time of its last request, and the delegate that keeps the newest frame.
+// The preview controller, which knows the time of its last request, and the delegate that keeps the newest
+// frame.
 #pragma once
 #include <atomic>
 #include <cstdint>
@@ -12,8 +13,7 @@
 
 namespace lmx {
 
-/// Keeps the most recent JPEG frame. Frames come on a thread of the framework, copies are taken on channel
-/// threads.
+/// Keeps the most recent JPEG frame. Frames arrive on a thread of the framework; channel threads take copies.
 class MyLMRPreviewControllerDelegate : public LMRPreviewControllerDelegate {
  public:
   /// @param interval  milliseconds between frames
@@ -31,8 +31,8 @@ class MyLMRPreviewControllerDelegate : public LMRPreviewControllerDelegate {
   std::shared_ptr<const std::vector<std::uint8_t>> mLastJPEGData_;  // guarded by mLock_
 };
 
-/// A controller of the framework with the agent's own bookkeeping. Thread-safe where the framework's
-/// controller is.
+/// A controller of the framework with the agent's bookkeeping. Thread-safe where the framework's controller
+/// is.
 class MyLMRPreviewController {
  public:
   explicit MyLMRPreviewController(std::unique_ptr<LMRPreviewController> controller);
@@ -41,10 +41,10 @@ class MyLMRPreviewController {
   [[nodiscard]] const std::shared_ptr<MyLMRPreviewControllerDelegate>& delegate() const { return delegate_; }
   void setDelegate(std::shared_ptr<MyLMRPreviewControllerDelegate> delegate);
 
-  /// Seconds since 1970 of the last request for a frame; 0 when none is pending.
+  /// When a frame was last requested, in seconds since 1970; 0 when no request is pending.
   [[nodiscard]] std::int64_t mLastPreviewRequestTime() const { return last_request_; }
   void setMLastPreviewRequestTime(std::int64_t seconds) { last_request_ = seconds; }
-  /// Stamps the request time, then asks the delegate.
+  /// Sets the request time, then asks the delegate.
   [[nodiscard]] std::optional<std::string> base64PreviewFrameCopy();
 
  private:

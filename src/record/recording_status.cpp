@@ -1,4 +1,4 @@
-// Reading the session under its lock.
+// Reads the session's status under its lock.
 #include "record/recording_status.h"
 
 #include "capture/api/capture_framework.h"

@@ -1,4 +1,4 @@
-// What STATUS tells of the recorder.
+// The recorder's state for STATUS.
 #pragma once
 #include <cstdint>
 #include <memory>
@@ -8,10 +8,10 @@
 
 namespace lmx {
 
-/// Outputs of LXAgentRecordGetStatus. Times that are not set are left as they were.
+/// Output of LXAgentRecordGetStatus. A time that is not set leaves its field unchanged.
 struct RecordStatus {
   std::int32_t recordStatus = kRecorderIdle;
-  std::int32_t start = 0;  ///< seconds since 1970, as the following two
+  std::int32_t start = 0;  ///< seconds since 1970, as are the next two
   std::int64_t elapsedSeconds = 0;
   std::int32_t stop = 0;
   std::int32_t hardStop = 0;
@@ -20,7 +20,8 @@ struct RecordStatus {
   std::int32_t lastError = kRecordSuccess;
 };
 
-/// @param status  may be null. @return 0, 2 without a session, 6 when the lock can't be had.
+/// @param status  may be null
+/// @return 0; 2 without a session; 6 when the lock fails
 int LXAgentRecordGetStatus(const std::shared_ptr<AgentRecord>& session, RecordStatus* status);
 
 }  // namespace lmx

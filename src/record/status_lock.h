@@ -1,4 +1,4 @@
-// The session's status-and-timing mutex for a scope.
+// Holds the session's status-and-timing mutex for a scope.
 #pragma once
 #include "record/agent_record.h"
 

@@ -1,4 +1,4 @@
-// Stopping by type, and what a stop leaves in the session.
+// Stops a recording according to its type and updates the session.
 #include "record/stop_capture.h"
 
 #include <chrono>
@@ -17,7 +17,7 @@ using namespace std::chrono_literals;
 
 namespace {
 
-/// Waits until the controller has shut down, at most until `deadline`.
+/// Waits until the controller has shut down, or until `deadline`.
 void waitForShutDown(const std::shared_ptr<LMRCaptureController>& controller,
                      std::chrono::steady_clock::time_point deadline) {
   while (controller && !controller->hasShutDown() && std::chrono::steady_clock::now() < deadline) {
@@ -25,7 +25,7 @@ void waitForShutDown(const std::shared_ptr<LMRCaptureController>& controller,
   }
 }
 
-/// Stops a capture of the framework through the main thread. @return the agent's result.
+/// Stops a capture of the framework through the main thread. @return the agent's result
 int stopFrameworkCapture(AgentRecord& session, const std::shared_ptr<LMRCaptureController>& controller) {
   const EngineEnvironment environment = engineEnvironment();
   const auto deadline = std::chrono::steady_clock::now() + 10s;
@@ -66,7 +66,7 @@ int stopByType(AgentRecord& session, const std::shared_ptr<LMRCaptureController>
   return result;
 }
 
-/// Stop time now, elapsed time longer by the span since the start, status idle.
+/// Sets the stop time to now, adds the time since the start to the elapsed time, and sets the status to idle.
 void closeTimes(AgentRecord& session) {
   const auto now = lmp_gettimeofday();
   session.stopTime.set(now);

@@ -1,4 +1,4 @@
-// Stops the agent's one recording.
+// Stops the agent's only recording.
 #pragma once
 #include <memory>
 #include <optional>
@@ -9,11 +9,11 @@
 
 namespace lmx {
 
-/// Stops the session's recording; called by the capture thread and by AgentRecord::cleanup. @return a
-/// RecordError.
+/// Stops the session's recording. Called by the capture thread and by AgentRecord::cleanup. @return a
+/// RecordError
 int LXAgentRecordStopCapture(const std::shared_ptr<AgentRecord>& session);
 
-/// The stop time of a finished recording: now less the time shift.
+/// The stop time of a finished recording: now minus the time shift.
 std::optional<TimeValue> shiftedNow(const AgentContext& context);
 
 }  // namespace lmx

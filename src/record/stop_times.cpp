@@ -1,4 +1,4 @@
-// Setting deadlines and finding that they have passed.
+// Sets and checks the deadlines of a recording.
 #include "record/stop_times.h"
 
 #include <cstdlib>
@@ -26,7 +26,7 @@ StopTimes::Time deadlineIn(std::int32_t seconds) {
 }  // namespace
 
 void StopTimes::followWallClock(std::int64_t offset) {
-  constexpr std::int64_t kRounding = 1;  // of two times that are cut to seconds
+  constexpr std::int64_t kRounding = 1;  // both offsets are truncated to whole seconds
   const std::lock_guard lock(clock_mutex_);
   const std::int64_t step = clock_offset_ ? offset - *clock_offset_ : 0;
   clock_offset_ = offset;
@@ -51,7 +51,7 @@ void StopTimes::updateSoftStopTime() {
   softStopTime.set(std::nullopt);
   const std::int32_t minutes = maxUnattendedRecordingMinutes.get();
   if (minutes <= 0) return;
-  // 32 bits wrap: a limit of more than 68 years is as good as any other.
+  // 32 bits may wrap. A limit of more than 68 years need not be exact.
   const auto seconds = static_cast<std::int32_t>(static_cast<std::uint32_t>(minutes) * 60U);
   const Time deadline = deadlineIn(seconds);
   if (!deadline) return;

@@ -1,4 +1,4 @@
-// The deadlines that end a recording that nobody ends: hard stop and soft stop.
+// Deadlines that end a recording nobody stops: hard stop and soft stop.
 #pragma once
 #include <cstdint>
 #include <mutex>
@@ -9,35 +9,35 @@
 
 namespace lmx {
 
-/// Deadlines are wall-clock times; one that is not set is absent. They move along with a wall clock that is
-/// set: they say how long a recording may last. Thread-safe.
+/// Deadlines are wall-clock times; one that is not set is absent. When the wall clock is set they move with
+/// it, because they limit the length of a recording. Thread-safe.
 class StopTimes {
  public:
   using Time = std::optional<TimeValue>;
 
-  SharedValue<Time> hardStopTime;  ///< no recording lasts longer
-  SharedValue<Time> softStopTime;  ///< ends a recording that no server and no client asks about
+  SharedValue<Time> hardStopTime;  ///< the recording never runs past this time
+  SharedValue<Time> softStopTime;  ///< ends a recording that no server or client asks about
   SharedValue<std::int32_t> maxUnattendedRecordingMinutes;  ///< 0 or less: no soft stop
 
-  /// Recomputes the soft stop: now plus the unattended minutes, or none when those are 0 or less.
+  /// Sets the soft stop to now plus the unattended minutes, or clears it when those are 0 or less.
   void updateSoftStopTime();
-  /// Sets the hard stop `seconds` from now; 0 or less clears it.
+  /// Sets the hard stop to `seconds` from now; 0 or less clears it.
   void setRecordHardStopTimeSeconds(std::int32_t seconds);
   /// Whether a deadline has passed (logged).
   bool shouldStopRecording();
-  /// Forgets both deadlines.
+  /// Clears both deadlines.
   void clear();
-  /// Forgets deadlines that have passed: they would end a recording at its first check.
+  /// Clears deadlines that have passed. They would end a recording at its first check.
   void clearPassedDeadlines();
-  /// Moves the deadlines along when the wall clock was set since the last call.
+  /// Moves the deadlines if the wall clock was set since the last call.
   /// @param offset  see wallClockOffset()
   void followWallClock(std::int64_t offset);
-  /// Takes over the deadlines and the limit of `other`.
+  /// Copies the deadlines and the limit of `other`.
   void take(const StopTimes& other);
 
  private:
   std::mutex clock_mutex_;
-  std::optional<std::int64_t> clock_offset_;  // guarded by clock_mutex_; that of the last followWallClock
+  std::optional<std::int64_t> clock_offset_;  // guarded by clock_mutex_; from the last followWallClock
 };
 
 }  // namespace lmx

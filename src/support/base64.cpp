@@ -1,4 +1,4 @@
-// Base64 by table, both ways.
+// Table-driven Base64 encoding and decoding.
 #include "support/base64.h"
 
 #include <algorithm>
@@ -61,7 +61,7 @@ std::optional<std::string> lmp_decode_base64(std::string_view text) {
   std::uint32_t group = 0;
   for (std::size_t i = 0; i < digits.size(); ++i) {
     group = (group << 6) | kReverse[static_cast<unsigned char>(digits[i])];
-    // Of each group of four digits, every digit but the first completes a byte.
+    // In each group of four digits, every digit but the first completes a byte.
     if (i % 4 == 0) continue;
     const unsigned spare = 6 - 2 * static_cast<unsigned>(i % 4);
     bytes += static_cast<char>(static_cast<unsigned char>(group >> spare));

@@ -6,10 +6,10 @@
 
 namespace lmx {
 
-/// Text of `bytes`.
+/// Encodes `bytes`.
 std::string lmp_encode_base64(std::string_view bytes);
 
-/// Bytes of `text`; nothing when it holds anything outside the alphabet or wrong padding.
+/// Decodes `text`; nothing when it contains characters outside the alphabet or has wrong padding.
 std::optional<std::string> lmp_decode_base64(std::string_view text);
 
 }  // namespace lmx

@@ -1,4 +1,4 @@
-// Dates as text.
+// Converts dates to text and back.
 #include "support/date_text.h"
 
 #include <array>
@@ -6,7 +6,7 @@
 namespace lmx {
 namespace {
 
-/// Takes a text apart from the front; once something does not fit, nothing does any more.
+/// Parses a text from the front. After the first mismatch everything else fails, too.
 class DateScanner {
  public:
   explicit DateScanner(std::string_view text) : rest_(text) {}

@@ -1,4 +1,4 @@
-// The string-to-string dictionary that commands, properties and metadata travel in.
+// The string-to-string dictionary that holds the parameters of commands, properties and metadata.
 #pragma once
 #include <map>
 #include <memory>
@@ -9,10 +9,10 @@
 namespace lmx {
 
 using Dictionary = std::map<std::string, std::string, std::less<>>;
-/// Shared between threads; replaced, never edited in place. Null means none.
+/// Shared between threads. Replaced, never edited in place. Null means none.
 using SharedDictionary = std::shared_ptr<const Dictionary>;
 
-/// The value under `key`, or nothing when the dictionary or the key is absent.
+/// The value for `key`, or nothing when the dictionary or the key is absent.
 inline std::optional<std::string> lookUp(const Dictionary* dictionary, std::string_view key) {
   if (dictionary == nullptr) return std::nullopt;
   const auto found = dictionary->find(key);

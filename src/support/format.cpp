@@ -7,7 +7,7 @@
 namespace lmx {
 namespace {
 
-/// Text into `buffer` of `size` bytes. @return the length that it needs, without the NUL; negative on failure
+/// Formats into `buffer` of `size` bytes. @return the length needed, without the NUL; negative on failure
 __attribute__((format(printf, 3, 0))) int print(char* buffer, std::size_t size, const char* format,
                                                 va_list arguments) {
   va_list copy;

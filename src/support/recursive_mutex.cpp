@@ -1,4 +1,4 @@
-// Set-up of the agent's recursive mutexes.
+// Creates the agent's recursive mutexes.
 #include "support/recursive_mutex.h"
 
 #include <sysexits.h>

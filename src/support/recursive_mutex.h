@@ -1,11 +1,11 @@
-// The agent's one kind of mutex: recursive, and fatal when it can't be made.
+// The agent's only kind of mutex. It is recursive, and failing to create one ends the process.
 #pragma once
 #include <pthread.h>
 
 namespace lmx {
 
-/// Initialises `mutex` as a recursive mutex. When that fails the process exits at once with
-/// status 71, without a message: an agent without its locks must not record.
+/// Initialises `mutex` as a recursive mutex. On failure the process exits at once with status 71 and without
+/// a message: an agent without its locks must not record.
 void agent_init_recursive_mutex(pthread_mutex_t* mutex);
 
 /// A recursive mutex made by agent_init_recursive_mutex; meets BasicLockable for std::lock_guard.
@@ -16,7 +16,7 @@ class RecursiveMutex {
   RecursiveMutex& operator=(const RecursiveMutex&) = delete;
   ~RecursiveMutex() { pthread_mutex_destroy(&mutex_); }
 
-  /// @return the pthread result, 0 when locked.
+  /// @return the pthread result; 0 when locked
   int lock() noexcept { return pthread_mutex_lock(&mutex_); }
   int unlock() noexcept { return pthread_mutex_unlock(&mutex_); }
 

@@ -1,4 +1,4 @@
-// A value, or why there is none.
+// A value, or the reason why there is none.
 #pragma once
 #include <cerrno>
 #include <cstring>
@@ -9,23 +9,23 @@
 
 namespace lmx {
 
-/// Why something failed. The message is complete: it names what failed and the reason.
+/// Why something failed. The message is complete: it names what failed and why.
 struct Error {
   std::string message;
-  int systemError = 0;  ///< errno where the system gave the reason, else 0
+  int systemError = 0;  ///< errno when the system reported the reason, else 0
 
-  /// "WHAT: reason", with the system's words for `systemError`.
+  /// "WHAT: reason", with the system's text for `systemError`.
   static Error fromSystem(const std::string& what, int systemError = errno) {
     return {what + ": " + std::strerror(systemError), systemError};
   }
 };
 
-/// Holds either a value or an error, never neither. Expected failure is a value: look before you take.
+/// Holds either a value or an error. Check for a value before you use it.
 template <class T, class E = Error>
 class [[nodiscard]] Result {
  public:
   Result(T value)
-      : state_(std::in_place_index<0>, std::move(value)) {}  // NOLINT: implicit, as a return wants it
+      : state_(std::in_place_index<0>, std::move(value)) {}  // NOLINT: implicit, for plain returns
   Result(E error) : state_(std::in_place_index<1>, std::move(error)) {}  // NOLINT
 
   [[nodiscard]] bool ok() const { return state_.index() == 0; }

@@ -1,4 +1,4 @@
-// Scanning numbers, whatever the locale.
+// Parses numbers independently of the locale.
 #include "support/scan.h"
 
 #include <algorithm>
@@ -8,7 +8,8 @@
 namespace lmx {
 namespace {
 
-/// `text` from the number's first character on; from_chars takes a minus sign, but neither blanks nor a plus.
+/// `text` from the first character of the number. from_chars accepts a minus sign, but neither leading white
+/// space nor a plus.
 std::string_view numberPart(std::string_view text) {
   text.remove_prefix(std::min(text.find_first_not_of(" \t\n\v\f\r"), text.size()));
   if (text.starts_with('+') && !text.substr(1).starts_with('-')) text.remove_prefix(1);

@@ -1,4 +1,4 @@
-// A small value that several threads read and one or more replace.
+// A small value that several threads may read and replace.
 #pragma once
 #include <atomic>
 #include <mutex>
@@ -7,7 +7,7 @@
 
 namespace lmx {
 
-/// Copies in and out under a lock, so that no reader sees half a value or a freed string. Thread-safe.
+/// Copies in and out under a lock, so that no reader sees a partial value or a freed string. Thread-safe.
 template <class T>
 class SharedValue {
  public:
@@ -20,12 +20,12 @@ class SharedValue {
     const std::lock_guard lock(mutex_);
     return value_;
   }
-  /// The old value is destroyed after the lock is released: its destructor may do anything.
+  /// Destroys the old value after releasing the lock, because its destructor may run any code.
   void set(T value) {
     const std::lock_guard lock(mutex_);
     std::swap(value_, value);
   }
-  /// Stores `value` and returns what was there.
+  /// Stores `value` and returns the previous one.
   T exchange(T value) {
     const std::lock_guard lock(mutex_);
     std::swap(value_, value);

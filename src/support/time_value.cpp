@@ -1,4 +1,4 @@
-// Differences and text of time values.
+// Time arithmetic and the text of time values.
 #include "support/time_value.h"
 
 #include <ctime>
@@ -23,7 +23,7 @@ std::int64_t subtract(std::int64_t a, std::int64_t b) {
   return __builtin_sub_overflow(a, b, &difference) ? saturated(a < b) : difference;
 }
 
-/// Brings `micros` into 0 … 999999, moving whole seconds over.
+/// Normalises `micros` to 0 … 999999 and carries whole seconds.
 TimeValue normalised(std::int64_t seconds, std::int64_t micros) {
   std::int64_t carry = micros / kMicrosPerSecond;
   micros %= kMicrosPerSecond;
@@ -53,13 +53,13 @@ std::int64_t lmp_diff_timeval(const TimeValue& a, const TimeValue& b) {
       !__builtin_add_overflow(total, micros, &total)) {
     return total / 1000;
   }
-  // Too far apart for a count of microseconds: whole milliseconds, at most what fits.
+  // Microseconds overflow at this distance. Count whole milliseconds and saturate.
   if (__builtin_mul_overflow(seconds, std::int64_t{1000}, &total)) return saturated(seconds < 0);
   return add(total, micros / 1000);
 }
 
 std::string lmp_timeval_to_ctime(const TimeValue& value) {
-  // By hand instead of ctime_r, which has no room for years of more than four digits.
+  // Not ctime_r, whose buffer has no room for years of more than four digits.
   static constexpr const char* kDays[] = {"Sun", "Mon", "Tue", "Wed", "Thu", "Fri", "Sat"};
   static constexpr const char* kMonths[] = {"Jan", "Feb", "Mar", "Apr", "May", "Jun",
                                             "Jul", "Aug", "Sep", "Oct", "Nov", "Dec"};
@@ -89,7 +89,7 @@ std::int64_t wallClockOffset() {
 double secondsSinceReferenceDate() {
   std::timespec now{};
   clock_gettime(CLOCK_REALTIME, &now);
-  // The subtraction comes before the fraction: fewer digits are lost.
+  // Subtract before adding the fraction, which loses less precision.
   return (static_cast<double>(now.tv_sec) - kReferenceDateOffset) + static_cast<double>(now.tv_nsec) * 1e-9;
 }
 

@@ -1,4 +1,4 @@
-// Owner of a file descriptor.
+// Owns a file descriptor.
 #pragma once
 #include <unistd.h>
 

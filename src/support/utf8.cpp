@@ -1,4 +1,4 @@
-// UTF-8 and XML characters.
+// Checks UTF-8 and XML characters.
 #include "support/utf8.h"
 
 #include <algorithm>
@@ -8,7 +8,8 @@ namespace {
 
 constexpr bool isContinuation(unsigned char byte) { return (byte & 0xC0) == 0x80; }
 
-/// What a lead byte announces: the bytes of its sequence (0: no lead byte) and the range of the second one.
+/// What a lead byte says: the length of its sequence in bytes (0: not a lead byte) and the range of the
+/// second byte.
 struct Sequence {
   std::size_t length = 0;
   unsigned char second_from = 0x80;

@@ -1,4 +1,4 @@
-// Plays the server for one agent at a time: shows what it says, sends it what is typed or scripted.
+// Acts as the server for one agent at a time: prints its replies and sends typed or scripted commands.
 #include <editline/readline.h>
 #include <getopt.h>
 #include <netdb.h>
@@ -72,7 +72,7 @@ struct AddressListDeleter {
   void operator()(addrinfo* list) const noexcept { ::freeaddrinfo(list); }
 };
 
-/// @param problem  gets the reason for an invalid result
+/// @param problem  receives the reason for an invalid result
 UniqueFd listenOn(const Options& options, std::string& problem) {
   addrinfo hints{};
   hints.ai_flags = AI_NUMERICHOST | AI_PASSIVE;
@@ -101,7 +101,7 @@ class Connection {
   Connection(UniqueFd socket, const Options& options) : socket_(std::move(socket)), options_(options) {}
   [[nodiscard]] int descriptor() const { return socket_.get(); }
 
-  /// Takes the hello. @return false when there is none
+  /// Reads the agent's hello. @return false when there is none
   bool begin(const CipherBlock& secret) {
     const auto line = readLine(kReplyPatience);
     const auto hello = line ? parseHello(*line) : std::nullopt;
@@ -124,7 +124,7 @@ class Connection {
            static_cast<ssize_t>(line->size());
   }
 
-  /// Shows the next line. @return false when none came in time or the agent has gone
+  /// Prints the next line. @return false when none arrived in time or the agent has disconnected
   bool show(std::chrono::milliseconds patience) {
     const auto line = readLine(patience);
     if (!line) return false;
@@ -138,7 +138,7 @@ class Connection {
     if (awaited_ > 0) --awaited_;
     return true;
   }
-  /// Whether a command that was sent is still to be answered.
+  /// Whether a command is still unanswered.
   [[nodiscard]] bool awaitsReply() const { return awaited_ > 0; }
   [[nodiscard]] bool hasLine() const { return buffer_.find('\n') != std::string::npos; }
 
@@ -194,13 +194,13 @@ int runScript(Connection& agent, const std::string& path) {
       std::fprintf(stderr, "lmx-tunnel: no answer to \"%s\"\n", line.c_str());
       return kExitFailed;
     }
-    // The agent takes one line a packet: the next one must not join a line without an answer.
+    // The agent takes one line per packet. A command without a reply must not share a packet with the next.
     if (!getsReply(line)) std::this_thread::sleep_for(std::chrono::milliseconds(100));
   }
   return 0;
 }
 
-/// What a person types, through the line editor on a terminal, as it comes from a pipe.
+/// Reads typed commands: through the line editor on a terminal, else line by line.
 class Typist {
  public:
   explicit Typist(Connection& agent) : terminal_(isatty(STDIN_FILENO) == 1) {
@@ -214,7 +214,7 @@ class Typist {
   Typist(const Typist&) = delete;
   Typist& operator=(const Typist&) = delete;
 
-  /// Standard input is readable.
+  /// Call when standard input is readable.
   void read() {
     if (terminal_) return rl_callback_read_char();
     char bytes[4096];
@@ -242,16 +242,16 @@ class Typist {
     }
     if (*line != '\0') add_history(line);
     send(line);
-    std::free(line);  // NOLINT: the line editor's contract
+    std::free(line);  // NOLINT: the line editor allocates with malloc
   }
 
-  static inline Connection* agent_ = nullptr;  // the line editor's callback has no argument of its own
+  static inline Connection* agent_ = nullptr;  // the line editor's callback takes no user argument
   static inline bool ended_ = false;
   bool terminal_;
   std::string pending_;
 };
 
-/// Sends what is typed and shows what comes, until either side ends. @return whether it was the person
+/// Sends typed commands and prints replies until either side ends. @return whether the person ended it
 bool converse(Connection& agent) {
   Typist typist(agent);
   while (!Typist::ended()) {

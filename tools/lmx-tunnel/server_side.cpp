@@ -1,4 +1,4 @@
-// Hello, cipher and replies.
+// Parses hellos, encrypts commands and reads replies.
 #include "tools/lmx-tunnel/server_side.h"
 
 #include <algorithm>

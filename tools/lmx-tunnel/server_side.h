@@ -1,4 +1,4 @@
-// The server's side of the tunnel, as far as a person who sets up or debugs an agent needs it. Pure.
+// The server's side of the tunnel, limited to what is needed to set up or debug an agent. Pure.
 #pragma once
 #include <optional>
 #include <string>
@@ -9,7 +9,7 @@
 
 namespace lmx {
 
-/// What an agent says in clear.
+/// What an agent sends unencrypted.
 struct AgentHello {
   std::string agentUUID;
   std::string version;
@@ -17,7 +17,8 @@ struct AgentHello {
   bool offline = false;
 };
 
-/// @param line  without its line feed. @return nothing when it is no hello of protocol 1
+/// @param line  without its line feed
+/// @return nothing when it is not a hello of protocol 1
 std::optional<AgentHello> parseHello(const std::string& line);
 
 /// Encrypts and decrypts the lines of one connection.
@@ -25,9 +26,9 @@ class TunnelCipher {
  public:
   TunnelCipher(const CipherBlock& secret, const CipherBlock& vector) : secret_(secret), vector_(vector) {}
 
-  /// The line on the wire for a command, with its line feed; nothing when memory fails.
+  /// The encrypted line for a command, with its line feed; nothing when out of memory.
   [[nodiscard]] std::optional<std::string> encrypted(const std::string& command) const;
-  /// The text of a line; nothing when it does not decrypt.
+  /// The decrypted text of a line; nothing when it can't be decrypted.
   [[nodiscard]] std::optional<std::string> decrypted(const std::string& line) const;
 
  private:
@@ -35,13 +36,13 @@ class TunnelCipher {
   CipherBlock vector_;
 };
 
-/// The JPEG picture in a reply to STATUS; nothing when there is none.
+/// The JPEG image in a reply to STATUS; nothing when there is none.
 std::optional<std::string> previewIn(const std::string& reply);
 
-/// `reply` with its picture replaced by its size, for a terminal.
+/// `reply` with its image replaced by the image's size, for display on a terminal.
 std::string shortened(const std::string& reply);
 
-/// Whether the agent answers a command of that text.
+/// Whether the agent replies to this command.
 bool getsReply(const std::string& command);
 
 /// The 16 bytes under "lmx_secret" in the property list `path`. The error doesn't name the path.

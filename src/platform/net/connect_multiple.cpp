@@ -26,7 +26,7 @@ namespace {
 using Clock = std::chrono::steady_clock;
 constexpr std::chrono::seconds kTimePerHost{10};
 
-/// What ends a wait: the time, or a descriptor that becomes readable.
+/// What ends a wait: a deadline, or a descriptor that becomes readable.
 struct Patience {
   Clock::time_point deadline;
   int wake = -1;
@@ -52,7 +52,7 @@ bool isPort(std::string_view text) {
   return value >= 1 && value <= 65535;
 }
 
-/// Takes "host", "host:port", "[v6]" and "[v6]:port" apart; a bare v6 address (several colons) is a host.
+/// Parses "host", "host:port", "[v6]" and "[v6]:port". A bare IPv6 address (several colons) is a host.
 std::optional<Endpoint> parseEntry(std::string_view entry, std::string_view defaultPort) {
   std::string_view host = entry;
   std::string_view port = defaultPort;
@@ -87,7 +87,7 @@ int millisecondsUntil(Clock::time_point deadline) {
   return static_cast<int>(std::clamp<std::int64_t>(left, 0, 60000));
 }
 
-/// Waits until `fd` has one of `events` (or an error). @return false when the patience ended first.
+/// Waits until `fd` reports one of `events` or an error. @return false when `patience` ran out first
 bool awaitEvent(int fd, short events, const Patience& patience) {
   pollfd polled[2] = {{fd, events, 0}, {patience.wake, POLLIN, 0}};
   for (;;) {
@@ -102,15 +102,15 @@ bool isReadable(int fd) {
   return poll(&polled, 1, 0) > 0;
 }
 
-/// What a resolver thread and the caller that may have given up on it share.
+/// Shared by a resolver thread and a caller that may have stopped waiting for it.
 struct Lookup {
   UniqueFd done{eventfd(0, EFD_CLOEXEC)};
   std::mutex mutex;
   AddressList addresses;  // guarded by mutex
 };
 
-/// getaddrinfo has no time limit (dead name servers take half a minute), so a name is looked up on a
-/// thread of its own that is left behind when the time is over.
+/// getaddrinfo has no time limit (unreachable name servers take half a minute). It runs on a thread of its
+/// own, which is abandoned when time runs out.
 AddressList resolve(const Endpoint& endpoint, const Patience& patience) {
   if (AddressList numeric = resolveNow(endpoint, AI_NUMERICHOST)) return numeric;
   const auto lookup = std::make_shared<Lookup>();
@@ -129,7 +129,7 @@ AddressList resolve(const Endpoint& endpoint, const Patience& patience) {
   return std::move(lookup->addresses);
 }
 
-/// Waits until the connection is made or has failed. @return whether it is made.
+/// Waits until the connection is established or has failed. @return whether it is established
 bool awaitConnected(int fd, const Patience& patience) {
   if (!awaitEvent(fd, POLLOUT, patience)) return false;
   int error = 0;
@@ -144,7 +144,7 @@ UniqueFd connectTo(const addrinfo& address, const Patience& patience) {
   const int result = connect(fd.get(), address.ai_addr, address.ai_addrlen);
   if (result != 0 && errno != EINPROGRESS && errno != EINTR) return {};
   if (result != 0 && !awaitConnected(fd.get(), patience)) return {};
-  // Non-blocking was only for the time limit: the caller gets a socket as connect() leaves it.
+  // Non-blocking mode served only the time limit. The caller expects a blocking socket.
   const int flags = fcntl(fd.get(), F_GETFL);
   if (flags < 0 || fcntl(fd.get(), F_SETFL, flags & ~O_NONBLOCK) != 0) return {};
   return fd;
@@ -156,7 +156,7 @@ UniqueFd connectToHost(const Endpoint& endpoint, int wake) {
   int left = 0;
   for (const addrinfo* address = addresses.get(); address != nullptr; address = address->ai_next) ++left;
   for (const addrinfo* address = addresses.get(); address != nullptr; address = address->ai_next) {
-    // An even share of what is left: one mute address must not use up the time of the others.
+    // Each address gets an equal share of the time left, so that one that doesn't answer can't use it all.
     const auto now = Clock::now();
     UniqueFd fd = connectTo(*address, {now + (deadline - now) / left--, wake});
     if (fd.valid()) return fd;

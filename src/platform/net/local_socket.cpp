@@ -1,4 +1,4 @@
-// Unix-domain addresses.
+// Builds Unix-domain socket addresses.
 #include "platform/net/local_socket.h"
 
 #include <sys/socket.h>

@@ -1,4 +1,4 @@
-// Where the local control socket is.
+// Unix-domain socket addresses.
 #pragma once
 #include <sys/un.h>
 
@@ -7,7 +7,8 @@
 
 namespace lmx {
 
-/// The address of the socket file `path`; nothing when it is too long: cut off it would name another file.
+/// The address of the socket file `path`; nothing when the path is too long. Truncated, it would name another
+/// file.
 std::optional<sockaddr_un> localSocketAddress(const std::string& path);
 
 }  // namespace lmx

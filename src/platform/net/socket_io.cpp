@@ -1,4 +1,4 @@
-// Sending whole replies and waiting for descriptors without getting stuck on a peer.
+// Sends whole replies and waits for descriptors without getting stuck on a peer.
 #include "platform/net/socket_io.h"
 
 #include <poll.h>
@@ -13,10 +13,10 @@ namespace {
 
 using Clock = std::chrono::steady_clock;
 
-/// A peer that takes a few bytes now and then may hold its reply up for so many patiences altogether.
+/// Limit on a whole send, in multiples of `patience`, for a peer that takes only a few bytes at a time.
 constexpr int kPatiencesInAll = 6;
 
-/// Waits until `socket` takes bytes again. @return 0 or why not.
+/// Waits until `socket` is writable. @return 0, or the errno of the failure
 int awaitWritable(int socket, Clock::time_point deadline, int wake) {
   while (true) {
     const auto left = std::chrono::ceil<std::chrono::milliseconds>(deadline - Clock::now());
@@ -26,7 +26,7 @@ int awaitWritable(int socket, Clock::time_point deadline, int wake) {
     if (ready < 0 && errno != EINTR) return errno;
     if (ready <= 0) continue;
     if (waited[1].revents != 0) return ECANCELED;
-    return 0;  // errors included: the next send names them
+    return 0;  // also on errors: the next send reports them
   }
 }
 

@@ -1,4 +1,4 @@
-// Property lists through libplist.
+// Reads and writes property lists with libplist.
 #include "platform/plist/property_list.h"
 
 #include <fcntl.h>
@@ -119,7 +119,7 @@ struct Overloaded : Ts... {
 template <class... Ts>
 Overloaded(Ts...) -> Overloaded<Ts...>;
 
-/// The library's seconds are 32 bits wide; what lies outside of 1932 … 2069 becomes their end.
+/// libplist's seconds are 32 bits wide. Dates outside 1932 … 2069 are clamped.
 std::int32_t dateSeconds(const PlistDate& date) {
   if (std::isnan(date.secondsSinceReferenceDate)) return 0;
   constexpr double kLimit = std::numeric_limits<std::int32_t>::max();
@@ -152,7 +152,7 @@ plist_t newNode(const PlistValue& value) {
 }
 
 constexpr std::string_view kByteOrderMark = "\xEF\xBB\xBF";
-/// Far above every limit on files: lengths given to the library are 32 bits wide.
+/// Far above every limit on files. libplist takes lengths as 32 bits.
 constexpr std::size_t kParseLimit = 64U << 20;
 
 Error systemFailure(int error) { return {std::strerror(error), error}; }

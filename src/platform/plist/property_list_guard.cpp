@@ -1,4 +1,4 @@
-// Walking binary property lists to measure them.
+// Walks binary property lists to check their size before they are parsed.
 #include "platform/plist/property_list_guard.h"
 
 #include <bit>
@@ -12,9 +12,9 @@ namespace {
 
 constexpr std::uint64_t kTrailerSize = 32;
 constexpr std::uint64_t kHeaderSize = 8;
-/// Texts and data, each counted as often as it is referred to.
+/// Total size of texts and data, each counted as often as it is referenced.
 constexpr std::uint64_t kExpandedBytesLimit = 16U << 20;
-/// Dates are handed on as 32-bit seconds.
+/// Dates are passed on as 32-bit seconds.
 constexpr double kDateLimit = 2147483647.0;
 constexpr const char* kMalformed = "malformed binary property list";
 
@@ -52,14 +52,13 @@ class BinaryWalk {
     if (!problem_) problem_ = std::move(problem);
   }
 
-  /// Where an object's bytes begin; 0 when that is outside of the objects.
+  /// Offset of an object; 0 when it lies outside the object area.
   [[nodiscard]] std::uint64_t placeOf(std::uint64_t object) const {
     const std::uint64_t at = number(table_ + object * offset_size_, offset_size_);
     return at >= kHeaderSize && at < table_ ? at : 0;
   }
 
-  /// Reads the element count at and behind a marker and moves `at` to the elements. @return false when it
-  /// does not fit.
+  /// Reads the element count at a marker and moves `at` to the elements. @return false when it does not fit
   bool readCount(std::uint64_t& at, std::uint64_t& count) const {
     count = byte(at) & 0x0FU;
     ++at;
@@ -103,7 +102,7 @@ class BinaryWalk {
     if (byte(at) != 0x08 && byte(at) != 0x09) fail("a value of a kind that is not supported");
   }
 
-  /// A number of 2^n bytes, n at most `maximum`.
+  /// A number of 2^n bytes, where n is at most `maximum`.
   void walkFixed(std::uint64_t at, unsigned maximum) {
     const unsigned exponent = byte(at) & 0x0FU;
     const bool real_too_short = maximum == 3 && exponent < 2;
@@ -116,7 +115,7 @@ class BinaryWalk {
     if (!(seconds >= -kDateLimit && seconds <= kDateLimit)) fail("a date out of range");
   }
 
-  /// @return the bytes; empty when they are refused.
+  /// @return the bytes; empty when they are rejected
   std::string_view walkBytes(std::uint64_t at, unsigned unit, unsigned expanded) {
     std::uint64_t count = 0;
     if (!readCount(at, count) || count * unit > table_ - at) {
@@ -132,11 +131,11 @@ class BinaryWalk {
 
   void walkText(std::uint64_t at) {
     const bool wide = (byte(at) & 0xF0U) == 0x60;
-    // Two bytes of UTF-16 become up to three of UTF-8.
+    // Two bytes of UTF-16 become up to three bytes of UTF-8.
     const std::string_view text = walkBytes(at, wide ? 2 : 1, wide ? 3 : 1);
     const std::size_t step = wide ? 2 : 1;
     for (std::size_t i = 0; i < text.size(); i += step) {
-      // The library aborts the process on such a text.
+      // libplist aborts the process on such a text.
       if (text[i] == '\0' && text[i + step - 1] == '\0') return fail("a NUL character");
     }
   }
@@ -178,7 +177,7 @@ class BinaryWalk {
   std::uint64_t table_ = 0;
   std::size_t nodes_ = 0;
   std::uint64_t expanded_bytes_ = 0;
-  std::set<std::uint64_t> open_;  ///< the containers that are being walked: one met again contains itself
+  std::set<std::uint64_t> open_;  ///< containers being walked; finding one again means a cycle
   std::optional<std::string> problem_;
 };
 

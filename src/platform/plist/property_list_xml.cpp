@@ -69,8 +69,8 @@ void appendUtf8(std::string& out, std::uint32_t character) {
   }
 }
 
-/// The character that "#65" or "#x41" (what stands between "&" and ";") refers to; nothing when XML has no
-/// such.
+/// The character for a reference such as "#65" or "#x41" (the part between "&" and ";"); nothing when XML
+/// does not allow that character.
 std::optional<std::string> referredCharacter(std::string_view reference) {
   reference.remove_prefix(1);
   const bool hexadecimal = reference.starts_with('x');
@@ -110,14 +110,14 @@ class XmlReducer {
     takeTag();
   }
 
-  /// Text between values is nothing but layout.
+  /// Text between values must be white space.
   void takeText() {
     const std::string_view text = rest_.substr(0, rest_.find('<'));
     rest_.remove_prefix(text.size());
     if (inText()) addText(text);
   }
 
-  /// Characters given by number are put in their place here: the library aborts on some of them (NUL).
+  /// Resolves character references here, because libplist aborts on some of them (NUL).
   void addText(std::string_view text) {
     for (;;) {
       const std::size_t at = text.find("&#");
@@ -132,7 +132,7 @@ class XmlReducer {
     }
   }
 
-  /// @return what stands between the opening of `skip` characters and `end`.
+  /// Skips `skip` characters. @return the text up to `end`
   std::string_view takeUntil(std::string_view end, std::size_t skip) {
     const std::size_t at = rest_.find(end, skip);
     if (at == std::string_view::npos) {
@@ -149,7 +149,7 @@ class XmlReducer {
     if (inText()) appendEscaped(check_.clean, text);
   }
 
-  /// The inside of a tag up to its ">", quoted values skipped.
+  /// The contents of a tag up to its ">". A ">" in a quoted value does not end it.
   std::string_view takeMarkup() {
     char quote = '\0';
     for (std::size_t i = 1; i < rest_.size(); ++i) {
@@ -171,7 +171,7 @@ class XmlReducer {
   }
 
   void takeDoctype() {
-    // An internal subset may define entities that grow without end; no property list needs one.
+    // An internal subset may define entities that expand without limit. No property list needs one.
     const std::size_t end = rest_.find('>');
     if (rest_.substr(0, end).find('[') != std::string_view::npos) return fail("a DOCTYPE with definitions");
     (void)takeMarkup();

@@ -1,5 +1,4 @@
-// The agent itself with a scripted framework, child runner and service manager; its main loop is turned by
-// the test.
+// The agent with a scripted framework, child runner and service manager. The test drives its main loop.
 #pragma once
 #include <gtest/gtest.h>
 
@@ -17,7 +16,8 @@
 
 namespace lmx {
 
-/// A running daemon with an idle "Audio+Video" session; neither started nor looping.
+/// An agent marked as running, with an idle "Audio+Video" session. The daemon is not started and its loop
+/// does not run.
 class AgentTest : public ::testing::Test {
  protected:
   using Entries = std::vector<std::string>;
@@ -36,7 +36,7 @@ class AgentTest : public ::testing::Test {
     context_->recording.recording_repository_path.set(repository_.path());
     session_->recordingType.set(kRecordingTypeAudioVideo);
   }
-  /// Ends the captures, then waits until no thread and no work item can reach the agent any more.
+  /// Ends the captures and waits until no thread or work item can reach the agent any more.
   ~AgentTest() override {
     session_->status.set(kRecorderIdle);
     session_ = nullptr;
@@ -45,7 +45,7 @@ class AgentTest : public ::testing::Test {
       const auto made = framework_->controller(i);
       if (!made) continue;
       made->shut_down = true;
-      agent_.captureDidCancel(made.get());  // takes what is remembered of a capture that has not reported
+      agent_.captureDidCancel(made.get());  // drops the session kept for a capture that has not reported
     }
     turnTheLoop();
     EXPECT_TRUE(testing::waitUntil([&] { return framework_->allReleased(); }));
@@ -58,7 +58,7 @@ class AgentTest : public ::testing::Test {
   void setParameters(Dictionary values) {
     context_->state.properties.set(std::make_shared<const Dictionary>(std::move(values)));
   }
-  /// What a START does: parameters, prepare, mark. @return the capture's controller.
+  /// Does what a START does: parameters, prepare, mark. @return the capture's controller
   Controller start(const std::string& uuid, Dictionary more = {}) {
     more["RecordingMetadata_RECORDING_UUID"] = uuid;
     setParameters(std::move(more));
@@ -70,14 +70,14 @@ class AgentTest : public ::testing::Test {
     made->state = 3;
     return made;
   }
-  /// The framework's report that the capture has ended in order, from a thread of its own.
+  /// Reports the end of the capture as the framework does, from a thread of its own.
   static void reportEnd(const Controller& controller, const std::optional<CaptureError>& error = {}) {
     controller->shut_down = true;
     std::thread([&] {
       if (const auto delegate = controller->delegate()) delegate->lmrCaptureDidComplete(error);
     }).join();
   }
-  /// Waits for the next job of the list.
+  /// Waits for the next job in the list.
   std::shared_ptr<AgentSubmit> nextJob() {
     std::shared_ptr<AgentSubmit> job;
     testing::waitUntil([&] { return (job = context_->post_process_list.postProcessListNext()) != nullptr; });

@@ -1,4 +1,4 @@
-// The actions of the main thread, the engine's callbacks and the loss of the device.
+// Main-thread actions, engine callbacks and loss of the device.
 #include <chrono>
 #include <csignal>
 #include <ctime>
@@ -38,12 +38,12 @@ TEST_F(Actions, PrepareLeavesItsResultInTheStatus) {
 
 TEST_F(Actions, APreparationThatRunsOutOfMemoryIsNoRecording) {
   framework_->on_new_controller = [](auto&) { throw std::bad_alloc(); };
-  context_->state.status.set(0);  // what a START sets beforehand
+  context_->state.status.set(0);  // as a START does beforehand
   agent_.mainRunLoop().adoptThread();
   EXPECT_TRUE(agent_.perform(&AgentActions::prepareCapture, Wait::untilDone));
   EXPECT_EQ(context_->state.status.get(), kRecordNotRunning);
   framework_->on_new_controller = nullptr;
-  start("R1");  // finds no lock that was left behind
+  start("R1");  // succeeds: no lock was left held
 }
 
 TEST_F(Actions, PreviewActionsLogAndSucceedAlsoWithoutACamera) {
@@ -83,7 +83,7 @@ TEST_F(Actions, ResumeIsReportedOnlyWhenItChangesSomething) {
   EXPECT_EQ(log_.count(7, "Process resumeCapture"), 2);
 }
 
-TEST_F(Actions, PauseAndResumeLeaveTheStatus) {
+TEST_F(Actions, PauseAndResumeKeepTheStatus) {
   start("R1");
   context_->state.status.set(9);
   agent_.pauseCapture();
@@ -135,7 +135,7 @@ TEST_F(Actions, AdhocStopMarksTheShiftedStopThenStopsTheRecording) {
   const auto controller = start("R1");
   context_->options.adhoc.set(true);
   context_->state.timeshift_seconds.set(20);
-  setContinuous();  // a submission instead of another stop
+  setContinuous();  // submits instead of stopping again
   const double before = secondsSinceReferenceDate();
   agent_.stopCapture();
   const auto mark = controller->marks().back();
@@ -158,7 +158,7 @@ TEST_F(Actions, StopRecordingWithoutParametersIsACancelLineAndNothingElse) {
   EXPECT_EQ(journalCount("controller stopRecording"), 0);
 }
 
-TEST_F(Actions, StopRecordingIsContentWithAFilePath) {
+TEST_F(Actions, StopRecordingAcceptsAFilePathInsteadOfAUuid) {
   start("R1");
   setParameters({{"RecordingMetadata_ADHOC_FILE_PATH", movie("chosen.mov")}});
   agent_.stopRecording();
@@ -198,7 +198,7 @@ TEST_F(Actions, SignalsRunTheirActions) {
   }
 }
 
-TEST_F(Actions, AHangUpCancelsTheCaptureAndTheAgentGoesOn) {
+TEST_F(Actions, AHangUpCancelsTheCaptureAndTheAgentContinues) {
   start("R1");
   const std::int64_t before = std::time(nullptr);
   agent_.signal(SIGHUP);
@@ -235,7 +235,7 @@ TEST_F(Actions, OtherSignalNumbersAreIgnored) {
   EXPECT_TRUE(context_->state.running.get());
 }
 
-TEST_F(Actions, PerformedFromAnotherThreadTheyRunInTheLoop) {
+TEST_F(Actions, ActionsFromAnotherThreadRunInTheLoop) {
   session_->status.set(kRecorderRecording);
   std::atomic<bool> done{false};
   std::thread poster([&] {
@@ -270,7 +270,7 @@ TEST_F(Actions, CallbacksLogTheirLines) {
                                 {3, "An error occurred during recording (4)"}}));
 }
 
-/// Ends in the two-second pause that is part of the behaviour.
+/// Takes two seconds, because the behaviour under test includes a pause.
 TEST_F(Actions, ALostDeviceWaitsForTheQueue) {
   const auto delegate = std::make_shared<LMRCaptureDelegate>(nullptr);
   delegate->recordError.set(CaptureError{CaptureError::kDomain, kDeviceRemoved, "gone"});
@@ -290,7 +290,7 @@ TEST_F(Actions, ALostDeviceWaitsForTheQueue) {
   EXPECT_TRUE(log_.contains(2, "The capture device has been disconnected."));
 }
 
-TEST_F(Actions, ADeviceThatIsThereKeepsTheLoop) {
+TEST_F(Actions, APresentDeviceKeepsTheLoopRunning) {
   EXPECT_FALSE(agent_.devices().deviceDisconnected());
   start("R1");
   EXPECT_FALSE(agent_.devices().deviceDisconnected());

@@ -1,4 +1,4 @@
-// Cluster information from a scripted tool and from the cache on the disk.
+// Cluster information from a scripted tool and from the cache on disk.
 #include <gmock/gmock.h>
 
 #include "tests/unit/agent/agent_fixture.h"
@@ -44,7 +44,7 @@ class Cluster : public AgentTest {
   ClusterWatch::SharedPlist members_;
 };
 
-TEST_F(Cluster, TheToolIsAskedForTheHost) {
+TEST_F(Cluster, TheToolQueriesTheHost) {
   children_.result = exited(0, propertyListXml(members({"a", "b"})));
   EXPECT_EQ(watch_.clusterInformation("server", members_), 0);
   EXPECT_EQ(count(members_), 2U);
@@ -53,7 +53,7 @@ TEST_F(Cluster, TheToolIsAskedForTheHost) {
   EXPECT_EQ(children_.options().limit, std::chrono::seconds(20));
 }
 
-TEST_F(Cluster, OutputThatIsNoPropertyListHasNoMembers) {
+TEST_F(Cluster, InvalidOutputHasNoMembers) {
   for (const char* output :
        {"", "garbage", "<plist version=\"1.0\"><dict/></plist>", "<plist version=\"1.0\"><array/></plist>"}) {
     children_.result = exited(0, output);
@@ -62,12 +62,12 @@ TEST_F(Cluster, OutputThatIsNoPropertyListHasNoMembers) {
   }
 }
 
-TEST_F(Cluster, WithoutAHostNobodyIsAsked) {
+TEST_F(Cluster, WithoutAHostThereIsNoQuery) {
   EXPECT_EQ(watch_.clusterInformation(std::nullopt, members_), -1);
   EXPECT_TRUE(children_.runs().empty());
 }
 
-TEST_F(Cluster, AFailingToolWithoutACacheIsItsStatus) {
+TEST_F(Cluster, WithoutACacheAFailingToolsStatusIsReturned) {
   children_.result = exited(3);
   EXPECT_EQ(watch_.clusterInformation("server", members_), 3);
   EXPECT_EQ(members_, nullptr);
@@ -75,7 +75,7 @@ TEST_F(Cluster, AFailingToolWithoutACacheIsItsStatus) {
   EXPECT_TRUE(log_.contains(7, "Unable to retrieve cluster information from disk."));
 }
 
-TEST_F(Cluster, AHangingToolIsAFailedOne) {
+TEST_F(Cluster, AHangingToolCountsAsFailed) {
   children_.result = {ChildResult::End::timedOut, 9, ""};
   EXPECT_NE(watch_.clusterInformation("server", members_), 0);
   EXPECT_TRUE(log_.contains(3, "/usr/bin/lumex --listinfo has not answered for 20 seconds and was ended"));
@@ -91,7 +91,7 @@ TEST_F(Cluster, TheFirstMemberOfTheCacheIsSkipped) {
   EXPECT_TRUE(members_->contains("x"));
 }
 
-TEST_F(Cluster, ACacheOfOneMemberIsTheAnswerThoughNobodyWasAsked) {
+TEST_F(Cluster, ACacheOfOneMemberIsReturnedWithoutAnotherQuery) {
   cache(kServerInformation, members({"a"}));
   children_.result = exited(5);
   EXPECT_EQ(watch_.clusterInformation("server", members_), -1);
@@ -100,7 +100,7 @@ TEST_F(Cluster, ACacheOfOneMemberIsTheAnswerThoughNobodyWasAsked) {
   EXPECT_TRUE(log_.contains(7, "Unable to contact any member of the cluster."));
 }
 
-TEST_F(Cluster, AMembersOwnFailureIsTheStatus) {
+TEST_F(Cluster, AMembersFailureIsReturned) {
   cache(kServerInformation, members({"a", "b", "c"}));
   children_.result = exited(5);
   EXPECT_EQ(watch_.clusterInformation("server", members_), 5);
@@ -108,7 +108,7 @@ TEST_F(Cluster, AMembersOwnFailureIsTheStatus) {
   EXPECT_EQ(count(members_), 3U);
 }
 
-TEST_F(Cluster, TheSecondCacheCountsOnlyWithoutTheFirst) {
+TEST_F(Cluster, TheSecondCacheIsReadOnlyWithoutTheFirst) {
   cache(kServerInformationOfRoot, members({"second"}));
   EXPECT_TRUE(ClusterWatch::clusterInformationFromDisk()->contains("second"));
   cache(kServerInformation, members({"first"}));

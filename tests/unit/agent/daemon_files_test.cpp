@@ -19,7 +19,7 @@ class DaemonFiles : public AgentTest {
     fs::remove_all(systemPath(kPidFile));
     fs::remove_all(systemPath(kTimeShiftFile));
   }
-  /// One turn of the main loop, which is where the time shift is read.
+  /// Runs one turn of the main loop, which reads the time shift.
   void turn() {
     agent_.mainRunLoop().post([this] { context_->state.running.set(false); }, Wait::no);
     EXPECT_EQ(agent_.mainLoop().appLoop(), 0);
@@ -27,7 +27,7 @@ class DaemonFiles : public AgentTest {
   }
 };
 
-TEST_F(DaemonFiles, PidFileHoldsTheProcessInDecimal) {
+TEST_F(DaemonFiles, PidFileHoldsTheProcessIdInDecimal) {
   EXPECT_EQ(createPIDFile(*context_), 0);
   EXPECT_EQ(readFile(systemPath(kPidFile)), std::to_string(getpid()) + "\n");
   EXPECT_EQ(fs::status(systemPath(kPidFile)).permissions(), fs::perms{0644});
@@ -42,14 +42,14 @@ TEST_F(DaemonFiles, PidFileReplacesALongerOne) {
   EXPECT_EQ(readFile(systemPath(kPidFile)), std::to_string(getpid()) + "\n");
 }
 
-TEST_F(DaemonFiles, PidFileThatCannotBeMadeIsAFailureWithoutALine) {
+TEST_F(DaemonFiles, PidFileThatCannotBeCreatedFailsSilently) {
   fs::create_directory(systemPath(kPidFile));
   EXPECT_EQ(createPIDFile(*context_), 1);
   EXPECT_TRUE(log_.entries().empty());
 }
 
-TEST_F(DaemonFiles, PidFileThatAccessIsDeniedToIsOnlyLogged) {
-  // The effective user of this thread alone: root is denied nothing.
+TEST_F(DaemonFiles, DeniedAccessToThePidFileIsOnlyLogged) {
+  // Changes the effective user of this thread only: root is never denied access.
   if (geteuid() != 0) GTEST_SKIP() << "needs root to become somebody else";
   fs::permissions(systemPath("/var/run"), fs::perms{0700});
   fs::permissions(systemPath(""), fs::perms{0755});
@@ -60,7 +60,7 @@ TEST_F(DaemonFiles, PidFileThatAccessIsDeniedToIsOnlyLogged) {
   EXPECT_TRUE(log_.contains(3, "unable to write pid file (EACCES)"));
 }
 
-TEST_F(DaemonFiles, RepositoryThatExistsIsTaken) {
+TEST_F(DaemonFiles, ExistingRepositoryIsUsed) {
   EXPECT_TRUE(
       setupRecordingRepository(*context_, context_->recording.recording_repository_path.get().value()));
   EXPECT_TRUE(log_.entries().empty());

@@ -1,4 +1,4 @@
-// The watch over free space, against a volume that really has some and a controller that deletes as scripted.
+// The free-space monitor with a real volume and a controller that deletes as scripted.
 #include <gmock/gmock.h>
 
 #include "tests/unit/agent/agent_fixture.h"
@@ -30,7 +30,7 @@ class DiskSpaceGuardTest : public AgentTest {
   }
 };
 
-TEST_F(DiskSpaceGuardTest, LeavesARecordingAloneWhileThereIsSpace) {
+TEST_F(DiskSpaceGuardTest, KeepsRecordingWhileThereIsSpace) {
   start("R1")->devices_run = true;
   agent_.diskSpaceGuard().checkDiskSpace();
   EXPECT_EQ(journalCount("controller stopRecording"), 0);
@@ -38,7 +38,7 @@ TEST_F(DiskSpaceGuardTest, LeavesARecordingAloneWhileThereIsSpace) {
   EXPECT_TRUE(context_->state.running.get());
 }
 
-TEST_F(DiskSpaceGuardTest, StopsTheRecordingAndSaysSoOnce) {
+TEST_F(DiskSpaceGuardTest, StopsTheRecordingAndLogsItOnce) {
   const auto controller = start("R1");
   controller->devices_run = true;
   session_->diskSpaceCutoffInMB.set(kNeverEnough);
@@ -54,7 +54,7 @@ TEST_F(DiskSpaceGuardTest, StopsTheRecordingAndSaysSoOnce) {
   EXPECT_NE(nextJob(), nullptr) << "what was recorded until then is submitted";
 }
 
-TEST_F(DiskSpaceGuardTest, DoesNotRecordAgainByItselfInPlainMode) {
+TEST_F(DiskSpaceGuardTest, DoesNotRestartOutsideContinuousMode) {
   session_->diskSpaceCutoffInMB.set(kNeverEnough);
   agent_.diskSpaceGuard().checkDiskSpace();
   session_->diskSpaceCutoffInMB.set(1);
@@ -62,7 +62,7 @@ TEST_F(DiskSpaceGuardTest, DoesNotRecordAgainByItselfInPlainMode) {
   EXPECT_EQ(framework_->controllersMade(), 0U);
 }
 
-TEST_F(DiskSpaceGuardTest, RecordsAgainInContinuousMode) {
+TEST_F(DiskSpaceGuardTest, RestartsInContinuousMode) {
   setContinuous(true);
   agent_.diskSpaceGuard().checkDiskSpace();
   EXPECT_EQ(framework_->controllersMade(), 1U);
@@ -82,7 +82,7 @@ TEST_F(DiskSpaceGuardTest, RecordsAgainInContinuousMode) {
   EXPECT_EQ(framework_->controllersMade(), 2U);
 }
 
-TEST_F(DiskSpaceGuardTest, TellsOfTheNextShortageOnceThereWasSpaceAgain) {
+TEST_F(DiskSpaceGuardTest, LogsTheNextShortageAfterSpaceWasAvailable) {
   setContinuous(true);
   session_->diskSpaceCutoffInMB.set(kNeverEnough);
   agent_.diskSpaceGuard().checkDiskSpace();

@@ -1,4 +1,4 @@
-// The turns of the main loop: a missed device, forgotten previews, the server's refusal, and how it ends.
+// Main-loop turns: a missing device, forgotten previews, the server's refusal, and how the loop ends.
 #include <unistd.h>
 
 #include <cstdio>
@@ -13,14 +13,14 @@
 namespace lmx {
 namespace {
 
-/// The main loop's checks, a turn at a time.
+/// Runs the main loop's checks one turn at a time.
 class MainLoopTest : public AgentTest {
  protected:
   static constexpr const char* kOffline =
       "Unable to acquire the specified video device. The agent will remain offline until the device becomes "
       "available.";
 
-  /// @return whether the loop would have gone on after this turn.
+  /// @return whether the loop would have continued after this turn
   bool turn() {
     bool goesOn = false;
     agent_.mainRunLoop().post(
@@ -38,12 +38,12 @@ class MainLoopTest : public AgentTest {
   }
 };
 
-TEST_F(MainLoopTest, ADeviceThatIsNotMissedIsNotLookedFor) {
+TEST_F(MainLoopTest, APresentDeviceIsNotLookedFor) {
   EXPECT_TRUE(turn());
   EXPECT_EQ(session_->previewController.get(), nullptr);
 }
 
-TEST_F(MainLoopTest, AMissedDeviceIsLookedForAfterMoreThanTenSeconds) {
+TEST_F(MainLoopTest, AMissingDeviceIsLookedForAfterMoreThanTenSeconds) {
   checkedDevice(9);
   EXPECT_TRUE(turn());
   EXPECT_EQ(session_->previewController.get(), nullptr);
@@ -66,7 +66,7 @@ TEST_F(MainLoopTest, ASecondSignalWhileTheTunnelClosesIsHarmless) {
     checkedDevice(11);
     ASSERT_TRUE(turn());  // opens the tunnel
     agent_.mainRunLoop().post([&] { agent_.shutDownControl(); }, Wait::no);
-    agent_.shutDownControl();  // turns the loop until the tunnel's thread has ended
+    agent_.shutDownControl();  // runs the loop until the tunnel's thread has ended
     turnTheLoop();
   }
   EXPECT_EQ(log_.count(7, "Process shutDownControl"), 40);
@@ -94,7 +94,7 @@ TEST_F(MainLoopTest, ADeviceThatFailedGetsOneMoreRetryWithAWarning) {
   EXPECT_EQ(log_.count(4, kOffline), 1);
 }
 
-TEST_F(MainLoopTest, ADeviceThatIsBackForgetsTheWarning) {
+TEST_F(MainLoopTest, AReturningDeviceClearsTheWarning) {
   agent_.shutDownControlBecauseDeviceFailed();
   checkedDevice(11);
   EXPECT_TRUE(turn());
@@ -104,7 +104,7 @@ TEST_F(MainLoopTest, ADeviceThatIsBackForgetsTheWarning) {
   EXPECT_FALSE(log_.mentions(kOffline));
 }
 
-TEST_F(MainLoopTest, PreferencesThatAreGoneAtTheRetryEndTheDaemon) {
+TEST_F(MainLoopTest, MissingPreferencesAtTheRetryEndTheDaemon) {
   framework_->audio_device_usable = false;
   checkedDevice(11);
   EXPECT_FALSE(turn());
@@ -113,7 +113,7 @@ TEST_F(MainLoopTest, PreferencesThatAreGoneAtTheRetryEndTheDaemon) {
                             "for preference: RecordingAudioInput"));
 }
 
-TEST_F(MainLoopTest, APreviewThatNobodyAsksForIsStoppedAfterSixteenSeconds) {
+TEST_F(MainLoopTest, AnUnrequestedPreviewIsStoppedAfterSixteenSeconds) {
   const auto preview = LXAgentRecordCreatePreviewController("camera", std::nullopt, false, 400, nullptr);
   ASSERT_NE(preview, nullptr);
   session_->previewController.set(preview);
@@ -131,7 +131,7 @@ TEST_F(MainLoopTest, APreviewThatNobodyAsksForIsStoppedAfterSixteenSeconds) {
   EXPECT_TRUE(log_.contains(7, "Process stopPreview"));
 }
 
-TEST_F(MainLoopTest, ALostDeviceEndsItWithOne) {
+TEST_F(MainLoopTest, ALostDeviceEndsTheLoopWithOne) {
   const auto delegate = std::make_shared<LMRCaptureDelegate>(nullptr);
   delegate->recordError.set(CaptureError{CaptureError::kDomain, kDeviceRemoved, "gone"});
   session_->captureControllerDelegate.set(delegate);
@@ -139,16 +139,16 @@ TEST_F(MainLoopTest, ALostDeviceEndsItWithOne) {
   EXPECT_FALSE(context_->state.running.get());
 }
 
-TEST_F(MainLoopTest, ARunLoopThatWasStoppedEndsItInOrder) {
+TEST_F(MainLoopTest, AStoppedRunLoopEndsTheLoopWithZero) {
   agent_.mainRunLoop().stop();
   EXPECT_EQ(agent_.mainLoop().appLoop(), 0);
   EXPECT_TRUE(context_->state.running.get());
 }
 
-// The thread sanitizer can't follow the forks of these tests.
+// The thread sanitizer does not support the forks of these tests.
 #if !defined(__SANITIZE_THREAD__)
 
-/// The log of a process that is about to end, on its standard error.
+/// Copies the log to standard error, for a process that is about to end.
 void tellOnStandardError(void*, int level, const std::string& text) {
   std::fprintf(stderr, "%d %s\n", level, text.c_str());
 }
@@ -159,7 +159,7 @@ class Refusal : public MainLoopTest {
   static constexpr int kWentOn = 7;
 
   Refusal() { GTEST_FLAG_SET(death_test_style, "threadsafe"); }
-  /// One turn, which may end the process; else kWentOn does.
+  /// Runs one turn, which may end the process; otherwise ends it with kWentOn.
   [[noreturn]] void turnAfter(int seconds) {
     setLogSinkForTesting(tellOnStandardError, nullptr);
     context_->state.serverRejectTime.set(std::time(nullptr) - seconds);
@@ -172,9 +172,11 @@ TEST_F(Refusal, EndsTheProcessWithZeroAfterAMinute) {
   EXPECT_EXIT(turnAfter(60), ::testing::ExitedWithCode(0), kLine);
 }
 
-TEST_F(Refusal, IsNotActedUponEarlier) { EXPECT_EXIT(turnAfter(57), ::testing::ExitedWithCode(kWentOn), ""); }
+TEST_F(Refusal, IsIgnoredBeforeAMinute) {
+  EXPECT_EXIT(turnAfter(57), ::testing::ExitedWithCode(kWentOn), "");
+}
 
-TEST_F(Refusal, IsNeverActedUponInAdhocMode) {
+TEST_F(Refusal, IsIgnoredInAdhocMode) {
   context_->options.adhoc.set(true);
   EXPECT_EXIT(turnAfter(1000), ::testing::ExitedWithCode(kWentOn), "");
   context_->options.adhoc.set(false);

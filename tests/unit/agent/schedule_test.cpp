@@ -1,4 +1,4 @@
-// The schedule against a clock that the test names, and the main loop that runs due commands.
+// The schedule with a clock set by the test, and the main loop that runs due commands.
 #include "agent/schedule.h"
 
 #include <gmock/gmock.h>
@@ -35,7 +35,7 @@ TEST(Schedule, CommandsComeOnceInTheOrderOfTheirDates) {
   EXPECT_EQ(schedule.next(), std::nullopt);
 }
 
-TEST(Schedule, FollowsTheWallClockWhereverItIsSet) {
+TEST(Schedule, FollowsAWallClockThatIsSet) {
   constexpr std::time_t kHour = 3600;
   Schedule schedule;
   schedule.add(at(10 * kHour, "lecture"));
@@ -71,7 +71,7 @@ TEST_F(TimedCommands, AreLoadedFromTheFileExceptExpiredOnes) {
   EXPECT_TRUE(log_.contains(6, "Not scheduling unknown command: FOO"));
 }
 
-TEST_F(TimedCommands, LoadedTwiceWaitOnce) {
+TEST_F(TimedCommands, LoadingTwiceSchedulesOnce) {
   writeTimers(PlistArray{entry("START", now_ + 1000, "A")});
   agent_.timedCommands().loadSchedule();
   agent_.timedCommands().loadSchedule();
@@ -109,7 +109,7 @@ TEST_F(TimedCommands, GoodElementsOfABadFileAreLoaded) {
   ::unlink((file() + ".unreadable-1").c_str());
 }
 
-TEST_F(TimedCommands, AThousandEntriesComeBack) {
+TEST_F(TimedCommands, AThousandEntriesAreLoaded) {
   PlistArray many;
   for (int i = 0; i < 1000; ++i) {
     PlistDictionary one = entry("START", now_ + 1000 + i, std::to_string(i).c_str());

@@ -1,15 +1,15 @@
-// The end of an agent whose configuration can't work: exit status and what the service manager is asked.
+// Shutdown of an agent whose configuration can't work: exit status and calls of the service manager.
 #include "agent/service_disable.h"
 
 #include "tests/unit/agent/agent_fixture.h"
 
-// The thread sanitizer can't follow the forks of these tests.
+// The thread sanitizer does not support the forks of these tests.
 #if !defined(__SANITIZE_THREAD__)
 
 namespace lmx {
 namespace {
 
-/// Tells on standard error, which is all that is left of a process that has ended.
+/// Reports calls on standard error, the only output that outlives the process.
 class TellingServiceManager : public testing::ScriptedServiceManager {
  public:
   std::optional<std::string> disable(const std::string& job) override {
@@ -47,7 +47,7 @@ TEST_F(ServiceDisable, EndsWithSeventyEight) {
 
 TEST_F(ServiceDisable, ThatFailsRemovesTheJobAndEndsWithSeventyOne) {
   services_->disable_error = "no such unit";
-  // The line ends in a line feed of its own.
+  // The message ends in a line feed of its own.
   EXPECT_EXIT(disable(), ::testing::ExitedWithCode(71),
               std::string(kDisabling) +
                   "disable com.zandor.lmxagentd\n"

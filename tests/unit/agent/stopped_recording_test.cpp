@@ -1,4 +1,4 @@
-// The way of a stopped recording to its job: movie, document, queue.
+// How a stopped recording becomes a job: movie, document, queue.
 #include "capture/api/capture_framework.h"
 #include "model/codes.h"
 #include "postprocess/properties_document.h"
@@ -12,7 +12,7 @@ using testing::readFile;
 
 class StoppedRecording : public AgentTest {
  protected:
-  /// Stops the capture, has it report, and turns the loop for the hand-over.
+  /// Stops the capture, makes it report, and runs the loop for the hand-over.
   void stopAndReport(const Controller& controller) {
     agent_.stopRecording();
     reportEnd(controller);
@@ -64,7 +64,7 @@ TEST_F(StoppedRecording, CarriesItsWorkflow) {
   EXPECT_EQ(job->adhoc_workflow_uuid, "W");
 }
 
-TEST_F(StoppedRecording, OnlyTheTextOneDisablesItsSubmission) {
+TEST_F(StoppedRecording, OnlyTheValueOneDisablesItsSubmission) {
   const auto jobsFor = [&](Dictionary parameters) {
     setParameters(std::move(parameters));
     agent_.recordDidStopWithFile(session_, "/nowhere/r/A.mov", nullptr, std::nullopt, 5, std::nullopt, false);
@@ -112,7 +112,7 @@ TEST_F(StoppedRecording, AMovieThatCannotBeWrittenIsARuntimeErrorAndNoJob) {
 }
 
 /// The second START comes before the first capture has reported.
-TEST_F(StoppedRecording, ASecondOneThatHasStartedMeanwhileHasItsOwnMovieParametersAndType) {
+TEST_F(StoppedRecording, ASecondRecordingKeepsItsOwnMovieParametersAndType) {
   const auto first = start("R1", {{"RecordingMetadata_TITLE", "First"}});
   agent_.stopRecording();
   const auto second =
@@ -122,7 +122,7 @@ TEST_F(StoppedRecording, ASecondOneThatHasStartedMeanwhileHasItsOwnMovieParamete
   turnTheLoop();
   const auto job1 = nextJob();
   ASSERT_NE(job1, nullptr);
-  EXPECT_EQ(session_->recordingType.get(), kRecordingTypeAudio);  // the report is not for the second one
+  EXPECT_EQ(session_->recordingType.get(), kRecordingTypeAudio);  // the report was for the first one
   EXPECT_TRUE(session_->audioOnlyMode.get());
   stopAndReport(second);
   const auto job2 = nextJob();
@@ -139,19 +139,19 @@ TEST_F(StoppedRecording, ASecondOneThatHasStartedMeanwhileHasItsOwnMovieParamete
   EXPECT_EQ(getProperty(job2->properties, "RecordingMetadata_TYPE"), "Audio");
 }
 
-TEST_F(StoppedRecording, AHandedOverOneDoesNotMakeASessionIdleThatHasGoneOn) {
+TEST_F(StoppedRecording, AHandOverDoesNotMakeALaterRecordingIdle) {
   const auto first = start("R1");
   agent_.stopRecording();
   start("R2");
   reportEnd(first);
   turnTheLoop();
   EXPECT_TRUE(testing::waitUntil([&] { return journalCount("requestHandedOver request of R1") == 1; }));
-  EXPECT_NE(nextJob(), nullptr);  // it holds the capture too
+  EXPECT_NE(nextJob(), nullptr);  // the job holds the capture, too
   EXPECT_TRUE(testing::waitUntil([&] { return first.use_count() == 1; }));
   EXPECT_EQ(session_->status.get(), kRecorderRecording);
 }
 
-TEST_F(StoppedRecording, ALateCancellationDoesNotMakeASessionIdleThatHasGoneOn) {
+TEST_F(StoppedRecording, ALateCancellationDoesNotMakeALaterRecordingIdle) {
   const auto first = start("R1");
   agent_.cancelCapture();
   start("R2");
@@ -163,7 +163,7 @@ TEST_F(StoppedRecording, ALateCancellationDoesNotMakeASessionIdleThatHasGoneOn) 
   EXPECT_EQ(context_->post_process_list.postProcessListCount(), 0U);
 }
 
-TEST_F(StoppedRecording, ACancelledOneBecomesIdleAndNoJob) {
+TEST_F(StoppedRecording, CancellingMakesTheSessionIdleAndNoJob) {
   const auto controller = start("R1");
   agent_.cancelCapture();
   session_->status.set(kRecorderRecording);
@@ -174,7 +174,7 @@ TEST_F(StoppedRecording, ACancelledOneBecomesIdleAndNoJob) {
   EXPECT_EQ(context_->post_process_list.postProcessListCount(), 0U);
 }
 
-TEST_F(StoppedRecording, ALostDeviceStillHandsOverWhatWasRecorded) {
+TEST_F(StoppedRecording, ARecordingCutShortByALostDeviceIsHandedOver) {
   const auto controller = start("R1");
   reportEnd(controller, CaptureError{CaptureError::kDomain, kDeviceRemoved, "gone"});
   EXPECT_FALSE(agent_.devices().deviceDisconnected()) << "the recording is on its way";
@@ -234,7 +234,7 @@ TEST_F(StoppedRecording, NewPreferencesDuringItDoNotChangeItsType) {
   EXPECT_EQ(getProperty(job->properties, "RecordingMetadata_TYPE"), "Audio+Video");
 }
 
-TEST_F(StoppedRecording, OfAFileSurvivesARefusedRequestForSound) {
+TEST_F(StoppedRecording, AFileRecordingSurvivesARefusedAudioOnlyRequest) {
   testing::writeFile(movie("in.mov"), "movie");
   context_->recording.input_file.set(movie("in.mov"));
   context_->recording.recording_type.set("File");
@@ -255,9 +255,9 @@ TEST_F(StoppedRecording, OfAFileSurvivesARefusedRequestForSound) {
   EXPECT_EQ(session_->recordingType.get(), kRecordingTypeFile);
 }
 
-TEST_F(StoppedRecording, ThatEndedByItselfIsSubmittedThoughItsReportIsStillToCome) {
+TEST_F(StoppedRecording, ThatEndedByItselfIsSubmittedBeforeItsReport) {
   const auto first = start("R1");
-  first->shut_down = true;  // the disk is full, say; its files are being closed
+  first->shut_down = true;  // the disk is full, for example, and the files are being closed
   agent_.stopRecording();
   const auto second = start("R2");
   reportEnd(first);
@@ -269,7 +269,7 @@ TEST_F(StoppedRecording, ThatEndedByItselfIsSubmittedThoughItsReportIsStillToCom
   EXPECT_EQ(getProperty(nextJob()->properties, "RecordingMetadata_RECORDING_UUID"), "R2");
 }
 
-TEST_F(StoppedRecording, ThatEndedForWantOfSpaceLeavesItsError) {
+TEST_F(StoppedRecording, ThatEndedForLackOfSpaceLeavesItsError) {
   const auto controller = start("R1");
   controller->error = CaptureError{CaptureError::kDomain, kWriteFailed, "no space"};
   stopAndReport(controller);
@@ -286,7 +286,7 @@ TEST_F(StoppedRecording, OfALostDeviceLeavesNoDiskError) {
   EXPECT_EQ(session_->error.get(), kRecordSuccess);
 }
 
-TEST_F(StoppedRecording, IsDescribedByTheRequestThatTookItOver) {
+TEST_F(StoppedRecording, IsDescribedByALaterRefusedRequest) {
   const auto controller = start("R1", {{"RecordingMetadata_TITLE", "First"}});
   session_->diskSpaceCutoffInMB.set(0xFFFFFFFFU);
   setParameters({{"RecordingMetadata_RECORDING_UUID", "R2"}, {"RecordingMetadata_TITLE", "Second"}});

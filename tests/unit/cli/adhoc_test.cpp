@@ -1,4 +1,4 @@
-// The ad-hoc client against a daemon that the test plays.
+// The ad-hoc client with a simulated daemon.
 #include <sys/socket.h>
 
 #include <csignal>
@@ -12,7 +12,7 @@
 namespace lmx {
 namespace {
 
-/// Listens where the daemon would; serves one client.
+/// Listens on the daemon's socket and serves one client.
 class PlayedDaemon {
  public:
   PlayedDaemon() : path_(systemPath(kLocalSocket)) {
@@ -50,7 +50,7 @@ class AdHocMode : public AgentTest {
   AdHocMode() { context_->options.adhoc.set(true); }
   ~AdHocMode() override { context_->options.adhoc.set(false); }
 
-  /// Runs the client to its end. @return what it printed
+  /// Runs the client until it ends. @return what it printed
   std::string run() {
     ::testing::internal::CaptureStdout();
     EXPECT_EQ(AdHocClient(agent_).startupAdHoc(), 0);
@@ -58,7 +58,7 @@ class AdHocMode : public AgentTest {
   }
 };
 
-TEST_F(AdHocMode, WithoutADaemonSaysNothing) {
+TEST_F(AdHocMode, WithoutADaemonPrintsNothing) {
   context_->options.adhoc_request_type.set(1);
   EXPECT_EQ(run(), "");
   EXPECT_TRUE(log_.contains(6, "lmxagentd (version 100) starting..."));
@@ -91,7 +91,7 @@ TEST_F(AdHocMode, CutsALongReply) {
   conversation.get();
 }
 
-TEST_F(AdHocMode, ADaemonThatHangsUpHasNothingToSay) {
+TEST_F(AdHocMode, AHangUpPrintsAnEmptyReply) {
   PlayedDaemon daemon;
   context_->options.adhoc_request_type.set(1);
   auto conversation = std::async(std::launch::async, [&] {
@@ -126,8 +126,8 @@ TEST_P(AdHocRecording, LastsUntilASignal) {
 
 INSTANTIATE_TEST_SUITE_P(Signals, AdHocRecording, ::testing::Values(SIGINT, SIGTERM));
 
-TEST_F(AdHocMode, AnInterruptIsHeardWhileTheDaemonIsBusy) {
-  PlayedDaemon daemon;  // a connection waits in its queue as behind another peer
+TEST_F(AdHocMode, AnInterruptWorksWhileTheDaemonIsBusy) {
+  PlayedDaemon daemon;  // leaves the connection in its backlog, as when it serves another peer
   context_->options.submit_disabled.set(true);
   auto conversation = std::async(std::launch::async, [&] {
     daemon.accept();
@@ -142,7 +142,7 @@ TEST_F(AdHocMode, AnInterruptIsHeardWhileTheDaemonIsBusy) {
   EXPECT_TRUE(printed.ends_with("received: <empty>\nsent STOP, received: cmdStatus=0\n")) << printed;
 }
 
-TEST_F(AdHocMode, AnUnknownRequestStartsButDoesNotStay) {
+TEST_F(AdHocMode, AnUnknownRequestStartsARecordingButDoesNotWait) {
   PlayedDaemon daemon;
   context_->options.submit_disabled.set(true);
   context_->options.adhoc_request_type.set(9);

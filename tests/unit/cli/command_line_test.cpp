@@ -1,4 +1,4 @@
-// The options: what they set, what they print, with which exit code the program is to end.
+// Command-line options: what they set, what they print, and the exit code.
 #include "cli/command_line.h"
 
 #include <ctime>
@@ -51,7 +51,7 @@ constexpr const char* kUsage =
     "\t    -f file_output_path (runs an ad-hoc capture on this machine)\n"
     "\nexample: lmxagentd -s\n\n";
 
-TEST_F(CommandLineTest, WithoutOptionsTheProgramGoesOn) {
+TEST_F(CommandLineTest, WithoutOptionsTheProgramContinues) {
   const Outcome outcome = parse({});
   EXPECT_TRUE(outcome.goes_on);
   EXPECT_EQ(outcome.exit_code, 0);
@@ -105,7 +105,7 @@ TEST_F(CommandLineTest, DurationNeedsAdHocMode) {
   EXPECT_EQ(outcome.errors, "The -d option only applies to ad-hoc mode (requires a file path)\n");
 }
 
-TEST_F(CommandLineTest, AFileToRecordToIsAdHocMode) {
+TEST_F(CommandLineTest, AnOutputFileSelectsAdHocMode) {
   EXPECT_TRUE(parse({"-f", "out.mov", "-d", "60", "-s"}).goes_on);
   EXPECT_TRUE(context_->options.adhoc.get());
   EXPECT_EQ(context_->options.adhoc_request_type.get(), 0);
@@ -124,7 +124,7 @@ TEST_F(CommandLineTest, SubmissionNeedsAUser) {
   EXPECT_EQ(context_->options.password.get(), "secret");
 }
 
-TEST_F(CommandLineTest, QuestionsNeedNoUser) {
+TEST_F(CommandLineTest, QueriesNeedNoUser) {
   EXPECT_TRUE(parse({"--status"}).goes_on);
   EXPECT_TRUE(context_->options.adhoc.get());
   EXPECT_EQ(context_->options.adhoc_request_type.get(), 1);
@@ -135,7 +135,7 @@ TEST_F(CommandLineTest, QuestionsNeedNoUser) {
   EXPECT_EQ(context_->options.timer_id.get(), "T-1");
 }
 
-TEST_F(CommandLineTest, APathThatIsNotUtf8StopsAtOnce) {
+TEST_F(CommandLineTest, ANonUtf8PathEndsTheParsing) {
   const Outcome outcome = parse({"-f", "H\xF6rsaal.mov", "-v"});
   EXPECT_FALSE(outcome.goes_on);
   EXPECT_EQ(outcome.exit_code, 71);
@@ -143,7 +143,7 @@ TEST_F(CommandLineTest, APathThatIsNotUtf8StopsAtOnce) {
   EXPECT_FALSE(context_->options.adhoc.get());
 }
 
-TEST_F(CommandLineTest, ANumberThatDoesNotParseLeavesTheLastOne) {
+TEST_F(CommandLineTest, AnInvalidNumberRepeatsTheLastOne) {
   EXPECT_TRUE(parse({"-f", "a.mov", "-s", "-d", "x"}).goes_on);
   EXPECT_EQ(context_->options.duration.get(), 0);
   EXPECT_TRUE(parse({"-Z", "30", "-d", "x", "-f", "a.mov", "-s"}).goes_on);
@@ -171,7 +171,7 @@ TEST_F(CommandLineTest, TimerDelayBecomesADate) {
   EXPECT_TRUE(found) << *start;
 }
 
-TEST_F(CommandLineTest, ATimerDelayThatIsNoneIsIgnored) {
+TEST_F(CommandLineTest, AnInvalidTimerDelayIsIgnored) {
   for (const char* delay : {"-5", "0", "abc", "", "nan", "1e300"}) {
     const Outcome outcome = parse({"--timerdelay", delay});
     EXPECT_TRUE(outcome.goes_on) << delay;
@@ -180,14 +180,14 @@ TEST_F(CommandLineTest, ATimerDelayThatIsNoneIsIgnored) {
   }
 }
 
-TEST_F(CommandLineTest, AStoppingOptionHidesWhatFollows) {
+TEST_F(CommandLineTest, OptionsAfterAnEndingOneAreIgnored) {
   EXPECT_EQ(parse({"-v", "-d", "60"}).exit_code, 0);
   EXPECT_EQ(parse({"-d", "60", "-h"}).exit_code, 0);
   EXPECT_EQ(context_->options.duration.get(), 60);
   EXPECT_EQ(parse({"-x", "-v"}).exit_code, 64);
 }
 
-TEST_F(CommandLineTest, AnUnknownKindOfInformationIsNothing) {
+TEST_F(CommandLineTest, AnUnknownKindOfInformationPrintsNothing) {
   const Outcome outcome = parse({"-i", "nonsense"});
   EXPECT_FALSE(outcome.goes_on);
   EXPECT_EQ(outcome.exit_code, 0);
@@ -201,7 +201,7 @@ TEST_F(CommandLineTest, AdHocPreferencesAreDumped) {
   EXPECT_TRUE(outcome.output.starts_with("\n\n'RecordingType' == "));
 }
 
-TEST_F(CommandLineTest, BindGoesBeforeThePreviewPath) {
+TEST_F(CommandLineTest, BindTakesPrecedenceOverThePreviewPath) {
   children_.result.output =
       "Successfully bound " + std::string(36, 'c') + std::string(11, ' ') + std::string(36, 's');
   const Outcome bound = parse({"-p", "/p.jpg", "-t", "/a.mov", "-u", "jane", "-c", "host"});
@@ -246,7 +246,7 @@ TEST_F(CommandLineTest, DaemonPreferencesAreDumped) {
   EXPECT_NE(outcome.output.find("'RecordingAudioInput' == 'microphone'\n"), std::string::npos);
 }
 
-TEST_F(CommandLineTest, PreferencesThatCannotBeUsedAreASoftwareError) {
+TEST_F(CommandLineTest, UnusablePreferencesAreASoftwareError) {
   framework_->audio_device_usable = false;
   EXPECT_EQ(parse({"-i", "daemon-prefs"}).exit_code, 70);
   EXPECT_TRUE(log_.contains(

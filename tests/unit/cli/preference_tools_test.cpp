@@ -1,4 +1,4 @@
-// The tools that change the preferences file: the preview path and the camera-bind test.
+// Tools that change the preferences file: the preview path and the camera-bind test.
 #include "cli/preference_tools.h"
 
 #include <gmock/gmock.h>
@@ -74,7 +74,7 @@ TEST_F(PreferenceTools, PreviewPathGoesIntoNewDefaults) {
   EXPECT_EQ(stored(), expected);
 }
 
-TEST_F(PreferenceTools, PreviewPathKeepsWhatIsThere) {
+TEST_F(PreferenceTools, PreviewPathKeepsOtherSettings) {
   ASSERT_EQ(writePropertyList(file(), PlistDictionary{{"CameraName", "Hall 3"},
                                                       {"Unknown", PlistDictionary{{"a", std::int64_t{1}}}},
                                                       {"PreviewPath", "/old"}}),
@@ -117,7 +117,7 @@ TEST_F(PreferenceTools, AMalformedFileIsKeptBeforeItIsReplaced) {
   EXPECT_THAT(GetCapturedStderr(), HasSubstr(file() + ".unreadable-2"));
 }
 
-TEST_F(PreferenceTools, WhatCanBeNeitherReadNorKeptIsNotOverwritten) {
+TEST_F(PreferenceTools, AFileThatCanBeNeitherReadNorKeptIsNotOverwritten) {
   std::filesystem::create_directory(file());
   CaptureStderr();
   EXPECT_EQ(setPreviewPath("/tmp/p.jpg"), 73);
@@ -125,7 +125,7 @@ TEST_F(PreferenceTools, WhatCanBeNeitherReadNorKeptIsNotOverwritten) {
   EXPECT_TRUE(std::filesystem::is_directory(file()));
 }
 
-TEST_F(PreferenceTools, AFileThatCannotBeWrittenIs73) {
+TEST_F(PreferenceTools, AnUnwritableFileReturns73) {
   std::filesystem::remove_all(directoryOf(file()));
   CaptureStderr();
   EXPECT_EQ(setPreviewPath("/tmp/p.jpg"), 73);
@@ -175,7 +175,7 @@ TEST_F(PreferenceTools, BindRunsTheToolAndFillsThePreferences) {
   EXPECT_EQ(stored(), expected);
 }
 
-TEST_F(PreferenceTools, BindKeepsWhatIsBoundAlready) {
+TEST_F(PreferenceTools, BindKeepsExistingIdentifiers) {
   const PlistDictionary before{{"CameraName", "Hall"},        {"CameraUUID", "old camera"},
                                {"ServerUUID", "old server"},  {"RecordingRepositoryPath", "/r"},
                                {"TunnelPort", "1"},           {"RecordingType", "Audio"},
@@ -189,20 +189,20 @@ TEST_F(PreferenceTools, BindKeepsWhatIsBoundAlready) {
   EXPECT_EQ(stored(), expected);
 }
 
-TEST_F(PreferenceTools, AFailingBindToolsStatusIsTheResult) {
+TEST_F(PreferenceTools, AFailingBindToolsStatusIsReturned) {
   answer(ChildResult::End::exited, 5, kAnswer);
   EXPECT_EQ(bind("/a.mov", "jane", "host"), 5);
   EXPECT_EQ(errors_, "Error: camera binding failed with exit status 5\n");
   EXPECT_FALSE(std::filesystem::exists(file()));
 }
 
-TEST_F(PreferenceTools, AKilledBindToolIsNoSuccess) {
+TEST_F(PreferenceTools, AKilledBindToolIsAFailure) {
   answer(ChildResult::End::signalled, 9, kAnswer);
   EXPECT_EQ(bind("/a.mov", "jane", "host"), 137);
   EXPECT_EQ(errors_, "Error: camera binding failed with exit status 137\n");
 }
 
-TEST_F(PreferenceTools, AMissingBindToolEndsAsInAShell) {
+TEST_F(PreferenceTools, AMissingBindToolReturnsAShellsStatus) {
   answer(ChildResult::End::notStarted, ENOENT);
   EXPECT_EQ(bind("/a.mov", "jane", "host"), 127);
   EXPECT_THAT(errors_, HasSubstr("Error: camera binding failed with exit status 127\n"));
@@ -210,13 +210,13 @@ TEST_F(PreferenceTools, AMissingBindToolEndsAsInAShell) {
   EXPECT_EQ(bind("/a.mov", "jane", "host"), 126);
 }
 
-TEST_F(PreferenceTools, ABindToolThatCannotBeStartedIs71) {
+TEST_F(PreferenceTools, ABindToolThatCannotBeStartedReturns71) {
   answer(ChildResult::End::notStarted, EAGAIN);
   EXPECT_EQ(bind("/a.mov", "jane", "host"), 71);
   EXPECT_THAT(errors_, HasSubstr("Error: unable to run the `lmx --bind` command\n"));
 }
 
-TEST_F(PreferenceTools, AnUnexpectedAnswerIs76) {
+TEST_F(PreferenceTools, AnUnexpectedAnswerReturns76) {
   answer(ChildResult::End::exited, 0, "Bound.\n");
   EXPECT_EQ(bind("/a.mov", "jane", "host"), 76);
   EXPECT_EQ(errors_, "Error: unexpected result from `lmx --bind`: Bound.\n\n");
@@ -234,21 +234,21 @@ TEST(BoundCamera, IsFoundAtFixedPositions) {
   EXPECT_EQ(other->serverUUID, std::string(36, 's'));
 }
 
-TEST(BoundCamera, IsNotMadeOfHalfAnAnswer) {
+TEST(BoundCamera, IsAbsentInATruncatedAnswer) {
   EXPECT_FALSE(boundCamera(""));
   EXPECT_FALSE(boundCamera("successfully bound " + std::string(200, 'x')));
   EXPECT_FALSE(boundCamera(kAnswer.substr(0, 66 + 35)));
   EXPECT_TRUE(boundCamera(kAnswer.substr(0, 66 + 36)));
 }
 
-TEST(BindCommand, NamesAreSingleWordsWhateverTheyHold) {
+TEST(BindCommand, NamesAreSingleWordsWithAnyCharacters) {
   EXPECT_THAT(
       bindCommand("jane doe; rm -rf /", "$(host)"),
       ElementsAre("/usr/bin/lumex", "--bind", "Fake-Camera", "-u", "jane doe; rm -rf /", "-s", "$(host)"));
 }
 
 TEST(BindCommand, IsCutAfter255Bytes) {
-  // "/usr/bin/lumex --bind Fake-Camera -u " is 37 bytes, " -s " 4.
+  // "/usr/bin/lumex --bind Fake-Camera -u " is 37 bytes, " -s " is 4.
   const auto inServer = bindCommand("u", std::string(300, 's'));
   EXPECT_EQ(inServer.back(), std::string(255 - 37 - 1 - 4, 's'));
   const auto inUser = bindCommand(std::string(300, 'u'), "s");

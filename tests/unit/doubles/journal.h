@@ -1,4 +1,4 @@
-// What several doubles were asked to do, in the order in which it happened.
+// Records the calls of several doubles in the order in which they happened.
 #pragma once
 #include <mutex>
 #include <string>
@@ -6,7 +6,7 @@
 
 namespace lmx::testing {
 
-/// Thread-safe. Shared by the doubles whose order matters to a test.
+/// Thread-safe. Shared by doubles whose relative order matters to a test.
 class Journal {
  public:
   void add(std::string entry) {

@@ -1,4 +1,4 @@
-// Collects log messages for a test, and waits for them.
+// Collects log messages for a test and waits for them.
 #pragma once
 #include <algorithm>
 #include <chrono>
@@ -11,7 +11,7 @@
 
 namespace lmx::testing {
 
-/// Every message of the process goes here while it lives. One at a time. Thread-safe.
+/// Receives every log message of the process while it lives. One at a time. Thread-safe.
 class LogCapture {
  public:
   struct Entry {
@@ -34,20 +34,21 @@ class LogCapture {
     return std::count(entries_.begin(), entries_.end(), Entry{level, text});
   }
   [[nodiscard]] bool contains(int level, const std::string& text) const { return count(level, text) > 0; }
-  /// Whether any message holds `part`.
+  /// Whether any message contains `part`.
   [[nodiscard]] bool mentions(const std::string& part) const {
     const std::lock_guard lock(mutex_);
     return std::any_of(entries_.begin(), entries_.end(),
                        [&](const Entry& e) { return e.text.find(part) != std::string::npos; });
   }
-  /// Waits until the message has come `times` times. @return false after half a minute without.
+  /// Waits until the message has been logged `times` times. @return false when it is still missing after half
+  /// a minute
   bool waitFor(int level, const std::string& text, std::ptrdiff_t times = 1) {
     std::unique_lock lock(mutex_);
     return changed_.wait_until(lock, std::chrono::system_clock::now() + std::chrono::seconds(30), [&] {
       return std::count(entries_.begin(), entries_.end(), Entry{level, text}) >= times;
     });
   }
-  /// Waits until a message holds `part`. @return false after half a minute without.
+  /// Waits until a message contains `part`. @return false when none does within half a minute
   bool waitForPart(const std::string& part) {
     std::unique_lock lock(mutex_);
     return changed_.wait_until(lock, std::chrono::system_clock::now() + std::chrono::seconds(30), [&] {

@@ -1,4 +1,4 @@
-// The agent's actions as a script: what was performed, in which order, with which wait.
+// Scripted agent actions that record what was performed, in which order and with which wait.
 #pragma once
 #include <functional>
 #include <memory>
@@ -12,13 +12,13 @@
 
 namespace lmx::testing {
 
-/// Runs every action at once on the caller's thread and writes "prepareCapture, waiting" or "stopRecording"
-/// into the journal. The script of an action is what the test puts into its hook.
+/// Runs every action at once on the caller's thread and records it in the journal, as "prepareCapture,
+/// waiting" or "stopRecording". A test scripts an action through its hook.
 class ScriptedActions : public AgentActions {
  public:
   explicit ScriptedActions(Journal& journal) : journal_(journal) {}
 
-  bool loop_runs = true;  ///< false: the main loop has ended, nothing is performed
+  bool loop_runs = true;  ///< false: the main loop has ended and nothing is performed
   std::function<void()> on_prepare_capture;
   std::function<void()> on_stop_recording;
   std::function<void()> on_stop_capture;
@@ -56,7 +56,7 @@ class ScriptedActions : public AgentActions {
     return std::make_unique<RunLoop::Source>();
   }
   bool network_can_be_watched = true;
-  std::function<void()> network_changed;  ///< of the last watch
+  std::function<void()> network_changed;  ///< callback of the last watch
   struct Scheduled {
     SharedDictionary entry;
     std::time_t date;

@@ -1,4 +1,4 @@
-// A capture controller and a preview controller that do what the test says and remember what they were told.
+// A scripted capture controller and preview controller that record their calls.
 #pragma once
 #include <atomic>
 #include <functional>
@@ -14,8 +14,8 @@
 
 namespace lmx::testing {
 
-/// Operations go into the journal by name ("setStart", "pauseRecording"); marks are kept with their
-/// arguments. What it answers is set by the test, before other threads use it.
+/// Records operations in the journal by name ("setStart", "pauseRecording"), and marks with their arguments.
+/// Script the results before other threads use it.
 class ScriptedCaptureController : public LMRCaptureController {
  public:
   struct Mark {
@@ -45,9 +45,9 @@ class ScriptedCaptureController : public LMRCaptureController {
   std::vector<double> power_levels;
   std::optional<CaptureError> error;
   std::function<std::optional<std::string>()> on_delete_segment;
-  std::atomic<bool> devices_run{false};      ///< what its session answers
-  std::function<void()> on_start_recording;  ///< on the capture thread
-  /// What processRequest does instead of answering `error`.
+  std::atomic<bool> devices_run{false};      ///< result of its session's isRunning()
+  std::function<void()> on_start_recording;  ///< called on the capture thread
+  /// Replaces the result `error` of processRequest.
   std::function<std::optional<CaptureError>(const std::string& path)> on_process_request;
 
   [[nodiscard]] std::vector<Mark> marks() const {
@@ -123,12 +123,12 @@ class ScriptedCaptureController : public LMRCaptureController {
 
   Journal& journal_;
   mutable std::mutex mutex_;
-  std::vector<Mark> marks_;  // guarded by mutex_, as the following two
+  std::vector<Mark> marks_;  // guarded by mutex_, as are the next two
   std::optional<LMRRecordingContext> settings_;
   std::weak_ptr<CaptureControllerDelegate> delegate_;
 };
 
-/// A camera that is there, or not.
+/// A camera that is present or absent.
 class ScriptedPreviewController : public LMRPreviewController {
  public:
   bool attaches = true;

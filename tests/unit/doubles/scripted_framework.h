@@ -12,26 +12,26 @@
 
 namespace lmx::testing {
 
-/// Knows the devices "camera" and "microphone". Thread-safe, but for the scripts: set them first.
+/// Has the devices "camera" and "microphone". Thread-safe, except for the scripts: set them first.
 class ScriptedFramework : public CaptureFramework {
  public:
   explicit ScriptedFramework(Journal& journal) : journal_(journal) {}
 
   bool audio_device_usable = true;
   bool cameras_attach = true;
-  /// What is done to a new controller before the engine gets it.
+  /// Prepares a new controller before the engine gets it.
   std::function<void(ScriptedCaptureController&)> on_new_controller;
 
   [[nodiscard]] std::size_t controllersMade() const {
     const std::lock_guard lock(mutex_);
     return controllers_.size();
   }
-  /// The n-th controller handed out, null when nobody holds it any more.
+  /// The n-th controller handed out; null when it has been released.
   [[nodiscard]] std::shared_ptr<ScriptedCaptureController> controller(std::size_t n) const {
     const std::lock_guard lock(mutex_);
     return n < controllers_.size() ? controllers_[n].lock() : nullptr;
   }
-  /// Whether nobody holds a controller any more: no thread and no work item is left that could use one.
+  /// Whether every controller has been released, so that no thread or work item can still use one.
   [[nodiscard]] bool allReleased() const {
     const std::lock_guard lock(mutex_);
     for (const auto& made : controllers_) {

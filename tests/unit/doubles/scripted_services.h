@@ -1,4 +1,4 @@
-// A child runner and a service manager that do what the test says.
+// A scripted child runner and service manager.
 #pragma once
 #include <functional>
 #include <mutex>
@@ -12,12 +12,12 @@
 
 namespace lmx::testing {
 
-/// Remembers the argument vectors; every child ends as `result` says. Thread-safe, but for the script.
+/// Records the argument vectors; every child ends with `result`. Thread-safe, except for the script.
 class ScriptedChildRunner : public ChildRunner {
  public:
   ChildResult result{.end = ChildResult::End::exited, .status = 0, .output = {}};
   std::function<void()> on_run;
-  /// Answers instead of `result`.
+  /// Replaces `result`.
   std::function<ChildResult(const std::vector<std::string>& argv)> answer;
 
   ChildResult run(const std::vector<std::string>& argv, const ChildOptions& options) override {
@@ -33,7 +33,7 @@ class ScriptedChildRunner : public ChildRunner {
     const std::lock_guard lock(mutex_);
     return runs_;
   }
-  /// Those of the last run.
+  /// Options of the last run.
   [[nodiscard]] ChildOptions options() const {
     const std::lock_guard lock(mutex_);
     return options_;

@@ -1,4 +1,4 @@
-// A directory of a test's own, removed with everything in it.
+// A temporary directory for one test, removed with its contents.
 #pragma once
 #include <stdlib.h>
 

@@ -1,4 +1,4 @@
-// The directory that stands in front of the system's fixed paths in a test program.
+// The private root directory that prefixes the system's fixed paths in a test program.
 #pragma once
 #include <gtest/gtest.h>
 #include <stdlib.h>
@@ -12,18 +12,18 @@
 
 namespace lmx::testing {
 
-/// Made before main, since the program reads where it is only once; removed at its end.
+/// Created before main, because the program reads the root only once. Removed at the end of the program.
 class TestRoot {
  public:
   TestRoot() {
-    // With slashes at the end, which must not show.
+    // The trailing slashes must not show up in paths.
     setenv("LMXAGENTD_ROOT", (path() + "//").c_str(), 1);
     setHome();
     makeFolders();
   }
   [[nodiscard]] const std::string& path() const { return directory_.path(); }
   void setHome() const { setenv("HOME", (path() + "/home").c_str(), 1); }
-  /// Removes whatever tests have put there.
+  /// Removes everything that tests have put there.
   void clear() const {
     for (const auto& entry : std::filesystem::directory_iterator(path())) std::filesystem::remove_all(entry);
     makeFolders();
@@ -40,7 +40,7 @@ class TestRoot {
 
 inline const TestRoot kTestRoot;
 
-/// Preferences of an agent that is bound to a server, as far as a capture needs them.
+/// Preferences of an agent bound to a server, with what a capture needs.
 inline PlistDictionary capturePreferences(const std::string& repository) {
   return {{"RecordingType", "Audio+Video"},        {"RecordingRepositoryPath", repository.c_str()},
           {"RecordingDiskSpaceCutoffInMB", "1"},   {"RecordingVideoInput", "camera"},

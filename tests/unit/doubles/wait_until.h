@@ -1,11 +1,11 @@
-// Waiting for something that another thread brings about.
+// Waits for an effect of another thread.
 #pragma once
 #include <chrono>
 #include <thread>
 
 namespace lmx::testing {
 
-/// Looks every millisecond. @return false when `condition` has not come true within half a minute.
+/// Checks `condition` every millisecond. @return false when it is still false after half a minute
 template <class Condition>
 bool waitUntil(const Condition& condition) {
   const auto deadline = std::chrono::steady_clock::now() + std::chrono::seconds(30);

@@ -1,4 +1,4 @@
-// The shared record: its defaults, the queue, the cluster information, its end.
+// The agent context: its defaults, the queue, the cluster information, its cleanup.
 #include "model/agent_context.h"
 
 #include <gtest/gtest.h>
@@ -20,7 +20,7 @@ class Context : public ::testing::Test {
   std::shared_ptr<AgentContext> context_ = newAgentContext();
 };
 
-TEST_F(Context, NewOneHasItsDefaults) {
+TEST_F(Context, NewContextHasDefaults) {
   EXPECT_FALSE(context_->state.running.get());
   EXPECT_EQ(context_->options.duration.get(), 240);
   EXPECT_EQ(context_->options.unattended.get(), 60);
@@ -63,7 +63,7 @@ TEST_F(Context, QueueTakesJobsFromSeveralThreads) {
 
 TEST_F(Context, ServerInfoIsNullBeforeItIsSet) { EXPECT_EQ(context_->server_info.get(), nullptr); }
 
-TEST_F(Context, ServerInfoThatIsStoredAlreadySurvivesItsStoring) {
+TEST_F(Context, StoringTheSameServerInfoAgainKeepsIt) {
   context_->server_info.set(std::make_shared<const PlistDictionary>(PlistDictionary{{"a", "b"}}));
   context_->server_info.set(context_->server_info.get());
   ASSERT_NE(context_->server_info.get(), nullptr);
@@ -77,7 +77,7 @@ TEST_F(Context, RetainedServerInfoOutlivesItsReplacement) {
   EXPECT_EQ(held->size(), 1U);
 }
 
-TEST_F(Context, MessagesAreNoFormats) {
+TEST_F(Context, MessagesAreNotFormatStrings) {
   context_->logDebug("100%s");
   context_->logInfo("50%n");
   context_->logWarn("%d");

@@ -1,4 +1,4 @@
-// Tests of child processes, with real ones.
+// Child processes, tested with real ones.
 #include "platform/child_process.h"
 
 #include <fcntl.h>
@@ -35,7 +35,7 @@ TEST(ChildProcess, OutputAndStatusAreCollected) {
   EXPECT_TRUE(shell("exit 0").succeeded());
 }
 
-TEST(ChildProcess, ArgumentsArriveAsTheyAre) {
+TEST(ChildProcess, ArgumentsArePassedUnchanged) {
   const ChildResult result = run({"/usr/bin/printf", "%s|", "a b", "", "$HOME", "*", "'\"", "\xC3\xA4;"});
   EXPECT_EQ(result.output, "a b||$HOME|*|'\"|\xC3\xA4;|");
 }
@@ -73,7 +73,7 @@ TEST(ChildProcess, ChildThatHangsIsKilledAtTheLimit) {
   EXPECT_LT(taken, 20s);
 }
 
-TEST(ChildProcess, ChildWithinTheLimitIsLeftAlone) {
+TEST(ChildProcess, ChildWithinTheLimitIsNotKilled) {
   ChildOptions options;
   options.limit = 60s;
   EXPECT_TRUE(shell("exit 0", options).succeeded());
@@ -107,7 +107,7 @@ TEST(ChildProcess, GrandchildHoldingTheOutputIsNotAwaited) {
   EXPECT_LT(Clock::now() - begin, 6s);
 }
 
-TEST(ChildProcess, SignalsAreAsIfNobodyHadTouchedThem) {
+TEST(ChildProcess, ChildHasDefaultSignalMaskAndDispositions) {
   const auto before = std::signal(SIGUSR1, SIG_IGN);
   sigset_t blocked;
   sigset_t old;
@@ -117,7 +117,7 @@ TEST(ChildProcess, SignalsAreAsIfNobodyHadTouchedThem) {
   const ChildResult result = run({"/bin/grep", "-E", "^Sig(Blk|Ign):", "/proc/self/status"});
   pthread_sigmask(SIG_SETMASK, &old, nullptr);
   std::signal(SIGUSR1, before);
-  // Two signals belong to the C library, which ignores them in every child that it starts.
+  // The C library reserves two signals and ignores them in every child that it starts.
   constexpr unsigned long long kLibrarySignals = 3ULL << 31;
   unsigned long long mask_of_blocked = 1;
   unsigned long long mask_of_ignored = 1;
@@ -127,12 +127,12 @@ TEST(ChildProcess, SignalsAreAsIfNobodyHadTouchedThem) {
   EXPECT_EQ(mask_of_ignored & ~kLibrarySignals, 0U);
 }
 
-TEST(ChildProcess, OurDescriptorsStayOurs) {
-  // One that somebody forgot to mark.
+TEST(ChildProcess, DescriptorsAreNotInherited) {
+  // A descriptor without close-on-exec.
   const UniqueFd forgotten(fcntl(STDIN_FILENO, F_DUPFD, 20));
   ASSERT_TRUE(forgotten.valid());
   const ChildResult result = run({"/bin/ls", "/proc/self/fd"});
-  EXPECT_EQ(result.output, "0\n1\n2\n3\n");  // the last one is its own, for the directory
+  EXPECT_EQ(result.output, "0\n1\n2\n3\n");  // 3 is ls's own descriptor for the directory
 }
 
 TEST(ChildProcess, LongRunIsReported) {
@@ -146,7 +146,7 @@ TEST(ChildProcess, LongRunIsReported) {
   EXPECT_GE(reports[1], 40ms);
 }
 
-TEST(ChildProcess, IgnoredChildSignalIsNotTakenForSuccess) {
+TEST(ChildProcess, IgnoredSigchldIsNotReportedAsSuccess) {
   const auto before = std::signal(SIGCHLD, SIG_IGN);
   const ChildResult result = shell("exit 1");
   std::signal(SIGCHLD, before);

@@ -1,4 +1,4 @@
-// Tests of making directories and replacing files.
+// Creating directories and replacing files.
 #include "platform/directories.h"
 
 #include <fcntl.h>
@@ -39,7 +39,7 @@ TEST(MkdirP, ExistingDirectoryIsSuccess) {
   EXPECT_EQ(mkdir_p("/", 0755), 0);
 }
 
-TEST(MkdirP, TakesSlashesAsTheyCome) {
+TEST(MkdirP, AcceptsRepeatedAndTrailingSlashes) {
   const TemporaryDirectory root;
   EXPECT_EQ(mkdir_p((root.path() + "//x///y/").c_str(), 0755), 0);
   EXPECT_TRUE(fs::is_directory(root.file("x/y")));
@@ -53,19 +53,19 @@ TEST(MkdirP, LinkToADirectoryIsADirectory) {
   EXPECT_TRUE(fs::is_directory(root.file("real/below")));
 }
 
-TEST(MkdirP, FileInTheWayIsAFailure) {
+TEST(MkdirP, FileInTheWayIsAnError) {
   const TemporaryDirectory root;
   writeFile(root.file("file"), "");
   EXPECT_EQ(mkdir_p(root.file("file").c_str(), 0755), ENOTDIR);
   EXPECT_EQ(mkdir_p(root.file("file/below").c_str(), 0755), ENOTDIR);
 }
 
-TEST(MkdirP, NothingToMakeIsAFailure) {
+TEST(MkdirP, EmptyPathIsAnError) {
   EXPECT_EQ(mkdir_p("", 0755), ENOENT);
   EXPECT_EQ(mkdir_p(nullptr, 0755), ENOENT);
 }
 
-TEST(SyncDirectory, SaysWhyItCannot) {
+TEST(SyncDirectory, ReturnsTheErrnoOfAFailure) {
   const TemporaryDirectory root;
   EXPECT_EQ(syncDirectory(root.path()), 0);
   EXPECT_EQ(syncDirectory(root.file("none")), ENOENT);

@@ -1,4 +1,4 @@
-// Tests of watching a file.
+// Watching a file.
 #include "platform/file_watcher.h"
 
 #include <fcntl.h>
@@ -39,7 +39,7 @@ class FileWatcherTest : public ::testing::Test {
     writeFile(path_, "content");
     ASSERT_TRUE(watcher_.open(path_));
   }
-  /// Changes the content in place, its length kept.
+  /// Changes the content in place and keeps its length.
   void overwrite(const std::string& content) const {
     const UniqueFd fd(::open(path_.c_str(), O_WRONLY | O_CLOEXEC));
     EXPECT_EQ(write(fd.get(), content.data(), content.size()), static_cast<ssize_t>(content.size()));
@@ -105,7 +105,7 @@ TEST_F(FileWatcherTest, ReplacementByRename) {
 
 TEST_F(FileWatcherTest, RemovedAndMadeAgain) {
   fs::remove(path_);
-  writeFile(path_, "content");  // might get the same inode number, were the old one not held
+  writeFile(path_, "content");  // could get the same inode number if the old one weren't held
   EXPECT_EQ(watcher_.poll(), kDeleted);
 }
 

@@ -1,4 +1,4 @@
-// Tests of the system log against a log daemon of their own.
+// The system log, with a log daemon of the test's own.
 #include "platform/log.h"
 
 #include <gmock/gmock.h>
@@ -35,7 +35,7 @@ Context newContext(const char* facility = "com.zandor.lumex") {
   return Context(LMPLogCreateContext("lmxagentd", facility));
 }
 
-/// What listens on the log's socket.
+/// Listens on the log's socket.
 class LogDaemon {
  public:
   LogDaemon() : path_(systemPath(kLogSocket)), fd_(socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0)) {
@@ -49,7 +49,7 @@ class LogDaemon {
   LogDaemon& operator=(const LogDaemon&) = delete;
   ~LogDaemon() { unlink(path_.c_str()); }
 
-  /// The next datagram, or nothing when none comes in time.
+  /// The next datagram, or nothing when none arrives in time.
   std::optional<std::string> receive(int milliseconds = 20000) {
     const timeval limit{milliseconds / 1000, milliseconds % 1000 * 1000};
     setsockopt(fd_.get(), SOL_SOCKET, SO_RCVTIMEO, &limit, sizeof limit);
@@ -59,7 +59,7 @@ class LogDaemon {
     buffer.resize(static_cast<std::size_t>(size));
     return buffer;
   }
-  /// The text of the next datagram, behind its head.
+  /// The text of the next datagram, without its header.
   std::string receiveText(int milliseconds = 20000) {
     const auto datagram = receive(milliseconds);
     if (!datagram) return "(nothing)";
@@ -72,7 +72,7 @@ class LogDaemon {
   UniqueFd fd_;
 };
 
-/// The number in "N messages lost"; nothing for another text.
+/// The number in "N messages lost"; nothing for any other text.
 std::optional<int> lostIn(const std::string& text) {
   int number = 0;
   int length = 0;
@@ -92,7 +92,7 @@ TEST(Log, DatagramHasPriorityTimeProgramAndProcess) {
   EXPECT_THAT(daemon.receive().value_or(""), ::testing::MatchesRegex(expected));
 }
 
-TEST(Log, FacilitiesGoOutAsTheSystemKnowsThem) {
+TEST(Log, FacilityNamesMapToSyslogFacilities) {
   struct Case {
     const char* name;
     int code;
@@ -112,7 +112,7 @@ TEST(Log, FacilitiesGoOutAsTheSystemKnowsThem) {
   }
 }
 
-TEST(Log, LevelsOutOfRangeAreTheNearestOnes) {
+TEST(Log, LevelsOutOfRangeAreClamped) {
   LogDaemon daemon;
   const Context context = newContext("user");
   LMPLogMessage(context.get(), 99, "x");
@@ -127,7 +127,7 @@ TEST(Log, ContextNeedsAProgramAndAFacility) {
   LMPLogDestroyContext(nullptr);
 }
 
-TEST(Log, ContextIsMadeWithNobodyListening) { EXPECT_NE(newContext(), nullptr); }
+TEST(Log, ContextIsCreatedWithoutALogDaemon) { EXPECT_NE(newContext(), nullptr); }
 
 TEST(Log, ControlCharactersAreEscaped) {
   struct Case {
@@ -166,21 +166,21 @@ TEST(Log, MessageEndsAtEightKibibytes) {
   EXPECT_LE(daemon.receiveText().size(), 8192U);
 }
 
-TEST(Log, MessageThatCannotBeFormattedIsNotSwallowed) {
-  const wchar_t text[] = {0x20AC, 0};  // no encoding for it in the C locale
+TEST(Log, UnformattableMessageIsLoggedAsItsFormat) {
+  const wchar_t text[] = {0x20AC, 0};  // has no encoding in the C locale
   const LogCapture capture;
   LMPLogMessage(nullptr, kLogError, "name: %ls", text);
   EXPECT_TRUE(capture.contains(kLogError, "message that can't be formatted: name: %ls"));
 }
 
 TEST(Log, ErrnoIsKept) {
-  const Context context = newContext();  // nobody listens: system calls fail
+  const Context context = newContext();  // no daemon listens, so system calls fail
   errno = EDOM;
   LMPLogMessage(context.get(), kLogInfo, "x");
   EXPECT_EQ(errno, EDOM);
 }
 
-TEST(Log, FullSocketNeverBlocksAndTheLossIsToldOnce) {
+TEST(Log, FullSocketNeverBlocksAndTheLossIsReportedOnce) {
   LogDaemon daemon;
   const Context context = newContext();
   constexpr int kSent = 2000;
@@ -212,7 +212,7 @@ TEST(Log, MessagesWithoutADaemonAreCountedForTheNextOne) {
   LogDaemon daemon;
   int sent = 5;
   std::optional<std::string> first;
-  // Connecting is tried once a second: go on logging until somebody hears.
+  // The log tries to connect once a second. Keep logging until a message arrives.
   for (int i = 0; i < 500 && !first; ++i) {
     LMPLogMessage(context.get(), kLogInfo, "number %d", ++sent);
     first = daemon.receive(20);
@@ -251,7 +251,7 @@ TEST(Log, ThreadsWriteWholeMessages) {
   for (std::thread& writer : writers) writer.join();
   done = true;
   reader.join();
-  // What was lost last of all is not told until another message follows.
+  // A loss at the very end is reported only with the next message.
   LMPLogMessage(context.get(), kLogInfo, "end");
   if (const auto number = lostIn(daemon.receiveText())) lost += *number;
   EXPECT_EQ(whole + lost, kThreads * kEach);
@@ -260,7 +260,7 @@ TEST(Log, ThreadsWriteWholeMessages) {
 
 TEST(Log, NullIsTheDefaultContext) {
   LogDaemon daemon;
-  // Earlier messages may have found nobody: the second one comes after the loss has been told.
+  // Earlier messages may have been lost. Then the loss is reported before this message.
   std::string text;
   for (int i = 0; i < 500 && text != "default"; ++i) {
     LMPLogMessage(nullptr, kLogNotice, "default");
@@ -283,7 +283,7 @@ TEST(Log, SinkGetsEveryMessageInsteadOfTheLog) {
   EXPECT_EQ(daemon.receiveText(), "after");
 }
 
-/// Variables for a child that starts from the beginning: this process has read its own long ago.
+/// Sets environment variables for a child that starts afresh, since this process has already read its own.
 class Environment {
  public:
   Environment(const char* target, const char* level) {

@@ -1,4 +1,4 @@
-// Tests of what goes over message buses: with none, with a mute one, and with a real one of their own.
+// Message buses: without a bus, with an unresponsive one, and with a real private one.
 #include <fcntl.h>
 #include <gtest/gtest.h>
 #include <poll.h>
@@ -28,7 +28,7 @@ using Clock = std::chrono::steady_clock;
 using testing::LogCapture;
 using testing::TemporaryDirectory;
 
-/// The buses' addresses for one test. Always set here: no test may reach a bus of the machine.
+/// Sets the buses' addresses for one test. Always use it: no test may reach a bus of the machine.
 class Addresses {
  public:
   Addresses(const std::string& system, const std::string& session) {
@@ -38,7 +38,7 @@ class Addresses {
   explicit Addresses(const std::string& both) : Addresses(both, both) {}
 };
 
-/// A child that ends with this object, and its standard output.
+/// A child process that ends with this object, and its standard output.
 class Child {
  public:
   explicit Child(std::vector<std::string> argv) {
@@ -49,7 +49,7 @@ class Child {
     posix_spawn_file_actions_t actions;
     posix_spawn_file_actions_init(&actions);
     posix_spawn_file_actions_adddup2(&actions, writing.get(), STDOUT_FILENO);
-    // The bus says there what it may not do here: nothing of it is this test's concern.
+    // The bus reports missing permissions there, which don't concern this test.
     posix_spawn_file_actions_addopen(&actions, STDERR_FILENO, "/dev/null", O_WRONLY, 0);
     std::vector<char*> words;
     for (std::string& word : argv) words.push_back(word.data());
@@ -66,7 +66,7 @@ class Child {
   }
 
   [[nodiscard]] bool started() const { return pid_ > 0; }
-  /// Reads on until the output holds `text`. @return false after 20 s or at the end of the output.
+  /// Reads until the output contains `text`. @return false after 20 s or at end of file
   bool waitFor(const std::string& text) {
     const auto deadline = Clock::now() + 20s;
     while (seen_.find(text) == std::string::npos) {
@@ -89,7 +89,7 @@ class Child {
   std::string seen_;
 };
 
-/// A message bus of the test's own.
+/// A private message bus for a test.
 class PrivateBus {
  public:
   PrivateBus()
@@ -107,7 +107,7 @@ class PrivateBus {
   bool ready_;
 };
 
-/// A socket that takes connections and never says a word.
+/// A socket that accepts connections and never answers.
 class MuteBus {
  public:
   MuteBus() : fd_(socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0)) {
@@ -155,7 +155,7 @@ TEST(Notifications, NoSessionBusIsStartedWhereThereIsNone) {
   if (runtime != nullptr) setenv("XDG_RUNTIME_DIR", kept.c_str(), 1);
 }
 
-TEST(Notifications, NameThatIsNoneIsExplained) {
+TEST(Notifications, InvalidNameIsExplained) {
   const Addresses addresses(kNowhere);
   const LogCapture log;
   notify_post("x.not a name");
@@ -163,7 +163,7 @@ TEST(Notifications, NameThatIsNoneIsExplained) {
       kLogDebug, "Notification x.not a name was not sent on the system bus: not a name for a signal"));
 }
 
-TEST(Notifications, MuteBusIsGivenUp) {
+TEST(Notifications, UnresponsiveBusTimesOut) {
   const MuteBus bus;
   const Addresses addresses(bus.address());
   const LogCapture log;
@@ -178,7 +178,7 @@ TEST(Notifications, SignalsArriveOnTheirBus) {
   PrivateBus bus;
   if (!bus.ready()) GTEST_SKIP() << "no dbus-daemon here";
   Child monitor({"/usr/bin/dbus-monitor", "--address", bus.address(), "interface='com.zandor.lmxagentd'"});
-  // It is told that it has lost its name once it has become a monitor.
+  // It prints NameLost once it has become a monitor.
   if (!monitor.started() || !monitor.waitFor("NameLost")) GTEST_SKIP() << "no dbus-monitor here";
   const LogCapture log;
   const Addresses system(bus.address(), kNowhere);

@@ -1,4 +1,4 @@
-// Address messages as the kernel sends them.
+// Address messages in the form that the kernel sends.
 #include "platform/network_watcher.h"
 
 #include <arpa/inet.h>
@@ -29,7 +29,7 @@ std::string message(int type, unsigned interface, const char* address, int famil
   return {reinterpret_cast<const char*>(&m), sizeof m};
 }
 
-TEST(AddressMessages, ComingAndGoingAreChanges) {
+TEST(AddressMessages, AddedAndRemovedAddressesAreChanges) {
   std::set<InterfaceAddress> known;
   EXPECT_TRUE(applyAddressMessages(message(RTM_NEWADDR, 2, "192.0.2.1"), known));
   EXPECT_FALSE(applyAddressMessages(message(RTM_NEWADDR, 2, "192.0.2.1"), known)) << "a renewed lease";
@@ -39,22 +39,22 @@ TEST(AddressMessages, ComingAndGoingAreChanges) {
   EXPECT_EQ(known.size(), 1U);
 }
 
-TEST(AddressMessages, SeveralCanComeAtOnce) {
+TEST(AddressMessages, OneBufferMayHoldSeveral) {
   std::set<InterfaceAddress> known;
   const std::string both = message(RTM_NEWADDR, 2, "192.0.2.1") + message(RTM_NEWADDR, 2, "192.0.2.2");
   EXPECT_TRUE(applyAddressMessages(both, known));
   EXPECT_EQ(known.size(), 2U);
 }
 
-TEST(AddressMessages, OthersAreNone) {
+TEST(AddressMessages, OtherMessagesAreNoChange) {
   std::set<InterfaceAddress> known;
   EXPECT_FALSE(applyAddressMessages(message(RTM_NEWADDR, 2, "192.0.2.1", AF_INET6), known));
   EXPECT_FALSE(applyAddressMessages(message(RTM_NEWLINK, 2, "192.0.2.1"), known));
   EXPECT_FALSE(applyAddressMessages("", known));
 }
 
-TEST(AddressMessages, BrokenOnesAreSurvived) {
-  std::mt19937 random(3);  // NOLINT: the same numbers every time
+TEST(AddressMessages, SurvivesMalformedMessages) {
+  std::mt19937 random(3);  // NOLINT: a fixed seed makes the test repeatable
   std::set<InterfaceAddress> known;
   const std::string good = message(RTM_NEWADDR, 2, "192.0.2.1");
   for (std::size_t cut = 0; cut < good.size(); ++cut) applyAddressMessages(good.substr(0, cut), known);

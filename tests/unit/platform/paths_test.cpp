@@ -1,4 +1,4 @@
-// Tests of the fixed paths and of identifiers.
+// Fixed paths and unique identifiers.
 #include "platform/paths.h"
 
 #include <gmock/gmock.h>
@@ -12,7 +12,7 @@
 namespace lmx {
 namespace {
 
-TEST(SystemPath, StandsBehindTheRoot) {
+TEST(SystemPath, IsPrefixedWithTheRoot) {
   EXPECT_EQ(systemPath(kPidFile), testing::kTestRoot.path() + "/var/run/lmxagentd.pid");
 }
 

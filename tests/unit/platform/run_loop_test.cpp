@@ -1,4 +1,4 @@
-// Tests of the run loop.
+// The run loop.
 #include "platform/run_loop.h"
 
 #include <gtest/gtest.h>
@@ -42,7 +42,7 @@ class Pipe {
   UniqueFd writing;
 };
 
-/// A thread that posts an action and waits for it, and is known to be waiting.
+/// A thread that posts an action and waits for it. Construction returns once it is waiting.
 class WaitingPoster {
  public:
   WaitingPoster(RunLoop& loop, RunLoop::Action action) {
@@ -50,7 +50,7 @@ class WaitingPoster {
       tid_ = gettid();
       result_ = loop.post(action, Wait::untilDone);
     });
-    // It sleeps in one place only.
+    // The thread sleeps only while it waits for the action.
     while (!sleeping()) std::this_thread::yield();
   }
   bool result() {
@@ -71,7 +71,7 @@ class WaitingPoster {
   bool result_ = false;
 };
 
-TEST(RunLoop, PostedActionsRunOneATurnInTheirOrder) {
+TEST(RunLoop, PostedActionsRunInOrderOnePerTurn) {
   RunLoop loop;
   std::string order;
   for (const char c : {'a', 'b', 'c'}) EXPECT_TRUE(loop.post([&, c] { order += c; }, Wait::no));
@@ -122,7 +122,7 @@ TEST(RunLoop, WaitingOnTheOwnerThreadRunsAtOnce) {
   EXPECT_TRUE(ran);
 }
 
-TEST(RunLoop, OwnerIsWhoRanItLast) {
+TEST(RunLoop, RunMakesTheCallerTheOwner) {
   RunLoop loop;
   EXPECT_FALSE(loop.isOwnerThread());
   loop.run(0ms);
@@ -192,11 +192,11 @@ TEST(RunLoop, TimerRunsAfterEachInterval) {
   }
 }
 
-TEST(RunLoop, MissedBeatsAreNotMadeUp) {
+TEST(RunLoop, MissedTimerIntervalsAreNotMadeUp) {
   RunLoop loop;
   int beats = 0;
   const auto timer = loop.addRepeatingTimer(500ms, [&] { ++beats; });
-  std::this_thread::sleep_for(1100ms);  // nobody to wait for: time itself must pass
+  std::this_thread::sleep_for(1100ms);  // nothing to wait for: only time must pass
   EXPECT_EQ(loop.run(0ms), Turn::handledSource);
   EXPECT_EQ(loop.run(0ms), Turn::timedOut);
   EXPECT_EQ(beats, 1);
@@ -211,7 +211,7 @@ TEST(RunLoop, RemovedTimerIsSilent) {
   EXPECT_FALSE(ran);
 }
 
-TEST(RunLoop, TimerMayRemoveItselfAndKeepsWhatItHolds) {
+TEST(RunLoop, TimerMayRemoveItselfAndKeepsItsCapturesMeanwhile) {
   RunLoop loop;
   std::unique_ptr<RunLoop::Source> timer;
   int seen = 0;
@@ -285,12 +285,12 @@ TEST(RunLoop, PostedActionsGoBeforeTimersAndWatches) {
   EXPECT_EQ(order, "ptw");
 }
 
-TEST(RunLoop, BusyDescriptorLeavesTheOthersTheirTurn) {
+TEST(RunLoop, BusyDescriptorDoesNotStarveOthers) {
   RunLoop loop;
   const Pipe busy;
   const Pipe other;
   bool served = false;
-  const auto first = loop.watchReadable(busy.reading.get(), [] {});  // never read: always ready
+  const auto first = loop.watchReadable(busy.reading.get(), [] {});  // never read, so always ready
   const auto second = loop.watchReadable(other.reading.get(), [&] {
     other.take();
     served = true;
@@ -334,7 +334,7 @@ TEST(RunLoop, TurnsMayBeNestedInAnAction) {
   EXPECT_EQ(loop.run(0ms), Turn::timedOut);
 }
 
-TEST(RunLoop, NestedTurnDoesNotEnterARunningSourceAgain) {
+TEST(RunLoop, NestedTurnSkipsRunningSources) {
   RunLoop loop;
   const Pipe pipe;
   int depth = 0;
@@ -365,11 +365,11 @@ TEST(RunLoop, WaiterIsServedByANestedTurn) {
   EXPECT_TRUE(poster->result());
 }
 
-TEST(RunLoop, ManyPostersLoseNothing) {
+TEST(RunLoop, NoPostIsLostWithManyPosters) {
   RunLoop loop;
   constexpr int kThreads = 4;
   constexpr int kEach = 500;
-  int total = 0;  // touched on this thread only
+  int total = 0;  // used on this thread only
   std::atomic<int> running{kThreads};
   std::vector<std::thread> posters;
   posters.reserve(kThreads);

@@ -1,4 +1,4 @@
-// Tests of signals as run-loop work.
+// Signals as run-loop work.
 #include "platform/signals.h"
 
 #include <gtest/gtest.h>
@@ -14,7 +14,7 @@ namespace {
 using namespace std::chrono_literals;
 using Turn = RunLoop::Turn;
 
-/// Turns until nothing is left to do.
+/// Runs turns until nothing is left to do.
 void runAll(RunLoop& loop) {
   while (loop.run(0ms) == Turn::handledSource) {
   }
@@ -30,7 +30,7 @@ TEST(SignalSource, SignalBecomesAnActionOfTheLoop) {
   EXPECT_EQ(got, std::vector<int>{SIGUSR2});
 }
 
-TEST(SignalSource, OrderIsKept) {
+TEST(SignalSource, KeepsTheOrderOfSignals) {
   RunLoop loop;
   std::vector<int> got;
   const SignalSource source(loop, {SIGUSR1, SIGUSR2, SIGHUP}, [&](int number) { got.push_back(number); });
@@ -78,7 +78,7 @@ TEST(SignalSource, HandlerBlocksEverythingAndRestartsCalls) {
 TEST(SignalSource, HandlerKeepsErrno) {
   RunLoop loop;
   const SignalSource source(loop, {SIGUSR1}, [](int) {});
-  // More than the pipe holds: the writes of the handler fail.
+  // More than the pipe holds, so that the handler's writes fail.
   for (int i = 0; i < 70000; ++i) {
     errno = EDOM;
     raise(SIGUSR1);

@@ -1,4 +1,4 @@
-// Tests of the work queues.
+// The work queue.
 #include "platform/work_queue.h"
 
 #include <gtest/gtest.h>
@@ -18,7 +18,7 @@
 namespace lmx {
 namespace {
 
-/// Counts, and lets threads wait for a count.
+/// Counts, and lets threads wait until a count is reached.
 class Counter {
  public:
   int add(int difference) {
@@ -28,7 +28,7 @@ class Counter {
     changed_.notify_all();
     return value_;
   }
-  /// @return whether the count has come to `value` within ten seconds
+  /// @return whether the count reached `value` within ten seconds
   [[nodiscard]] bool reaches(int value) {
     std::unique_lock lock(mutex_);
     return changed_.wait_for(lock, std::chrono::seconds(10), [&] { return value_ >= value; });
@@ -45,7 +45,7 @@ class Counter {
   int highest_ = 0;
 };
 
-// The counters are static: an item that comes too late must not find them gone.
+// The counters are static, because an item may run after the test has ended.
 
 TEST(WorkQueue, ItemRunsOnAnotherThreadThatIsNiced) {
   static Counter done;
@@ -94,14 +94,14 @@ TEST(WorkQueue, ItemMayDispatchAnother) {
   EXPECT_TRUE(done.reaches(1));
 }
 
-TEST(WorkQueue, WhatAnItemHoldsMayDispatchAtItsEnd) {
+TEST(WorkQueue, DestructorOfACaptureMayDispatch) {
   static Counter done;
   std::shared_ptr<void> held(nullptr, [](void*) { dispatchAsync([] { done.add(1); }); });
   dispatchAsync([held = std::move(held)] {});
   EXPECT_TRUE(done.reaches(1));
 }
 
-TEST(WorkQueue, AnItemThatThrowsCostsOnlyItself) {
+TEST(WorkQueue, ExceptionEndsOnlyItsItem) {
   static Counter done;
   testing::LogCapture log;
   dispatchAsync([] { throw std::runtime_error("no such thing"); });

@@ -37,7 +37,7 @@ class Gathering : public testing::SubmitFixture {
             {"RecordingMetadata_VIDEO_MAXIMUM_FRAME_RATE", "25"},
             {"RecordingMetadata_DATA_MEDIA_EXTENSION", ".mov"}};
   }
-  /// `complete` with `more` in place of what has the same name, less `less`.
+  /// `complete` with the values of `more` replaced or added and those of `less` removed.
   static Dictionary completeWith(const Dictionary& more, const std::vector<std::string>& less = {}) {
     Dictionary all = complete();
     for (const auto& [name, value] : more) all[name] = value;
@@ -100,7 +100,7 @@ TEST_F(Gathering, AnEndDateOfTheStartEndsTheGathering) {
   EXPECT_THAT(log_.entries(), ElementsAre(kFailed));
 }
 
-TEST_F(Gathering, AnImageSideOfTheStartEndsTheGatheringWhenTheRecordersIsKnown) {
+TEST_F(Gathering, AnImageWidthOfTheStartEndsTheGatheringWhenTheRecordersIsKnown) {
   context_->record_context()->videoWidth.set(1280);
   EXPECT_EQ(gather(shared({{"RecordingMetadata_VIDEO_IMAGE_WIDTH", "640"}})),
             completeWith({{"RecordingMetadata_VIDEO_IMAGE_WIDTH", "640"}},
@@ -135,7 +135,7 @@ TEST_F(Gathering, AnEmptyImageSizeOfTheStartIsNoSize) {
             completeWith({{"RecordingMetadata_VIDEO_IMAGE_WIDTH", ""}}));
 }
 
-TEST_F(Gathering, AnEmptyMachineOfTheStartMeetsTheAgentsAndEndsTheGathering) {
+TEST_F(Gathering, AnEmptyMachineUuidOfTheStartEndsTheGathering) {
   EXPECT_EQ(gather(shared({{"RecordingMetadata_MACHINE_UUID", ""}})),
             (Dictionary{{"RecordingMetadata_MACHINE_UUID", ""}}));
   EXPECT_THAT(log_.entries(), ElementsAre(kFailed));
@@ -220,7 +220,7 @@ TEST_F(Gathering, ACanceledRecordingIsMarked) {
   EXPECT_TRUE(job_.canceled);
 }
 
-TEST_F(Gathering, ATimeThatNobodySetIsZero) {
+TEST_F(Gathering, AnUnsetTimeIsZero) {
   job_.setPropertyValuesWithContext(context_, "/r/ABC.mov", std::nullopt, kStop, 60, nullptr, false);
   EXPECT_EQ(job_.properties, completeWith({{"RecordingMetadata_START_DATE", "0"}}));
   EXPECT_THAT(log_.entries(), IsEmpty());

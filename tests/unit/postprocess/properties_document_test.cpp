@@ -20,7 +20,7 @@ class PropertiesDocument : public testing::SubmitFixture {
     job_.properties = std::move(properties);
     return propertiesXml(job_.properties);
   }
-  /// What a reader finds in the document.
+  /// The properties that a reader finds in the document.
   static Dictionary parsed(const std::string& document) {
     pugi::xml_document xml;
     const auto result = xml.load_buffer(document.data(), document.size(),
@@ -44,7 +44,7 @@ TEST_F(PropertiesDocument, WithoutPropertiesHasAnEmptyList) {
             "</LumexServerAgentRecordingProperties>\n");
 }
 
-TEST_F(PropertiesDocument, HasAnElementAProperty) {
+TEST_F(PropertiesDocument, HasOneElementPerProperty) {
   EXPECT_EQ(documentOf({{"RecordingMetadata_DURATION", "60"}, {"RecordingMetadata_TITLE", ""}}),
             "<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n"
             "<LumexServerAgentRecordingProperties>\n"
@@ -122,7 +122,7 @@ TEST_F(PropertiesDocument, IsWrittenUnderItsName) {
   EXPECT_THAT(log_.entries(), IsEmpty());
 }
 
-TEST_F(PropertiesDocument, ReplacesAnOlderOneAsAWhole) {
+TEST_F(PropertiesDocument, ReplacesAnOlderDocumentAtomically) {
   write(inRepository("ABC.xml"), std::string(10000, 'x'));
   struct stat before {};
   ASSERT_EQ(stat(inRepository("ABC.xml").c_str(), &before), 0);

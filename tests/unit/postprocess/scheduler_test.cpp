@@ -1,4 +1,4 @@
-// The scheduler's loop with a sleep of the test's own, and its thread.
+// The scheduler's loop with a scripted sleep, and its thread.
 #include "postprocess/scheduler.h"
 
 #include <gmock/gmock.h>
@@ -26,7 +26,7 @@ class Scheduler : public testing::SubmitFixture {
     job->properties = {{"RecordingMetadata_RECORDING_UUID", uuid}};
     context_->post_process_list.postProcessListAddJob(std::move(job));
   }
-  /// Runs the loop on this thread; `onSleep` comes in place of each sleep.
+  /// Runs the loop on this thread and calls `onSleep` instead of sleeping.
   void runLoop(std::function<void()> onSleep) {
     EXPECT_EQ(agentPostProcessSchedulerRunLoop(*context_, children_,
                                                {.sleep =
@@ -72,7 +72,7 @@ TEST_F(Scheduler, TakesAJobThatCameWhileItSlept) {
   EXPECT_THAT(submitted(), ElementsAre("A"));
 }
 
-TEST_F(Scheduler, GoesOnAfterAFailedJob) {
+TEST_F(Scheduler, ContinuesAfterAFailedJob) {
   children_.results = {{ChildResult::End::exited, 1, {}}};
   add("A");
   add("B");
@@ -80,7 +80,7 @@ TEST_F(Scheduler, GoesOnAfterAFailedJob) {
   EXPECT_THAT(submitted(), ElementsAre("A", "B"));
 }
 
-TEST_F(Scheduler, EndsAfterTheJobInHandWhenTheAgentStops) {
+TEST_F(Scheduler, EndsAfterTheCurrentJobWhenTheAgentStops) {
   add("A");
   add("B");
   children_.on_run = [this](const ChildOptions&) { context_->state.running.set(false); };
@@ -90,7 +90,7 @@ TEST_F(Scheduler, EndsAfterTheJobInHandWhenTheAgentStops) {
   EXPECT_THAT(sleeps_, IsEmpty());
 }
 
-TEST_F(Scheduler, EndsAfterTheJobInHandWhenItIsCancelled) {
+TEST_F(Scheduler, EndsAfterTheCurrentJobWhenCancelled) {
   add("A");
   add("B");
   children_.on_run = [this](const ChildOptions&) { cancelled_ = true; };
@@ -128,7 +128,7 @@ TEST_F(Scheduler, DoesNotHoldTheListWhileAJobRuns) {
   add("A");
   children_.on_run = [this](const ChildOptions&) {
     if (submitted().size() > 1) return;
-    std::jthread([this] { add("B"); }).join();  // would hang
+    std::jthread([this] { add("B"); }).join();  // would deadlock if the list were locked
   };
   runLoop([this] { context_->state.running.set(false); });
   EXPECT_THAT(submitted(), ElementsAre("A", "B"));
@@ -136,7 +136,7 @@ TEST_F(Scheduler, DoesNotHoldTheListWhileAJobRuns) {
 
 // The thread.
 
-/// A tool that ends when the test lets it.
+/// A tool that ends when the test allows it.
 class GatedChildren : public ChildRunner {
  public:
   ChildResult run(const std::vector<std::string>&, const ChildOptions&) override {
@@ -170,10 +170,10 @@ TEST_F(Scheduler, AnIdleThreadEndsAtOnceWhenItIsCancelled) {
   const auto asked = std::chrono::steady_clock::now();
   scheduler.cancel();
   EXPECT_TRUE(log_.waitFor(kLogInfo, kStopped));
-  EXPECT_LT(std::chrono::steady_clock::now() - asked, 4s);  // an uninterrupted sleep would last five
+  EXPECT_LT(std::chrono::steady_clock::now() - asked, 4s);  // an uninterrupted sleep takes five seconds
 }
 
-TEST_F(Scheduler, ItsThreadOutlivesIt) {
+TEST_F(Scheduler, ThreadOutlivesTheScheduler) {
   GatedChildren gated;
   add("A");
   {

@@ -1,4 +1,4 @@
-// The submission of a job, with a scripted tool and with a real one.
+// Submission of a job, with a scripted tool and with a real one.
 #include "postprocess/submission.h"
 
 #include <gmock/gmock.h>
@@ -107,7 +107,7 @@ TEST_F(SubmissionJob, ANonZeroExitIsLoggedWithItsCodeAndKeepsTheFiles) {
   expectFilesKept();
 }
 
-TEST_F(SubmissionJob, AToolKilledByASignalCountsAsAShellWouldHaveIt) {
+TEST_F(SubmissionJob, AToolKilledByASignalHasAShellsExitCode) {
   children_.results = {{End::signalled, 9, {}}};
   EXPECT_EQ(job_.addRecording(children_), 1);
   EXPECT_THAT(log_.entries(), ElementsAre(kCommandLine, exitCode(137)));
@@ -151,7 +151,7 @@ TEST_F(SubmissionJob, AWorkflowIsSubmittedWithUserAndPassword) {
                                            " --workflow_uuid W-1 --user ada -p secret --delete "));
 }
 
-TEST_F(SubmissionJob, ThePasswordStandsInTheCommandLineOnly) {
+TEST_F(SubmissionJob, ThePasswordAppearsOnlyInTheCommandLine) {
   job_.adhoc_workflow_uuid = "W-1";
   context_->options.user.set("ada");
   context_->options.password.set("secret");
@@ -232,7 +232,7 @@ class FileRecording : public SubmissionJob {
   static std::string elsewhere() { return kRoot_ + "/elsewhere"; }
 
   static inline const std::string kRoot_ = testing::kTestRoot.path();
-  const std::string movie_ = std::string(200000, 'm') + "end";  // more than one buffer
+  const std::string movie_ = std::string(200000, 'm') + "end";  // more than one copy buffer
 };
 
 TEST_F(FileRecording, IsCopiedIntoTheRepositoryBeforeTheToolRuns) {
@@ -242,7 +242,7 @@ TEST_F(FileRecording, IsCopiedIntoTheRepositoryBeforeTheToolRuns) {
   EXPECT_EQ(seen, movie_);
   EXPECT_EQ(contentOf(inRepository("NEW.xml")), "talk's document");
   EXPECT_EQ(contentOf(elsewhere() + "/talk.mov"), movie_);
-  EXPECT_EQ(filesInRepository(), 4U);  // nothing temporary
+  EXPECT_EQ(filesInRepository(), 4U);  // no temporary file left
 }
 
 TEST_F(FileRecording, TheCopiesStayWhenTheToolFails) {
@@ -261,7 +261,7 @@ TEST_F(FileRecording, AnExistingCopyIsKeptAndTheSubmissionGoesOn) {
                                            inRepository("NEW.mov") + "\": File exists"));
 }
 
-TEST_F(FileRecording, ALinkThatLeadsNowhereIsAnExistingCopy) {
+TEST_F(FileRecording, ADanglingLinkCountsAsAnExistingCopy) {
   ASSERT_EQ(symlink("/nowhere/at/all", inRepository("NEW.mov").c_str()), 0);
   EXPECT_EQ(job_.addRecording(children_), 0);
   EXPECT_TRUE(std::filesystem::is_symlink(inRepository("NEW.mov")));
@@ -272,19 +272,19 @@ TEST_F(FileRecording, AMissingMovieIsADebugLineAndLeavesNothingTemporary) {
   EXPECT_EQ(job_.addRecording(children_), 0);
   EXPECT_TRUE(log_.contains(kLogDebug, "\"" + elsewhere() + "/talk.mov\" was not copied to \"" +
                                            inRepository("NEW.mov") + "\": No such file or directory"));
-  EXPECT_EQ(filesInRepository(), 3U);  // the two of the fixture and the document
+  EXPECT_EQ(filesInRepository(), 3U);  // two from the fixture, plus the document
 }
 
 TEST_F(FileRecording, AMovieThatCannotBeReadLeavesNoHalfCopy) {
   std::filesystem::remove(elsewhere() + "/talk.mov");
-  std::filesystem::create_directory(elsewhere() + "/talk.mov");  // opens, but does not read
+  std::filesystem::create_directory(elsewhere() + "/talk.mov");  // can be opened but not read
   EXPECT_EQ(job_.addRecording(children_), 0);
   EXPECT_TRUE(log_.contains(kLogDebug, "\"" + elsewhere() + "/talk.mov\" was not copied to \"" +
                                            inRepository("NEW.mov") + "\": Is a directory"));
   EXPECT_EQ(filesInRepository(), 3U);
 }
 
-TEST_F(FileRecording, AnUnwritableRepositoryIsADebugLineEach) {
+TEST_F(FileRecording, AnUnwritableRepositoryIsOneDebugLinePerFile) {
   context_->recording.recording_repository_path.set(kRoot_ + "/missing");
   EXPECT_EQ(job_.addRecording(children_), 0);
   EXPECT_EQ(children_.runs().size(), 1U);
@@ -299,13 +299,13 @@ TEST_F(FileRecording, TheJobsOwnSessionDecidesWhatIsCopied) {
   EXPECT_FALSE(std::filesystem::exists(inRepository("NEW.mov")));
 }
 
-TEST_F(FileRecording, AWorkflowWithoutPasswordIsCopiedAllTheSame) {
+TEST_F(FileRecording, AWorkflowWithoutPasswordIsStillCopied) {
   job_.adhoc_workflow_uuid = "W-1";
   EXPECT_EQ(job_.addRecording(children_), 1);
   EXPECT_EQ(contentOf(inRepository("NEW.mov")), movie_);
 }
 
-// A real child.
+// Tests with a real child process.
 
 class RealTool : public SubmissionJob {
  protected:
@@ -319,7 +319,7 @@ class RealTool : public SubmissionJob {
   }
 };
 
-TEST_F(RealTool, GetsItsArgumentsAsTheyAre) {
+TEST_F(RealTool, GetsItsArgumentsUnchanged) {
   installTool("exit 0");
   job_.properties = {{"RecordingMetadata_RECORDING_UUID", "A B'$(id)\"*"}};
   EXPECT_EQ(job_.addRecordingWithCommentary(systemChildRunner()), 0);
@@ -346,7 +346,7 @@ TEST_F(RealTool, ASignalIsLoggedAsItsShellCode) {
   EXPECT_TRUE(log_.contains(exitCode(143).level, exitCode(143).text));
 }
 
-TEST_F(RealTool, ThatIsNotInstalledIsNamed) {
+TEST_F(RealTool, MissingToolIsNamedInTheLog) {
   EXPECT_EQ(job_.addRecordingWithCommentary(systemChildRunner()), -1);
   EXPECT_THAT(log_.entries(),
               ElementsAre(kStarting, kInProgress, kCommandLine,

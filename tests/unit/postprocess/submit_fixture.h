@@ -1,4 +1,4 @@
-// A context, a movie and a child runner for the tests of submissions.
+// A context, a movie and a child runner for submission tests.
 #pragma once
 #include <gtest/gtest.h>
 
@@ -22,7 +22,7 @@
 
 namespace lmx::testing {
 
-/// Remembers what it was asked to run and answers with the results it was given, then with success.
+/// Records what it was asked to run. Returns the scripted results, then success.
 class ScriptedChildren : public ChildRunner {
  public:
   std::deque<ChildResult> results;
@@ -49,7 +49,7 @@ inline SharedDictionary shared(Dictionary dictionary) {
   return std::make_shared<const Dictionary>(std::move(dictionary));
 }
 
-/// A bound agent with an empty repository.
+/// An agent bound to a server, with an empty repository.
 class SubmitFixture : public ::testing::Test {
  protected:
   SubmitFixture() {
@@ -59,7 +59,7 @@ class SubmitFixture : public ::testing::Test {
     context_->recording.recording_repository_path.set(repository());
     context_->state.running.set(true);
   }
-  /// The list and the jobs in it hold the context.
+  /// Breaks the cycle: the list and its jobs hold the context.
   ~SubmitFixture() override { context_->cleanup(); }
 
   static std::string repository() { return kTestRoot.path() + "/recordings"; }

@@ -1,4 +1,4 @@
-// The settings on their way into the context.
+// Copying the settings into the context.
 #include "prefs/agent_settings.h"
 
 #include <arpa/inet.h>
@@ -94,7 +94,7 @@ Failure missing(const char* name, const char* key, std::vector<Entry> said) {
 Failure with(const char* name, const char* key, PlistValue value, std::vector<Entry> said) {
   return {name, [key, value](PlistDictionary& all) { all[key] = value; }, std::move(said)};
 }
-/// `also` is set beside the key that makes it fail.
+/// Sets `also` beside the key that makes the reading fail.
 Failure withType(const char* name, const char* type, Failure failure) {
   return {name,
           [type, change = failure.change](PlistDictionary& all) {
@@ -268,7 +268,7 @@ TEST_F(Settings, AdHocModeSkipsBindingSecretAndRepository) {
   EXPECT_EQ(context_->recording.recording_type.get(), "Audio+Video");
 }
 
-TEST_F(Settings, WithoutASessionTheyFailAfterTheBinding) {
+TEST_F(Settings, WithoutASessionReadingFailsAfterTheBindingKeys) {
   context_->releaseRecord();
   EXPECT_FALSE(read(bound()));
   EXPECT_TRUE(log_.contains(kLogCritical, "Internal error occurred creating record context"));
@@ -288,7 +288,7 @@ TEST_F(Settings, AFailureKeepsTheFieldsBeforeItAndStoresWhatTheFailingKeyHad) {
   EXPECT_EQ(context_->server.tunnel_host.get(), "tunnel.example");
 }
 
-TEST_F(Settings, AnUnknownTypeIsStoredAllTheSame) {
+TEST_F(Settings, AnUnknownTypeIsStoredAnyway) {
   ASSERT_TRUE(read(bound()));
   PlistDictionary all = bound();
   all["RecordingType"] = "Hologram";
@@ -318,7 +318,7 @@ TEST_F(Settings, OnlyAFileRecordingReadsItsPath) {
   EXPECT_EQ(context_->record_context()->recordingType.get(), kRecordingTypeFile);
 }
 
-TEST_F(Settings, AnIntegerInTheFileServesWhereATextIsExpected) {
+TEST_F(Settings, AnIntegerIsAcceptedForAText) {
   PlistDictionary all = bound();
   all["RecordingDiskSpaceCutoffInMB"] = std::int64_t{512};
   ASSERT_TRUE(read(all));
@@ -338,7 +338,7 @@ TEST_F(Migration, TheObsoleteIntervalBecomesMilliseconds) {
                                  {"none", "0"},
                                  {"-1", "-1000"},
                                  {std::int64_t{3}, "400"},
-                                 {"3000000", "-1294967296"}};  // 32-bit arithmetic
+                                 {"3000000", "-1294967296"}};  // wraps in 32 bits
   for (const auto& [seconds, milliseconds] : kIntervals) {
     replace({{"RecordingPreviewIntervalInSeconds", seconds}, {"PreviewIntervalInMilliseconds", "7"}});
     AgentPreferences().migrateOldKeys();

@@ -1,4 +1,4 @@
-// Preferences files for a test, in a directory of its own.
+// Preferences files for a test, in a directory of their own.
 #pragma once
 #include <gtest/gtest.h>
 #include <sys/stat.h>
@@ -19,7 +19,7 @@
 
 namespace lmx::testing {
 
-/// Starts without any preferences file.
+/// Starts without a preferences file.
 class PrefsFixture : public ::testing::Test {
  protected:
   PrefsFixture() {
@@ -31,13 +31,13 @@ class PrefsFixture : public ::testing::Test {
   static std::string systemFile() { return systemPath(kPreferencesFile); }
   static std::string userFile() { return kTestRoot.path() + "/home" + std::string(kPreferencesFile); }
 
-  /// Puts a new file under the name, as an editor that renames does.
+  /// Renames a new file over the old one, as some editors do.
   static void replace(const std::string& path, const PlistDictionary& dictionary) {
     ASSERT_EQ(writePropertyList(path, dictionary), 0);
     makeOld(path);
   }
   static void replace(const PlistDictionary& dictionary) { replace(systemFile(), dictionary); }
-  /// Writes into the file that is there, as an editor that does not rename.
+  /// Writes to the existing file, as other editors do.
   static void writeInPlace(const std::string& text) {
     std::ofstream(systemFile(), std::ios::in | std::ios::out | std::ios::trunc) << text;
   }
@@ -46,7 +46,7 @@ class PrefsFixture : public ::testing::Test {
     makeOld(systemFile());
   }
 
-  /// The clock of file times ticks slowly: a later write must be seen to be later.
+  /// Backdates the file. Timestamps tick slowly, and a later write must get a later one.
   static void makeOld(const std::string& path) {
     std::filesystem::last_write_time(path,
                                      std::filesystem::file_time_type::clock::now() - std::chrono::hours(1));
@@ -60,7 +60,7 @@ class PrefsFixture : public ::testing::Test {
     return value && value->string() != nullptr ? std::optional(*value->string()) : std::nullopt;
   }
 
-  /// What was logged but for the debug lines.
+  /// What was logged, without debug lines.
   [[nodiscard]] std::vector<LogCapture::Entry> messages() const {
     auto entries = log_.entries();
     std::erase_if(entries, [](const LogCapture::Entry& entry) { return entry.level == kLogDebug; });

@@ -1,4 +1,4 @@
-// Building and refusing the settings of a capture.
+// Building and rejecting capture settings.
 #include "prefs/recording_context.h"
 
 #include <gmock/gmock.h>
@@ -31,7 +31,7 @@ class RecordingContext : public testing::PrefsFixture {
     return builder().newRecordingContext(type);
   }
   RecordingContextBuilder builder() { return {prefs_, kFile, *catalog_}; }
-  /// The reason of the refusal; also proves that the next attempt will read the file afresh.
+  /// The reason for the refusal. Also checks that the next attempt reads the file again.
   std::string reasonOfRefusal(const std::function<void(RecordingContextBuilder&)>& step) {
     prefs_.getFromPrefsFile("RecordingType");
     try {
@@ -68,7 +68,7 @@ TEST_F(RecordingContext, HoldsWhatThePreferencesSay) {
   EXPECT_EQ(context->maxDurationMinutes, 0U);
 }
 
-TEST_F(RecordingContext, EveryOneHasItsOwnIdentifier) {
+TEST_F(RecordingContext, EachContextHasItsOwnIdentifier) {
   replace(complete());
   const auto first = build();
   const auto second = build();
@@ -152,14 +152,14 @@ TEST_F(RecordingContext, WithoutAnyDeviceAutomaticNamesNone) {
   EXPECT_EQ(context->audioDeviceID, std::nullopt);
 }
 
-TEST_F(RecordingContext, ANamedCameraIsTakenUnchecked) {
+TEST_F(RecordingContext, ANamedCameraIsNotChecked) {
   PlistDictionary all = complete();
   all["RecordingVideoInput"] = "gone";
   replace(all);
   catalog_->microphone_of["gone"] = "microphone";
   const auto context = build();
   EXPECT_EQ(context->videoDeviceID, "gone");
-  EXPECT_EQ(context->audioDeviceID, std::nullopt);  // the microphone of a camera that is not there
+  EXPECT_EQ(context->audioDeviceID, std::nullopt);  // the microphone of an unknown camera
 }
 
 TEST_F(RecordingContext, ACameraWithoutMicrophoneLeavesTheAudioDeviceOpen) {
@@ -256,7 +256,7 @@ TEST_F(RecordingContext, InvalidContinuousSettingsGiveNothingAndOneLine) {
       ElementsAre(Entry{kLogCritical, "Continuous capture is enabled, but the preferences are invalid."}));
 }
 
-TEST_F(RecordingContext, ABuildDropsTheCache) {
+TEST_F(RecordingContext, BuildingDropsTheCache) {
   replace(complete());
   build();
   EXPECT_EQ(prefs_.prefsDict(), std::nullopt);
@@ -305,7 +305,7 @@ TEST_F(RecordingContext, NoTypeIsRefused) {
 
 // The two modes.
 
-TEST_F(RecordingContext, TheDaemonsMigratesTheObsoleteIntervalFirst) {
+TEST_F(RecordingContext, TheDaemonMigratesTheObsoleteIntervalFirst) {
   PlistDictionary all = complete();
   all.erase("PreviewIntervalInMilliseconds");
   all["RecordingPreviewIntervalInSeconds"] = "2";
@@ -318,12 +318,12 @@ TEST_F(RecordingContext, TheDaemonsMigratesTheObsoleteIntervalFirst) {
   EXPECT_FALSE(file->dictionary()->contains("RecordingPreviewIntervalInSeconds"));
 }
 
-TEST_F(RecordingContext, TheDaemonsReadsNoUserFileAndNoDefaults) {
+TEST_F(RecordingContext, TheDaemonReadsNeitherUserFileNorDefaults) {
   replace(userFile(), complete());
   EXPECT_THROW(newRecordingContextForDaemon(*catalog_), PreferenceError);
 }
 
-TEST_F(RecordingContext, TheAdHocOneStandsOnUserFileAndDefaults) {
+TEST_F(RecordingContext, AdHocModeReadsTheUserFileAndDefaults) {
   replace(userFile(), {{"RecordingRepositoryPath", "/my/movies"}});
   const auto context = newRecordingContextForAdHoc(*catalog_);
   EXPECT_EQ(context->captureType, CaptureType::audioAndVideo);
@@ -333,7 +333,7 @@ TEST_F(RecordingContext, TheAdHocOneStandsOnUserFileAndDefaults) {
   EXPECT_EQ(context->videoDeviceID, "camera");
 }
 
-TEST_F(RecordingContext, TheAdHocOneNeedsARepositoryToo) {
+TEST_F(RecordingContext, AdHocModeAlsoNeedsARepository) {
   try {
     newRecordingContextForAdHoc(*catalog_);
     FAIL() << "accepted";
@@ -342,7 +342,7 @@ TEST_F(RecordingContext, TheAdHocOneNeedsARepositoryToo) {
   }
 }
 
-// In words.
+// Descriptions.
 
 TEST(DescribeRecordingContext, SaysWhatIsOnAndWhere) {
   LMRRecordingContext context;
@@ -404,7 +404,7 @@ TEST_F(Dump, ListsItsKeysInTheirOrder) {
             "'LumexURL' == 'https://lumex.example'\n");
 }
 
-TEST_F(Dump, AdHocListsTheDefaultsUnderTheUsersValues) {
+TEST_F(Dump, AdHocListsTheUsersValuesAndElseTheDefaults) {
   replace(userFile(), {{"RecordingType", "Video"}});
   EXPECT_EQ(printed(&dumpAdHoc),
             "'RecordingType' == 'Video'\n'RecordingVideoInput' == 'Automatic'\n"

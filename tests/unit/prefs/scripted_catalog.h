@@ -1,4 +1,4 @@
-// Devices and compressions as a test wants them.
+// A scripted catalog of devices and compressions.
 #pragma once
 #include <map>
 #include <optional>
@@ -9,7 +9,7 @@
 
 namespace lmx::testing {
 
-/// A machine with a camera and the microphone that belongs to it, unless the test says otherwise.
+/// A machine with a camera and its microphone, unless the test changes that.
 class ScriptedCatalog : public CaptureCatalog {
  public:
   std::optional<std::string> camera = "camera";

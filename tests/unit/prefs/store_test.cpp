@@ -1,4 +1,4 @@
-// Reading the preferences: the file, its cache, and the layered domain.
+// Reading the preferences: the file, its cache and the layered domain.
 #include <gmock/gmock.h>
 
 #include <algorithm>
@@ -148,7 +148,7 @@ TEST_F(PreferenceStore, NumbersCountAsTheirDecimalText) {
   EXPECT_THAT(messages(), IsEmpty());
 }
 
-TEST_F(PreferenceStore, ADomainKeyIsTheUsersThenTheSystemsThenTheDefault) {
+TEST_F(PreferenceStore, TheDomainPrefersTheUsersValueThenTheSystemsThenTheDefault) {
   replace(userFile(), {{"RecordingType", "Audio"}});
   replace({{"RecordingType", "Video"}, {"RecordingCapturePreset", "Video:Best"}});
   AgentPreferences prefs;
@@ -163,14 +163,14 @@ TEST_F(PreferenceStore, EveryAdHocDefaultIsVisibleInTheDomain) {
   for (const auto& [key, value] : adHocDefaults()) EXPECT_EQ(prefs.get(key), value) << key;
 }
 
-TEST_F(PreferenceStore, ADomainKeyThatNobodyHasIsANotice) {
+TEST_F(PreferenceStore, AMissingDomainKeyIsANotice) {
   AgentPreferences prefs;
   EXPECT_EQ(prefs.get("CameraName"), std::nullopt);
   EXPECT_THAT(log_.entries(),
               ElementsAre(Entry{kLogNotice, "Unable to find preference for key: CameraName"}));
 }
 
-TEST_F(PreferenceStore, TheDomainGivesADictionaryForContinuousRecordingAndTextsElse) {
+TEST_F(PreferenceStore, TheDomainReturnsTextsExceptForContinuousRecording) {
   replace({{"ContinuousRecording", PlistDictionary{{"Enabled", true}}}, {"TunnelPort", std::int64_t{8170}}});
   AgentPreferences prefs;
   const auto continuous = prefs.get("ContinuousRecording");
@@ -180,7 +180,7 @@ TEST_F(PreferenceStore, TheDomainGivesADictionaryForContinuousRecordingAndTextsE
   EXPECT_EQ(text(prefs.get("TunnelPort")), "8170");
 }
 
-TEST_F(PreferenceStore, AWronglyTypedUserValueGivesWayToTheSystems) {
+TEST_F(PreferenceStore, AWronglyTypedUserValueFallsBackToTheSystems) {
   replace(userFile(), {{"RecordingType", PlistArray{}}});
   replace({{"RecordingType", "Video"}});
   AgentPreferences prefs;

@@ -1,4 +1,4 @@
-// Noticing that the preferences file has changed.
+// Detecting changes of the preferences file.
 #include <gmock/gmock.h>
 #include <unistd.h>
 
@@ -26,7 +26,7 @@ TEST_F(PreferenceWatcher, NothingChangedIsFalseAtOnce) {
   AgentPreferences prefs;
   const auto start = std::chrono::steady_clock::now();
   for (int i = 0; i < 100; ++i) EXPECT_FALSE(prefs.prefsFileChanged());
-  // A poll that waited even 50 ms would need 5 s for these.
+  // If a poll waited even 50 ms, these would take 5 s.
   EXPECT_LT(std::chrono::steady_clock::now() - start, 5s);
 }
 
@@ -118,7 +118,7 @@ TEST_F(PreferenceWatcher, AChangeOfModeIsReportedAndTheCacheKept) {
   replace({{"CameraName", "Hall 3"}});
   AgentPreferences prefs;
   prefs.getFromPrefsFile("CameraName");
-  // The clock of file times ticks slowly: a change within one tick of the last look can't be told.
+  // File timestamps tick slowly: a change within one tick of the last poll can't be detected.
   const auto deadline = std::chrono::steady_clock::now() + 10s;
   bool changed = false;
   for (mode_t mode = 0600; !changed && std::chrono::steady_clock::now() < deadline; mode ^= 0044U) {

@@ -53,13 +53,13 @@ TEST_F(Delegate, CancellationMakesIdleAndRestoresTheType) {
   EXPECT_EQ(session_->recordingType.get(), kRecordingTypeVideo);
 }
 
-TEST_F(Delegate, AReportWithoutErrorKeepsTheEarlierOne) {
+TEST_F(Delegate, AReportWithoutErrorKeepsTheEarlierError) {
   delegate_.recordError.set(CaptureError{CaptureError::kDomain, 1002, ""});
   delegate_.lmrCaptureDidComplete(std::nullopt);
   EXPECT_TRUE(delegate_.deviceDisconnected());
 }
 
-TEST_F(Delegate, TypeOfASessionThatHasGoneOnIsLeftAlone) {
+TEST_F(Delegate, TypeOfASessionThatHasMovedOnIsKept) {
   session_->captureController.set(std::make_shared<ScriptedCaptureController>(journal_));
   delegate_.lmrCaptureDidComplete(std::nullopt);
   EXPECT_EQ(session_->recordingType.get(), kRecordingTypeAudio);
@@ -90,7 +90,7 @@ TEST_F(EngineTest, PreviewFrameIsTheNewestOneAsBase64) {
   EXPECT_EQ(frame, "bmV3");
 }
 
-TEST_F(EngineTest, PreviewRequestIsStampedAlsoWithoutAFrame) {
+TEST_F(EngineTest, PreviewRequestTimeIsSetEvenWithoutAFrame) {
   const auto preview = LXAgentRecordCreatePreviewController("camera", std::nullopt, false, 400, nullptr);
   ASSERT_NE(preview, nullptr);
   EXPECT_EQ(preview->mLastPreviewRequestTime(), 0);

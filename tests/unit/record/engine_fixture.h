@@ -28,7 +28,7 @@ class EngineTest : public ::testing::Test {
     session_->recordingType.set(kRecordingTypeAudioVideo);
     setEngineEnvironment({context_, &actions_, framework_});
   }
-  /// No capture thread may outlive the test: they end once their controller has shut down.
+  /// Ends the capture threads by shutting their controllers down; none may outlive the test.
   ~EngineTest() override {
     session_->status.set(kRecorderIdle);
     endCaptures();

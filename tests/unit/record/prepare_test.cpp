@@ -36,7 +36,7 @@ TEST_F(Prepare, StartsTheCaptureUnderTheNameOfTheRecording) {
   EXPECT_TRUE(testing::waitUntil([&] { return session_->startTime.get().has_value(); }));
 }
 
-TEST_F(Prepare, EachOneMakesAFreshUuid) {
+TEST_F(Prepare, EachPreparationCreatesANewUuid) {
   ASSERT_EQ(prepare(), 0);
   const std::string first = session_->recording_uuid.get();
   endCaptures();
@@ -88,7 +88,7 @@ TEST_F(Prepare, DurationOfTheContextIsTheLongestRecording) {
   EXPECT_EQ(framework_->controller(0)->settings()->maxDurationMinutes, 77U);
 }
 
-TEST_F(Prepare, ADurationBelowOneIsNoLimit) {
+TEST_F(Prepare, ADurationBelowOneMeansNoLimit) {
   for (const int duration : {0, -5}) {
     context_->options.duration.set(duration);
     ASSERT_EQ(prepare(), 0);
@@ -98,9 +98,9 @@ TEST_F(Prepare, ADurationBelowOneIsNoLimit) {
   }
 }
 
-TEST_F(Prepare, ASegmentLengthGoesBeforeTheDuration) {
+TEST_F(Prepare, ASegmentLengthOverridesTheDuration) {
   PlistDictionary preferences = testing::capturePreferences(repository_.path());
-  // What counts is the length alone, cut to 32 bits, not whether continuous recording is on.
+  // Only the length matters, truncated to 32 bits, even when continuous recording is off.
   preferences["ContinuousRecording"] =
       PlistDictionary{{"Enabled", false}, {"RecordingSegmentLength", std::int64_t{0x100000005}}};
   testing::writePreferences(preferences);
@@ -109,7 +109,7 @@ TEST_F(Prepare, ASegmentLengthGoesBeforeTheDuration) {
   EXPECT_EQ(framework_->controller(0)->settings()->maxDurationMinutes, 5U);
 }
 
-TEST_F(Prepare, TheFrameRateOfThePreferencesIsAskedFor) {
+TEST_F(Prepare, TheFrameRateOfThePreferencesIsRequested) {
   const std::pair<const char*, double> rows[] = {{"25", 25}, {"29.97", 29.97}, {"0", 30}, {"fast", 30}};
   for (const auto& [text, rate] : rows) {
     context_->recording.recording_video_maximum_frame_rate.set(text);
@@ -174,7 +174,7 @@ TEST_F(Prepare, NeedsASessionAndAPath) {
   EXPECT_EQ(log_.count(3, kLine), 3);
 }
 
-TEST_F(Prepare, ARefusingFrameworkIsThree) {
+TEST_F(Prepare, ARefusingFrameworkReturnsThree) {
   framework_->on_new_controller = [](auto& controller) { controller.prepare_succeeds = false; };
   EXPECT_EQ(prepare(), 3);
   EXPECT_EQ(session_->error.get(), 3);
@@ -183,7 +183,7 @@ TEST_F(Prepare, ARefusingFrameworkIsThree) {
   EXPECT_TRUE(log_.contains(3, kReceivedError));
 }
 
-TEST_F(Prepare, PreferencesThatCannotBeUsedAreThree) {
+TEST_F(Prepare, UnusablePreferencesReturnThree) {
   framework_->audio_device_usable = false;
   EXPECT_EQ(prepare(), 3);
   EXPECT_TRUE(log_.contains(2,
@@ -192,7 +192,7 @@ TEST_F(Prepare, PreferencesThatCannotBeUsedAreThree) {
   EXPECT_TRUE(log_.contains(3, kReceivedError));
 }
 
-TEST_F(Prepare, WhileRecordingIsFourAndLeavesTheRecordingAlone) {
+TEST_F(Prepare, WhileRecordingReturnsFourAndKeepsTheRecording) {
   ASSERT_EQ(prepare(), 0);
   const std::string before = session_->recording_uuid.get();
   const auto controller = session_->captureController.get();
@@ -207,7 +207,7 @@ TEST_F(Prepare, WhileRecordingIsFourAndLeavesTheRecordingAlone) {
   EXPECT_EQ(framework_->controllersMade(), 1U);
 }
 
-TEST_F(Prepare, TooLittleSpaceIsThirtyAndLeavesTheError) {
+TEST_F(Prepare, TooLittleSpaceReturnsThirtyAndKeepsTheError) {
   session_->diskSpaceCutoffInMB.set(0xFFFFFFFFU);
   session_->error.set(3);
   EXPECT_EQ(prepare(), 30);
@@ -224,8 +224,8 @@ TEST_F(Prepare, AVolumeThatCannotBeMeasuredPassesTheThreshold) {
   EXPECT_EQ(prepare(), 0);
 }
 
-TEST_F(Prepare, DeadlinesAreLeftAlone) {
-  // One that passes while the camera opens must still end the recording at its first check.
+TEST_F(Prepare, DeadlinesAreKept) {
+  // A deadline that passes while the camera opens must still end the recording at its first check.
   session_->stop_times.hardStopTime.set(TimeValue{1000, 0});
   ASSERT_EQ(prepare(), 0);
   EXPECT_TRUE(session_->stop_times.hardStopTime.get() ||
@@ -281,7 +281,7 @@ TEST_F(Prepare, VolumeIsThatOfTheFileElseTheRepository) {
   EXPECT_EQ(volumePath(*session_), "/elsewhere");
 }
 
-TEST_F(Prepare, StatusTellsOfAVolumeThatCannotBeMeasured) {
+TEST_F(Prepare, StatusReportsAVolumeThatCannotBeMeasured) {
   RecordStatus status;
   EXPECT_EQ(LXAgentRecordGetStatus(session_, &status), 0);
   EXPECT_GT(status.totalDiskMB, 0);

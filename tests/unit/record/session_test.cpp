@@ -1,4 +1,4 @@
-// The session: its state when new, its copy and its end.
+// The session: its initial state, its copies and its cleanup.
 #include "capture/api/capture_framework.h"
 #include "record/agent_record.h"
 #include "record/create_preview.h"
@@ -119,7 +119,7 @@ TEST_F(Session, StoppingThroughACopyStopsTheSameRecording) {
   EXPECT_EQ(journalCount("stopCapture"), 1);
 }
 
-TEST_F(Session, CopyKeepsItsValuesWhenTheSessionGoesOn) {
+TEST_F(Session, CopyKeepsItsValuesWhenTheSessionMovesOn) {
   session_->filename.set("/r/A.mov");
   session_->stopTime.set(TimeValue{1, 0});
   const auto copy = session_->copy();
@@ -139,7 +139,7 @@ TEST_F(Session, CopyHasAMutexOfItsOwn) {
   EXPECT_EQ(session_->unlockStatusAndTimingMutex(), 0);
 }
 
-TEST_F(Session, CleanupOfARecordingOneStopsItWithItsCallback) {
+TEST_F(Session, CleanupWhileRecordingStopsAndReports) {
   const auto record = std::make_shared<AgentRecord>();
   const auto controller = std::make_shared<ScriptedCaptureController>(journal_);
   controller->shut_down = true;

@@ -1,4 +1,4 @@
-// Stopping a recording through the engine, and its status.
+// Stopping a recording through the engine, and the recorder's status.
 #include <chrono>
 
 #include "record/recording_status.h"
@@ -10,7 +10,7 @@ namespace {
 
 using testing::ScriptedCaptureController;
 
-/// A session that records with a controller of the test's own.
+/// A session that records with the test's own controller.
 class Stop : public EngineTest {
  protected:
   Stop() {
@@ -28,7 +28,7 @@ class Stop : public EngineTest {
       std::make_shared<ScriptedCaptureController>(journal_);
 };
 
-TEST_F(Stop, MarksPerformsAndReportsWholeSeconds) {
+TEST_F(Stop, SetsTheMarkStopsTheCaptureAndReportsWholeSeconds) {
   EXPECT_EQ(LXAgentRecordStopCapture(session_), 0);
   EXPECT_EQ(journal_.entries(),
             (Entries{"setStop", "stopCapture", "recordDidStop " + movie("R1.mov") + " 12"}));
@@ -37,7 +37,7 @@ TEST_F(Stop, MarksPerformsAndReportsWholeSeconds) {
   EXPECT_EQ(session_->status.get(), kRecorderIdle);
 }
 
-TEST_F(Stop, ElapsedTimeGrowsByTheSpan) {
+TEST_F(Stop, ElapsedTimeGrowsByTheTimeSinceTheStart) {
   auto start = *lmp_gettimeofday();
   start.tv_sec -= 100;
   session_->startTime.set(start);
@@ -47,12 +47,12 @@ TEST_F(Stop, ElapsedTimeGrowsByTheSpan) {
   EXPECT_LE(session_->elapsedTime.get()->tv_sec, 152);
 }
 
-TEST_F(Stop, WithoutASessionIsTwo) {
+TEST_F(Stop, WithoutASessionReturnsTwo) {
   EXPECT_EQ(LXAgentRecordStopCapture(nullptr), 2);
   EXPECT_TRUE(log_.contains(3, "Invalid Arguments in function LXAgentRecordStopCapture"));
 }
 
-TEST_F(Stop, WithoutARecordingIsThree) {
+TEST_F(Stop, WithoutARecordingReturnsThree) {
   session_->status.set(kRecorderIdle);
   EXPECT_EQ(LXAgentRecordStopCapture(session_), 3);
   EXPECT_TRUE(log_.contains(3, "Unable to stop, capture not running"));
@@ -60,12 +60,12 @@ TEST_F(Stop, WithoutARecordingIsThree) {
   EXPECT_EQ(session_->error.get(), 3);
 }
 
-TEST_F(Stop, APausedOneIsRunning) {
+TEST_F(Stop, StopsAPausedRecording) {
   session_->status.set(kRecorderPaused);
   EXPECT_EQ(LXAgentRecordStopCapture(session_), 0);
 }
 
-TEST_F(Stop, UnknownTypeIsOne) {
+TEST_F(Stop, UnknownTypeReturnsOne) {
   session_->recordingType.set(9);
   EXPECT_EQ(LXAgentRecordStopCapture(session_), 1);
   EXPECT_EQ(journal_.entries(), (Entries{"setStop", "recordRuntimeError 1"}));
@@ -101,8 +101,8 @@ TEST_F(Stop, AdhocStopsTheControllerDirectly) {
   EXPECT_EQ(journalCount("stopCapture"), 0);
 }
 
-/// The one slow test: the bound is part of the behaviour.
-TEST_F(Stop, OfAControllerThatNeverShutsDownEndsAfterTenSeconds) {
+/// Slow, because the ten-second limit is part of the behaviour.
+TEST_F(Stop, GivesUpAfterTenSecondsWhenTheControllerNeverShutsDown) {
   controller_->shut_down = false;
   const auto before = std::chrono::steady_clock::now();
   EXPECT_EQ(LXAgentRecordStopCapture(session_), 0);
@@ -136,7 +136,7 @@ TEST_F(Stop, StatusComesFromTheControllersState) {
   }
 }
 
-TEST_F(Stop, StatusLeavesOutputsOfUnsetTimes) {
+TEST_F(Stop, StatusKeepsOutputsOfUnsetTimes) {
   RecordStatus status{.start = 11, .stop = 12, .hardStop = 13};
   EXPECT_EQ(LXAgentRecordGetStatus(session_, &status), 0);
   EXPECT_EQ(status.start, 11);
@@ -144,7 +144,7 @@ TEST_F(Stop, StatusLeavesOutputsOfUnsetTimes) {
   EXPECT_EQ(status.hardStop, 13);
 }
 
-TEST_F(Stop, StatusTellsTimesErrorAndSpace) {
+TEST_F(Stop, StatusReportsTimesErrorAndSpace) {
   session_->launchTime.set(TimeValue{101, 5});
   session_->stopTime.set(TimeValue{102, 5});
   session_->stop_times.hardStopTime.set(TimeValue{103, 5});
@@ -159,7 +159,7 @@ TEST_F(Stop, StatusTellsTimesErrorAndSpace) {
   EXPECT_LE(status.availableDiskMB, status.totalDiskMB);
 }
 
-TEST_F(Stop, StatusWithoutASessionIsTwo) {
+TEST_F(Stop, StatusWithoutASessionReturnsTwo) {
   EXPECT_EQ(LXAgentRecordGetStatus(nullptr, nullptr), 2);
   EXPECT_TRUE(log_.contains(3, "Invalid Arguments in function LXAgentRecordGetStatus"));
   EXPECT_EQ(LXAgentRecordGetStatus(session_, nullptr), 0);

@@ -1,4 +1,4 @@
-// The deadlines: setting them, hitting them, what the auto-shutoff does.
+// Deadlines: setting and reaching them, and the auto-shutoff.
 #include "record/stop_times.h"
 
 #include "record/auto_shutoff.h"
@@ -97,7 +97,7 @@ TEST_F(StopTimes, SoftStopThatHasPassedIsLoggedWithItsDifference) {
 
 TEST_F(StopTimes, SoftStopWithinTheSameSecondHasPassed) {
   TimeValue now{};
-  do {  // away from the end of a second
+  do {  // wait until the second isn't about to end
     now = *lmp_gettimeofday();
   } while (now.tv_usec > 900000);
   now.tv_usec = 999999;
@@ -151,7 +151,7 @@ TEST_F(StopTimes, DeadlinesFollowAClockThatIsSet) {
   session_->stop_times.followWallClock(wallClockOffset() - 3600);
   EXPECT_EQ(session_->stop_times.hardStopTime.get()->tv_sec, hard->tv_sec - 3600);
   EXPECT_EQ(session_->stop_times.softStopTime.get()->tv_sec, soft->tv_sec - 3600);
-  // An hour forward again, which the check itself must notice.
+  // The clock moves an hour forward again, which the check must notice by itself.
   EXPECT_FALSE(session_->stop_times.shouldStopRecording());
   EXPECT_NEAR(static_cast<double>(session_->stop_times.hardStopTime.get()->tv_sec),
               static_cast<double>(hard->tv_sec), 1);

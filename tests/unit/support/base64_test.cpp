@@ -1,4 +1,4 @@
-// Tests of the Base64 functions.
+// Base64 encoding and decoding.
 #include "support/base64.h"
 
 #include <gtest/gtest.h>

@@ -1,4 +1,4 @@
-// Tests of the recursive mutex.
+// The recursive mutex.
 #include "support/recursive_mutex.h"
 
 #include <gtest/gtest.h>
@@ -26,7 +26,7 @@ TEST(RecursiveMutex, OneThreadLocksItTwice) {
   EXPECT_EQ(mutex.unlock(), 0);
 }
 
-TEST(RecursiveMutex, IsFreeForOthersAfterTheLastUnlockOnly) {
+TEST(RecursiveMutex, IsReleasedOnlyByTheLastUnlock) {
   pthread_mutex_t mutex;
   agent_init_recursive_mutex(&mutex);
   pthread_mutex_lock(&mutex);

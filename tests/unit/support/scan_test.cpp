@@ -1,4 +1,4 @@
-// Numbers at the beginning of a text, and dates as text.
+// Numbers at the beginning of a text, and the text form of dates.
 #include "support/scan.h"
 
 #include <gtest/gtest.h>
@@ -9,7 +9,7 @@
 namespace lmx {
 namespace {
 
-TEST(ScanInteger, ReadsWhatStandsAtTheBeginning) {
+TEST(ScanInteger, ReadsTheLeadingNumber) {
   EXPECT_EQ(scanInteger("60"), 60);
   EXPECT_EQ(scanInteger(" \t60"), 60);
   EXPECT_EQ(scanInteger("-5"), -5);
@@ -19,19 +19,19 @@ TEST(ScanInteger, ReadsWhatStandsAtTheBeginning) {
   EXPECT_EQ(scanInteger("0x10"), 0);
 }
 
-TEST(ScanInteger, NothingIsNotZero) {
+TEST(ScanInteger, RejectsTextWithoutANumberThatFits) {
   for (const char* text : {"", " ", "abc", "-", "+-5", "99999999999", "\xFF"})
     EXPECT_FALSE(scanInteger(text)) << text;
 }
 
-TEST(ScanReal, ReadsDecimalsWhateverFollows) {
+TEST(ScanReal, IgnoresTrailingText) {
   EXPECT_EQ(scanReal("1.5"), 1.5);
   EXPECT_EQ(scanReal(" 2e2x"), 200.0);
   EXPECT_EQ(scanReal("-5"), -5.0);
   EXPECT_EQ(scanReal("1,5"), 1.0);
 }
 
-TEST(ScanReal, OnlyFiniteNumbersCount) {
+TEST(ScanReal, RejectsTextAndNonFiniteNumbers) {
   for (const char* text : {"", "abc", "inf", "nan", "1e999"}) EXPECT_FALSE(scanReal(text)) << text;
 }
 
@@ -47,7 +47,7 @@ class DateText : public ::testing::Test {
   }
 };
 
-TEST_F(DateText, IsLocalTimeWithItsOffset) {
+TEST_F(DateText, IsLocalTimeWithOffset) {
   zone("CET-1CEST,M3.5.0,M10.5.0/3");
   EXPECT_EQ(dateText(1246363500), "2009-06-30 14:05:00 +0200");
   EXPECT_EQ(dateText(1230768000), "2009-01-01 01:00:00 +0100");
@@ -57,9 +57,9 @@ TEST_F(DateText, IsLocalTimeWithItsOffset) {
   EXPECT_EQ(dateText(0), "1969-12-31 19:00:00 -0500");
 }
 
-TEST_F(DateText, AYearBeyondTheCalendarHasNone) { EXPECT_FALSE(dateText(1LL << 62)); }
+TEST_F(DateText, IsAbsentForAYearOutOfRange) { EXPECT_FALSE(dateText(1LL << 62)); }
 
-TEST(DateFromText, ReadsTheFormOfTheTimers) {
+TEST(DateFromText, ReadsTheTimerFormat) {
   EXPECT_EQ(dateFromText("1970-01-01 00:00:00 +0000"), 0);
   EXPECT_EQ(dateFromText("2011-03-14 09:00:00 +0100"), 1300089600);
   EXPECT_EQ(dateFromText("2011-03-14 13:30:00 +0530"), 1300089600);
@@ -68,7 +68,7 @@ TEST(DateFromText, ReadsTheFormOfTheTimers) {
   EXPECT_EQ(dateFromText("1969-12-31 23:59:59 +0000"), -1);
 }
 
-TEST(DateFromText, OtherFormsAndDatesThatDoNotExistGiveNone) {
+TEST(DateFromText, RejectsOtherFormsAndInvalidDates) {
   for (const char* text : {"",
                            "now",
                            "2011-03-14",
@@ -94,7 +94,7 @@ TEST(DateFromText, OtherFormsAndDatesThatDoNotExistGiveNone) {
   }
 }
 
-TEST_F(DateText, IsReadBack) {
+TEST_F(DateText, RoundTrips) {
   zone("IST-5:30");
   for (const std::time_t at : {0L, 1246363500L, 1835438400L}) EXPECT_EQ(dateFromText(*dateText(at)), at);
 }

@@ -1,4 +1,4 @@
-// Tests of time values.
+// Time values.
 #include "support/time_value.h"
 
 #include <gtest/gtest.h>
@@ -41,7 +41,7 @@ TEST(DiffTimeval, TruncatesTowardZero) {
   EXPECT_EQ(lmp_diff_timeval(zero, almost), -1);
 }
 
-TEST(DiffTimeval, FarApartStaysDefined) {
+TEST(DiffTimeval, SaturatesForDistantTimes) {
   const TimeValue end = at(kMaximum, 999999);
   const TimeValue begin = at(kMinimum, 0);
   const TimeValue zero = at(0, 0);
@@ -51,7 +51,7 @@ TEST(DiffTimeval, FarApartStaysDefined) {
   EXPECT_EQ(lmp_diff_timeval(ages, zero), kMaximum / 2000 * 1000);
 }
 
-TEST(GetTimeOfDay, LiesBetweenTwoLooksAtTheClock) {
+TEST(GetTimeOfDay, LiesBetweenTwoClockReadings) {
   const time_t before = time(nullptr);
   const auto now = lmp_gettimeofday();
   ASSERT_TRUE(now);
@@ -62,7 +62,7 @@ TEST(GetTimeOfDay, LiesBetweenTwoLooksAtTheClock) {
   EXPECT_LT(now->tv_usec, 1000000);
 }
 
-TEST(TimevalToCtime, HasTheFormOfCtimeWithoutItsLineFeed) {
+TEST(TimevalToCtime, MatchesCtimeWithoutTheLineFeed) {
   for (const std::int64_t seconds : {0LL, 951782400LL, 1700000000LL}) {
     const TimeValue time = at(seconds, 999999);
     std::string expected = ctime(&time.tv_sec);
@@ -71,7 +71,7 @@ TEST(TimevalToCtime, HasTheFormOfCtimeWithoutItsLineFeed) {
   }
 }
 
-TEST(TimevalToCtime, IsAQuestionMarkForATimeWithoutCalendar) {
+TEST(TimevalToCtime, IsAQuestionMarkForATimeOutOfRange) {
   EXPECT_EQ(lmp_timeval_to_ctime(at(kMaximum, 0)), "?");
 }
 

@@ -1,4 +1,4 @@
-// UTF-8 and the characters that XML can hold.
+// UTF-8 and the characters that XML allows.
 #include "support/utf8.h"
 
 #include <gtest/gtest.h>

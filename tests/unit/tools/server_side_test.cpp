@@ -12,7 +12,7 @@ namespace {
 
 constexpr const char* kVector = "EBESExQVFhcYGRobHB0eHw==";
 
-TEST(ParseHello, TakesTheAgentsWords) {
+TEST(ParseHello, ParsesAnAgentsHello) {
   const auto hello =
       parseHello("AGENT protocol=1,agent_uuid=C-1,iv=" + std::string(kVector) + ",version=100");
   ASSERT_TRUE(hello);
@@ -26,14 +26,14 @@ TEST(ParseHello, TakesTheAgentsWords) {
                   ->offline);
 }
 
-TEST(ParseHello, OtherLinesAreNone) {
+TEST(ParseHello, RejectsOtherLines) {
   for (const char* line : {"", "AGENT", "HELLO protocol=1", "AGENT protocol=2,iv=EBESExQVFhcYGRobHB0eHw==",
                            "AGENT protocol=1,agent_uuid=C", "AGENT protocol=1,iv=QUJD"}) {
     EXPECT_FALSE(parseHello(line)) << line;
   }
 }
 
-TEST(TunnelCipher, UnderstandsItselfAndNothingElse) {
+TEST(TunnelCipher, DecryptsOnlyItsOwnLines) {
   const testing::LogCapture log;
   const TunnelCipher cipher({1, 2, 3}, {4, 5, 6});
   const auto line = cipher.encrypted("STATUS include_profile=true");
@@ -43,7 +43,7 @@ TEST(TunnelCipher, UnderstandsItselfAndNothingElse) {
   EXPECT_FALSE(cipher.decrypted("garbage"));
 }
 
-TEST(Preview, IsTakenOutOfAReply) {
+TEST(Preview, IsExtractedFromAReply) {
   const std::string reply = "cmdStatus=0,audio-level-left=1.0,preview-size=8,preview=anBlZyE=";
   EXPECT_EQ(previewIn(reply), "jpeg!");
   EXPECT_EQ(shortened(reply), "cmdStatus=0,audio-level-left=1.0,preview-size=8,preview=(8 characters)");
@@ -51,7 +51,7 @@ TEST(Preview, IsTakenOutOfAReply) {
   EXPECT_EQ(shortened("cmdStatus=0"), "cmdStatus=0");
 }
 
-TEST(GetsReply, NoticesGetNone) {
+TEST(GetsReply, NotificationsGetNoReply) {
   EXPECT_TRUE(getsReply("STATUS"));
   EXPECT_FALSE(getsReply("SERVER version=2"));
   EXPECT_FALSE(getsReply("X-PREVIEW refresh_milliseconds=1"));

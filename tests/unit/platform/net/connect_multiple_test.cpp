@@ -1,4 +1,4 @@
-// Tests of connecting to the first reachable of several hosts, on the loopback.
+// Connecting to the first reachable of several hosts, on the loopback.
 #include "platform/net/connect_multiple.h"
 
 #include <arpa/inet.h>
@@ -15,7 +15,7 @@
 namespace lmx {
 namespace {
 
-/// A port of the loopback that somebody listens on.
+/// A listening port on the loopback.
 class Listener {
  public:
   explicit Listener(int family = AF_INET, int backlog = 8)
@@ -34,7 +34,7 @@ class Listener {
 
   [[nodiscard]] bool ready() const { return ready_; }
   [[nodiscard]] std::string port() const {
-    sockaddr_in6 address{};  // the port stands at the same place in both families
+    sockaddr_in6 address{};  // sockaddr_in has the port at the same offset
     socklen_t size = sizeof address;
     getsockname(fd_.get(), reinterpret_cast<sockaddr*>(&address), &size);
     return std::to_string(ntohs(address.sin6_port));
@@ -48,7 +48,7 @@ class Listener {
   bool ready_ = false;
 };
 
-/// A port that nobody listens on: it was free a moment ago.
+/// A port on which nobody listens: it was free a moment ago.
 std::string deadPort() { return Listener().port(); }
 
 struct Attempt {
@@ -91,7 +91,7 @@ TEST(ConnectMultiple, SocketBlocksAndIsClosedInChildren) {
   EXPECT_EQ(fcntl(attempt.socket.get(), F_GETFD) & FD_CLOEXEC, FD_CLOEXEC);
 }
 
-TEST(ConnectMultiple, UnreachableHostIsPassedOver) {
+TEST(ConnectMultiple, UnreachableHostIsSkipped) {
   const Listener listener;
   const Attempt attempt({"127.0.0.1:" + deadPort(), "no.such.host.invalid", "127.0.0.1"}, listener.port());
   EXPECT_EQ(attempt.result, 0);
@@ -118,7 +118,7 @@ TEST(ConnectMultiple, PortOfAnEntryWins) {
   EXPECT_EQ(attempt.result, 0);
 }
 
-TEST(ConnectMultiple, VersionSixAddressesStandInBrackets) {
+TEST(ConnectMultiple, IPv6AddressesAreAcceptedWithAndWithoutBrackets) {
   const Listener listener(AF_INET6);
   if (!listener.ready()) GTEST_SKIP() << "no IPv6 loopback here";
   EXPECT_EQ(Attempt({"[::1]:" + listener.port()}, deadPort()).result, 0);
@@ -126,7 +126,7 @@ TEST(ConnectMultiple, VersionSixAddressesStandInBrackets) {
   EXPECT_EQ(Attempt({"::1"}, listener.port()).result, 0);
 }
 
-TEST(ConnectMultiple, MalformedEntriesArePassedOver) {
+TEST(ConnectMultiple, MalformedEntriesAreSkipped) {
   const Listener listener;
   const std::string port = listener.port();
   for (const std::string& entry :
@@ -144,8 +144,8 @@ TEST(ConnectMultiple, PortIsDecimalText) {
   }
 }
 
-TEST(ConnectMultiple, MuteHostIsGivenUp) {
-  // A full backlog drops what comes next: nobody ever answers.
+TEST(ConnectMultiple, UnresponsiveHostTimesOut) {
+  // With a full backlog further connections are dropped and never answered.
   const Listener listener(AF_INET, 0);
   std::vector<UniqueFd> fill;
   sockaddr_in address{};

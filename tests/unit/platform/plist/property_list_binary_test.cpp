@@ -1,4 +1,4 @@
-// Tests of binary property lists, the malicious ones above all.
+// Binary property lists, especially malicious ones.
 #include <gtest/gtest.h>
 
 #include <bit>
@@ -15,7 +15,7 @@ std::string bigEndian(std::uint64_t value, int size) {
   return out;
 }
 
-/// A binary property list of these objects, with two bytes for each offset and reference.
+/// A binary property list with these objects and two-byte offsets and references.
 std::string binary(const std::vector<std::string>& objects, std::uint64_t top = 0) {
   std::string out = "bplist00";
   std::string table;
@@ -39,7 +39,7 @@ std::string container(unsigned kind, std::size_t count, const std::vector<std::u
   return out;
 }
 std::string array(const std::vector<std::uint64_t>& items) { return container(0xA0, items.size(), items); }
-/// Keys first, then values.
+/// References to the keys come first, then those to the values.
 std::string dictionary(const std::vector<std::uint64_t>& references) {
   return container(0xD0, references.size() / 2, references);
 }
@@ -84,7 +84,7 @@ TEST(BinaryPropertyList, EveryKindOfValueIsRead) {
 }
 
 TEST(BinaryPropertyList, SharedValuesAreCountedAsOftenAsTheyExpand) {
-  // Six arrays of ten references each to the next: a million values in two hundred bytes.
+  // Six arrays, each with ten references to the next one: a million values in two hundred bytes.
   std::vector<std::string> objects;
   for (std::uint64_t level = 1; level <= 6; ++level)
     objects.push_back(array(std::vector<std::uint64_t>(10, level)));
@@ -123,7 +123,7 @@ TEST(BinaryPropertyList, SixtyFourLevelsAreTheLimit) {
   EXPECT_EQ(problemOf(nested(65)), "nested more than 64 levels");
 }
 
-TEST(BinaryPropertyList, ValueThatContainsItselfIsRefused) {
+TEST(BinaryPropertyList, SelfReferencesAreRejected) {
   EXPECT_EQ(problemOf(binary({array({0})})), "a value that contains itself");
   EXPECT_EQ(problemOf(binary({array({1}), dictionary({2, 0}), ascii("k")})), "a value that contains itself");
 }
@@ -133,21 +133,21 @@ TEST(BinaryPropertyList, KeysMustBeTexts) {
   EXPECT_EQ(problemOf(binary({dictionary({0, 1}), kTrue})), "a key that is not a text");
 }
 
-TEST(BinaryPropertyList, KindsWithoutAMeaningHereAreRefused) {
+TEST(BinaryPropertyList, UnsupportedKindsAreRejected) {
   for (const std::string& object : {std::string(1, '\0'), std::string("\x0F"), std::string("\x80\x01"),
                                     std::string("\xC0"), std::string("\x70"), std::string("\xF0")}) {
     EXPECT_EQ(problemOf(binary({object})), "a value of a kind that is not supported");
   }
 }
 
-TEST(BinaryPropertyList, TextsHoldNoNul) {
+TEST(BinaryPropertyList, TextsWithNulAreRejected) {
   EXPECT_EQ(problemOf(binary({ascii(std::string("a\0b", 3))})), "a NUL character");
   EXPECT_EQ(problemOf(binary({std::string("\x62\x00\x61\x00\x00", 5)})), "a NUL character");
   EXPECT_EQ(problemOf(binary({dictionary({1, 2}), ascii(std::string(1, '\0')), kTrue})), "a NUL character");
   EXPECT_EQ(parsePropertyList(binary({std::string("\x61\x01\x00", 3)})).value(), PlistValue("\xC4\x80"));
 }
 
-TEST(BinaryPropertyList, DatesMustFit) {
+TEST(BinaryPropertyList, DatesOutOfRangeAreRejected) {
   EXPECT_EQ(problemOf(binary({date(1e300)})), "a date out of range");
   EXPECT_EQ(problemOf(binary({'\x33' + bigEndian(0x7FF8000000000000, 8)})), "a date out of range");
 }
@@ -175,7 +175,7 @@ TEST(BinaryPropertyList, MalformedTablesAreRefused) {
   EXPECT_EQ(problemOf("bplist00"), "too short for a binary property list");
 }
 
-TEST(BinaryPropertyList, EveryBeginningAndEveryFlippedBitIsHandled) {
+TEST(BinaryPropertyList, SurvivesTruncationAndEveryFlippedBit) {
   const std::string good = binary({dictionary({1, 2, 3, 4}), ascii("a"), ascii("b"), array({5, 6}), kTrue,
                                    real(1), std::string("\x61\x00\xE4", 3)});
   for (std::size_t length = 0; length < good.size(); ++length)

@@ -1,4 +1,4 @@
-// Tests of property lists: values, XML, files. The binary form has a file of its own.
+// Property lists: values, XML, files. The binary form has its own test file.
 #include "platform/plist/property_list.h"
 
 #include <gtest/gtest.h>
@@ -92,14 +92,14 @@ PlistDictionary everyKind() {
   };
 }
 
-TEST(PropertyList, EveryKindOfValueComesBackFromXml) {
+TEST(PropertyList, EveryKindOfValueRoundTripsThroughXml) {
   const PlistResult result = parsePropertyList(propertyListXml(everyKind()));
   ASSERT_TRUE(result) << result.error().message;
   for (const auto& [key, value] : everyKind()) EXPECT_EQ(result->dictionary()->at(key), value) << key;
   EXPECT_EQ(*result, PlistValue(everyKind()));
 }
 
-TEST(PropertyList, XmlIsWholeAndEndsInALineFeed) {
+TEST(PropertyList, XmlIsCompleteAndEndsInALineFeed) {
   const std::string text = propertyListXml(PlistDictionary{{"a<", "b&"}, {"n", std::int64_t{-1}}});
   EXPECT_TRUE(text.starts_with("<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n<!DOCTYPE plist "));
   EXPECT_NE(text.find("<dict>\n\t<key>a&lt;</key>\n\t<string>b&amp;</string>\n\t<key>n</key>\n"
@@ -108,7 +108,7 @@ TEST(PropertyList, XmlIsWholeAndEndsInALineFeed) {
   EXPECT_TRUE(text.ends_with("</plist>\n"));
 }
 
-TEST(PropertyList, WhatXmlCannotHoldIsReplaced) {
+TEST(PropertyList, CharactersInvalidInXmlAreReplaced) {
   const std::string replacement = "\xEF\xBF\xBD";
   struct Case {
     std::string text;
@@ -127,7 +127,7 @@ TEST(PropertyList, WhatXmlCannotHoldIsReplaced) {
     EXPECT_EQ(parsePropertyList(propertyListXml(c.text)).value(), PlistValue(c.stored));
 }
 
-TEST(PropertyList, DatesThatDoNotFitAreTheNearestOnes) {
+TEST(PropertyList, DatesOutOfRangeAreClamped) {
   for (const double seconds : {1e18, -1e18, std::numeric_limits<double>::infinity(), std::nan("")}) {
     const auto value = parsePropertyList(propertyListXml(PlistDate{seconds})).value();
     ASSERT_TRUE(value);
@@ -136,7 +136,7 @@ TEST(PropertyList, DatesThatDoNotFitAreTheNearestOnes) {
   }
 }
 
-TEST(PropertyList, ReadsWhatOthersWrite) {
+TEST(PropertyList, ReadsDocumentsFromOtherWriters) {
   EXPECT_EQ(valueOf("<dict><key>a</key><true/><key>b</key><false></false></dict>"),
             PlistValue(PlistDictionary{{"a", true}, {"b", false}}));
   EXPECT_EQ(valueOf("<string>&lt;&amp;&gt;&quot;&apos;&#65;&#x42;</string>"), PlistValue("<&>\"'AB"));
@@ -150,7 +150,7 @@ TEST(PropertyList, ReadsWhatOthersWrite) {
             PlistValue(PlistDictionary{{"bare", true}}));
 }
 
-TEST(PropertyList, MarkupThatIsNoneDoesNotFoolTheCount) {
+TEST(PropertyList, TagsInCommentsCdataAndAttributesAreNotCounted) {
   const std::string deep = repeated("<array>", 100);
   EXPECT_EQ(valueOf("<!-- " + deep + " --><string>a<!-- <dict> -->b</string>"), PlistValue("ab"));
   EXPECT_EQ(valueOf("<string><![CDATA[" + deep + " & ]]></string>"), PlistValue(deep + " & "));
@@ -159,7 +159,7 @@ TEST(PropertyList, MarkupThatIsNoneDoesNotFoolTheCount) {
 }
 
 TEST(PropertyList, MarkupThatHidesDepthIsStillCounted) {
-  // Each of these is read in different ways by different parsers.
+  // Parsers disagree about each of these.
   const std::string deep = repeated("<array>", 70) + repeated("</array>", 70);
   for (const std::string& hidden :
        {"<!-->" + deep + "<!-- -->", "<?>" + deep + "<? ?>", "<!--->" + deep + "<!-- -->"}) {
@@ -201,7 +201,7 @@ TEST(PropertyList, DefinitionsAreRefused) {
   EXPECT_EQ(problemOf(body), "not a well-formed property list");
 }
 
-TEST(PropertyList, DocumentsThatAreNoneSayWhy) {
+TEST(PropertyList, InvalidDocumentsAreRejectedWithAReason) {
   struct Case {
     std::string text;
     const char* problem;
@@ -227,12 +227,12 @@ TEST(PropertyList, DocumentsThatAreNoneSayWhy) {
   for (const Case& c : cases) EXPECT_EQ(problemOf(c.text), c.problem) << c.text;
 }
 
-TEST(PropertyList, CharactersMayBeGivenByNumber) {
+TEST(PropertyList, CharacterReferencesAreResolved) {
   EXPECT_EQ(valueOf("<string>&#60;&#x26;amp;&#228;&#x20AC;&#x1F3A5;&#10;</string>"),
             PlistValue("<&amp;\xC3\xA4\xE2\x82\xAC\xF0\x9F\x8E\xA5\n"));
 }
 
-TEST(PropertyList, NumbersOfNoCharacterAreRefused) {
+TEST(PropertyList, InvalidCharacterReferencesAreRejected) {
   for (const char* reference : {"&#0;", "&#x0;", "&#000;", "&#1;", "&#xD800;", "&#x110000;", "&#99999999999;",
                                 "&#;", "&#x;", "&#-1;", "&#65", "&# 65;", "&#X41;", "&#0x41;"}) {
     const std::string text = document("<string>a" + std::string(reference) + "</string>");
@@ -244,9 +244,9 @@ TEST(PropertyList, ByteOrderMarkIsSkipped) {
   EXPECT_EQ(parsePropertyList("\xEF\xBB\xBF" + document("<string>x</string>")).value(), PlistValue("x"));
 }
 
-TEST(PropertyList, EveryBeginningOfADocumentIsHandled) {
+TEST(PropertyList, TruncatedDocumentsAreRejected) {
   const std::string text = propertyListXml(everyKind());
-  // Without its last tag no document is one.
+  // Without its last tag, no document is complete.
   for (std::size_t length = 0; length < text.rfind("</plist>"); ++length) {
     EXPECT_FALSE(parsePropertyList(text.substr(0, length)).value()) << length;
   }
@@ -262,12 +262,12 @@ TEST(PropertyListFile, WrittenAndReadAgain) {
   EXPECT_EQ(readPropertyList(path).value(), PlistValue(everyKind()));
 }
 
-TEST(PropertyListFile, FailureToWriteIsTold) {
+TEST(PropertyListFile, WriteFailureIsReported) {
   const TemporaryDirectory directory;
   EXPECT_EQ(writePropertyList(directory.file("none/a.plist"), everyKind()), ENOENT);
 }
 
-TEST(PropertyListFile, MissingFileIsNamedByItsError) {
+TEST(PropertyListFile, MissingFileReportsItsErrno) {
   const TemporaryDirectory directory;
   const PlistResult result = readPropertyList(directory.file("none"));
   EXPECT_FALSE(result.value());
@@ -275,7 +275,7 @@ TEST(PropertyListFile, MissingFileIsNamedByItsError) {
   EXPECT_EQ(result.error().message, "No such file or directory");
 }
 
-TEST(PropertyListFile, BrokenFileIsNoSystemError) {
+TEST(PropertyListFile, BrokenFileReportsNoErrno) {
   const TemporaryDirectory directory;
   writeFile(directory.file("broken"), "text");
   const PlistResult result = readPropertyList(directory.file("broken"));
@@ -283,7 +283,7 @@ TEST(PropertyListFile, BrokenFileIsNoSystemError) {
   EXPECT_EQ(result.error().message, "neither an XML nor a binary property list");
 }
 
-TEST(PropertyListFile, SizeHasALimit) {
+TEST(PropertyListFile, SizeIsLimited) {
   const TemporaryDirectory directory;
   const std::string text = document("<string>" + std::string(1000, 'x') + "</string>");
   writeFile(directory.file("f"), text);
