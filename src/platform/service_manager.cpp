@@ -42,7 +42,7 @@ Variant call(const Method& method, GVariant* floating_arguments, std::string* pr
       G_DBUS_CALL_FLAGS_NO_AUTO_START, static_cast<int>(kBusLimit.count()), limit.cancellable(), &error));
   if (!reply) *problem = takeMessage(error);
   return reply;
-} catch (const std::exception& error) {  // no thread for the time limit
+} catch (const std::exception& error) {  // the time-limit thread could not start
   *problem = error.what();
   return nullptr;
 }
