@@ -40,7 +40,7 @@ struct RecordingDefaults {
   SharedValue<Text> recording_audio_input;
   SharedValue<Text> recording_audio_sample_rate;
   SharedValue<Text> recording_video_maximum_frame_rate;
-  /// Absent only once the context has been taken apart.
+  /// Absent only after the context's cleanup.
   SharedValue<std::optional<LMRContinuousRecordingInfo>> continuous{LMRContinuousRecordingInfo{}};
 
   /// Whether the capture runs all the time and commands only mark times in it.

@@ -11,8 +11,7 @@
 namespace lmx {
 namespace {
 
-/// Finds the session bus's address without GIO: asked for a session bus where there is none, GIO would start
-/// one.
+/// Finds the session bus's address without GIO, which would start a bus if there is none.
 std::optional<std::string> sessionBusAddress() {
   if (const char* address = std::getenv("DBUS_SESSION_BUS_ADDRESS")) return address;
   const char* directory = std::getenv("XDG_RUNTIME_DIR");

@@ -39,7 +39,7 @@ void emitOrExplain(GBusType type, const char* bus_name, const std::string& name)
   std::optional<std::string> problem;
   try {
     problem = emitSignal(type, name);
-  } catch (const std::exception& error) {  // no thread for the time limit
+  } catch (const std::exception& error) {  // the time-limit thread could not start
     problem = error.what();
   }
   if (!problem) return;

@@ -68,8 +68,8 @@ class AgentRecord : public RecordingSettings, public std::enable_shared_from_thi
   SharedValue<std::shared_ptr<LMRCaptureDelegate>> captureControllerDelegate;
   SharedValue<std::shared_ptr<CaptureThread>> captureThread;
 
-  /// The type of the recording prepared last, since the configured type may change meanwhile. Before the
-  /// first one, the configured type.
+  /// The type of the recording prepared last, since the configured type may have changed. Before the first
+  /// recording, the configured type.
   [[nodiscard]] std::int32_t recordedType() const;
   void setRecordedType(std::int32_t type) { recordedType_.set(type); }
 
