@@ -21,6 +21,7 @@
 #include "tests/unit/control/channel/turned_clock.h"
 #include "tests/unit/doubles/log_capture.h"
 #include "tests/unit/doubles/scripted_actions.h"
+#include "tests/unit/doubles/test_root.h"
 
 namespace lmx {
 namespace {
@@ -29,26 +30,6 @@ using namespace std::chrono_literals;
 using testing::Journal;
 using testing::LogCapture;
 using testing::ScriptedActions;
-
-/// Puts a directory of our own in front of the fixed paths, before anything reads where they are.
-class TemporaryRoot {
- public:
-  TemporaryRoot() {
-    if (::mkdtemp(path_.data()) == nullptr) std::abort();
-    std::filesystem::create_directories(path_ + "/var/run");
-    ::setenv("LMXAGENTD_ROOT", path_.c_str(), 1);
-  }
-  ~TemporaryRoot() {
-    std::error_code ignored;
-    std::filesystem::remove_all(path_, ignored);
-  }
-  TemporaryRoot(const TemporaryRoot&) = delete;
-  TemporaryRoot& operator=(const TemporaryRoot&) = delete;
-
- private:
-  std::string path_ = "/tmp/unit_control_root_XXXXXX";
-};
-const TemporaryRoot kRoot;
 
 std::string socketPath() { return systemPath(kLocalSocket); }
 
