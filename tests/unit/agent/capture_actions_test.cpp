@@ -22,18 +22,18 @@ class Actions : public AgentTest {
 
 TEST_F(Actions, PrepareRecordsWithACopyOfTheParameters) {
   start("R1", {{"RecordingMetadata_TITLE", "Talk"}});
-  EXPECT_TRUE(log_.contains(7, "Process prepareCapture"));
+  EXPECT_TRUE(log_.contains(kLogDebug, "Process prepareCapture"));
   EXPECT_EQ(session_->filename.get(), movie("R1.mov"));
   EXPECT_EQ(lookUp(session_->metadata.get(), "RecordingMetadata_TITLE"), "Talk");
   EXPECT_NE(session_->metadata.get(), context_->state.properties.get());
-  EXPECT_TRUE(log_.contains(5, "\"" + movie("R1.mov") + "\" recording started"));
+  EXPECT_TRUE(log_.contains(kLogNotice, "\"" + movie("R1.mov") + "\" recording started"));
 }
 
 TEST_F(Actions, PrepareLeavesItsResultInTheStatus) {
   session_->recordingType.set(7);
   agent_.prepareCapture();
   EXPECT_EQ(context_->state.status.get(), 1);
-  EXPECT_TRUE(log_.contains(3, "An error occurred during recording (1)"));
+  EXPECT_TRUE(log_.contains(kLogError, "An error occurred during recording (1)"));
 }
 
 TEST_F(Actions, APreparationThatRunsOutOfMemoryIsNoRecording) {
@@ -53,8 +53,8 @@ TEST_F(Actions, PreviewActionsLogAndSucceedAlsoWithoutACamera) {
   context_->state.status.set(9);
   agent_.stopPreview();
   EXPECT_EQ(context_->state.status.get(), 0);
-  EXPECT_TRUE(log_.contains(7, "Process startPreview"));
-  EXPECT_TRUE(log_.contains(7, "Process stopPreview"));
+  EXPECT_TRUE(log_.contains(kLogDebug, "Process startPreview"));
+  EXPECT_TRUE(log_.contains(kLogDebug, "Process stopPreview"));
 }
 
 TEST_F(Actions, PauseIsReportedOnlyWhenItChangesSomething) {
@@ -63,24 +63,24 @@ TEST_F(Actions, PauseIsReportedOnlyWhenItChangesSomething) {
   const std::string line = "\"" + movie("R1.mov") + "\" recording paused (current duration: 65s)";
   controller->state = 4;
   agent_.pauseCapture();
-  EXPECT_EQ(log_.count(5, line), 0);
+  EXPECT_EQ(log_.count(kLogNotice, line), 0);
   controller->state = 3;
   agent_.pauseCapture();
-  EXPECT_EQ(log_.count(5, line), 1);
+  EXPECT_EQ(log_.count(kLogNotice, line), 1);
   EXPECT_EQ(journalCount("pauseRecording"), 2);
-  EXPECT_EQ(log_.count(7, "Process pauseCapture"), 2);
+  EXPECT_EQ(log_.count(kLogDebug, "Process pauseCapture"), 2);
 }
 
 TEST_F(Actions, ResumeIsReportedOnlyWhenItChangesSomething) {
   const auto controller = start("R1");
   const std::string line = "\"" + movie("R1.mov") + "\" recording resumed";
   agent_.resumeCapture();
-  EXPECT_EQ(log_.count(5, line), 0);
+  EXPECT_EQ(log_.count(kLogNotice, line), 0);
   controller->state = 4;
   agent_.resumeCapture();
-  EXPECT_EQ(log_.count(5, line), 1);
+  EXPECT_EQ(log_.count(kLogNotice, line), 1);
   EXPECT_EQ(journalCount("resumeRecording"), 2);
-  EXPECT_EQ(log_.count(7, "Process resumeCapture"), 2);
+  EXPECT_EQ(log_.count(kLogDebug, "Process resumeCapture"), 2);
 }
 
 TEST_F(Actions, PauseAndResumeKeepTheStatus) {
@@ -99,7 +99,7 @@ TEST_F(Actions, StopStopsTheControllerAndMakesIdle) {
   EXPECT_EQ(journalCount("cancelRecording"), 0);
   EXPECT_EQ(session_->status.get(), kRecorderIdle);
   EXPECT_EQ(context_->state.status.get(), 0);
-  EXPECT_TRUE(log_.contains(7, "Process stopCapture"));
+  EXPECT_TRUE(log_.contains(kLogDebug, "Process stopCapture"));
 }
 
 TEST_F(Actions, CancelCancelsTheController) {
@@ -108,7 +108,7 @@ TEST_F(Actions, CancelCancelsTheController) {
   EXPECT_EQ(journalCount("cancelRecording"), 1);
   EXPECT_EQ(journalCount("controller stopRecording"), 0);
   EXPECT_EQ(session_->status.get(), kRecorderIdle);
-  EXPECT_TRUE(log_.contains(7, "Process cancelCapture"));
+  EXPECT_TRUE(log_.contains(kLogDebug, "Process cancelCapture"));
 }
 
 TEST_F(Actions, WithoutACaptureTheyDoNothing) {
@@ -142,7 +142,7 @@ TEST_F(Actions, AdhocStopMarksTheShiftedStopThenStopsTheRecording) {
   EXPECT_EQ(mark.operation, "setStop");
   EXPECT_EQ(mark.uuid, session_->recording_uuid.get());
   EXPECT_NEAR(*mark.time, before - 20, 1.0);
-  EXPECT_TRUE(log_.contains(7, "Process stopRecording"));
+  EXPECT_TRUE(log_.contains(kLogDebug, "Process stopRecording"));
   context_->options.adhoc.set(false);
   context_->state.running.set(false);
 }
@@ -153,7 +153,7 @@ TEST_F(Actions, StopRecordingWithoutParametersIsACancelLineAndNothingElse) {
     context_->state.properties.set(parameters);
     agent_.stopRecording();
   }
-  EXPECT_EQ(log_.count(1, "Recording canceled, missing RecordingMetadata_RECORDING_UUID."), 2);
+  EXPECT_EQ(log_.count(kLogAlert, "Recording canceled, missing RecordingMetadata_RECORDING_UUID."), 2);
   EXPECT_EQ(session_->status.get(), kRecorderRecording);
   EXPECT_EQ(journalCount("controller stopRecording"), 0);
 }
@@ -169,7 +169,7 @@ TEST_F(Actions, StopRecordingOfAContinuousCaptureSubmitsAndGoesOn) {
   start("R1");
   setContinuous();
   agent_.stopRecording();
-  EXPECT_TRUE(log_.contains(7, "Submitting Stopped Recording"));
+  EXPECT_TRUE(log_.contains(kLogDebug, "Submitting Stopped Recording"));
   EXPECT_EQ(journalCount("controller stopRecording"), 0);
   EXPECT_NE(nextJob(), nullptr);
 }
@@ -177,7 +177,7 @@ TEST_F(Actions, StopRecordingOfAContinuousCaptureSubmitsAndGoesOn) {
 TEST_F(Actions, ShutDownControlCancelsAndAsksForTheDeviceAgain) {
   start("R1");
   agent_.shutDownControl();
-  EXPECT_TRUE(log_.contains(7, "Process shutDownControl"));
+  EXPECT_TRUE(log_.contains(kLogDebug, "Process shutDownControl"));
   EXPECT_EQ(journalCount("cancelRecording"), 1);
   EXPECT_GT(context_->state.last_device_check.get(), 0);
 }
@@ -194,7 +194,7 @@ TEST_F(Actions, SignalsRunTheirActions) {
   EXPECT_EQ(journalCount("controller stopRecording"), 1);
   EXPECT_FALSE(context_->state.running.get());
   for (const char* line : {"Got Pause Signal", "Got Resume Signal", "Got Termination Signal (SIGTERM)"}) {
-    EXPECT_TRUE(log_.contains(7, line)) << line;
+    EXPECT_TRUE(log_.contains(kLogDebug, line)) << line;
   }
 }
 
@@ -202,7 +202,7 @@ TEST_F(Actions, AHangUpCancelsTheCaptureAndTheAgentContinues) {
   start("R1");
   const std::int64_t before = std::time(nullptr);
   agent_.signal(SIGHUP);
-  EXPECT_TRUE(log_.contains(7, "Got Signal (SIGHUP)"));
+  EXPECT_TRUE(log_.contains(kLogDebug, "Got Signal (SIGHUP)"));
   EXPECT_EQ(journalCount("cancelRecording"), 1);
   EXPECT_EQ(journalCount("controller stopRecording"), 0);
   EXPECT_GE(context_->state.last_device_check.get(), before);
@@ -221,7 +221,7 @@ TEST_F(Actions, AnInterruptStopsTheCaptureOfADaemonOnly) {
   agent_.signal(SIGINT);
   EXPECT_EQ(journalCount("controller stopRecording"), 1);
   EXPECT_FALSE(context_->state.running.get());
-  EXPECT_EQ(log_.count(7, "Got Stop Signal (SIGINT)"), 2);
+  EXPECT_EQ(log_.count(kLogDebug, "Got Stop Signal (SIGINT)"), 2);
 }
 
 TEST_F(Actions, OtherSignalNumbersAreIgnored) {
@@ -264,10 +264,10 @@ TEST_F(Actions, CallbacksLogTheirLines) {
   agent_.recordDidResumeWithFile("/r/A.mov", nullptr);
   agent_.recordRuntimeErrorCallback(4);
   EXPECT_EQ(log_.entries(), (std::vector<testing::LogCapture::Entry>{
-                                {5, "\"/r/A.mov\" recording started"},
-                                {5, "\"/r/A.mov\" recording paused (current duration: 61s)"},
-                                {5, "\"/r/A.mov\" recording resumed"},
-                                {3, "An error occurred during recording (4)"}}));
+                                {kLogNotice, "\"/r/A.mov\" recording started"},
+                                {kLogNotice, "\"/r/A.mov\" recording paused (current duration: 61s)"},
+                                {kLogNotice, "\"/r/A.mov\" recording resumed"},
+                                {kLogError, "An error occurred during recording (4)"}}));
 }
 
 /// Takes two seconds, because the behaviour under test includes a pause.
@@ -287,7 +287,7 @@ TEST_F(Actions, ALostDeviceWaitsForTheQueue) {
   const auto before = std::chrono::steady_clock::now();
   agent_.devices().announceLostDevice();
   EXPECT_GE(std::chrono::steady_clock::now() - before, std::chrono::milliseconds(1900));
-  EXPECT_TRUE(log_.contains(2, "The capture device has been disconnected."));
+  EXPECT_TRUE(log_.contains(kLogCritical, "The capture device has been disconnected."));
 }
 
 TEST_F(Actions, APresentDeviceKeepsTheLoopRunning) {

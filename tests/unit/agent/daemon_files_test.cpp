@@ -57,7 +57,7 @@ TEST_F(DaemonFiles, DeniedAccessToThePidFileIsOnlyLogged) {
   const int result = createPIDFile(*context_);
   ASSERT_EQ(seteuid(0), 0);
   EXPECT_EQ(result, 0);
-  EXPECT_TRUE(log_.contains(3, "unable to write pid file (EACCES)"));
+  EXPECT_TRUE(log_.contains(kLogError, "unable to write pid file (EACCES)"));
 }
 
 TEST_F(DaemonFiles, ExistingRepositoryIsUsed) {
@@ -73,7 +73,7 @@ TEST_F(DaemonFiles, MissingRepositoryIsMadeWithItsParents) {
       setupRecordingRepository(*context_, context_->recording.recording_repository_path.get().value()));
   EXPECT_TRUE(fs::is_directory(path));
   EXPECT_EQ(fs::status(path).permissions(), fs::perms{0755});
-  EXPECT_TRUE(log_.contains(6, "Recording Repository does not exist, creating " + path + "."));
+  EXPECT_TRUE(log_.contains(kLogInfo, "Recording Repository does not exist, creating " + path + "."));
 }
 
 TEST_F(DaemonFiles, RepositoryThatCannotBeMadeIsAFailure) {
@@ -81,7 +81,7 @@ TEST_F(DaemonFiles, RepositoryThatCannotBeMadeIsAFailure) {
   context_->recording.recording_repository_path.set(repository_.file("link"));
   EXPECT_FALSE(
       setupRecordingRepository(*context_, context_->recording.recording_repository_path.get().value()));
-  EXPECT_TRUE(log_.contains(2, "Unable to create recording directory"));
+  EXPECT_TRUE(log_.contains(kLogCritical, "Unable to create recording directory"));
 }
 
 TEST_F(DaemonFiles, RepositoryBelowAFileDoesNotExist) {
@@ -90,7 +90,7 @@ TEST_F(DaemonFiles, RepositoryBelowAFileDoesNotExist) {
   context_->recording.recording_repository_path.set(path);
   EXPECT_FALSE(
       setupRecordingRepository(*context_, context_->recording.recording_repository_path.get().value()));
-  EXPECT_TRUE(log_.contains(2, "Recording repository path \"" + path + "\" does not exist"));
+  EXPECT_TRUE(log_.contains(kLogCritical, "Recording repository path \"" + path + "\" does not exist"));
 }
 
 TEST_F(DaemonFiles, TimeShiftIsReadOnEveryTurn) {

@@ -22,9 +22,9 @@ class DiskSpaceGuardTest : public AgentTest {
   [[nodiscard]] std::ptrdiff_t disabledLines() const {
     std::ptrdiff_t lines = 0;
     for (const auto& entry : log_.entries()) {
-      lines += entry.level == 4 && entry.text.ends_with(
-                                       "MB is below threshold 4294967295 MB, unable to free space, "
-                                       "recording disabled");
+      lines += entry.level == kLogWarning && entry.text.ends_with(
+                                                 "MB is below threshold 4294967295 MB, unable to free space, "
+                                                 "recording disabled");
     }
     return lines;
   }
@@ -71,7 +71,8 @@ TEST_F(DiskSpaceGuardTest, RestartsInContinuousMode) {
   const auto entries = log_.entries();
   EXPECT_EQ(std::count_if(entries.begin(), entries.end(),
                           [](const auto& e) {
-                            return e.level == 5 && e.text.ends_with(" MB is sufficient, starting recorder");
+                            return e.level == kLogNotice &&
+                                   e.text.ends_with(" MB is sufficient, starting recorder");
                           }),
             1);
   const auto running = framework_->controller(0);
@@ -138,7 +139,7 @@ TEST_F(DiskSpaceGuardTest, AVanishedRepositoryIsMadeAgainAndTheCaptureCancelled)
   EXPECT_EQ(journalCount("cancelRecording"), 1);
   EXPECT_TRUE(std::filesystem::is_directory(lost));
   EXPECT_TRUE(context_->state.running.get());
-  EXPECT_TRUE(log_.contains(6, "Recording Repository does not exist, creating " + lost + "."));
+  EXPECT_TRUE(log_.contains(kLogInfo, "Recording Repository does not exist, creating " + lost + "."));
 }
 
 TEST_F(DiskSpaceGuardTest, AVolumeThatCannotBeMeasuredEndsTheAgent) {

@@ -69,7 +69,7 @@ TEST_F(MainLoopTest, ASecondSignalWhileTheTunnelClosesIsHarmless) {
     agent_.shutDownControl();  // runs the loop until the tunnel's thread has ended
     turnTheLoop();
   }
-  EXPECT_EQ(log_.count(7, "Process shutDownControl"), 40);
+  EXPECT_EQ(log_.count(kLogDebug, "Process shutDownControl"), 40);
 }
 
 TEST_F(MainLoopTest, ADeviceThatIsStillMissingEndsTheDaemon) {
@@ -83,15 +83,15 @@ TEST_F(MainLoopTest, ADeviceThatIsStillMissingEndsTheDaemon) {
 TEST_F(MainLoopTest, ADeviceThatFailedGetsOneMoreRetryWithAWarning) {
   framework_->cameras_attach = false;
   agent_.shutDownControlBecauseDeviceFailed();
-  EXPECT_TRUE(log_.contains(7, "Process shutDownControl"));
+  EXPECT_TRUE(log_.contains(kLogDebug, "Process shutDownControl"));
   checkedDevice(11);
   const std::int64_t before = std::time(nullptr);
   EXPECT_TRUE(turn());
-  EXPECT_EQ(log_.count(4, kOffline), 1);
+  EXPECT_EQ(log_.count(kLogWarning, kOffline), 1);
   EXPECT_GE(context_->state.last_device_check.get(), before);
   checkedDevice(11);
   EXPECT_FALSE(turn());
-  EXPECT_EQ(log_.count(4, kOffline), 1);
+  EXPECT_EQ(log_.count(kLogWarning, kOffline), 1);
 }
 
 TEST_F(MainLoopTest, AReturningDeviceClearsTheWarning) {
@@ -108,7 +108,7 @@ TEST_F(MainLoopTest, MissingPreferencesAtTheRetryEndTheDaemon) {
   framework_->audio_device_usable = false;
   checkedDevice(11);
   EXPECT_FALSE(turn());
-  EXPECT_TRUE(log_.contains(2,
+  EXPECT_TRUE(log_.contains(kLogCritical,
                             "Unable to load the recording context, exception = Unknown device ID: microphone "
                             "for preference: RecordingAudioInput"));
 }
@@ -128,7 +128,7 @@ TEST_F(MainLoopTest, AnUnrequestedPreviewIsStoppedAfterSixteenSeconds) {
   turn();
   EXPECT_FALSE(preview->controller().isPreviewRunning());
   EXPECT_EQ(preview->mLastPreviewRequestTime(), 0);
-  EXPECT_TRUE(log_.contains(7, "Process stopPreview"));
+  EXPECT_TRUE(log_.contains(kLogDebug, "Process stopPreview"));
 }
 
 TEST_F(MainLoopTest, ALostDeviceEndsTheLoopWithOne) {

@@ -67,8 +67,9 @@ TEST_F(TimedCommands, AreLoadedFromTheFileExceptExpiredOnes) {
                          entry("FOO", now_ + 9, "C"), entry("STOP", now_ + 2000, "D")});
   agent_.timedCommands().loadSchedule();
   EXPECT_THAT(waiting(), ElementsAre("A", "D"));
-  EXPECT_TRUE(log_.contains(6, "Not scheduling STOP command. The timer has expired: " + *dateText(now_ - 5)));
-  EXPECT_TRUE(log_.contains(6, "Not scheduling unknown command: FOO"));
+  EXPECT_TRUE(
+      log_.contains(kLogInfo, "Not scheduling STOP command. The timer has expired: " + *dateText(now_ - 5)));
+  EXPECT_TRUE(log_.contains(kLogInfo, "Not scheduling unknown command: FOO"));
 }
 
 TEST_F(TimedCommands, LoadingTwiceSchedulesOnce) {
@@ -126,7 +127,7 @@ TEST_F(TimedCommands, ADueCommandRunsInTheMainLoop) {
   writeTimers(PlistArray{entry("PAUSE", now_ + 1, "A")});
   agent_.timedCommands().loadSchedule();
   std::thread ending([&] {
-    log_.waitFor(6, "Running deferred command: PAUSE");
+    log_.waitFor(kLogInfo, "Running deferred command: PAUSE");
     context_->state.running.set(false);
   });
   EXPECT_EQ(agent_.mainLoop().appLoop(), 0);
@@ -134,7 +135,7 @@ TEST_F(TimedCommands, ADueCommandRunsInTheMainLoop) {
   EXPECT_GE(std::time(nullptr), now_ + 1);
   EXPECT_LE(std::time(nullptr), now_ + 3);
   EXPECT_THAT(waiting(), IsEmpty());
-  EXPECT_TRUE(log_.contains(7, "Nobody to send the reply to: cmdStatus=0"));
+  EXPECT_TRUE(log_.contains(kLogDebug, "Nobody to send the reply to: cmdStatus=0"));
 }
 
 }  // namespace

@@ -36,7 +36,7 @@ TEST_F(StoppedRecording, BecomesAMovieADocumentAndAJob) {
   EXPECT_EQ(readFile(movie("R1.mov")), "movie");
   EXPECT_EQ(readFile(movie("R1.xml")), propertiesXml(job->properties));
   EXPECT_EQ(journalCount("processRequest request of R1 " + movie("R1.mov")), 1);
-  EXPECT_TRUE(log_.contains(5, "\"" + movie("R1.mov") + "\" recording stopped (duration: 61s)"));
+  EXPECT_TRUE(log_.contains(kLogNotice, "\"" + movie("R1.mov") + "\" recording stopped (duration: 61s)"));
   EXPECT_TRUE(testing::waitUntil([&] { return journalCount("requestHandedOver request of R1") == 1; }));
 }
 
@@ -102,8 +102,8 @@ TEST_F(StoppedRecording, AMovieThatCannotBeWrittenIsARuntimeErrorAndNoJob) {
     return std::optional(CaptureError{CaptureError::kDomain, kNoSpace, "disk full"});
   };
   stopAndReport(controller);
-  EXPECT_TRUE(log_.waitFor(2, "The recording could not be finished: disk full"));
-  EXPECT_TRUE(log_.waitFor(3, "An error occurred during recording (8)"));
+  EXPECT_TRUE(log_.waitFor(kLogCritical, "The recording could not be finished: disk full"));
+  EXPECT_TRUE(log_.waitFor(kLogError, "An error occurred during recording (8)"));
   EXPECT_TRUE(testing::waitUntil([&] { return session_->error.get() == kRecordCannotWrite; }));
   session_->captureController.set(nullptr);
   EXPECT_TRUE(testing::waitUntil([&] { return controller.use_count() == 1; })) << "the hand-off has ended";
@@ -275,7 +275,7 @@ TEST_F(StoppedRecording, ThatEndedForLackOfSpaceLeavesItsError) {
   stopAndReport(controller);
   ASSERT_NE(nextJob(), nullptr) << "what was written is submitted";
   EXPECT_TRUE(testing::waitUntil([&] { return session_->error.get() == kRecordCannotWrite; }));
-  EXPECT_TRUE(log_.contains(3, "The capture of \"" + movie("R1.mov") + "\" ended early: no space"));
+  EXPECT_TRUE(log_.contains(kLogError, "The capture of \"" + movie("R1.mov") + "\" ended early: no space"));
 }
 
 TEST_F(StoppedRecording, OfALostDeviceLeavesNoDiskError) {

@@ -61,7 +61,7 @@ class AdHocMode : public AgentTest {
 TEST_F(AdHocMode, WithoutADaemonPrintsNothing) {
   context_->options.adhoc_request_type.set(1);
   EXPECT_EQ(run(), "");
-  EXPECT_TRUE(log_.contains(6, "lmxagentd (version 100) starting..."));
+  EXPECT_TRUE(log_.contains(kLogInfo, "lmxagentd (version 100) starting..."));
 }
 
 TEST_F(AdHocMode, AsksForTheStatusOnce) {

@@ -81,7 +81,8 @@ TEST_F(Context, MessagesAreNotFormatStrings) {
   context_->logDebug("100%s");
   context_->logInfo("50%n");
   context_->logWarn("%d");
-  EXPECT_EQ(log_.entries(), (std::vector<LogCapture::Entry>{{7, "100%s"}, {6, "50%n"}, {4, "%d"}}));
+  EXPECT_EQ(log_.entries(),
+            (std::vector<LogCapture::Entry>{{kLogDebug, "100%s"}, {kLogInfo, "50%n"}, {kLogWarning, "%d"}}));
 }
 
 TEST_F(Context, CleanupTakesItApart) {

@@ -69,7 +69,7 @@ TEST_F(Delegate, TypeOfASessionThatHasMovedOnIsKept) {
 TEST_F(EngineTest, PreviewControllerNamesTheCamera) {
   const auto preview = LXAgentRecordCreatePreviewController("camera", "microphone", true, 400, nullptr);
   ASSERT_NE(preview, nullptr);
-  EXPECT_TRUE(log_.contains(7, "Using Video Device Named: Scripted camera"));
+  EXPECT_TRUE(log_.contains(kLogDebug, "Using Video Device Named: Scripted camera"));
   EXPECT_EQ(preview->delegate()->frameGrabInterval(), 400);
 }
 

@@ -149,7 +149,7 @@ TEST_F(Prepare, IsRefusedWhenTheAgentIsNotRunning) {
 TEST_F(Prepare, IsRefusedWithoutARepository) {
   context_->recording.recording_repository_path.set(std::nullopt);
   EXPECT_EQ(prepare(), 1);
-  EXPECT_TRUE(log_.contains(2, "Internal error occurred"));
+  EXPECT_TRUE(log_.contains(kLogCritical, "Internal error occurred"));
 }
 
 TEST_F(Prepare, UnknownTypesAreRefused) {
@@ -171,7 +171,7 @@ TEST_F(Prepare, NeedsASessionAndAPath) {
   EXPECT_EQ(prepare(), 2);  // no input file
   context_->releaseRecord();
   EXPECT_EQ(prepare(), 2);
-  EXPECT_EQ(log_.count(3, kLine), 3);
+  EXPECT_EQ(log_.count(kLogError, kLine), 3);
 }
 
 TEST_F(Prepare, ARefusingFrameworkReturnsThree) {
@@ -180,16 +180,16 @@ TEST_F(Prepare, ARefusingFrameworkReturnsThree) {
   EXPECT_EQ(session_->error.get(), 3);
   EXPECT_EQ(session_->status.get(), kRecorderIdle);
   EXPECT_EQ(session_->metadata.get(), nullptr);
-  EXPECT_TRUE(log_.contains(3, kReceivedError));
+  EXPECT_TRUE(log_.contains(kLogError, kReceivedError));
 }
 
 TEST_F(Prepare, UnusablePreferencesReturnThree) {
   framework_->audio_device_usable = false;
   EXPECT_EQ(prepare(), 3);
-  EXPECT_TRUE(log_.contains(2,
+  EXPECT_TRUE(log_.contains(kLogCritical,
                             "Unable to load the recording context, exception = Unknown device ID: microphone "
                             "for preference: RecordingAudioInput"));
-  EXPECT_TRUE(log_.contains(3, kReceivedError));
+  EXPECT_TRUE(log_.contains(kLogError, kReceivedError));
 }
 
 TEST_F(Prepare, WhileRecordingReturnsFourAndKeepsTheRecording) {
@@ -197,7 +197,7 @@ TEST_F(Prepare, WhileRecordingReturnsFourAndKeepsTheRecording) {
   const std::string before = session_->recording_uuid.get();
   const auto controller = session_->captureController.get();
   EXPECT_EQ(prepare({{"RecordingMetadata_RECORDING_UUID", "R2"}}), 4);
-  EXPECT_TRUE(log_.contains(3, "Unable to start, capture not idle"));
+  EXPECT_TRUE(log_.contains(kLogError, "Unable to start, capture not idle"));
   EXPECT_EQ(journalCount("recordRuntimeError 4"), 1);
   EXPECT_EQ(session_->filename.get(), movie("R1.mov"));
   EXPECT_EQ(session_->status.get(), kRecorderRecording);
@@ -229,7 +229,7 @@ TEST_F(Prepare, DeadlinesAreKept) {
   session_->stop_times.hardStopTime.set(TimeValue{1000, 0});
   ASSERT_EQ(prepare(), 0);
   EXPECT_TRUE(session_->stop_times.hardStopTime.get() ||
-              log_.contains(5, "Agent recording hit hard stop time"));
+              log_.contains(kLogNotice, "Agent recording hit hard stop time"));
 }
 
 TEST_F(Prepare, TheRecordedTypeIsThatOfThePreparation) {
@@ -257,7 +257,7 @@ TEST_F(Prepare, LogLinesOfThePrepareStepByResult) {
     controller.error = CaptureError{CaptureError::kDomain, kDeviceBusy, "camera is busy"};
   };
   EXPECT_EQ(LXAgentRecordPrepareCaptureController(*context_), 3);
-  EXPECT_TRUE(log_.contains(3, "The capture could not be prepared: camera is busy"));
+  EXPECT_TRUE(log_.contains(kLogError, "The capture could not be prepared: camera is busy"));
 }
 
 TEST(DiskSpace, UnknownPathGivesAllOnesAndErrno) {
@@ -289,7 +289,7 @@ TEST_F(Prepare, StatusReportsAVolumeThatCannotBeMeasured) {
   EXPECT_EQ(LXAgentRecordGetStatus(session_, &status), 0);
   EXPECT_EQ(status.totalDiskMB, 0);
   EXPECT_EQ(status.availableDiskMB, static_cast<double>(~std::uint64_t{0} >> 10));
-  EXPECT_TRUE(log_.contains(3, "statfs failed: 2"));
+  EXPECT_TRUE(log_.contains(kLogError, "statfs failed: 2"));
 }
 
 }  // namespace

@@ -49,13 +49,13 @@ TEST_F(Stop, ElapsedTimeGrowsByTheTimeSinceTheStart) {
 
 TEST_F(Stop, WithoutASessionReturnsTwo) {
   EXPECT_EQ(LXAgentRecordStopCapture(nullptr), 2);
-  EXPECT_TRUE(log_.contains(3, "Invalid Arguments in function LXAgentRecordStopCapture"));
+  EXPECT_TRUE(log_.contains(kLogError, "Invalid Arguments in function LXAgentRecordStopCapture"));
 }
 
 TEST_F(Stop, WithoutARecordingReturnsThree) {
   session_->status.set(kRecorderIdle);
   EXPECT_EQ(LXAgentRecordStopCapture(session_), 3);
-  EXPECT_TRUE(log_.contains(3, "Unable to stop, capture not running"));
+  EXPECT_TRUE(log_.contains(kLogError, "Unable to stop, capture not running"));
   EXPECT_EQ(journal_.entries(), (Entries{"setStop", "recordRuntimeError 3"}));
   EXPECT_EQ(session_->error.get(), 3);
 }
@@ -82,7 +82,7 @@ TEST_F(Stop, AgentStatusIsTheResult) {
     context_->state.status.set(row.agent_status);
     EXPECT_EQ(LXAgentRecordStopCapture(session_), row.agent_status);
     EXPECT_EQ(session_->error.get(), row.agent_status);
-    EXPECT_EQ(log_.contains(3, "_LXAgentRecordStopCaptureSync received error"), row.logged);
+    EXPECT_EQ(log_.contains(kLogError, "_LXAgentRecordStopCaptureSync received error"), row.logged);
   }
   EXPECT_EQ(journalCount("recordDidStop " + movie("R1.mov") + " 12"), 0);
 }
@@ -118,7 +118,7 @@ TEST_F(EngineTest, ACaptureThatFailsToStartIsStopped) {
   };
   framework_->on_new_controller = [](auto& controller) { controller.start_succeeds = false; };
   ASSERT_EQ(prepare(), 0);
-  EXPECT_TRUE(log_.waitFor(2, "The recording failed to start"));
+  EXPECT_TRUE(log_.waitFor(kLogCritical, "The recording failed to start"));
   EXPECT_TRUE(
       testing::waitUntil([&] { return journalCount("recordDidStop " + movie("R1.mov") + " 0") == 1; }));
   EXPECT_EQ(session_->status.get(), kRecorderIdle);
@@ -161,7 +161,7 @@ TEST_F(Stop, StatusReportsTimesErrorAndSpace) {
 
 TEST_F(Stop, StatusWithoutASessionReturnsTwo) {
   EXPECT_EQ(LXAgentRecordGetStatus(nullptr, nullptr), 2);
-  EXPECT_TRUE(log_.contains(3, "Invalid Arguments in function LXAgentRecordGetStatus"));
+  EXPECT_TRUE(log_.contains(kLogError, "Invalid Arguments in function LXAgentRecordGetStatus"));
   EXPECT_EQ(LXAgentRecordGetStatus(session_, nullptr), 0);
 }
 

@@ -82,7 +82,7 @@ TEST_F(StopTimes, HardStopThatHasPassedIsLogged) {
   session_->stop_times.hardStopTime.set(fromNow(-1));
   EXPECT_TRUE(session_->stop_times.shouldStopRecording());
   EXPECT_EQ(log_.entries(),
-            (std::vector<testing::LogCapture::Entry>{{5, "Agent recording hit hard stop time"}}));
+            (std::vector<testing::LogCapture::Entry>{{kLogNotice, "Agent recording hit hard stop time"}}));
 }
 
 TEST_F(StopTimes, SoftStopThatHasPassedIsLoggedWithItsDifference) {
@@ -111,7 +111,7 @@ TEST_F(StopTimes, BothDeadlinesLogBothLines) {
   session_->stop_times.hardStopTime.set(TimeValue{1000, 0});
   session_->stop_times.softStopTime.set(TimeValue{1000, 0});
   EXPECT_TRUE(session_->stop_times.shouldStopRecording());
-  EXPECT_TRUE(log_.contains(5, "Agent recording hit hard stop time"));
+  EXPECT_TRUE(log_.contains(kLogNotice, "Agent recording hit hard stop time"));
   EXPECT_TRUE(log_.mentions("Agent recording hit soft stop time: "));
 }
 
@@ -120,7 +120,7 @@ TEST_F(StopTimes, AutoShutoffMarksTheRequestWaitsAndClearsBothDeadlines) {
   session_->stop_times.softStopTime.set(fromNow(1000));
   const double before = secondsSinceReferenceDate();
   checkForAutoShutoffConditions(*session_);
-  EXPECT_TRUE(log_.contains(5, "Doing Auto-Shutoff: Video"));
+  EXPECT_TRUE(log_.contains(kLogNotice, "Doing Auto-Shutoff: Video"));
   EXPECT_EQ(journal_.entries(), (Entries{"setStop", "stopRecording, waiting"}));
   EXPECT_EQ(controller_->marks()[0].uuid, "request");
   EXPECT_GE(*controller_->marks()[0].time, before);

@@ -106,29 +106,29 @@ class Lifecycle : public ::testing::Test {
 
 TEST_F(Lifecycle, StartIsLogged) {
   start();
-  EXPECT_TRUE(log_.contains(5, "Control module is starting..."));
-  EXPECT_TRUE(log_.contains(5, "Control module started with success"));
+  EXPECT_TRUE(log_.contains(kLogNotice, "Control module is starting..."));
+  EXPECT_TRUE(log_.contains(kLogNotice, "Control module started with success"));
 }
 
 TEST_F(Lifecycle, NoChannelWithoutNewsOfTheNetwork) {
   actions_.network_can_be_watched = false;
   EXPECT_FALSE(channel_.initWithAgentContext());
-  EXPECT_TRUE(
-      log_.contains(3, "Unable to create dynamic store for Netvane registration for Network Notification"));
-  EXPECT_TRUE(log_.contains(3, "Unable to register for network notifications"));
-  EXPECT_FALSE(log_.contains(5, "Control module started with success"));
+  EXPECT_TRUE(log_.contains(
+      kLogError, "Unable to create dynamic store for Netvane registration for Network Notification"));
+  EXPECT_TRUE(log_.contains(kLogError, "Unable to register for network notifications"));
+  EXPECT_FALSE(log_.contains(kLogNotice, "Control module started with success"));
 }
 
 TEST_F(Lifecycle, NoChannelWithoutTheTime) {
   clock_.readable = false;
   EXPECT_FALSE(channel_.initWithAgentContext());
-  EXPECT_TRUE(log_.contains(2, "Internal error occurred"));
+  EXPECT_TRUE(log_.contains(kLogCritical, "Internal error occurred"));
 }
 
 TEST_F(Lifecycle, CommandsOfAConnectionAreExecuted) {
   start();
   say(connections_.peer(0), "foo\n");
-  EXPECT_TRUE(log_.waitFor(3, "Unknown command [foo]"));
+  EXPECT_TRUE(log_.waitFor(kLogError, "Unknown command [foo]"));
 }
 
 TEST_F(Lifecycle, SilentTunnelIsRetriedAfter5And15And45And120And120Seconds) {
@@ -137,7 +137,7 @@ TEST_F(Lifecycle, SilentTunnelIsRetriedAfter5And15And45And120And120Seconds) {
     return 1;
   };
   start();
-  ASSERT_TRUE(log_.waitFor(6, "Failed to connect to server, retrying in 120 seconds.", 2));
+  ASSERT_TRUE(log_.waitFor(kLogInfo, "Failed to connect to server, retrying in 120 seconds.", 2));
   channel_.stop();
   Lines retries;
   for (const auto& entry : log_.entries()) {
@@ -152,7 +152,7 @@ TEST_F(Lifecycle, BackOffSleepsWithoutWakingMeanwhile) {
     return 1;
   };
   start();
-  ASSERT_TRUE(log_.waitFor(6, "Failed to connect to server, retrying in 45 seconds."));
+  ASSERT_TRUE(log_.waitFor(kLogInfo, "Failed to connect to server, retrying in 45 seconds."));
   channel_.stop();
   const Lines expected{"connect", "5000", "connect", "15000", "connect"};
   auto seen = clock_.sleeps.entries();
@@ -176,7 +176,7 @@ TEST(Stop, EndsABackOffEarly) {
   ScriptedChannel channel(newAgentContext(), nullptr, systemChannelClock());
   channel.on_connect = [](ScriptedChannel&) { return 1; };
   ASSERT_TRUE(channel.initWithAgentContext());
-  ASSERT_TRUE(log.waitFor(6, "Failed to connect to server, retrying in 5 seconds."));
+  ASSERT_TRUE(log.waitFor(kLogInfo, "Failed to connect to server, retrying in 5 seconds."));
   const auto before = std::chrono::steady_clock::now();
   channel.stop();
   EXPECT_LT(std::chrono::steady_clock::now() - before, 2s);
@@ -197,11 +197,11 @@ TEST_F(Lifecycle, ContactLostForTenMinutesReconnectsAndClearsTheTime) {
   start();
   const int first = connections_.peer(0);
   say(first, "foo\n");
-  ASSERT_TRUE(log_.waitFor(3, "Unknown command [foo]"));
+  ASSERT_TRUE(log_.waitFor(kLogError, "Unknown command [foo]"));
   clock_.ahead_seconds = 601;
   say(first, "x");  // one turn of the loop, not yet a command
   connections_.peer(1);
-  EXPECT_TRUE(log_.contains(5, "Too long since last contact from server.  Reconnecting..."));
+  EXPECT_TRUE(log_.contains(kLogNotice, "Too long since last contact from server.  Reconnecting..."));
   EXPECT_FALSE(context_->record_context()->lastContact.get().has_value());
   EXPECT_TRUE(Connections::closes(first));
 }
@@ -211,7 +211,7 @@ TEST_F(Lifecycle, PartialCommandOutlivesTheConnection) {
   say(connections_.peer(0), "fo");
   ::shutdown(connections_.peer(0), SHUT_WR);
   say(connections_.peer(1), "o\n");
-  EXPECT_TRUE(log_.waitFor(3, "Unknown command [foo]"));
+  EXPECT_TRUE(log_.waitFor(kLogError, "Unknown command [foo]"));
 }
 
 TEST_F(Lifecycle, ClosedPeerIsReplacedByTheNext) {
@@ -220,7 +220,7 @@ TEST_F(Lifecycle, ClosedPeerIsReplacedByTheNext) {
   const int second = connections_.peer(1);
   EXPECT_TRUE(Connections::closes(connections_.peer(0)));
   say(second, "foo\n");
-  EXPECT_TRUE(log_.waitFor(3, "Unknown command [foo]"));
+  EXPECT_TRUE(log_.waitFor(kLogError, "Unknown command [foo]"));
 }
 
 TEST_F(Lifecycle, OnlyTheFirstLineOfAChunkRunsUntilTheNextChunk) {
@@ -228,7 +228,7 @@ TEST_F(Lifecycle, OnlyTheFirstLineOfAChunkRunsUntilTheNextChunk) {
   EXPECT_EQ(channel_.replies(), Lines{"cmdStatus=0"});
   EXPECT_FALSE(log_.mentions("Unknown command"));
   channel_.receive("bar\n");
-  EXPECT_TRUE(log_.contains(3, "Unknown command [foo\\nbar]"));
+  EXPECT_TRUE(log_.contains(kLogError, "Unknown command [foo\\nbar]"));
 }
 
 TEST_F(Lifecycle, LineOverTwoChunksRunsOnce) {
@@ -241,7 +241,7 @@ TEST_F(Lifecycle, LineOverTwoChunksRunsOnce) {
 TEST_F(Lifecycle, AppendingIsLogged) {
   channel_.receive("ST");
   channel_.receive("OP");
-  EXPECT_EQ(log_.count(7, "Appending to existing partial command"), 1);
+  EXPECT_EQ(log_.count(kLogDebug, "Appending to existing partial command"), 1);
 }
 
 TEST_F(Lifecycle, CarriageReturnBeforeTheLineFeedIsTrimmed) {
@@ -266,7 +266,7 @@ TEST_F(Lifecycle, ChannelThatAsksForAuthenticationRefuses) {
 TEST_F(Lifecycle, EndlessCommandIsDroppedWithOneErrorLine) {
   const std::string chunk(1024, 'x');
   for (int i = 0; i <= 1024; ++i) channel_.receive(chunk);
-  EXPECT_EQ(log_.count(3, "Command of more than 1048576 bytes without an end dropped"), 1);
+  EXPECT_EQ(log_.count(kLogError, "Command of more than 1048576 bytes without an end dropped"), 1);
   channel_.receive("STOP\n");
   EXPECT_EQ(channel_.replies(), Lines{"cmdStatus=0"});
 }
@@ -282,14 +282,14 @@ TEST_F(Lifecycle, DisconnectIsLoggedAndClosesOnce) {
   other.join();
   EXPECT_TRUE(Connections::closes(peer.get()));
   EXPECT_FALSE(channel_.connected());
-  EXPECT_EQ(log_.count(6, "Disconnecting from tunnel..."), 2) << "both say so, one of them closes";
+  EXPECT_EQ(log_.count(kLogInfo, "Disconnecting from tunnel..."), 2) << "both say so, one of them closes";
 }
 
 TEST_F(Lifecycle, DisconnectWithNothingOpenIsLoggedAllTheSame) {
   channel_.disconnect();
-  EXPECT_EQ(log_.count(6, "Disconnecting from tunnel..."), 1);
+  EXPECT_EQ(log_.count(kLogInfo, "Disconnecting from tunnel..."), 1);
   channel_.disconnectOld();
-  EXPECT_EQ(log_.count(6, "Disconnecting from tunnel..."), 2);
+  EXPECT_EQ(log_.count(kLogInfo, "Disconnecting from tunnel..."), 2);
 }
 
 TEST_F(Lifecycle, StopReturnsWhenTheThreadHasEndedAndTheSocketsAreClosed) {
@@ -300,7 +300,7 @@ TEST_F(Lifecycle, StopReturnsWhenTheThreadHasEndedAndTheSocketsAreClosed) {
   EXPECT_LT(std::chrono::steady_clock::now() - before, 1s);
   EXPECT_TRUE(channel_.threadHasEnded());
   EXPECT_TRUE(Connections::closes(peer));
-  EXPECT_EQ(log_.count(5, "Control module is stopping..."), 1);
+  EXPECT_EQ(log_.count(kLogNotice, "Control module is stopping..."), 1);
 }
 
 TEST_F(Lifecycle, StopRightAfterTheStartIsNotLost) {
@@ -362,9 +362,9 @@ TEST_F(Lifecycle, HandlerThatThrowsCostsNeitherThreadNorConnection) {
   channel_.on_reply = [](ScriptedChannel&) { throw std::runtime_error("out of luck"); };
   start();
   say(connections_.peer(0), "STOP\n");
-  ASSERT_TRUE(log_.waitFor(2, "Internal error occurred: out of luck"));
+  ASSERT_TRUE(log_.waitFor(kLogCritical, "Internal error occurred: out of luck"));
   say(connections_.peer(0), "foo\n");
-  EXPECT_TRUE(log_.waitFor(3, "Unknown command [foo]"));
+  EXPECT_TRUE(log_.waitFor(kLogError, "Unknown command [foo]"));
 }
 
 }  // namespace

@@ -31,7 +31,7 @@ class Dispatch : public ::testing::Test {
 TEST_F(Dispatch, StatusAloneIsHandledWithoutParameters) {
   execute("STATUS");
   EXPECT_TRUE(replies_.last().starts_with("cmdStatus=0,recordStatus=0,start=0,")) << replies_.last();
-  EXPECT_TRUE(log_.contains(7, "Command is [STATUS]"));
+  EXPECT_TRUE(log_.contains(kLogDebug, "Command is [STATUS]"));
 }
 
 TEST_F(Dispatch, EveryVerbReachesAHandler) {
@@ -46,19 +46,19 @@ TEST_F(Dispatch, EveryVerbReachesAHandler) {
 TEST_F(Dispatch, UnknownVerbIsLoggedAndNotAnswered) {
   execute("foo");
   EXPECT_TRUE(replies_.all().empty());
-  EXPECT_TRUE(log_.contains(3, "Unknown command [foo]"));
+  EXPECT_TRUE(log_.contains(kLogError, "Unknown command [foo]"));
 }
 
 TEST_F(Dispatch, ErrFromTheTunnelIsLoggedWhole) {
   execute("ERR something went wrong");
   EXPECT_TRUE(replies_.all().empty());
-  EXPECT_TRUE(log_.contains(3, "Received error from tunnel [ERR something went wrong]"));
+  EXPECT_TRUE(log_.contains(kLogError, "Received error from tunnel [ERR something went wrong]"));
 }
 
 TEST_F(Dispatch, VerbsThatOnlyLookLikeHandlersAreUnknown) {
   for (const std::string verb : {"status", "XCMD", "handleSTATUS", "STATUS:", "ERROR", ""}) {
     execute(verb);
-    EXPECT_TRUE(log_.contains(3, "Unknown command [" + verb + "]")) << verb;
+    EXPECT_TRUE(log_.contains(kLogError, "Unknown command [" + verb + "]")) << verb;
   }
   EXPECT_TRUE(replies_.all().empty());
 }
@@ -73,7 +73,7 @@ TEST_F(Dispatch, GateRefusesButCountsAsContact) {
   authenticated_ = false;
   execute("STATUS");
   EXPECT_EQ(replies_.all(), Replies{"cmdStatus=36"});
-  EXPECT_TRUE(log_.contains(3, "Command rejected because authentication is required [STATUS]"));
+  EXPECT_TRUE(log_.contains(kLogError, "Command rejected because authentication is required [STATUS]"));
   EXPECT_TRUE(contacted());
 }
 
@@ -105,7 +105,7 @@ TEST_F(Dispatch, PasswordStaysOutOfTheLog) {
   authenticated_ = false;
   execute("STOP RecordingMetadata_AGENT_PASSWORD=sesame");
   EXPECT_FALSE(log_.mentions("sesame"));
-  EXPECT_TRUE(log_.contains(7, "Command is [START RecordingMetadata_AGENT_PASSWORD=****,a=1]"));
+  EXPECT_TRUE(log_.contains(kLogDebug, "Command is [START RecordingMetadata_AGENT_PASSWORD=****,a=1]"));
 }
 
 }  // namespace

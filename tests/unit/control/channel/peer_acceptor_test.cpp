@@ -42,7 +42,7 @@ TEST_F(Accepting, KeepAliveIsSetOnTheListeningSocketNotOnThePeers) {
   ASSERT_EQ(::connect(peer.get(), reinterpret_cast<const sockaddr*>(&address), size), 0);
   EXPECT_EQ(acceptor_.acceptPeer(listening_.get()), 0);
   EXPECT_GE(sockets_.current(), 0);
-  EXPECT_TRUE(log_.contains(6, lineFor(sockets_.current())));
+  EXPECT_TRUE(log_.contains(kLogInfo, lineFor(sockets_.current())));
   EXPECT_EQ(keepAliveOf(listening_.get()), 1);
   EXPECT_EQ(keepAliveOf(sockets_.current()), 0);
 }
@@ -52,7 +52,7 @@ TEST_F(Accepting, AFailureIsLoggedWithMinusOneAndTriedAgainAtOnce) {
   EXPECT_EQ(acceptor_.acceptPeer(listening_.get()), -1);  // nobody has called listen
   EXPECT_LT(std::chrono::steady_clock::now() - before, std::chrono::seconds(1));
   EXPECT_EQ(sockets_.current(), -1);
-  EXPECT_TRUE(log_.contains(6, lineFor(-1)));
+  EXPECT_TRUE(log_.contains(kLogInfo, lineFor(-1)));
 }
 
 }  // namespace

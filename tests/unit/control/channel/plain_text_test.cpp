@@ -12,7 +12,7 @@ TEST(PlainText, LineThatIsNotUtf8IsIgnoredWithAnErrorLine) {
   testing::LogCapture log;
   EXPECT_EQ(plainCommand("STATUS\n", nullptr), "STATUS\n");
   EXPECT_EQ(plainCommand("START title=H\xF6rsaal\n", nullptr), std::nullopt);
-  EXPECT_TRUE(log.contains(3, "Command ignored because it is not UTF-8 text"));
+  EXPECT_TRUE(log.contains(kLogError, "Command ignored because it is not UTF-8 text"));
 }
 
 }  // namespace

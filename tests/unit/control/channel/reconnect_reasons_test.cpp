@@ -34,11 +34,11 @@ TEST_F(Reconnect, WithoutAReasonItStays) { EXPECT_FALSE(reasons_.mustReconnect()
 
 TEST_F(Reconnect, ANetworkChangeIsActedUponOnceInALaterSecond) {
   reasons_.networkChanged();
-  EXPECT_TRUE(log_.contains(6, "A network transition was received."));
+  EXPECT_TRUE(log_.contains(kLogInfo, "A network transition was received."));
   EXPECT_FALSE(reasons_.mustReconnect());
   clock_.frozen_at = 5001;
   EXPECT_TRUE(reasons_.mustReconnect());
-  EXPECT_TRUE(log_.contains(7, "The connection is made anew after a network change"));
+  EXPECT_TRUE(log_.contains(kLogDebug, "The connection is made anew after a network change"));
   EXPECT_FALSE(reasons_.mustReconnect());
 }
 
@@ -47,7 +47,7 @@ TEST_F(Reconnect, ContactLostForTenMinutesIsActedUponOnce) {
   EXPECT_FALSE(reasons_.mustReconnect());
   clock_.frozen_at = 5001;
   EXPECT_TRUE(reasons_.mustReconnect());
-  EXPECT_TRUE(log_.contains(5, "Too long since last contact from server.  Reconnecting..."));
+  EXPECT_TRUE(log_.contains(kLogNotice, "Too long since last contact from server.  Reconnecting..."));
   EXPECT_FALSE(reasons_.mustReconnect());
 }
 

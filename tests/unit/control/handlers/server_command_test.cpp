@@ -28,14 +28,14 @@ TEST_F(ServerCommandTest, SetsTheVersionWithoutReplyEvenWhenTheUuidDiffers) {
   announce({{"version", "2"}, {"server_uuid", "X"}});
   EXPECT_TRUE(replies_.all().empty());
   EXPECT_EQ(server_.server_protocol_version(), 2);
-  EXPECT_TRUE(log_.contains(6, "Server UUID does not match"));
+  EXPECT_TRUE(log_.contains(kLogInfo, "Server UUID does not match"));
 }
 
 TEST_F(ServerCommandTest, ServerOfOurOwnIsNamedInTheLog) {
   announce({{"version", "3"}, {"server_uuid", "S1"}});
   EXPECT_TRUE(replies_.all().empty());
   EXPECT_EQ(server_.server_protocol_version(), 3);
-  EXPECT_TRUE(log_.contains(6, "Server is: S1"));
+  EXPECT_TRUE(log_.contains(kLogInfo, "Server is: S1"));
 }
 
 TEST_F(ServerCommandTest, WithoutAParameterItIsRefused) {

@@ -134,7 +134,7 @@ TEST_F(StatusCommandTest, PreviewFileThatHoldsNothingGivesNoPreview) {
     context_->recording.preview_file.set(path);
     EXPECT_THAT(reply("STATUS include_preview=true"), ::testing::MatchesRegex(plain_)) << path;
   }
-  EXPECT_EQ(log_.count(7, "preview buffer is NULL"), 3);
+  EXPECT_EQ(log_.count(kLogDebug, "preview buffer is NULL"), 3);
 }
 
 TEST_F(StatusCommandTest, PreviewFileTooLargeForAStillGivesNoPreview) {
@@ -160,13 +160,13 @@ TEST_F(StatusCommandTest, AudioOnlySessionHasNoPreviewAndNoLineAboutIt) {
 TEST_F(StatusCommandTest, VideoSessionWithoutPreviewSaysSoInTheLog) {
   session_->recordingType.set(kRecordingTypeVideo);
   EXPECT_THAT(reply("STATUS include_preview=true"), ::testing::MatchesRegex(plain_));
-  EXPECT_TRUE(log_.contains(7, "preview buffer is NULL"));
+  EXPECT_TRUE(log_.contains(kLogDebug, "preview buffer is NULL"));
 }
 
 TEST_F(StatusCommandTest, AfterTheChannelHasStoppedItselfNothingIsAnswered) {
   held_.release();
   EXPECT_EQ(reply("STATUS"), "(none)");
-  EXPECT_TRUE(log_.contains(3, "No agent context"));
+  EXPECT_TRUE(log_.contains(kLogError, "No agent context"));
 }
 
 }  // namespace

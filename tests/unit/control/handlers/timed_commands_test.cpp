@@ -100,10 +100,10 @@ TEST_F(TimedCommandsTest, StartIsScheduledWithItsParametersAndAnIdentity) {
   EXPECT_EQ(stored()[0].dictionary()->at("time"), PlistValue(in(600)));
   ASSERT_EQ(actions_.scheduled.size(), 1U);
   EXPECT_EQ(actions_.scheduled[0].date, now_ + 600);
-  EXPECT_TRUE(log_.contains(6, "Scheduling START command to run at: " + in(600)));
+  EXPECT_TRUE(log_.contains(kLogInfo, "Scheduling START command to run at: " + in(600)));
 
   EXPECT_EQ(fire(0), "cmdStatus=0");
-  EXPECT_TRUE(log_.contains(6, "Running deferred command: START"));
+  EXPECT_TRUE(log_.contains(kLogInfo, "Running deferred command: START"));
   EXPECT_THAT(listed(), IsEmpty());
   EXPECT_THAT(stored(), IsEmpty());
   EXPECT_EQ(context_->state.properties.get()->at("TimerID"), id) << "the handler gets the whole entry";
@@ -119,13 +119,13 @@ TEST_F(TimedCommandsTest, InThePastIs31AndNotStored) {
   EXPECT_EQ(run("TIMEDCMD command=STOP,time=" + in(-1)), "cmdStatus=31");
   EXPECT_THAT(listed(), IsEmpty());
   EXPECT_FALSE(std::filesystem::exists(file()));
-  EXPECT_TRUE(log_.contains(6, "Not scheduling STOP command. The timer has expired: " + in(-1)));
+  EXPECT_TRUE(log_.contains(kLogInfo, "Not scheduling STOP command. The timer has expired: " + in(-1)));
 }
 
 TEST_F(TimedCommandsTest, AnUnknownCommandIs31) {
   for (const char* command : {"FOO", "start", "", "X-PREVIEW", "TIMEDCMD"}) {
     EXPECT_EQ(run("TIMEDCMD command=" + std::string(command) + ",time=" + in(60)), "cmdStatus=31") << command;
-    EXPECT_TRUE(log_.contains(6, "Not scheduling unknown command: " + std::string(command)));
+    EXPECT_TRUE(log_.contains(kLogInfo, "Not scheduling unknown command: " + std::string(command)));
   }
   EXPECT_EQ(run("TIMEDCMD"), "cmdStatus=31");
   EXPECT_THAT(listed(), IsEmpty());
@@ -176,7 +176,7 @@ TEST_F(TimedCommandsTest, ARevokedOneDoesNotRun) {
   EXPECT_EQ(run("TIMEDCMD command=TIMERREVOKE,TimerID=A"), "cmdStatus=0");
   EXPECT_THAT(stored(), IsEmpty());
   EXPECT_EQ(fire(0), "cmdStatus=38");
-  EXPECT_TRUE(log_.contains(6, "Not running deferred command"));
+  EXPECT_TRUE(log_.contains(kLogInfo, "Not running deferred command"));
   EXPECT_EQ(journal_.entries(), Lines{"scheduleTimedCommand STOP"});
 }
 
@@ -211,7 +211,7 @@ TEST_F(TimedCommandsTest, AFileThatCannotBeWrittenIsAWarning) {
   std::filesystem::rename(state, state + ".away");
   EXPECT_EQ(run("TIMEDCMD command=STOP,time=" + in(60)), "cmdStatus=0");
   std::filesystem::rename(state + ".away", state);
-  EXPECT_TRUE(log_.contains(4, "Unable to write timer file."));
+  EXPECT_TRUE(log_.contains(kLogWarning, "Unable to write timer file."));
   EXPECT_EQ(listed().size(), 1U);
 }
 

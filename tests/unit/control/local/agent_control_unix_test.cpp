@@ -134,7 +134,7 @@ TEST_F(LocalSocket, SetUpAndPeerAreLogged) {
   Peer peer;
   peer.send("STOP\n");
   peer.receiveUpTo("cmdStatus=0");
-  EXPECT_TRUE(log_.contains(6, "Connecting local pipe"));
+  EXPECT_TRUE(log_.contains(kLogInfo, "Connecting local pipe"));
   EXPECT_TRUE(log_.mentions("accepted connection fd = "));
 }
 
@@ -213,34 +213,34 @@ TEST_F(LocalSocket, ReplyToAPeerThatIsGoneIsADebugLine) {
   executing.wait();
   peer.close();
   peer_gone.count_down();
-  EXPECT_TRUE(log_.waitFor(7, "Could not answer to tunnel (errno = 32)"));
+  EXPECT_TRUE(log_.waitFor(kLogDebug, "Could not answer to tunnel (errno = 32)"));
 }
 
 TEST_F(LocalSocket, LineAByteAtATimeIsExecutedOnce) {
   Peer peer;
   for (const char byte : std::string("STOP\n")) peer.send(std::string_view(&byte, 1));
   EXPECT_EQ(peer.receiveUpTo("cmdStatus=0"), "cmdStatus=0");
-  EXPECT_EQ(log_.count(7, "Command is [STOP]"), 1);
+  EXPECT_EQ(log_.count(kLogDebug, "Command is [STOP]"), 1);
 }
 
 TEST_F(LocalSocket, APeerThatLostItsPlaceToANetworkChangeIsHeardAgain) {
   Peer peer;
   peer.send("x\n");
-  ASSERT_TRUE(log_.waitFor(3, "Unknown command [x]"));
+  ASSERT_TRUE(log_.waitFor(kLogError, "Unknown command [x]"));
   changeNetwork();
-  ASSERT_TRUE(log_.waitFor(7, "The connection is made anew after a network change"));
+  ASSERT_TRUE(log_.waitFor(kLogDebug, "The connection is made anew after a network change"));
   peer.send("STOP\n");
   EXPECT_EQ(peer.receiveUpTo("cmdStatus=0"), "cmdStatus=0");
-  EXPECT_TRUE(log_.contains(7, "The previous peer speaks again"));
+  EXPECT_TRUE(log_.contains(kLogDebug, "The previous peer speaks again"));
   EXPECT_EQ(journal_.entries(), std::vector<std::string>{"stopRecording"});
 }
 
 TEST_F(LocalSocket, APeerThatLostItsPlaceMakesRoomForTheNext) {
   Peer first;
   first.send("x\n");
-  ASSERT_TRUE(log_.waitFor(3, "Unknown command [x]"));
+  ASSERT_TRUE(log_.waitFor(kLogError, "Unknown command [x]"));
   changeNetwork();
-  ASSERT_TRUE(log_.waitFor(7, "The connection is made anew after a network change"));
+  ASSERT_TRUE(log_.waitFor(kLogDebug, "The connection is made anew after a network change"));
   Peer second;
   second.send("STOP\n");
   EXPECT_EQ(second.receiveUpTo("cmdStatus=0"), "cmdStatus=0");
@@ -251,7 +251,7 @@ TEST_F(LocalSocket, APeerThatIsGoneWithItsPlaceCostsNothing) {
   changeNetwork();  // the first peer loses its place as soon as it has it
   {
     const Peer first;
-    ASSERT_TRUE(log_.waitFor(7, "The connection is made anew after a network change"));
+    ASSERT_TRUE(log_.waitFor(kLogDebug, "The connection is made anew after a network change"));
   }
   Peer second;
   second.send("STOP\n");
@@ -262,7 +262,7 @@ TEST_F(LocalSocket, TenMegabytesWithoutALineFeedLeaveTheChannelUsable) {
   Peer peer;
   const std::string block(1U << 20, 'x');
   for (int i = 0; i < 10; ++i) peer.send(block);
-  ASSERT_TRUE(log_.waitFor(3, "Command of more than 1048576 bytes without an end dropped", 9));
+  ASSERT_TRUE(log_.waitFor(kLogError, "Command of more than 1048576 bytes without an end dropped", 9));
   peer.send("\n");  // ends what was left of it
   ASSERT_TRUE(log_.waitForPart("Unknown command [xxx"));
   peer.send("STOP\n");
@@ -286,7 +286,7 @@ TEST_F(LocalSocket, ReplyLongerThanTheSocketBufferArrivesWhole) {
 }
 
 TEST_F(LocalSocket, StopReturnsAtOnceWhileWaitingForAPeer) {
-  ASSERT_TRUE(log_.waitFor(6, "Connecting local pipe"));
+  ASSERT_TRUE(log_.waitFor(kLogInfo, "Connecting local pipe"));
   const auto before = std::chrono::steady_clock::now();
   channel_->stop();
   EXPECT_LT(std::chrono::steady_clock::now() - before, 1s);

@@ -129,13 +129,13 @@ TEST_F(Tunnel, ARefusalCountsOnlyWhenItCameInPieces) {
   ASSERT_TRUE(tunnel_.initWithAgentContext());
   const UniqueFd peer = acceptWithHello();
   send(peer, "ERR Unbound agent\n");
-  ASSERT_TRUE(log_.waitFor(2, "Internal error occurred during decryption"));
+  ASSERT_TRUE(log_.waitFor(kLogCritical, "Internal error occurred during decryption"));
   // The answer proves that the whole line has been dealt with, and that what came behind its own line waits.
   send(peer, encrypted("STOP") + "ERR Unb");
   EXPECT_FALSE(PlayedServer::readLine(peer).empty());
   EXPECT_EQ(context_->state.serverRejectTime.get(), 0);
   send(peer, "ound agent\n");
-  ASSERT_TRUE(log_.waitFor(4, "Server rejected agent connection, sleeping for one minute."));
+  ASSERT_TRUE(log_.waitFor(kLogWarning, "Server rejected agent connection, sleeping for one minute."));
   // The time is set behind the line.
   ASSERT_TRUE(testing::waitUntil([&] { return tunnel_.threadHasEnded(); }));
   EXPECT_NEAR(static_cast<double>(context_->state.serverRejectTime.get()),
@@ -149,7 +149,7 @@ TEST_F(Tunnel, InItsBackOffItHearsThePreviousConnection) {
   context_->server.tunnel_port.set("9");  // nobody there
   actions_.network_changed();
   clock_.ahead_seconds = 2;
-  ASSERT_TRUE(log_.waitFor(6, "Failed to connect to server, retrying in 5 seconds."));
+  ASSERT_TRUE(log_.waitFor(kLogInfo, "Failed to connect to server, retrying in 5 seconds."));
   send(old, encrypted("STOP"));
   EXPECT_FALSE(PlayedServer::readLine(old).empty());
   EXPECT_EQ(journal_.entries(), std::vector<std::string>{"stopRecording"});
@@ -157,7 +157,7 @@ TEST_F(Tunnel, InItsBackOffItHearsThePreviousConnection) {
 
 TEST_F(Tunnel, AReplyBeforeTheHelloIsNotSent) {
   tunnel_.completeTimedCommand(std::make_shared<const Dictionary>(Dictionary{{"command", "STOP"}}));
-  EXPECT_TRUE(log_.contains(7, "No reply before the hello: cmdStatus=38"));
+  EXPECT_TRUE(log_.contains(kLogDebug, "No reply before the hello: cmdStatus=38"));
 }
 
 TEST_F(Tunnel, CommandsAreDecryptedAndAnswered) {
@@ -182,7 +182,7 @@ TEST_F(Tunnel, TenMinutesWithoutContactMakeANewConnection) {
   context_->record_context()->lastContact.set(lmp_gettimeofday());
   clock_.ahead_seconds = 601;
   const UniqueFd peer = acceptWithHello();
-  EXPECT_TRUE(log_.contains(5, "Too long since last contact from server.  Reconnecting..."));
+  EXPECT_TRUE(log_.contains(kLogNotice, "Too long since last contact from server.  Reconnecting..."));
 }
 
 }  // namespace

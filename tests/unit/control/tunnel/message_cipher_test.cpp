@@ -69,9 +69,9 @@ TEST_F(MessageCipher, WhatIsNoMessageIsRefusedWithALine) {
   for (const std::string& text :
        {std::string("no base64!"), std::string("QUJD"), std::string(), good.substr(4), good.substr(0, 20),
         std::string("AAAAAAAAAAAAAAAAAAAAAA=="), bad_padding, std::string("ERR Unbound agent")}) {
-    const auto before = log_.count(2, kFailed);
+    const auto before = log_.count(kLogCritical, kFailed);
     EXPECT_EQ(decrypt(text), "(none)") << text;
-    EXPECT_EQ(log_.count(2, kFailed), before + 1) << text;
+    EXPECT_EQ(log_.count(kLogCritical, kFailed), before + 1) << text;
   }
 }
 
