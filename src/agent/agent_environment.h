@@ -12,7 +12,7 @@ inline constexpr double kVersion = 100;
 /// The agent's name for the service manager.
 inline constexpr const char* kServiceJob = "com.zandor.lmxagentd";
 
-/// Tests pass scripted ones.
+/// All of them must be set. Tests pass scripted ones.
 struct AgentEnvironment {
   std::shared_ptr<CaptureFramework> framework;
   std::shared_ptr<ServiceManager> serviceManager;

@@ -47,6 +47,7 @@ AgentMain::AgentMain(std::shared_ptr<AgentContext> context, AgentEnvironment env
 }
 
 AgentMain::~AgentMain() {
+  channels_.close();  // their threads use the other parts
   scheduler_.cancel();
   setEngineEnvironment({});
 }

@@ -9,7 +9,8 @@
 
 namespace lmx {
 
-/// Main thread only. Actions with a result store it in the agent's `status`.
+/// Main thread only, except the recording callbacks and setRecorderStatusToIdle. Actions with a result store
+/// it in the agent's `status`.
 class CaptureActions {
  public:
   /// Both outlive the object.

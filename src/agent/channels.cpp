@@ -3,6 +3,11 @@
 
 namespace lmx {
 
+void Channels::close() {
+  tunnel_.drop();
+  agentControlLocal_ = nullptr;
+}
+
 bool Channels::openLocal() {
   agentControlLocal_ = newControlChannel<AgentControlUnix>(context_, &actions_);
   return agentControlLocal_ != nullptr;

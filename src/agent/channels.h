@@ -19,6 +19,8 @@ class Channels {
       : context_(context), actions_(actions), tunnel_(context, actions, loop), detached_(context, &actions) {}
 
   [[nodiscard]] TunnelKeeper& tunnel() { return tunnel_; }
+  /// Ends all channels. Joins their threads: call it only when none of them can be waiting for the loop.
+  void close();
   /// @return false when the local channel can't be started
   bool openLocal();
   /// The channel of that kind, or the one without a peer when there is none.

@@ -40,19 +40,19 @@ TimeValue timeValueFrom(double secondsSinceReference) {
   return {whole, static_cast<suseconds_t>((seconds - static_cast<double>(whole)) * 1e6)};
 }
 
-/// Decrements a counter on destruction, so that every exit path does.
-class CountedDown {
+}  // namespace
+
+/// A recording on its way to the queue: counted for as long as somebody holds it.
+class Submission::HandOff {
  public:
-  explicit CountedDown(std::atomic<int>& counter) : counter_(counter) {}
-  ~CountedDown() { --counter_; }
-  CountedDown(const CountedDown&) = delete;
-  CountedDown& operator=(const CountedDown&) = delete;
+  explicit HandOff(std::atomic<int>& count) : count_(count) { ++count_; }
+  ~HandOff() { --count_; }
+  HandOff(const HandOff&) = delete;
+  HandOff& operator=(const HandOff&) = delete;
 
  private:
-  std::atomic<int>& counter_;
+  std::atomic<int>& count_;
 };
-
-}  // namespace
 
 bool Submission::isIdle() const {
   return hand_offs_ == 0 && context_->post_process_list.postProcessListCount() == 0 && !scheduler_.busy();
@@ -78,17 +78,11 @@ std::shared_ptr<AgentRecord> Submission::takeStopped(const void* controller) {
 }
 
 void Submission::captureDidComplete(const void* controller) {
-  ++hand_offs_;
-  const bool posted = loop_.post(
-      [this, controller] {
-        if (const auto stopped = takeStopped(controller)) {
-          submit(stopped);
-        } else {
-          --hand_offs_;
-        }
+  loop_.post(
+      [this, controller, hand_off = std::make_shared<HandOff>(hand_offs_)] {
+        if (const auto stopped = takeStopped(controller)) submit(stopped, hand_off);
       },
       Wait::no);
-  if (!posted) --hand_offs_;
 }
 
 void Submission::captureDidCancel(const void* controller) {
@@ -106,15 +100,13 @@ void Submission::captureDidCancel(const void* controller) {
 }
 
 void Submission::submitStoppedRecording() {
-  ++hand_offs_;
   if (const auto record = context_->record_context()) {
-    submit(record->copy());
-  } else {
-    --hand_offs_;
+    submit(record->copy(), std::make_shared<HandOff>(hand_offs_));
   }
 }
 
-void Submission::submit(const std::shared_ptr<AgentRecord>& stopped) {
+void Submission::submit(const std::shared_ptr<AgentRecord>& stopped,
+                        const std::shared_ptr<HandOff>& hand_off) {
   context_->logDebug("Submitting Stopped Recording");
   const auto controller = stopped->captureController.get();
   const double elapsed =
@@ -126,10 +118,7 @@ void Submission::submit(const std::shared_ptr<AgentRecord>& stopped) {
                                .value_or(repository + "/" + uuid.value_or("") + ".mov");
   stopped->metadata.set(withUuid(metadataOf(*context_, *stopped), uuid));
   stopped->startTime.set(stopped->beginning());
-  dispatchAsync([this, stopped, path, elapsed] {
-    const CountedDown end_of_hand_off(hand_offs_);
-    handOff(stopped, path, elapsed);
-  });
+  dispatchAsync([this, stopped, path, elapsed, hand_off] { handOff(stopped, path, elapsed); });
 }
 
 /// The session, unless it has moved on to another capture.
@@ -154,7 +143,12 @@ void Submission::handOff(const std::shared_ptr<AgentRecord>& stopped, const std:
     controller->requestHandedOver(stopped->request_uuid.get());
     keepRecovered(controller->recoverAbandonedRequests());
   }
-  if (sessionOf(controller.get())) actions_.setRecorderStatusToIdle();
+  // On the main thread, so that no START comes between the question and the answer.
+  loop_.post(
+      [this, controller] {
+        if (sessionOf(controller.get())) actions_.setRecorderStatusToIdle();
+      },
+      Wait::no);
 }
 
 bool Submission::finishMovie(const std::shared_ptr<AgentRecord>& stopped, LMRCaptureController& controller,

@@ -22,6 +22,7 @@ class Submission {
  public:
   using Time = std::optional<TimeValue>;
 
+  /// The object outlives its work items.
   /// @param actions, loop, scheduler  outlive the object and the work items it has started
   Submission(std::shared_ptr<AgentContext> context, AgentActions& actions, RunLoop& loop,
              const PostProcessScheduler& scheduler)
@@ -39,7 +40,7 @@ class Submission {
   void submitStoppedRecording();
 
   /// Logs the stop, writes the properties document and queues the job. Any thread.
-  /// @return false when the recording should have a document but has none
+  /// @return false when the recording should have a document but has none; true also when the agent is ending
   bool announceStop(const std::shared_ptr<AgentRecord>& session, const std::string& file,
                     const SharedDictionary& metadata, Time atTime, std::int64_t elapsedSeconds,
                     Time stoppedTime, bool canceled);
@@ -55,7 +56,8 @@ class Submission {
 
  private:
   std::shared_ptr<AgentRecord> takeStopped(const void* controller);
-  void submit(const std::shared_ptr<AgentRecord>& stopped);
+  class HandOff;
+  void submit(const std::shared_ptr<AgentRecord>& stopped, const std::shared_ptr<HandOff>& hand_off);
   void handOff(const std::shared_ptr<AgentRecord>& stopped, const std::string& path, double elapsed);
   /// @return whether the recording is settled: movie and document exist, or there was nothing to write
   bool finishMovie(const std::shared_ptr<AgentRecord>& stopped, LMRCaptureController& controller,

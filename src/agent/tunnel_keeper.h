@@ -18,11 +18,13 @@ class TunnelKeeper {
 
   /// The tunnel; null while it is closed.
   [[nodiscard]] AgentControl* tunnel() const { return agentControl_.get(); }
-  /// @return false when it can't be started (logged)
+  /// Call it while the tunnel is closed. @return false when it can't be started (logged)
   bool openTunnel();
   /// Ends the tunnel. Keeps running the loop, since the tunnel's thread may be waiting for this one. A thread
   /// that has not ended after ten seconds is abandoned.
   void closeTunnel();
+  /// Ends the tunnel without running the loop: call it only when its thread can't be waiting for the loop.
+  void drop() { agentControl_ = nullptr; }
   /// Sends a last hello that says offline, to a server that supports it. Takes at most ten seconds.
   void tellServerOfTheEnd();
 

@@ -68,11 +68,11 @@ bool AdHocClient::handleSignals() {
 }
 
 void AdHocClient::appLoopAdHoc() {
-  while (context_.state.running.get()) {
-    if (agent_.devices().deviceDisconnected()) agent_.devices().announceLostDevice();
+  do {
+    if (agent_.devices().deviceDisconnected()) return agent_.devices().announceLostDevice();
     readTimeShift(context_.state);
     if (agent_.mainRunLoop().run(250ms) == RunLoop::Turn::stopped) return;
-  }
+  } while (context_.state.running.get());
 }
 
 }  // namespace lmx

@@ -2,6 +2,7 @@
 #include "cli/adhoc_command.h"
 
 #include "model/codes.h"
+#include "model/metadata_keys.h"
 
 namespace lmx {
 namespace {
@@ -11,20 +12,20 @@ constexpr const char* kRecordingUUID = "90201534-37B5-482F-AD57-C3762F5020E1";
 constexpr const char* kWorkflowUUID = "DEFA1587-A650-426E-92DA-01C5EB811705";
 
 std::string startParameters(const RunOptions& options) {
-  std::string text = std::string("RecordingMetadata_RECORDING_UUID=") + kRecordingUUID;
+  std::string text = std::string(metadata_key::kRecordingUUID) + "=" + kRecordingUUID;
   const auto add = [&text](const char* key, const std::string& value) {
     text.append(",").append(key).append("=").append(value);
   };
   const auto addIfSet = [&add](const char* key, const RunOptions::Text& value) {
     if (value) add(key, *value);
   };
-  add("RecordingMetadata_MAX_RECORDING_MINUTES", std::to_string(options.duration.get()));
-  add("RecordingMetadata_UNATTENDED_RECORDING_MINUTES", std::to_string(options.unattended.get()));
-  add("RecordingMetadata_ADHOC_WORKFLOW_UUID", kWorkflowUUID);
-  if (options.submit_disabled.get()) add("RecordingMetadata_ADHOC_SUBMIT_DISABLED", "1");
-  addIfSet("RecordingMetadata_AGENT_USERNAME", options.user.get());
-  addIfSet("RecordingMetadata_AGENT_PASSWORD", options.password.get());
-  addIfSet("RecordingMetadata_ADHOC_FILE_PATH", options.adhoc_output_file.get());
+  add(metadata_key::kMaxRecordingMinutes, std::to_string(options.duration.get()));
+  add(metadata_key::kUnattendedMinutes, std::to_string(options.unattended.get()));
+  add(metadata_key::kAdHocWorkflowUUID, kWorkflowUUID);
+  if (options.submit_disabled.get()) add(metadata_key::kAdHocSubmitDisabled, "1");
+  addIfSet(metadata_key::kAgentUsername, options.user.get());
+  addIfSet(metadata_key::kAgentPassword, options.password.get());
+  addIfSet(metadata_key::kAdHocFilePath, options.adhoc_output_file.get());
   return text;
 }
 

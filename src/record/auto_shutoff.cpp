@@ -13,7 +13,8 @@ namespace {
 /// Clears `deadline` if it still equals `known`. The session may have moved on to the next recording.
 void forget(SharedValue<StopTimes::Time>& deadline, const StopTimes::Time& known) {
   const auto now = deadline.get();
-  const bool same = now.has_value() == known.has_value() && (!now || lmp_diff_timeval(*now, *known) == 0);
+  const bool same = now.has_value() == known.has_value() &&
+                    (!now || (now->tv_sec == known->tv_sec && now->tv_usec == known->tv_usec));
   if (same) deadline.set(std::nullopt);
 }
 

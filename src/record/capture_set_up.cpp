@@ -14,14 +14,14 @@
 namespace lmx {
 namespace {
 
-std::shared_ptr<LMRRecordingContext> captureSettings(AgentContext& context, const AgentRecord& session) {
-  const auto framework = engineEnvironment().framework;
+std::shared_ptr<LMRRecordingContext> captureSettings(const AgentContext& context, const AgentRecord& session,
+                                                     CaptureFramework& framework) {
   try {
-    if (context.options.adhoc.get()) return newRecordingContextForAdHoc(*framework);
+    if (context.options.adhoc.get()) return newRecordingContextForAdHoc(framework);
     CaptureType type = CaptureType::audioAndVideo;
     if (session.recordedType() == kRecordingTypeAudio) type = CaptureType::audio;
     if (session.recordedType() == kRecordingTypeVideo) type = CaptureType::video;
-    return newRecordingContextForDaemonWithRecordingType(*framework, type);
+    return newRecordingContextForDaemonWithRecordingType(framework, type);
   } catch (const PreferenceError& error) {
     LMPLogMessage(nullptr, kLogCritical, "Unable to load the recording context, exception = %s",
                   error.what());
@@ -41,7 +41,7 @@ int LXAgentRecordPrepareCaptureController(AgentContext& context) {
   const auto session = context.record_context();
   const auto framework = engineEnvironment().framework;
   if (!session || !framework) return kRecordNotRunning;
-  const auto settings = captureSettings(context, *session);
+  const auto settings = captureSettings(context, *session, *framework);
   if (!settings) return kRecordNotRunning;
   settings->outputPath = session->filename.get().value_or("");
   settings->maximumFrameRate = frameRateSetting(context);

@@ -10,7 +10,8 @@ namespace lmx {
 
 /// Prepares and starts a recording with `metadata`. Main thread. @return a RecordError
 int LXAgentRecordPrepareCapture(AgentContext& context, SharedDictionary metadata);
-/// The same for the movie `path`. The caller holds the control-action mutex.
+/// The same for the movie `path`; fails without a session or a path. With a session the caller holds the
+/// control-action mutex.
 int LXAgentRecordPrepareCaptureSync(AgentContext& context, const std::optional<std::string>& path,
                                     SharedDictionary metadata);
 

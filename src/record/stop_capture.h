@@ -9,8 +9,8 @@
 
 namespace lmx {
 
-/// Stops the session's recording. Called by the capture thread and by AgentRecord::cleanup. @return a
-/// RecordError
+/// Stops the session's recording. Any thread; on the main thread only for a "File" recording, since for any
+/// other it waits up to ten seconds for the main thread. @return a RecordError
 int LXAgentRecordStopCapture(const std::shared_ptr<AgentRecord>& session);
 
 /// The stop time of a finished recording: now minus the time shift.
