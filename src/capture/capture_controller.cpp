@@ -23,8 +23,12 @@ bool CaptureController::prepareRecording(const LMRRecordingContext& settings,
     recorder_ = *opened;
     repository_ = plan->repository;
   }
-  (*opened)->run(
-      [self = shared_from_this()](const CaptureRecorder::Outcome& outcome) { self->reportEnd(outcome); });
+  if (const auto error = (*opened)->run([self = shared_from_this()] { return self->reportOfTheEnd(); })) {
+    const std::lock_guard lock(mutex_);
+    recorder_ = nullptr;
+    refusal_ = *error;
+    return false;
+  }
   return true;
 }
 
@@ -34,15 +38,18 @@ bool CaptureController::refuse(const CaptureError& reason) {
   return false;
 }
 
-void CaptureController::reportEnd(const CaptureRecorder::Outcome& outcome) {
+CaptureRecorder::Report CaptureController::reportOfTheEnd() {
   std::shared_ptr<CaptureControllerDelegate> delegate;
   {
     const std::lock_guard lock(mutex_);
     delegate = delegate_.lock();
   }
-  if (!delegate) return;
-  outcome.cancelled ? delegate->lmrCaptureDidCancel(outcome.error)
-                    : delegate->lmrCaptureDidComplete(outcome.error);
+  // The report keeps the controller alive as well: the delegate identifies the capture by it.
+  return [self = shared_from_this(), delegate](const CaptureRecorder::Outcome& outcome) {
+    if (!delegate) return;
+    outcome.cancelled ? delegate->lmrCaptureDidCancel(outcome.error)
+                      : delegate->lmrCaptureDidComplete(outcome.error);
+  };
 }
 
 std::shared_ptr<CaptureRecorder> CaptureController::recorder() const {

@@ -49,7 +49,8 @@ class CaptureController : public LMRCaptureController,
 
  private:
   bool refuse(const CaptureError& reason);
-  void reportEnd(const CaptureRecorder::Outcome& outcome);
+  /// How the end of the capture is reported; holds the delegate.
+  [[nodiscard]] CaptureRecorder::Report reportOfTheEnd();
   [[nodiscard]] std::shared_ptr<CaptureRecorder> recorder() const;
   [[nodiscard]] std::optional<CaptureError> refusal() const;
 

@@ -7,6 +7,7 @@
 #include <chrono>
 #include <cmath>
 #include <exception>
+#include <system_error>
 #include <thread>
 
 #include "platform/log.h"
@@ -32,21 +33,31 @@ CaptureRecorder::CaptureRecorder(const RecordingPlan& plan, PipelineLease pipeli
       journal_(std::move(files.journal)),
       marks_(journal_),
       queue_(plan.encoding.video.has_value(), pipeline->realTime()),
+      pipeline_(std::move(pipeline)),
       movie_(std::make_unique<MovieOutput>(plan.encoding, std::move(files.movie), *journal_,
                                            [this](const CaptureError& error) { fail(error); })),
-      cutter_(plan.encoding, {marks_, *journal_, *movie_, [this] { return this->pipeline()->size(); }}),
-      pipeline_(std::move(pipeline)) {
+      cutter_(plan.encoding, {marks_, *journal_, *movie_, [this] { return this->pipeline()->size(); }}) {
   journal_->capture(plan_.type, frame_seconds_, pipeline_->wallOffset());
 }
 
-void CaptureRecorder::run(std::function<void(const Outcome&)> onEnd) {
-  pipeline()->consumers().add(shared_from_this());
-  // Detached: this thread may hold the last reference to the recorder, and a thread cannot join itself.
-  std::thread([self = shared_from_this(), onEnd = std::move(onEnd)] {
-    onEnd(self->record());
-    // The encoder has freed tens of megabytes that the heap would otherwise keep.
-    malloc_trim(0);
-  }).detach();
+std::optional<CaptureError> CaptureRecorder::run(Reporter reporter) {
+  const PipelineLease pipeline = this->pipeline();
+  pipeline->consumers().add(shared_from_this());
+  try {
+    // Detached: this thread may hold the last reference to the recorder, and a thread cannot join itself.
+    std::thread([self = shared_from_this(), reporter = std::move(reporter)] {
+      self->record(reporter);
+      // The encoder has freed tens of megabytes that the heap would otherwise keep.
+      malloc_trim(0);
+    }).detach();
+  } catch (const std::system_error& problem) {
+    pipeline->consumers().remove(this);
+    const std::lock_guard lock(mutex_);
+    pipeline_ = nullptr;
+    return CaptureError{CaptureError::kDomain, kEncoderFailed,
+                        std::string("the recording thread could not be started: ") + problem.what()};
+  }
+  return std::nullopt;
 }
 
 // ---- commands
@@ -134,21 +145,30 @@ void CaptureRecorder::fail(const CaptureError& error) {
 
 // ---- the recording thread
 
-CaptureRecorder::Outcome CaptureRecorder::record() {
-  try {
-    recordUntilTheEnd();
-  } catch (const std::exception& problem) {  // no memory, no thread: what there is becomes the movie
-    fail({CaptureError::kDomain, kEncoderFailed, problem.what()});
-  }
+void CaptureRecorder::record(const Reporter& reporter) {
+  guarded([this] { recordUntilTheEnd(); });
   PipelineLease pipeline = this->pipeline();
   pipeline->consumers().remove(this);
   queue_.close();
-  publish(*pipeline, closeMovie());
+  std::uint32_t frames = 0;
+  guarded([this, &frames] { frames = closeMovie(); });
+  // Whoever is to be told is held from before anybody can see that the capture has ended.
+  const Report report = reporter();
+  const std::optional<CaptureError> problem = error();
+  publish(*pipeline, frames);
   movie_.reset();
   pipeline = nullptr;  // closes the devices unless somebody else has them
-  const std::shared_ptr<FinishedCapture> finished = this->finished();
-  finished->removeIfResolved();
-  return {marks_.cancelled(), error()};
+  finished()->removeIfResolved();
+  report({marks_.cancelled(), problem});
+}
+
+/// Runs a step of the recording. No memory, no thread: what there is becomes the movie.
+void CaptureRecorder::guarded(const std::function<void()>& step) {
+  try {
+    step();
+  } catch (const std::exception& problem) {
+    fail({CaptureError::kDomain, kEncoderFailed, problem.what()});
+  }
 }
 
 void CaptureRecorder::recordUntilTheEnd() {

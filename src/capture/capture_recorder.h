@@ -31,12 +31,16 @@ class CaptureRecorder : public CaptureConsumer, public std::enable_shared_from_t
     bool cancelled = false;
     std::optional<CaptureError> error;
   };
+  /// Told on the recording thread when the file is closed and the devices are given back.
+  using Report = std::function<void(const Outcome&)>;
+  /// Asked for the report on the recording thread, just before the end of the capture can be seen.
+  using Reporter = std::function<Report()>;
 
   /// Opens the devices and makes the capture's files. Blocks for as long as that takes.
   static Result<std::shared_ptr<CaptureRecorder>, CaptureError> open(const RecordingPlan& plan);
-  /// Starts the recording thread; once. `onEnd` is called there when the file is closed and the devices are
-  /// given back, and keeps alive what it holds until then.
-  void run(std::function<void(const Outcome&)> onEnd);
+  /// Starts the recording thread; once. What `reporter` holds stays alive until the thread has ended.
+  /// @return why the thread could not be started; nothing is recorded then, and the devices are given back
+  [[nodiscard]] std::optional<CaptureError> run(Reporter reporter);
 
   /// Starts devices that wait for it ("speed=max"). All others deliver already.
   void startFlow();
@@ -66,7 +70,8 @@ class CaptureRecorder : public CaptureConsumer, public std::enable_shared_from_t
   CaptureRecorder(const RecordingPlan& plan, PipelineLease pipeline, CaptureFiles files);
 
   // The recording thread.
-  Outcome record();
+  void record(const Reporter& reporter);
+  void guarded(const std::function<void()>& step);
   void recordUntilTheEnd();
   void feed(MediaQueue::Batch batch);
   [[nodiscard]] bool reachedEnd() const;
@@ -84,9 +89,7 @@ class CaptureRecorder : public CaptureConsumer, public std::enable_shared_from_t
   const std::shared_ptr<Journal> journal_;
   CaptureMarks marks_;
   MediaQueue queue_;
-  std::unique_ptr<MovieOutput> movie_;  // recording thread
-  MediaCutter cutter_;                  // recording thread
-  bool limit_reached_ = false;          // recording thread
+  bool limit_reached_ = false;  // recording thread
   std::atomic<std::uint32_t> recorded_frames_{0};
 
   mutable std::mutex mutex_;
@@ -95,6 +98,10 @@ class CaptureRecorder : public CaptureConsumer, public std::enable_shared_from_t
   double closed_at_ = 0;                       // guarded by mutex_: running time when the capture ended
   std::optional<CaptureError> error_;          // guarded by mutex_: the first one
   std::shared_ptr<FinishedCapture> finished_;  // guarded by mutex_
+
+  // Last: their threads use what stands above.
+  std::unique_ptr<MovieOutput> movie_;  // recording thread
+  MediaCutter cutter_;                  // recording thread
 };
 
 }  // namespace lmx

@@ -26,7 +26,8 @@ MovieOutput::MovieOutput(const MovieEncoding& encoding, GrowingMovie movie, Jour
     : encoding_(encoding), movie_(std::move(movie)), journal_(journal), on_error_(std::move(onError)) {}
 
 bool MovieOutput::start(PictureSize size) {
-  if (writer_) return encoder_ != nullptr;
+  if (tried_) return encoder_ != nullptr;
+  tried_ = true;  // the movie is handed on: a second try would have none
   if (encoding_.video) encoding_.video->size = size;
   const std::size_t tracks = (encoding_.video ? 1 : 0) + (encoding_.audio ? 1 : 0);
   writer_ = std::make_unique<MovieWriter>(std::move(movie_), tracks, journal_,

@@ -22,8 +22,8 @@ class MovieOutput {
   /// @param journal  must outlive the output
   MovieOutput(const MovieEncoding& encoding, GrowingMovie movie, Journal& journal, OnError onError);
 
-  /// Starts the encoder unless it runs already. @param size  of the frames
-  /// @return false when it could not be started
+  /// Starts the encoder, once. @param size  of the frames
+  /// @return false when it could not be started, now or before
   bool start(PictureSize size);
 
   // Once started. These wait while the encoder is behind.
@@ -48,6 +48,7 @@ class MovieOutput {
   GrowingMovie movie_;  ///< until the writer has it
   Journal& journal_;
   const OnError on_error_;
+  bool tried_ = false;
   std::unique_ptr<MovieWriter> writer_;
   std::unique_ptr<Encoder> encoder_;  // declared behind the writer, which its threads call
 };

@@ -11,6 +11,7 @@
 #include <cstdlib>
 #include <string_view>
 
+#include "platform/paths.h"
 #include "support/unique_fd.h"
 
 namespace lmx {
@@ -28,12 +29,6 @@ int makeOne(const char* path, mode_t mode) {
   const int error = errno;
   if (isDirectory(path)) return 0;
   return error == EEXIST ? ENOTDIR : error;
-}
-
-std::string parentOf(std::string_view path) {
-  const auto slash = path.rfind('/');
-  if (slash == std::string_view::npos) return ".";
-  return slash == 0 ? "/" : std::string(path.substr(0, slash));
 }
 
 int writeAll(int fd, std::string_view content) {
@@ -85,7 +80,7 @@ int syncDirectory(const std::string& directory) {
 }
 
 int writeFileAtomically(const std::string& path, const std::string& content, mode_t mode) {
-  const std::string directory = parentOf(path);
+  const std::string directory = directoryOf(path);
   std::string temporary = directory + "/.lmx-" + path.substr(path.rfind('/') + 1) + ".XXXXXX";
   const UniqueFd fd(mkostemp(temporary.data(), O_CLOEXEC));
   if (!fd.valid()) return errno;

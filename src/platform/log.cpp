@@ -129,7 +129,9 @@ void writeMessage(LogContext& context, int level, const std::string& text) {
 LMPLogContext LMPLogCreateContext(const char* program, const char* facility) {
   if (program == nullptr || facility == nullptr) return nullptr;
   try {
-    return std::make_unique<LogContext>(program, facilityNamed(facility)).release();
+    auto context = std::make_unique<LogContext>(program, facilityNamed(facility));
+    context->socket.connect();
+    return context.release();
   } catch (const std::exception&) {
     return nullptr;
   }

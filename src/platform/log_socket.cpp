@@ -22,7 +22,7 @@ UniqueFd connectToLog() {
   std::memcpy(address.sun_path, path.c_str(), path.size() + 1);
   UniqueFd fd(::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC | SOCK_NONBLOCK, 0));
   if (!fd.valid()) return {};
-  if (connect(fd.get(), reinterpret_cast<const sockaddr*>(&address), sizeof address) != 0) return {};
+  if (::connect(fd.get(), reinterpret_cast<const sockaddr*>(&address), sizeof address) != 0) return {};
   return fd;
 }
 
@@ -47,12 +47,12 @@ Sent sendOnce(int socket, std::string_view datagram) {
 
 }  // namespace
 
-LogSocket::LogSocket() : socket_(connectToLog()) {}
+void LogSocket::connect() { socket_ = connectToLog(); }
 
 void LogSocket::send(std::string_view datagram,
                      const std::function<std::string(const std::string& text)>& lostNotice) {
   if (lost_ > 0 && deliver(lostNotice(std::to_string(lost_) + " messages lost"))) lost_ = 0;
-  // A message that goes out behind lost ones that could not be told would hide the gap.
+  // Sending this message without the notice before it would hide the gap.
   if (lost_ > 0 || !deliver(datagram)) ++lost_;
 }
 

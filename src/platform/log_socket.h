@@ -12,8 +12,8 @@ namespace lmx {
 /// Not thread-safe; its owner locks.
 class LogSocket {
  public:
-  /// Connects; nobody listening is no failure.
-  LogSocket();
+  /// Connects now rather than at the first message; nobody listening is no failure.
+  void connect();
 
   /// Sends the datagram of a message. What the daemon can't take is counted, and reported by a message of its
   /// own before the next one that goes out.

@@ -19,6 +19,10 @@ class AgentSubmit {
  public:
   using Text = std::optional<std::string>;
 
+  AgentSubmit() = default;
+  AgentSubmit(const AgentSubmit&) = delete;
+  AgentSubmit& operator=(const AgentSubmit&) = delete;
+
   Dictionary properties;
   std::shared_ptr<AgentContext> agentContext;
   /// The session that recorded (the job's own copy). Its type goes into the document and decides what is

@@ -1,6 +1,6 @@
 // The "ContinuousRecording" dictionary of the preferences.
 #pragma once
-#include "model/agent_context.h"
+#include "model/continuous_recording.h"
 #include "platform/plist/property_list.h"
 
 namespace lmx {

@@ -9,12 +9,13 @@
 
 namespace lmx {
 
-/// Why something failed. The message is complete: it names what failed and why.
+/// Why something failed. Whoever returns it says whether the message also names what failed.
 struct Error {
   std::string message;
   int systemError = 0;  ///< errno when the system reported the reason, else 0
 
-  /// "WHAT: reason", with the system's text for `systemError`.
+  /// `what` is no temporary: making one could change errno. "WHAT: reason", with the system's text for
+  /// `systemError`.
   static Error fromSystem(const std::string& what, int systemError = errno) {
     return {what + ": " + std::strerror(systemError), systemError};
   }

@@ -10,8 +10,8 @@
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
   const lmx::PlistResult result = lmx::parsePropertyList({reinterpret_cast<const char*>(data), size});
   if (!result && result.error().message.empty()) std::abort();
-  if (!result.value) return 0;
-  const std::string text = lmx::propertyListXml(*result.value);
-  if (text.size() < lmx::kPlistFileLimit && !lmx::parsePropertyList(text).value) std::abort();
+  if (!result) return 0;
+  const std::string text = lmx::propertyListXml(*result);
+  if (text.size() < lmx::kPlistFileLimit && !lmx::parsePropertyList(text)) std::abort();
   return 0;
 }

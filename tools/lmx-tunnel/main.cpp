@@ -6,6 +6,7 @@
 #include <sys/socket.h>
 #include <unistd.h>
 
+#include <cerrno>
 #include <chrono>
 #include <cstdio>
 #include <cstring>
@@ -13,7 +14,6 @@
 #include <memory>
 #include <thread>
 
-#include "model/codes.h"
 #include "support/scan.h"
 #include "support/unique_fd.h"
 #include "tools/lmx-tunnel/server_side.h"

@@ -83,8 +83,8 @@ void CapturePipeline::attach(GstHandle<GstElement> pipeline) {
 
 /// Waits until the devices are ready. @return why they are not
 std::optional<CaptureError> CapturePipeline::settle() {
-  const auto deadline = std::chrono::steady_clock::now() + kOpeningLimit;
   GstStateChangeReturn result = gst_element_set_state(pipeline_.get(), GST_STATE_PAUSED);
+  const auto deadline = std::chrono::steady_clock::now() + kOpeningLimit;  // opening itself may take its time
   while (result == GST_STATE_CHANGE_ASYNC && std::chrono::steady_clock::now() < deadline) {
     result = gst_element_get_state(pipeline_.get(), nullptr, nullptr, 20 * GST_MSECOND);
     if (auto error = pendingError()) return error;

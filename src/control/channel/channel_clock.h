@@ -1,4 +1,4 @@
-// The time as the channels see it, so that trials can turn it by hand.
+// The clock of the channels. Tests replace it by one that they advance by hand.
 #pragma once
 #include <chrono>
 #include <optional>

@@ -14,8 +14,8 @@ class PeerSockets {
   PeerSockets(const PeerSockets&) = delete;
   PeerSockets& operator=(const PeerSockets&) = delete;
 
-  /// Held while a reply is sent: timed commands answer from the main thread, and a socket is never closed
-  /// under its lock.
+  /// Held while a reply is sent: timed commands answer from the main thread, and their socket must not be
+  /// closed, and its number reused, meanwhile.
   [[nodiscard]] std::mutex& sendMutex() { return send_mutex_; }
 
   [[nodiscard]] int current() const { return current_; }

@@ -8,7 +8,8 @@
 
 namespace lmx {
 
-/// "cmdStatus=…,recordStatus=…" and the other fields that every status has; empty only when memory fails.
+/// "cmdStatus=…,recordStatus=…" and the other fields that every status has; empty only when it can't be
+/// formatted.
 std::string statusFields(int cmdStatus, const RecordStatus& status);
 
 /// "CameraName=…,TunnelHost=…,RecordingCapturePreset=…"; what is not set reads empty.

@@ -42,11 +42,11 @@ std::int32_t decimalValue(const std::string& text) {
 }
 
 std::string withoutSecrets(std::string_view command) {
-  static const std::string kKey = std::string(metadata_key::kAgentPassword) + "=";
+  const std::string key = std::string(metadata_key::kAgentPassword) + "=";
   std::string shown;
-  for (auto found = command.find(kKey); found != std::string_view::npos; found = command.find(kKey)) {
-    shown.append(command.substr(0, found + kKey.size())).append("****");
-    command.remove_prefix(found + kKey.size());
+  for (auto found = command.find(key); found != std::string_view::npos; found = command.find(key)) {
+    shown.append(command.substr(0, found + key.size())).append("****");
+    command.remove_prefix(found + key.size());
     // A value ends at the next comma, whatever blanks or equals signs it holds.
     command.remove_prefix(std::min(command.find(','), command.size()));
   }

@@ -1,10 +1,8 @@
 // The server tunnel: we connect, say who we are in clear, then every line is encrypted.
 #pragma once
-#include <array>
 #include <atomic>
 #include <chrono>
 #include <memory>
-#include <mutex>
 #include <optional>
 #include <string>
 

@@ -52,7 +52,7 @@ std::optional<std::string> runCipher(Direction direction, const CipherBlock& vec
 
 }  // namespace
 
-std::string agent_random_bytes(std::uint32_t count) {
+std::string agent_random_bytes(std::size_t count) {
   std::string bytes(count, '\0');
   arc4random_buf(bytes.data(), bytes.size());
   return bytes;

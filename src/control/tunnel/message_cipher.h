@@ -2,7 +2,6 @@
 #pragma once
 #include <array>
 #include <cstddef>
-#include <cstdint>
 #include <optional>
 #include <string>
 #include <string_view>
@@ -15,7 +14,7 @@ using CipherBlock = std::array<unsigned char, 16>;
 inline constexpr std::size_t kRandomPrefix = 32;
 
 /// `count` unpredictable bytes.
-std::string agent_random_bytes(std::uint32_t count);
+std::string agent_random_bytes(std::size_t count);
 
 /// @return Base64 text without line breaks; nothing on failure (logged)
 std::optional<std::string> agent_encrypt_message(const CipherBlock& vector, const CipherBlock& key,

@@ -91,7 +91,10 @@ TEST_F(StoppedRecording, IsLeftToTheNextStartWhenTheAgentHasStopped) {
   reportEnd(controller);
   turnTheLoop();
   session_->captureController.set(nullptr);
-  EXPECT_TRUE(testing::waitUntil([&] { return controller.use_count() == 1; }));
+  EXPECT_TRUE(testing::waitUntil([&] {
+    turnTheLoop();
+    return controller.use_count() == 1;
+  }));
   EXPECT_EQ(context_->post_process_list.postProcessListCount(), 0U);
   EXPECT_EQ(journalCount("processRequest request of R1 " + movie("R1.mov")), 0);
 }
@@ -106,7 +109,10 @@ TEST_F(StoppedRecording, AMovieThatCannotBeWrittenIsARuntimeErrorAndNoJob) {
   EXPECT_TRUE(log_.waitFor(kLogError, "An error occurred during recording (8)"));
   EXPECT_TRUE(testing::waitUntil([&] { return session_->error.get() == kRecordCannotWrite; }));
   session_->captureController.set(nullptr);
-  EXPECT_TRUE(testing::waitUntil([&] { return controller.use_count() == 1; })) << "the hand-off has ended";
+  EXPECT_TRUE(testing::waitUntil([&] {
+    turnTheLoop();
+    return controller.use_count() == 1;
+  })) << "the hand-off has ended";
   EXPECT_EQ(context_->post_process_list.postProcessListCount(), 0U);
   EXPECT_EQ(journalCount("requestHandedOver request of R1"), 0);
 }
@@ -147,7 +153,10 @@ TEST_F(StoppedRecording, AHandOverDoesNotMakeALaterRecordingIdle) {
   turnTheLoop();
   EXPECT_TRUE(testing::waitUntil([&] { return journalCount("requestHandedOver request of R1") == 1; }));
   EXPECT_NE(nextJob(), nullptr);  // the job holds the capture, too
-  EXPECT_TRUE(testing::waitUntil([&] { return first.use_count() == 1; }));
+  EXPECT_TRUE(testing::waitUntil([&] {
+    turnTheLoop();
+    return first.use_count() == 1;
+  }));
   EXPECT_EQ(session_->status.get(), kRecorderRecording);
 }
 
@@ -158,7 +167,10 @@ TEST_F(StoppedRecording, ALateCancellationDoesNotMakeALaterRecordingIdle) {
   first->shut_down = true;
   agent_.captureDidCancel(first.get());
   turnTheLoop();
-  EXPECT_TRUE(testing::waitUntil([&] { return first.use_count() == 1; }));
+  EXPECT_TRUE(testing::waitUntil([&] {
+    turnTheLoop();
+    return first.use_count() == 1;
+  }));
   EXPECT_EQ(session_->status.get(), kRecorderRecording);
   EXPECT_EQ(context_->post_process_list.postProcessListCount(), 0U);
 }
