@@ -49,10 +49,10 @@ void MainLoop::stopForgottenPreview(std::int64_t now) {
   const auto record = parts_.context.record_context();
   const auto preview = record ? record->previewController.get() : nullptr;
   if (!preview || !preview->controller().isPreviewRunning()) return;
-  const std::int64_t requested = preview->mLastPreviewRequestTime();
+  const std::int64_t requested = preview->mLastPreviewRequestTime.get();
   if (requested == 0 || isAhead(now, requested, kPreviewTimeOutSeconds)) return;
   parts_.capture.stopPreview();
-  preview->setMLastPreviewRequestTime(0);
+  preview->mLastPreviewRequestTime.set(0);
 }
 
 void MainLoop::reloadChangedPreferences() {

@@ -33,7 +33,7 @@ void MyLMRPreviewController::setDelegate(std::shared_ptr<MyLMRPreviewControllerD
 }
 
 std::optional<std::string> MyLMRPreviewController::base64PreviewFrameCopy() {
-  last_request_ = std::time(nullptr);
+  mLastPreviewRequestTime.set(std::time(nullptr));
   return delegate_ ? delegate_->base64PreviewFrameCopy() : std::nullopt;
 }
 

@@ -10,6 +10,7 @@
 
 #include "capture/api/capture_framework.h"
 #include "support/recursive_mutex.h"
+#include "support/shared_value.h"
 
 namespace lmx {
 
@@ -42,15 +43,13 @@ class MyLMRPreviewController {
   void setDelegate(std::shared_ptr<MyLMRPreviewControllerDelegate> delegate);
 
   /// When a frame was last requested, in seconds since 1970; 0 when no request is pending.
-  [[nodiscard]] std::int64_t mLastPreviewRequestTime() const { return last_request_; }
-  void setMLastPreviewRequestTime(std::int64_t seconds) { last_request_ = seconds; }
+  SharedValue<std::int64_t> mLastPreviewRequestTime;
   /// Sets the request time, then asks the delegate.
   [[nodiscard]] std::optional<std::string> base64PreviewFrameCopy();
 
  private:
   std::unique_ptr<LMRPreviewController> controller_;
   std::shared_ptr<MyLMRPreviewControllerDelegate> delegate_;
-  std::atomic<std::int64_t> last_request_{0};
 };
 
 }  // namespace lmx

@@ -118,16 +118,16 @@ TEST_F(MainLoopTest, AnUnrequestedPreviewIsStoppedAfterSixteenSeconds) {
   ASSERT_NE(preview, nullptr);
   session_->previewController.set(preview);
   preview->controller().startPreview();
-  preview->setMLastPreviewRequestTime(std::time(nullptr) - 14);
+  preview->mLastPreviewRequestTime.set(std::time(nullptr) - 14);
   turn();
   EXPECT_TRUE(preview->controller().isPreviewRunning());
-  preview->setMLastPreviewRequestTime(0);
+  preview->mLastPreviewRequestTime.set(0);
   turn();
   EXPECT_TRUE(preview->controller().isPreviewRunning());
-  preview->setMLastPreviewRequestTime(std::time(nullptr) - 16);
+  preview->mLastPreviewRequestTime.set(std::time(nullptr) - 16);
   turn();
   EXPECT_FALSE(preview->controller().isPreviewRunning());
-  EXPECT_EQ(preview->mLastPreviewRequestTime(), 0);
+  EXPECT_EQ(preview->mLastPreviewRequestTime.get(), 0);
   EXPECT_TRUE(log_.contains(kLogDebug, "Process stopPreview"));
 }
 

@@ -93,9 +93,9 @@ TEST_F(EngineTest, PreviewFrameIsTheNewestOneAsBase64) {
 TEST_F(EngineTest, PreviewRequestTimeIsSetEvenWithoutAFrame) {
   const auto preview = LXAgentRecordCreatePreviewController("camera", std::nullopt, false, 400, nullptr);
   ASSERT_NE(preview, nullptr);
-  EXPECT_EQ(preview->mLastPreviewRequestTime(), 0);
+  EXPECT_EQ(preview->mLastPreviewRequestTime.get(), 0);
   EXPECT_EQ(preview->base64PreviewFrameCopy(), std::nullopt);
-  EXPECT_GT(preview->mLastPreviewRequestTime(), 0);
+  EXPECT_GT(preview->mLastPreviewRequestTime.get(), 0);
 }
 
 }  // namespace
