@@ -43,7 +43,7 @@ std::optional<std::string> runCipher(Direction direction, const CipherBlock& vec
                        reinterpret_cast<const unsigned char*>(input.data()),
                        static_cast<int>(input.size())) == 1 &&
       EVP_CipherFinal_ex(context.get(), bytes(output.data()) + updated, &finished) == 1) {
-    output.resize(static_cast<std::size_t>(updated + finished));
+    output.resize(static_cast<std::size_t>(updated) + static_cast<std::size_t>(finished));
     return output;
   }
   ERR_print_errors_fp(stdout);
