@@ -98,7 +98,7 @@ TEST(LineAssembler, TenMegabytesWithoutALineFeedStayBounded) {
   EXPECT_EQ(dropped, 9);  // each time 1024 chunks fit, and the one that doesn't goes too
 }
 
-/// The assembly written down once more as it was described to us: C strings and an owned partial command.
+/// The assembly once more in the plainest way, to compare with: C strings and an owned partial command.
 struct PlainAssembly {
   char* partial = nullptr;
   std::vector<std::string> lines;
@@ -116,8 +116,9 @@ struct PlainAssembly {
       if (partial == nullptr) {
         partial = strdup(chunk);
       } else {
-        partial = static_cast<char*>(std::realloc(partial, std::strlen(partial) + std::strlen(chunk) + 1));
-        std::strcat(partial, chunk);
+        const std::size_t before = std::strlen(partial);
+        partial = static_cast<char*>(std::realloc(partial, before + std::strlen(chunk) + 1));
+        std::memcpy(partial + before, chunk, std::strlen(chunk) + 1);
       }
     } else {
       const auto index = static_cast<std::size_t>(line_feed - chunk);
