@@ -1,5 +1,6 @@
 // The system's fixed paths, which a private root directory can prefix for trials and tests.
 #pragma once
+#include <cstddef>
 #include <string>
 #include <string_view>
 
@@ -22,6 +23,14 @@ inline constexpr std::string_view kLogSocket = "/dev/log";
 /// `fixedPath` below the directory named by LMXAGENTD_ROOT (read once); unchanged when that is unset or
 /// empty. Only for the system's own paths: paths from the user (-f, preference values) are never prefixed.
 std::string systemPath(std::string_view fixedPath);
+
+/// Longest name of a recording in bytes: file systems take 255 with what the agent adds to it (an ending, a
+/// number, the parts of a temporary name).
+inline constexpr std::size_t kLongestRecordingName = 200;
+
+/// The properties document of `movie`: every ".mov" in the path becomes ".xml"; a path without any gets
+/// ".xml" appended.
+std::string documentPathOf(const std::string& movie);
 
 /// The directory part of `path`: everything before its last "/"; "/" for a file in the root, "." without any
 /// "/".

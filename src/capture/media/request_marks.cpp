@@ -50,7 +50,15 @@ void RequestMarks::stop(const std::string& uuid, double t) {
 }
 
 void RequestMarks::cancel(const std::string& uuid) {
-  if (Request* request = editable(uuid)) request->cancelled = true;
+  if (Request* request = editable(uuid)) request->cancelled = !request->submit;
+}
+
+void RequestMarks::submit(const std::string& uuid) {
+  if (Request* request = editable(uuid)) request->submit = !request->cancelled;
+}
+
+void RequestMarks::markQueued(const std::string& uuid) {
+  if (Request* request = editable(uuid)) request->queued = true;
 }
 
 void RequestMarks::markDone(const std::string& uuid) {

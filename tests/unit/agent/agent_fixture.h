@@ -64,8 +64,7 @@ class AgentTest : public ::testing::Test {
     setParameters(std::move(more));
     agent_.prepareCapture();
     EXPECT_EQ(context_->state.status.get(), 0);
-    session_->request_uuid.set("request of " + uuid);
-    session_->request_properties.set(context_->state.properties.get());
+    session_->request.set({.uuid = "request of " + uuid, .properties = context_->state.properties.get()});
     Controller made = framework_->controller(framework_->controllersMade() - 1);
     made->state = 3;
     return made;

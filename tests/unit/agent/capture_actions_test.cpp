@@ -1,4 +1,5 @@
 // Main-thread actions, engine callbacks and loss of the device.
+#include <algorithm>
 #include <chrono>
 #include <csignal>
 #include <ctime>
@@ -138,8 +139,9 @@ TEST_F(Actions, AdhocStopMarksTheShiftedStopThenStopsTheRecording) {
   setContinuous();  // submits instead of stopping again
   const double before = secondsSinceReferenceDate();
   agent_.stopCapture();
-  const auto mark = controller->marks().back();
-  EXPECT_EQ(mark.operation, "setStop");
+  const auto marks = controller->marks();
+  const auto mark =
+      *std::find_if(marks.rbegin(), marks.rend(), [](const auto& one) { return one.operation == "setStop"; });
   EXPECT_EQ(mark.uuid, session_->recording_uuid.get());
   EXPECT_NEAR(*mark.time, before - 20, 1.0);
   EXPECT_TRUE(log_.contains(kLogDebug, "Process stopRecording"));
