@@ -1,0 +1,182 @@
+"""Submissions that wait when the daemon ends are taken up by the next start: none is lost, none begins twice."""
+import re
+import signal
+
+import pytest
+from harness import movie
+from harness.agent import DEFAULTS, REPOSITORY
+from harness.log_reader import Level
+from harness.power_cut import PowerCut
+from harness.waiting import let_pass, wait_until
+
+ENDS = pytest.mark.parametrize("number", [signal.SIGKILL, signal.SIGTERM])
+WORKFLOW = {"RecordingMetadata_ADHOC_WORKFLOW_UUID": "W-1", "RecordingMetadata_AGENT_USERNAME": "ada",
+            "RecordingMetadata_AGENT_PASSWORD": "a secret"}
+
+
+def record_behind(agent, first, *others, **parameters):
+    """Records all of them, with the tool hanging on the first."""
+    agent.set_tool({"when": first, "hang": True})
+    agent.record(first, **parameters)
+    agent.wait_tool_call(first)
+    for uuid in others:
+        agent.record(uuid, **parameters)
+
+
+def restart(agent, number, *rules):
+    """Ends the daemon, lets the tool follow other rules, starts the daemon. @return a mark in the log between the two"""
+    agent.stop(number)
+    agent.set_tool(*rules)
+    mark = agent.log.mark()
+    agent.start()
+    return mark
+
+
+def settle(agent, uuid):
+    """Submits one more recording. One job at a time, oldest first: nothing is waiting behind it."""
+    agent.record(uuid)
+    agent.wait_tool_call(uuid, event="end", timeout=15)
+
+
+def complaints(agent, uuid, mark):
+    """How many warnings and errors since `mark` name the recording."""
+    lines = agent.log.lines(rf"(?<![\w-]){uuid}(?![\w-])", after=mark)
+    return sum(Level.CRITICAL <= line.level <= Level.WARNING for line in lines)
+
+
+def assert_submitted_once(agent, uuid, mark, before):
+    """`before` holds what had been submitted when the daemon ended: the tool that ran then is not started again."""
+    wait_until(lambda: uuid in agent.submitted() or complaints(agent, uuid, mark), 15, f"the submission of {uuid}")
+    settle(agent, f"BEHIND-{uuid}")
+    calls = agent.submitted().count(uuid)
+    in_hand = complaints(agent, uuid, mark)
+    assert (calls, in_hand) in ((1, 0), (1, 1), (0, 1)), (calls, in_hand)
+    if in_hand:
+        assert calls == before.count(uuid), "it was in hand, and was started again"
+    assert agent.document(uuid)["RecordingMetadata_RECORDING_UUID"] == uuid
+    movie.decodes(agent.movie(uuid))
+
+
+@ENDS
+def test_jobs_that_wait_are_taken_up(running, number):
+    record_behind(running, "FIRST", "SECOND", "THIRD")
+    running.start_recording("NOBODY-STOPS-IT")
+    running.let_record(1)
+    mark = restart(running, number)
+    running.wait_tool_call("THIRD", event="end", timeout=15)
+    running.log.wait("^Recovered unfinished recording .*/NOBODY-STOPS-IT.mov", after=mark)
+    settle(running, "LAST")
+    assert running.submitted() == ["FIRST", "SECOND", "THIRD", "LAST"]
+    assert complaints(running, "FIRST", mark) == 1, "the one in hand is named, once"
+    assert complaints(running, "SECOND", mark) == complaints(running, "THIRD", mark) == 0
+    uuids = ("FIRST", "SECOND", "THIRD", "NOBODY-STOPS-IT", "LAST")
+    assert running.repository() == sorted(f"{uuid}.{kind}" for uuid in uuids for kind in ("mov", "xml"))
+    for uuid in uuids:
+        movie.decodes(running.movie(uuid))
+
+
+def test_restart_after_restart(running):
+    record_behind(running, "FIRST", "SECOND", "THIRD")
+    mark = restart(running, signal.SIGKILL, {"when": "SECOND", "hang": True})
+    running.wait_tool_call("SECOND", timeout=15)
+    assert [complaints(running, uuid, mark) for uuid in ("FIRST", "SECOND", "THIRD")] == [1, 0, 0]
+    mark = restart(running, signal.SIGKILL)
+    running.wait_tool_call("THIRD", event="end", timeout=15)
+    assert [complaints(running, uuid, mark) for uuid in ("FIRST", "SECOND", "THIRD")] == [0, 1, 0]
+    running.log.wait("^Post-process mechanism completed with success$", after=mark)
+    mark = restart(running, signal.SIGKILL)
+    settle(running, "LAST")
+    assert running.submitted() == ["FIRST", "SECOND", "THIRD", "LAST"]
+    assert [complaints(running, uuid, mark) for uuid in ("FIRST", "SECOND", "THIRD")] == [0, 0, 0]
+
+
+def test_starts_that_are_cut_short(running):
+    """The next start ends while it is taking the jobs up."""
+    record_behind(running, "FIRST", "SECOND", "THIRD")
+    running.kill9()
+    running.set_tool()
+    mark = running.log.mark()
+    for milliseconds in (30, 100, 300):
+        running.start(wait=False)
+        running.log.wait("starting\\.\\.\\.$", after=running.log.mark() - 1)
+        let_pass(milliseconds / 1000, "the moment of the kill")
+        running.kill9()
+    before = running.submitted()
+    running.start()
+    for uuid in ("SECOND", "THIRD"):
+        assert_submitted_once(running, uuid, mark, before)
+    assert running.submitted().count("FIRST") == complaints(running, "FIRST", mark) == 1
+
+
+@pytest.mark.parametrize("number", [signal.SIGKILL, signal.SIGTERM])
+@pytest.mark.parametrize("milliseconds", [0, 5, 50, 300])
+def test_an_end_right_behind_the_answer_to_stop(running, number, milliseconds):
+    running.start_recording("A")
+    running.let_record(1)
+    assert running.command("STOP").text == "cmdStatus=0"
+    if milliseconds:
+        let_pass(milliseconds / 1000, "the moment of the end")
+    running.stop(number)
+    before, mark = running.submitted(), running.log.mark()
+    running.start()
+    assert_submitted_once(running, "A", mark, before)
+
+
+def test_the_tool_is_told_the_same_after_a_restart(running):
+    chosen = "/var/lmx/a lecture.mov"
+    record_behind(running, "FIRST", "SECOND", **WORKFLOW)
+    running.start_recording("THIRD", RecordingMetadata_ADHOC_FILE_PATH=chosen,
+                            **{**WORKFLOW, "RecordingMetadata_AGENT_USERNAME": "bob"})
+    running.let_record(1)
+    running.command("STOP")
+    running.log.wait(f'^"{chosen}" recording stopped')
+    running.start_recording("NOT-THIS", RecordingMetadata_ADHOC_SUBMIT_DISABLED="1", **WORKFLOW)
+    running.let_record(1)
+    running.command("STOP")
+    running.wait_recorded("NOT-THIS")
+    restart(running, signal.SIGKILL)
+    wait_until(lambda: len(running.tool_calls("end")) == 2, 15, "two submissions")
+    settle(running, "LAST")
+
+    def told(file, user):
+        return ["--server", DEFAULTS["LumexURL"], "--submit", "--file", file, "--workflow_uuid", "W-1", "--user", user,
+                "-p", "a secret", "--delete"]
+
+    assert [call["arguments"] for call in running.tool_calls()][:-1] == [
+        told(f"{REPOSITORY}/FIRST.mov", "ada"), told(f"{REPOSITORY}/SECOND.mov", "ada"), told(chosen, "bob")]
+    assert running.submitted()[-1] == "LAST" and running.movie("NOT-THIS").exists()
+    assert not [line for line in running.log.lines() if "a secret" in line.text and "/usr/bin/lumex" not in line.text]
+
+
+@pytest.mark.parametrize("syncs", [0, 1, 2, 3, 5, 8])
+def test_a_power_cut_behind_the_answer_to_stop(agent, syncs):
+    power = PowerCut(agent)
+    power.start()
+    agent.start_recording("A", RecordingMetadata_TITLE="A talk")
+    agent.let_record(2)
+    power.arm(syncs)
+    assert agent.command("STOP").text == "cmdStatus=0"
+    assert agent.wait_exit() == 128 + signal.SIGKILL
+    power.restore()
+    before, mark = agent.submitted(), agent.log.mark()
+    agent.start()
+    assert_submitted_once(agent, "A", mark, before)
+    assert agent.document("A")["RecordingMetadata_TITLE"] == "A talk"
+    assert movie.streams(agent.movie("A"))["video"].duration > 0.5
+
+
+def test_a_power_cut_while_the_tool_runs(agent):
+    power = PowerCut(agent)
+    power.start()
+    record_behind(agent, "FIRST", "SECOND")
+    agent.kill9()
+    agent.set_tool()
+    power.restore()
+    mark = agent.log.mark()
+    agent.start()
+    agent.wait_tool_call("SECOND", event="end", timeout=15)
+    settle(agent, "LAST")
+    assert agent.submitted() == ["FIRST", "SECOND", "LAST"]
+    assert complaints(agent, "FIRST", mark) == 1
+    for uuid in ("FIRST", "SECOND"):
+        movie.decodes(agent.movie(uuid))
