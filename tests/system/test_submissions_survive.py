@@ -123,34 +123,41 @@ def test_an_end_right_behind_the_answer_to_stop(running, number, milliseconds):
 
 
 def test_the_tool_is_told_the_same_after_a_restart(running):
-    chosen = "/var/lmx/a lecture.mov"
-    record_behind(running, "FIRST", "SECOND", **WORKFLOW)
-    running.start_recording("THIRD", RecordingMetadata_ADHOC_FILE_PATH=chosen,
-                            **{**WORKFLOW, "RecordingMetadata_AGENT_USERNAME": "bob"})
-    running.let_record(1)
-    running.command("STOP")
-    running.log.wait(f'^"{chosen}" recording stopped')
-    running.start_recording("NOT-THIS", RecordingMetadata_ADHOC_SUBMIT_DISABLED="1", **WORKFLOW)
-    running.let_record(1)
-    running.command("STOP")
-    running.wait_recorded("NOT-THIS")
-    restart(running, signal.SIGKILL)
-    wait_until(lambda: len(running.tool_calls("end")) == 2, 15, "two submissions")
-    settle(running, "LAST")
-
     def told(file, user):
         return ["--server", DEFAULTS["LumexURL"], "--submit", "--file", file, "--workflow_uuid", "W-1", "--user", user,
                 "-p", "a secret", "--delete"]
 
+    first, second, chosen = f"{REPOSITORY}/FIRST.mov", f"{REPOSITORY}/SECOND.mov", "/var/lmx/a lecture.mov"
+    bobs = {**WORKFLOW, "RecordingMetadata_AGENT_USERNAME": "bob"}
+    running.set_tool({"when": first, "hang": True})
+    running.record("FIRST", **WORKFLOW)
+    running.wait_tool_call(first)
+    running.record("SECOND", **WORKFLOW)
+    stop_at(running, chosen, "THIRD", RecordingMetadata_ADHOC_FILE_PATH=chosen, **bobs)
+    running.record("NOT-THIS", RecordingMetadata_ADHOC_SUBMIT_DISABLED="1", **bobs)
+    mark = restart(running, signal.SIGKILL)
+    running.wait_tool_call(chosen, event="end", timeout=15)
+    settle(running, "LAST")
     assert [call["arguments"] for call in running.tool_calls()][:-1] == [
-        told(f"{REPOSITORY}/FIRST.mov", "ada"), told(f"{REPOSITORY}/SECOND.mov", "ada"), told(chosen, "bob")]
-    assert running.submitted()[-1] == "LAST" and running.movie("NOT-THIS").exists()
-    assert not [line for line in running.log.lines() if "a secret" in line.text and "/usr/bin/lumex" not in line.text]
+        told(first, "ada"), told(second, "ada"), told(chosen, "bob")]
+    assert complaints(running, "FIRST", mark) == 1
+    assert movie.streams(running.movie("NOT-THIS"))["video"].duration > 0.5
+    telling = [line.text for line in running.log.lines("a secret")]
+    assert not [text for text in telling if not text.startswith("/usr/bin/lumex ")], telling
 
 
-@pytest.mark.parametrize("syncs", [0, 1, 2, 3, 5, 8])
-def test_a_power_cut_behind_the_answer_to_stop(agent, syncs):
-    power = PowerCut(agent)
+def stop_at(agent, path, uuid, **parameters):
+    """Makes a recording whose movie is `path`."""
+    assert agent.start_recording(uuid, **parameters).text == "cmdStatus=0"
+    agent.let_record(1)
+    assert agent.command("STOP").text == "cmdStatus=0"
+    agent.log.wait(f'^"{path}" recording stopped')
+
+
+@pytest.mark.parametrize("names, syncs", [("together", 0), ("together", 1), ("together", 3), ("together", 5),
+                                          ("apart", 0), ("apart", 4)])
+def test_a_power_cut_behind_the_answer_to_stop(agent, names, syncs):
+    power = PowerCut(agent, names)
     power.start()
     agent.start_recording("A", RecordingMetadata_TITLE="A talk")
     agent.let_record(2)

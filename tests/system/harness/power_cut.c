@@ -4,7 +4,9 @@
 //   dirs/KEY   names in a directory at its last sync: a number that rises from sync to sync, then "NAME KEY d|f" a line
 //   top        key of the directory $POWER_CUT_TOP
 //   armed      written by the test: how many more syncs count after the next "cmdStatus=0" that is sent
-// A KEY is inode and birth time, since inodes are used again. A directory's names are durable only by its own sync.
+// A KEY is inode and birth time, since inodes are used again. With $POWER_CUT_NAMES "together" any sync makes the names
+// in all directories below the top durable, as the journal of most file systems does; with "apart" each directory needs
+// a sync of its own.
 #define _GNU_SOURCE
 #include <dirent.h>
 #include <dlfcn.h>
@@ -23,6 +25,8 @@ enum { kPath = 512, kNotArmed = -1 };
 
 static pthread_mutex_t lock = PTHREAD_MUTEX_INITIALIZER;
 static const char* place;     // null in the daemon's children
+static int together;          // one sync makes all names durable
+static int top = -1;
 static int number;            // of the last directory's sync
 static int left = kNotArmed;  // syncs until the cut
 static int cut;               // what comes now is lost
@@ -78,13 +82,37 @@ static void write_names(FILE* file, int fd) {
   closedir(directory);
 }
 
+static void keep_names(int fd) {
+  char key[80];
+  key_of(fd, "", key, sizeof key);
+  put("dirs/", key, write_names, fd);
+}
+
+static void keep_all_names(int fd) {
+  keep_names(fd);
+  DIR* directory = fdopendir(openat(fd, ".", O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+  if (!directory) fail("a directory");
+  for (struct dirent* entry; (entry = readdir(directory)) != NULL;) {
+    if (entry->d_type != DT_DIR || strcmp(entry->d_name, ".") == 0 || strcmp(entry->d_name, "..") == 0) continue;
+    const int inner = openat(fd, entry->d_name, O_RDONLY | O_DIRECTORY | O_CLOEXEC);
+    if (inner < 0) continue;  // it has gone meanwhile
+    keep_all_names(inner);
+    close(inner);
+  }
+  closedir(directory);
+}
+
 static void keep(int fd) {
   struct stat status;
   char key[80];
   if (fstat(fd, &status) != 0) fail("a descriptor");
   key_of(fd, "", key, sizeof key);
-  if (S_ISDIR(status.st_mode)) put("dirs/", key, write_names, fd);
   if (S_ISREG(status.st_mode)) put("files/", key, write_content, fd);
+  if (together) {
+    keep_all_names(top);
+  } else if (S_ISDIR(status.st_mode)) {
+    keep_names(fd);
+  }
 }
 
 static void write_top(FILE* file, int fd) {
@@ -95,13 +123,14 @@ static void write_top(FILE* file, int fd) {
 
 __attribute__((constructor)) static void begin(void) {
   place = getenv("POWER_CUT");
-  const char* top = getenv("POWER_CUT_TOP");
-  if (!place || !top) return;
+  const char* path = getenv("POWER_CUT_TOP");
+  const char* names = getenv("POWER_CUT_NAMES");
+  if (!place || !path || !names) return;
   place = strdup(place);
-  const int fd = open(top, O_RDONLY | O_DIRECTORY | O_CLOEXEC);
-  if (fd < 0) fail(top);
-  put("", "top", write_top, fd);
-  close(fd);
+  together = strcmp(names, "together") == 0;
+  top = open(path, O_RDONLY | O_DIRECTORY | O_CLOEXEC);
+  if (top < 0) fail(path);
+  put("", "top", write_top, top);
   unsetenv("POWER_CUT");  // not for the daemon's children
   unsetenv("LD_PRELOAD");
 }

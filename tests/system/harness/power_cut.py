@@ -9,10 +9,15 @@ PLACE = "/var/power"
 
 
 class PowerCut:
-    """For one start of the daemon, with an empty repository. At most one cut."""
+    """For one start of the daemon, with an empty repository. At most one cut.
 
-    def __init__(self, agent):
+    names: "together" when each sync makes all names durable, "apart" when a directory's own sync is needed for its
+    """
+
+    def __init__(self, agent, names="together"):
         self._agent = agent
+        self._variables = (f"LD_PRELOAD={PLACE}/power_cut.so", f"POWER_CUT={PLACE}", f"POWER_CUT_TOP={REPOSITORY}",
+                           f"POWER_CUT_NAMES={names}")
         place = agent.path(PLACE)
         shutil.rmtree(place, ignore_errors=True)
         for name in ("files", "dirs"):
@@ -21,8 +26,7 @@ class PowerCut:
                         HARNESS / "power_cut.c"], check=True, timeout=60)
 
     def start(self):
-        variables = (f"LD_PRELOAD={PLACE}/power_cut.so", f"POWER_CUT={PLACE}", f"POWER_CUT_TOP={REPOSITORY}")
-        self._agent.start(prefix=("env", *variables))
+        self._agent.start(prefix=("env", *self._variables))
 
     def arm(self, syncs):
         """The power fails behind the next command's answer: at once for 0, else right after so many more syncs."""
