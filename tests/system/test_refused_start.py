@@ -45,7 +45,8 @@ def test_all_that_it_carries_is_forgotten(running):
                         (span[1], "stop", stop.sent, stop.received)], 30)
     document = running.document("FIRST")
     assert {key: document.get(key) for key in FIRST} == FIRST
-    assert document["RecordingMetadata_RECORDING_UUID"] == "FIRST" and document["RecordingMetadata_TYPE"] == "Audio+Video"
+    assert document["RecordingMetadata_RECORDING_UUID"] == "FIRST"
+    assert document["RecordingMetadata_TYPE"] == "Audio+Video"
     assert running.repository() == ["FIRST.mov", "FIRST.xml"] and not running.path("/var/lmx/two.mov").exists()
     assert not running.log.lines("^Recovered")
     running.record("NEXT")

@@ -1,12 +1,12 @@
-// Loaded into the daemon: keeps what its syncs have made durable, and ends the daemon at a chosen moment as a power cut
-// does. Below $POWER_CUT:
+// Loaded into the daemon: keeps what its syncs have made durable, and ends the daemon at a chosen moment as a
+// power cut does. Below $POWER_CUT:
 //   files/KEY  content of a file at its last sync
-//   dirs/KEY   names in a directory at its last sync: a number that rises from sync to sync, then "NAME KEY d|f" a line
-//   top        key of the directory $POWER_CUT_TOP
-//   armed      written by the test: how many more syncs count after the next "cmdStatus=0" that is sent
-// A KEY is inode and birth time, since inodes are used again. With $POWER_CUT_NAMES "together" any sync makes the names
-// in all directories below the top durable, as the journal of most file systems does; with "apart" each directory needs
-// a sync of its own.
+//   dirs/KEY   names in a directory at its last sync: a number that rises from sync to sync, then "NAME KEY
+//   d|f" a line top        key of the directory $POWER_CUT_TOP armed      written by the test: how many more
+//   syncs count after the next "cmdStatus=0" that is sent
+// A KEY is inode and birth time, since inodes are used again. With $POWER_CUT_NAMES "together" any sync makes
+// the names in all directories below the top durable, as the journal of most file systems does; with "apart"
+// each directory needs a sync of its own.
 #define _GNU_SOURCE
 #include <dirent.h>
 #include <dlfcn.h>
@@ -24,8 +24,8 @@
 enum { kPath = 512, kNotArmed = -1 };
 
 static pthread_mutex_t lock = PTHREAD_MUTEX_INITIALIZER;
-static const char* place;     // null in the daemon's children
-static int together;          // one sync makes all names durable
+static const char* place;  // null in the daemon's children
+static int together;       // one sync makes all names durable
 static int top = -1;
 static int number;            // of the last directory's sync
 static int left = kNotArmed;  // syncs until the cut
@@ -93,7 +93,8 @@ static void keep_all_names(int fd) {
   DIR* directory = fdopendir(openat(fd, ".", O_RDONLY | O_DIRECTORY | O_CLOEXEC));
   if (!directory) fail("a directory");
   for (struct dirent* entry; (entry = readdir(directory)) != NULL;) {
-    if (entry->d_type != DT_DIR || strcmp(entry->d_name, ".") == 0 || strcmp(entry->d_name, "..") == 0) continue;
+    if (entry->d_type != DT_DIR || strcmp(entry->d_name, ".") == 0 || strcmp(entry->d_name, "..") == 0)
+      continue;
     const int inner = openat(fd, entry->d_name, O_RDONLY | O_DIRECTORY | O_CLOEXEC);
     if (inner < 0) continue;  // it has gone meanwhile
     keep_all_names(inner);

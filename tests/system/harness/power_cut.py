@@ -16,8 +16,8 @@ class PowerCut:
 
     def __init__(self, agent, names="together"):
         self._agent = agent
-        self._variables = (f"LD_PRELOAD={PLACE}/power_cut.so", f"POWER_CUT={PLACE}", f"POWER_CUT_TOP={REPOSITORY}",
-                           f"POWER_CUT_NAMES={names}")
+        self.prefix = ("env", f"LD_PRELOAD={PLACE}/power_cut.so", f"POWER_CUT={PLACE}", f"POWER_CUT_TOP={REPOSITORY}",
+                       f"POWER_CUT_NAMES={names}")
         place = agent.path(PLACE)
         shutil.rmtree(place, ignore_errors=True)
         for name in ("files", "dirs"):
@@ -26,7 +26,7 @@ class PowerCut:
                         HARNESS / "power_cut.c"], check=True, timeout=60)
 
     def start(self):
-        self._agent.start(prefix=("env", *self._variables))
+        self._agent.start(prefix=self.prefix)
 
     def arm(self, syncs):
         """The power fails behind the next command's answer: at once for 0, else right after so many more syncs."""
