@@ -49,8 +49,8 @@ def calls_so_far(agent):
 
 
 def assert_submitted_once(agent, uuid, mark, calls_before):
-    """Its tool is started by the daemon that ended, as `calls_before` tell, or by the next one, not by both. A recording
-    whose tool did not end is named. So is one whose tool was killed too early for its call to be seen."""
+    """Its tool is started by the daemon that ended, as `calls_before` tell, or by the next one, not by both. One whose
+    tool did not end is named. So is one whose tool was killed too early for its call to be seen."""
     begun, ended = (uuid in calls for calls in calls_before)
     wait_until(lambda: uuid in agent.submitted() or complaints(agent, uuid, mark), 15, f"the submission of {uuid}")
     settle(agent, f"BEHIND-{uuid}")
