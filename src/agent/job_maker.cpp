@@ -27,8 +27,7 @@ std::shared_ptr<AgentSubmit> JobMaker::make(const Finished& finished, const Hand
     context_->state.running.set(false);
     return nullptr;
   }
-  store_.keep(context_->recording.recording_repository_path.get().value_or(""), *job,
-              HandOffOrder::placeOf(ticket));
+  store_.keep(*job, HandOffOrder::placeOf(ticket));
   return job;
 }
 

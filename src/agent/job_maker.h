@@ -8,6 +8,7 @@
 #include "agent/hand_off_order.h"
 #include "model/agent_context.h"
 #include "model/recording_request.h"
+#include "platform/paths.h"
 #include "postprocess/agent_submit.h"
 #include "postprocess/job_store.h"
 #include "record/agent_record.h"
@@ -43,7 +44,7 @@ class JobMaker {
 
  private:
   const std::shared_ptr<AgentContext> context_;
-  JobStore store_;
+  JobStore store_{systemPath(kJobsDirectory)};
 };
 
 }  // namespace lmx

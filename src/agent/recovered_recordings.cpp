@@ -36,9 +36,9 @@ JobMaker::Finished finishedFrom(const RecoveredRecording& recording) {
 }  // namespace
 
 void RecoveredRecordings::takeUp(std::shared_ptr<CaptureFramework> framework) {
+  takeUpJobs();
   const auto repository = context_->recording.recording_repository_path.get();
   if (!repository) return;
-  takeUpJobs(*repository);
   // On a worker: a long recording may have to be copied, and the agent must accept commands meanwhile.
   dispatchAsync([this, repository, framework = std::move(framework), ticket = order_.enter()] {
     auto recordings = framework->recoverUnfinished(*repository);
@@ -48,8 +48,8 @@ void RecoveredRecordings::takeUp(std::shared_ptr<CaptureFramework> framework) {
   });
 }
 
-void RecoveredRecordings::takeUpJobs(const std::string& repository) {
-  JobStore::Left left = jobs_.store().takeUp(repository, context_);
+void RecoveredRecordings::takeUpJobs() {
+  JobStore::Left left = jobs_.store().takeUp(context_);
   for (const std::string& movie : left.begun) {
     LMPLogMessage(context_->log_context(), kLogWarning,
                   "The agent ended while \"%s\" was being submitted: it is not submitted again",

@@ -16,8 +16,8 @@ class RecoveredRecordings {
   RecoveredRecordings(std::shared_ptr<AgentContext> context, JobMaker& jobs, HandOffOrder& order)
       : context_(std::move(context)), jobs_(jobs), order_(order) {}
 
-  /// Takes up the jobs that wait in the repository, and makes movies of the recordings that were left
-  /// unfinished there, in the background. A recording that had been stopped is submitted, any other is not.
+  /// Takes up the jobs that wait, and makes movies of the recordings that were left unfinished in the
+  /// repository, in the background. A recording that had been stopped is submitted, any other is not.
   /// Main thread, once, at the start.
   void takeUp(std::shared_ptr<CaptureFramework> framework);
   /// Writes documents beside recovered movies and logs one line for each. Any thread.
@@ -26,7 +26,7 @@ class RecoveredRecordings {
                                         const HandOffOrder::Ticket& ticket);
 
  private:
-  void takeUpJobs(const std::string& repository);
+  void takeUpJobs();
   [[nodiscard]] bool writeDocument(const JobMaker::Finished& finished) const;
   [[nodiscard]] bool isToBeSubmitted(const RecoveredRecording& recording) const;
 

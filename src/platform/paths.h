@@ -14,6 +14,7 @@ inline constexpr std::string_view kServerInformation = "/var/lmx/agent/com.zando
 inline constexpr std::string_view kServerInformationOfRoot =
     "/var/root/Library/Caches/com.zandor.lmxserverinfo.plist";
 inline constexpr std::string_view kTimersFile = "/var/lmx/agent/timers";
+inline constexpr std::string_view kJobsDirectory = "/var/lmx/agent/jobs";
 inline constexpr std::string_view kTimeShiftFile = "/var/lmx/agent/timeshift";
 inline constexpr std::string_view kPidFile = "/var/run/lmxagentd.pid";
 inline constexpr std::string_view kLocalSocket = "/var/run/lmxagentd.comm";

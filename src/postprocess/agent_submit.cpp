@@ -129,7 +129,9 @@ int AgentSubmit::addRecording(ChildRunner& children) {
     submission.password = *secret;
   }
   if (stored) stored->begin();
-  return submitWithTool(children, submissionArguments(submission));
+  const int result = submitWithTool(children, submissionArguments(submission));
+  if (stored) stored->remove();  // before anybody is told: a crash now must not name it as interrupted
+  return result;
 }
 
 /// The tool looks for a recording in the repository, so the input file of a "File" recording and its document

@@ -11,7 +11,6 @@
 #include <cstdio>
 #include <cstring>
 #include <filesystem>
-#include <mutex>
 #include <utility>
 
 #include "model/metadata_keys.h"
@@ -28,14 +27,6 @@ namespace {
 
 constexpr const char* kWaiting = ".job";
 constexpr const char* kBegun = ".begun";
-
-/// Serialises what makes, empties and removes the folder.
-std::mutex& folderMutex() {
-  static auto* mutex = new std::mutex;  // NOLINT: used by threads that outlive main, so never destroyed
-  return *mutex;
-}
-
-std::string folderIn(const std::string& repository) { return repository + "/.lmxagentd/jobs"; }
 
 bool exists(const std::string& path) { return access(path.c_str(), F_OK) == 0; }
 
@@ -63,18 +54,10 @@ std::vector<std::string> filesEndingIn(const char* ending, const std::string& fo
   return files;
 }
 
-int makeFolder(const std::string& repository) {
-  const std::string folder = folderIn(repository);
+int makeFolder(const std::string& folder) {
   if (exists(folder)) return 0;
-  // The end of a capture removes the common folder if it is empty, possibly right now: try again.
-  int error = ENOENT;
-  for (int attempt = 0; error == ENOENT && attempt < 10; ++attempt) error = mkdir_p(folder.c_str(), 0700);
-  if (error == 0) error = syncDirectory(directoryOf(folder));
-  return error != 0 ? error : syncDirectory(repository);
-}
-
-void removeFolderIfEmpty(const std::string& folder) {
-  if (rmdir(folder.c_str()) == 0) rmdir(directoryOf(folder).c_str());
+  if (const int error = mkdir_p(folder.c_str(), 0700)) return error;
+  return syncDirectory(directoryOf(folder));
 }
 
 void addIfSet(PlistDictionary& to, const char* key, const std::optional<std::string>& value) {
@@ -125,7 +108,6 @@ std::shared_ptr<AgentSubmit> readJob(const std::string& path, const std::shared_
 }  // namespace
 
 void StoredJob::begin() {
-  const std::lock_guard lock(folderMutex());
   const std::string begun = path_.substr(0, path_.size() - std::strlen(kWaiting)) + kBegun;
   int error = rename(path_.c_str(), begun.c_str()) == 0 ? 0 : errno;
   if (error == 0) {
@@ -138,20 +120,13 @@ void StoredJob::begin() {
                 path_.c_str(), std::strerror(error));
 }
 
-void StoredJob::remove() const {
-  const std::lock_guard lock(folderMutex());
-  unlink(path_.c_str());
-  removeFolderIfEmpty(directoryOf(path_));
-}
+void StoredJob::remove() const { unlink(path_.c_str()); }
 
-void JobStore::keep(const std::string& repository, AgentSubmit& job, std::uint64_t place) {
-  const std::lock_guard lock(folderMutex());
-  std::string path;
-  int error = makeFolder(repository);
-  if (error == 0) {
-    path = freeName(folderIn(repository), taken_numbers_ + place);
-    error = writePropertyList(path, written(job), 0600);
-  }
+void JobStore::keep(AgentSubmit& job, std::uint64_t place) {
+  const std::lock_guard lock(mutex_);
+  const std::string path = freeName(folder_, taken_numbers_ + place);
+  int error = makeFolder(folder_);
+  if (error == 0) error = writePropertyList(path, written(job), 0600);
   if (error == 0) {
     job.stored = std::make_shared<StoredJob>(path);
     return;
@@ -161,33 +136,38 @@ void JobStore::keep(const std::string& repository, AgentSubmit& job, std::uint64
                 job.recording_file_path.value_or("").c_str(), std::strerror(error));
 }
 
-JobStore::Left JobStore::takeUp(const std::string& repository, const std::shared_ptr<AgentContext>& context) {
-  const std::lock_guard lock(folderMutex());
+/// @return 0 or the errno; EWOULDBLOCK when another process has it
+int JobStore::lockFolder() {
+  if (const int error = makeFolder(folder_)) return error;
+  lock_.reset(open(folder_.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+  return lock_.valid() && flock(lock_.get(), LOCK_EX | LOCK_NB) == 0 ? 0 : errno;
+}
+
+JobStore::Left JobStore::takeUp(const std::shared_ptr<AgentContext>& context) {
+  const std::lock_guard lock(mutex_);
   Left left;
-  lock_.reset(open(repository.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
-  if (!lock_.valid() || flock(lock_.get(), LOCK_EX | LOCK_NB) != 0) {
-    LMPLogMessage(context->log_context(), kLogWarning,
-                  "Another process uses %s: the jobs that wait there are left to it", repository.c_str());
+  if (const int error = lockFolder()) {
+    LMPLogMessage(context->log_context(), kLogError, "The jobs in %s can't be taken up: %s", folder_.c_str(),
+                  error == EWOULDBLOCK ? "another process uses them" : std::strerror(error));
     return left;
   }
-  const std::string folder = folderIn(repository);
-  for (const std::string& path : filesEndingIn(kBegun, folder)) {
+  for (const std::string& path : filesEndingIn(kBegun, folder_)) {
     const PlistResult file = readPropertyList(path);
     left.begun.push_back(file ? textIn(file, "Movie").value_or(path) : path);
     unlink(path.c_str());
   }
-  for (const std::string& path : filesEndingIn(kWaiting, folder)) {
+  for (const std::string& path : filesEndingIn(kWaiting, folder_)) {
+    taken_numbers_ = std::max(taken_numbers_, numberOf(path));
     auto job = readJob(path, context);
     if (!job) continue;
-    taken_numbers_ = std::max(taken_numbers_, numberOf(path));
     taken_up_.push_back(job->request);
     left.waiting.push_back(std::move(job));
   }
-  removeFolderIfEmpty(folder);
   return left;
 }
 
 bool JobStore::tookUp(const std::string& request) const {
+  const std::lock_guard lock(mutex_);
   return !request.empty() && std::find(taken_up_.begin(), taken_up_.end(), request) != taken_up_.end();
 }
 

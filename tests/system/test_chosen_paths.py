@@ -39,9 +39,9 @@ def record_at(agent, uuid, path):
 
 def assert_beside(agent, got, path, uuid, mark):
     """The movie bears a number behind its name, its document stands beside it, and one warning names both paths."""
-    stem, ending = path.removesuffix(".mov"), ".mov"
-    assert re.fullmatch(rf"{re.escape(stem)}-\d+(\.\w+)*", got), got
-    if path.endswith(ending):
+    stem, dot, ending = path.rpartition(".") if "." in path.rsplit("/", 1)[1] else (path, "", "")
+    assert re.fullmatch(rf"{re.escape(stem)}-\d+{re.escape(dot + ending)}", got), got
+    if ending == "mov":
         assert got == f"{stem}-1.mov"
     movie.decodes(agent.path(got))
     document = agent.path(got.removesuffix(".mov") + ".xml")

@@ -7,7 +7,7 @@ from harness import movie
 from harness.agent import DEFAULTS, REPOSITORY
 from harness.commands import start_line
 from harness.log_reader import Level
-from harness.waiting import wait_until
+from harness.waiting import let_pass, wait_until
 
 FIRST = {"RecordingMetadata_TITLE": "one", "RecordingMetadata_ADHOC_WORKFLOW_UUID": "W-1",
          "RecordingMetadata_AGENT_USERNAME": "ada", "RecordingMetadata_AGENT_PASSWORD": "first secret"}
@@ -72,6 +72,7 @@ def test_in_a_pause(running):
     running.command("PAUSE")
     refuse(running, "B")
     assert running.command("STATUS").fields["recordStatus"] == "1"
+    let_pass(0.3, "the pause must be longer than a frame")
     running.command("RESUME")
     running.let_record(2)
     running.command("STOP")
@@ -104,7 +105,7 @@ def test_over_a_kill(running):
     assert running.document("A")["RecordingMetadata_TITLE"] == "one"
 
 
-@pytest.mark.parametrize("wrong", ["x" * 300, "a/b"])
+@pytest.mark.parametrize("wrong", ["x" * 300, "a/b"], ids=["long", "slash"])
 def test_one_that_is_wrong_in_itself(running, wrong):
     assert running.start_recording("A", RecordingMetadata_TITLE="one").text == "cmdStatus=0"
     running.let_record(1)

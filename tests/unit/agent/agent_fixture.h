@@ -2,6 +2,7 @@
 #pragma once
 #include <gtest/gtest.h>
 
+#include <filesystem>
 #include <memory>
 #include <string>
 
@@ -24,6 +25,7 @@ class AgentTest : public ::testing::Test {
   using Controller = std::shared_ptr<testing::ScriptedCaptureController>;
 
   AgentTest() {
+    std::filesystem::remove_all(systemPath(kJobsDirectory));  // those of the test before
     testing::writePreferences(testing::capturePreferences(repository_.path()));
     framework_->on_new_controller = [](auto& controller) {
       controller.on_process_request = [](const std::string& path) {

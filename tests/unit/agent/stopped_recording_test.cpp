@@ -379,12 +379,12 @@ TEST_F(LeftOver, StoppedRecordingsGoToTheServerOldestFirst) {
 }
 
 TEST_F(LeftOver, WaitingJobsComeBeforeThem) {
-  JobStore earlier;
+  JobStore earlier(systemPath(kJobsDirectory));
   AgentSubmit waiting;
   waiting.request = "request of W";
   waiting.properties["RecordingMetadata_RECORDING_UUID"] = "W";
   waiting.recording_file_path = movie("W.mov");
-  earlier.keep(repository_.path(), waiting, 7);
+  earlier.keep(waiting, 7);
   framework_->unfinished = {stopped("A", 100)};
   expected_ = 2;
   EXPECT_EQ(takeUp(), (Entries{"W", "A"}));
@@ -393,12 +393,12 @@ TEST_F(LeftOver, WaitingJobsComeBeforeThem) {
 
 /// The process was killed after it had stored the job and before the capture knew of that.
 TEST_F(LeftOver, OneThatHasItsJobAlreadyGetsNoSecond) {
-  JobStore earlier;
+  JobStore earlier(systemPath(kJobsDirectory));
   AgentSubmit waiting;
   waiting.request = "request of A";
   waiting.properties["RecordingMetadata_RECORDING_UUID"] = "A";
   waiting.recording_file_path = movie("A.mov");
-  earlier.keep(repository_.path(), waiting, 1);
+  earlier.keep(waiting, 1);
   framework_->unfinished = {stopped("A", 100)};
   EXPECT_EQ(takeUp(), Entries{"A"});
   EXPECT_TRUE(testing::waitUntil([&] { return agent_.submission().isIdle(); }));

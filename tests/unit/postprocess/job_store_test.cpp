@@ -22,11 +22,15 @@ class Jobs : public testing::SubmitFixture {
     made->properties_file_path = inRepository(name + ".xml");
     return made;
   }
-  static std::string folder() { return inRepository(".lmxagentd/jobs"); }
+  static std::string folder() { return testing::kTestRoot.path() + "/var/lmx/agent/jobs"; }
+  static std::size_t filesLeft() {
+    const std::filesystem::directory_iterator all(folder());
+    return static_cast<std::size_t>(std::distance(begin(all), end(all)));
+  }
   /// What a new process finds. @return the names of the jobs that wait, in order
   std::vector<std::string> takenUp(JobStore& store) {
     std::vector<std::string> names;
-    left_ = store.takeUp(repository(), context_);
+    left_ = store.takeUp(context_);
     for (const auto& waiting : left_.waiting)
       names.push_back(waiting->properties[metadata_key::kRecordingUUID]);
     return names;
@@ -38,30 +42,27 @@ using Names = std::vector<std::string>;
 
 TEST_F(Jobs, AreTakenUpInTheOrderOfTheirPlaces) {
   {
-    JobStore store;
-    store.keep(repository(), *job("C"), 3);
-    store.keep(repository(), *job("A"), 1);
-    store.keep(repository(), *job("B1"), 2);
-    store.keep(repository(), *job("B2"), 2);
+    JobStore store(folder());
+    store.keep(*job("C"), 3);
+    store.keep(*job("A"), 1);
+    store.keep(*job("B1"), 2);
+    store.keep(*job("B2"), 2);
   }
-  JobStore next;
+  JobStore next(folder());
   EXPECT_EQ(takenUp(next), (Names{"A", "B1", "B2", "C"}));
   EXPECT_TRUE(next.tookUp("request of B1"));
   EXPECT_FALSE(next.tookUp("request of D"));
-  next.keep(repository(), *job("D"), 1);
-  JobStore third;
-  left_ = {};
   EXPECT_TRUE(log_.entries().empty());
 }
 
 TEST_F(Jobs, OfANewProcessComeBehindThoseItTookUp) {
-  JobStore().keep(repository(), *job("old"), 40);
+  JobStore(folder()).keep(*job("old"), 40);
   {
-    JobStore second;
+    JobStore second(folder());
     takenUp(second);
-    second.keep(repository(), *job("new"), 1);
+    second.keep(*job("new"), 1);
   }
-  JobStore third;
+  JobStore third(folder());
   EXPECT_EQ(takenUp(third), (Names{"old", "new"}));
 }
 
@@ -72,8 +73,8 @@ TEST_F(Jobs, KeepAllThatTheToolNeeds) {
   kept->password = "open, sesame = <&>";
   kept->recorded = std::make_shared<AgentRecord>();
   kept->recorded->setRecordedType(kRecordingTypeVideo);
-  JobStore().keep(repository(), *kept, 1);
-  JobStore next;
+  JobStore(folder()).keep(*kept, 1);
+  JobStore next(folder());
   takenUp(next);
   ASSERT_EQ(left_.waiting.size(), 1U);
   AgentSubmit& found = *left_.waiting[0];
@@ -88,7 +89,7 @@ TEST_F(Jobs, KeepAllThatTheToolNeeds) {
 
 TEST_F(Jobs, AreForTheirOwnerAlone) {
   const auto kept = job("R1");
-  JobStore().keep(repository(), *kept, 1);
+  JobStore(folder()).keep(*kept, 1);
   for (const auto& entry : std::filesystem::directory_iterator(folder())) {
     EXPECT_EQ(entry.status().permissions(),
               std::filesystem::perms::owner_read | std::filesystem::perms::owner_write);
@@ -99,29 +100,27 @@ TEST_F(Jobs, AreForTheirOwnerAlone) {
 TEST_F(Jobs, AreGoneWithAllTracesOnceTheToolHasEnded) {
   for (const int status : {0, 3}) {
     const auto kept = job("R1");
-    JobStore().keep(repository(), *kept, 1);
+    JobStore(folder()).keep(*kept, 1);
     children_.results = {{ChildResult::End::exited, status, {}}};
     kept->addRecordingWithCommentary(children_);
-    EXPECT_EQ(filesInRepository(), 0U) << status;
+    EXPECT_EQ(filesLeft(), 0U) << status;
   }
 }
 
 TEST_F(Jobs, WhoseToolHadBeenStartedAreOnlyNamed) {
   const auto kept = job("R1");
-  JobStore().keep(repository(), *kept, 1);
-  JobStore().keep(repository(), *job("R2"), 2);
+  JobStore(folder()).keep(*kept, 1);
+  JobStore(folder()).keep(*job("R2"), 2);
   bool checked = false;
   children_.on_run = [&](const ChildOptions&) {  // the process is killed here
-    JobStore next;
+    JobStore next(folder());
     EXPECT_EQ(takenUp(next), Names{"R2"});
     EXPECT_EQ(left_.begun, Names{inRepository("R1.mov")});
-    JobStore third;
-    left_ = {};
     checked = true;
   };
   kept->addRecordingWithCommentary(children_);
   EXPECT_TRUE(checked);
-  JobStore last;
+  JobStore last(folder());
   takenUp(last);
   EXPECT_EQ(left_.begun, Names{}) << "named once";
 }
@@ -129,24 +128,24 @@ TEST_F(Jobs, WhoseToolHadBeenStartedAreOnlyNamed) {
 TEST_F(Jobs, ThatFailBeforeTheToolAreGoneToo) {
   const auto kept = job("R1");
   kept->adhoc_workflow_uuid = "W";  // and nobody to submit it
-  JobStore().keep(repository(), *kept, 1);
+  JobStore(folder()).keep(*kept, 1);
   EXPECT_EQ(kept->addRecordingWithCommentary(children_), -1);
-  EXPECT_EQ(filesInRepository(), 0U);
+  EXPECT_EQ(filesLeft(), 0U);
 }
 
 TEST_F(Jobs, OfAnotherProcessThatRunsAreLeftToIt) {
-  JobStore first;
+  JobStore first(folder());
   takenUp(first);
-  first.keep(repository(), *job("R1"), 1);
-  JobStore second;
+  first.keep(*job("R1"), 1);
+  JobStore second(folder());
   EXPECT_EQ(takenUp(second), Names{});
-  EXPECT_TRUE(log_.mentions("Another process uses " + repository()));
+  EXPECT_TRUE(log_.mentions("The jobs in " + folder() + " can't be taken up: another process uses them"));
 }
 
 TEST_F(Jobs, ThatCanNotBeReadAreLeftAloneAndNamed) {
-  JobStore().keep(repository(), *job("R1"), 2);
+  JobStore(folder()).keep(*job("R1"), 2);
   write(folder() + "/0000000001-0000.job", "half a fi");
-  JobStore next;
+  JobStore next(folder());
   EXPECT_EQ(takenUp(next), Names{"R1"});
   EXPECT_TRUE(log_.mentions("0000000001-0000.job"));
   EXPECT_TRUE(contentOf(folder() + "/0000000001-0000.job"));
@@ -154,8 +153,8 @@ TEST_F(Jobs, ThatCanNotBeReadAreLeftAloneAndNamed) {
 
 TEST_F(Jobs, ThatCanNotBeStoredStayInMemory) {
   const auto kept = job("R1");
-  write(inRepository(".lmxagentd"), "a file in the way");
-  JobStore().keep(repository(), *kept, 1);
+  write(inRepository("file"), "a file in the way");
+  JobStore(inRepository("file/jobs")).keep(*kept, 1);
   EXPECT_EQ(kept->stored, nullptr);
   EXPECT_TRUE(log_.mentions("The submission of \"" + inRepository("R1.mov") + "\" could not be stored"));
   EXPECT_EQ(kept->addRecordingWithCommentary(children_), 0);
