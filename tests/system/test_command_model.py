@@ -8,6 +8,7 @@ import os
 import random
 import threading
 import time
+import traceback
 
 import pytest
 from harness import command_outcome
@@ -35,6 +36,7 @@ def play(hall, script):
             for event in lane:
                 hall.step(event)
         except BaseException as failure:  # the main thread reports it
+            traceback.print_exception(failure)
             failures.append(failure)
 
     lanes = [threading.Thread(target=run, args=(lane,)) for lane in script.lanes]

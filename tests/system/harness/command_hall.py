@@ -1,10 +1,13 @@
 """A hall under test: one daemon that sequences of commands are played to, by several at once."""
+import contextlib
 import itertools
 import queue
 import re
 import signal
+import socket
 import threading
 import time
+from concurrent.futures import ThreadPoolExecutor
 
 from .agent import DEFAULTS
 from .command_model import Operation
@@ -35,6 +38,7 @@ class TunnelPeer:
         self._server = TunnelServer(agent)
         self._replies = queue.Queue()
         self.open = threading.Event()
+        self._connections = self._sent_on = 0
         self._closed = False
         self._thread = threading.Thread(target=self._serve, daemon=True)
         self._thread.start()
@@ -42,8 +46,9 @@ class TunnelPeer:
     def _serve(self):
         while not self._closed:
             try:
-                self._server.accept(1.0)
+                self._server.accept(0.2)
                 self._server.peer.settimeout(None)
+                self._connections += 1
                 self.open.set()
                 while True:
                     self._replies.put((self._server.reply().rstrip("\n"), time.time()))
@@ -51,30 +56,34 @@ class TunnelPeer:
                 continue
             except (EOFError, OSError, ValueError, AssertionError):
                 self.open.clear()
-                self._replies.put((None, time.time()))
 
     def send(self, line):
         """What has come unasked before is not an answer."""
         while not self._replies.empty():
             self._replies.get_nowait()
+        self._sent_on = self._connections
         try:
             self._server.send(line)
         except OSError as error:
             raise Gone from error
 
     def next(self):
-        try:
-            text, at = self._replies.get(timeout=PATIENCE)
-        except queue.Empty:
-            raise AssertionError("no reply on the tunnel") from None
-        if text is None:
-            raise Gone
-        return text, at
+        """The next reply and when it came; Gone when the connection that was asked has ended without one."""
+        end = time.monotonic() + PATIENCE
+        while time.monotonic() < end:
+            asked = self.open.is_set() and self._sent_on == self._connections
+            with contextlib.suppress(queue.Empty):
+                return self._replies.get(timeout=0.2 if asked else 0.0)
+            if not asked:
+                raise Gone
+        raise AssertionError("no reply on the tunnel")
 
     def close(self):
         self._closed = True
-        self._server.close()
+        with contextlib.suppress(OSError):  # closing alone would not wake the thread
+            self._server.peer.shutdown(socket.SHUT_RDWR)
         self._thread.join(5)
+        self._server.close()
 
 
 class LocalPeer:
@@ -114,6 +123,8 @@ class Hall:
         self._turn = {"local": threading.Lock(), "tunnel": threading.Lock(), "signal": threading.Lock()}
         self._waiting = {"local": 0, "tunnel": 0}  # timed commands whose replies may come in between
         self.tunnel = None
+        # The daemon is killed when the thread that has started it ends: the lanes end sooner.
+        self._starter = ThreadPoolExecutor(1)
         self.begin_sequence("")
         self._preferences()
         self._start()
@@ -127,6 +138,7 @@ class Hall:
     def close(self):
         if self.tunnel:
             self.tunnel.close()
+        self._starter.shutdown()
 
     def note(self, *details, **more):
         with self._guard:
@@ -142,7 +154,7 @@ class Hall:
         self.agent.preferences(**{"RecordingVideoInput": SMALL_CAMERA, "RecordingDiskSpaceCutoffInMB": ROOM, **changes})
 
     def _start(self):
-        self.agent.prepare()
+        self._starter.submit(self.agent.prepare).result()
         self.tunnel = TunnelPeer(self.agent)
         self.agent.start()
         wait_until(lambda: self.tunnel.open.is_set(), PATIENCE, "the tunnel")
@@ -263,11 +275,11 @@ class Hall:
         parameters = self.start_parameters(title, number) if title else {"n": str(number)}
         due = int(time.time()) + event.ahead
         self._waiting[event.way] += 1
-        answer = self._ask(timed_line(verb, due, TimerID=f"T{number}", **parameters), event.way, number)
-        if answer is None or answer[3] == ("cmdStatus=31",):
+        mark = self.agent.log.mark()
+        if self._ask(timed_line(verb, due, TimerID=f"T{number}", **parameters), event.way, number) is None:
             return
-        with self._guard:
-            self._timed.append((due, number, verb, title))
+        if self.agent.log.wait("^(Not s|S)cheduling ", 5, after=mark).text.startswith("Scheduling"):
+            self._timed.append((due, number, verb, title))  # otherwise its time had passed when it was read
 
     def wait_timed(self):
         """Waits until all timed commands have run, and notes them."""

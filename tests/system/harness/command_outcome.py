@@ -8,9 +8,9 @@ from .command_model import Left
 from .log_reader import Level
 
 FPS = 30
-ACCEPTED = (  # lines at critical and above that the events explain, by the events
-    (r"^Recording canceled, missing RecordingMetadata_RECORDING_UUID\.$", {"STOP"}),
-    (r"^The recording could not be finished: nothing was captured for ", {"STOP"}),
+ACCEPTED = (  # lines at critical and above that the events explain, by the events; each sequence ends with a STOP
+    (r"^Recording canceled, missing RecordingMetadata_RECORDING_UUID\.$", set()),
+    (r"^The recording could not be finished: nothing was captured for ", set()),
     (r"^The capture device has been disconnected\.$", {"END"}),
     (r"^Internal error caused application to stop$", {"END"}),
 )
@@ -69,7 +69,7 @@ def strays(agent, titles):
 def bad_lines(lines, verbs):
     """The lines at critical and above that the events of a sequence don't explain."""
     def explained(line):
-        return any(re.search(pattern, line.text) and causes & verbs for pattern, causes in ACCEPTED)
+        return any(re.search(pattern, line.text) and causes <= verbs for pattern, causes in ACCEPTED)
     return [line.text for line in lines if Level.UNKNOWN < line.level <= Level.CRITICAL and not explained(line)]
 
 
