@@ -6,6 +6,7 @@ shortest beginning that fails. LMX_SEQUENCES says how many sequences there are i
 import contextlib
 import os
 import random
+import re
 import threading
 import time
 import traceback
@@ -51,22 +52,27 @@ def play(hall, script):
         hall.end_of_loss(begun)
     hall.expect_alive()
     complaints = [*hall.complaints, *(f"{type(failure).__name__}: {failure}" for failure in failures)]
-    return Record(script, list(hall.operations), complaints, hall.mark, hall.agent.log.mark())
+    return Record(script, list(hall.operations), complaints, (begun, time.time()))
 
 
 class Record:
     """What was done in one sequence, and what is wrong with it."""
 
-    def __init__(self, script, operations, complaints, begin, end):
+    def __init__(self, script, operations, complaints, times):
         self.script, self.operations, self.complaints = script, operations, complaints
-        self.begin, self.end = begin, end
+        self.begun, self.ended = times
         self.explanation = None
+
+    def owns(self, line):
+        """Whether the log line is about this sequence: it names its recording, or no recording, in its time."""
+        named = re.search(r"/(\d+)-\d+\.", line.text)
+        return int(named[1]) == self.script.seed if named else self.begun <= line.at + CLOCK <= self.ended
 
     def check(self, agent, left, state):
         """Compares with the model. @return the state in which the next sequence begins"""
-        log = agent.log.lines(after=self.begin)[:self.end - self.begin]
+        lines = [line for line in agent.log.lines() if self.owns(line)]
         verbs = {op.verb for op in self.operations}
-        self.complaints += [f"in the log: {line}" for line in command_outcome.bad_lines(log, verbs)]
+        self.complaints += [f"in the log: {line.text}" for line in command_outcome.bad_lines(lines, verbs)]
         self.complaints += direct_complaints(self.operations, left)
         self.explanation = explain(self.operations, left, state)
         if not self.explanation.complaints:
@@ -83,9 +89,9 @@ class Record:
         lines += [f"  {complaint}" for complaint in self.complaints]
         if self.explanation and self.explanation.complaints:
             lines.append(self.explanation.text())
-        log = agent.log.lines(after=self.begin)[:self.end - self.begin + 60]
         lines += ["  the log:"] + [f"    {(line.at + CLOCK) % 1000:8.3f} <{line.level.name}> {line.text}"
-                                   for line in log]
+                                   for line in agent.log.lines()
+                                   if self.owns(line) or self.begun <= line.at + CLOCK <= self.ended + 1]
         return "\n".join(lines)
 
 

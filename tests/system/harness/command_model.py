@@ -51,6 +51,7 @@ class Left:
     seconds: float = 0.0
     problem: str = ""  # why movie or document are not as they should be
     named: bool = False  # a log line says that its submission was in hand when the process ended
+    empty: bool = False  # a log line says that it has not a single picture
 
     def nothing(self):
         return not self.movie and self.submissions == 0
@@ -194,8 +195,9 @@ class Model:
 
 def contradiction(ending, found, brief):
     """Why what was found does not fit a recording that has so ended; empty if it does. A `brief` one may have no
-    picture: it was ended before the camera had to deliver one, or killed before one had to be on the disk."""
-    if brief and found.nothing():
+    picture: it was ended before the camera had to deliver one, or killed before one had to be on the disk. The log must
+    say so."""
+    if brief and found.empty and found.nothing():
         return ""
     if ending == "cancelled":
         return "" if found.nothing() else f"cancelled, but {found}"

@@ -39,7 +39,10 @@ def left_of(agent, op, submitted):
     """What is left of the START `op`. `submitted` are the identifiers in the order of their submissions."""
     path = agent.path(f"{REPOSITORY}/{op.title}.mov")
     places = [i for i, uuid in enumerate(submitted) if uuid == op.title]
-    left = {"submissions": len(places), "place": places[0] if places else -1}
+    name = re.escape(op.title)
+    left = {"submissions": len(places), "place": places[0] if places else -1,
+            "empty": bool(agent.log.lines(rf"nothing was captured for .*/{name}\.mov$")),
+            "named": bool(agent.log.lines(name + r"\b.*(was in hand|had been started|not started again)"))}
     if not path.exists():
         orphan = path.with_suffix(".xml").exists()
         return Left(**left, problem="a document without its movie" if orphan else "")
@@ -48,8 +51,7 @@ def left_of(agent, op, submitted):
         problem = problem or document_problem(agent.document(op.title), op)
     except FileNotFoundError:
         problem = problem or "a movie without its document"
-    named = agent.log.lines(re.escape(op.title) + r".*(was in hand|had been started|not started again)")
-    return Left(**left, movie=True, seconds=seconds, problem=problem, named=bool(named))
+    return Left(**left, movie=True, seconds=seconds, problem=problem)
 
 
 def collect(agent, operations):
@@ -67,10 +69,10 @@ def strays(agent, titles):
 
 
 def bad_lines(lines, verbs):
-    """The lines at critical and above that the events of a sequence don't explain."""
+    """The lines at critical and above that the events don't explain."""
     def explained(line):
         return any(re.search(pattern, line.text) and causes <= verbs for pattern, causes in ACCEPTED)
-    return [line.text for line in lines if Level.UNKNOWN < line.level <= Level.CRITICAL and not explained(line)]
+    return [line for line in lines if Level.UNKNOWN < line.level <= Level.CRITICAL and not explained(line)]
 
 
 def sweep(agent):
