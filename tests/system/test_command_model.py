@@ -14,6 +14,7 @@ import traceback
 import pytest
 from harness import command_outcome
 from harness.agent import Agent
+from harness.command_cells import cells_hit, cells_missed
 from harness.command_hall import CLOCK, Hall
 from harness.command_model import State, direct_complaints, explain
 from harness.command_sequences import sequence
@@ -121,14 +122,16 @@ def check_batch(hall, records, state):
 
 def play_all(agent, scripts):
     """Plays the sequences in batches. @return the failures"""
-    failures, state = [], State()
+    failures, kills, state = [], [], State()
     with contextlib.closing(Hall(agent)) as hall:
         for begin in range(0, len(scripts), BATCH):
             records = [play(hall, script) for script in scripts[begin:begin + BATCH]]
             wrong, state = check_batch(hall, records, state)
             failures += wrong
+            kills += [op.sent - CLOCK for record in records for op in record.operations if op.verb == "KILL"]
             if len(failures) >= ENOUGH:
                 break
+    print("cells of the table without an event:", *cells_missed(cells_hit(agent.log.lines(), kills)), sep="\n  ")
     return failures
 
 

@@ -5,8 +5,10 @@ import subprocess
 import numpy
 import pytest
 from harness import movie
+from harness.command_cells import cells_hit, cells_missed
 from harness.command_model import Left, Operation, direct_complaints, explain
 from harness.command_sequences import THEMES, sequence
+from harness.log_reader import Level, LogLine
 from harness.unread import all_read, wait_read
 
 
@@ -85,7 +87,8 @@ def test_what_the_daemon_has_not_read_is_seen(agent, server, way):
 # The checker of the command model, fed with histories that no honest daemon leaves.
 
 def said(verb, sent, done=None, reply="cmdStatus=0", title="", **more):
-    return Operation(verb, "local", sent, sent + 0.01 if done is None else done, (reply,) if reply else (), title, **more)
+    done = sent + 0.01 if done is None else done
+    return Operation(verb, "local", sent, done, (reply,) if reply else (), title, **more)
 
 
 def showing(number, sent, elapsed=0):
@@ -140,8 +143,8 @@ def test_doctored_remains_are_a_failure(left, complaint):
     (9, showing(2, 108.0), "STATUS says"),
     (9, showing(0, 108.0, 20), "STATUS counts 20 s"),
     (6, said("BAD", 103.0), "BAD was answered"),
-], ids=["refused while idle", "no room though there is", "accepted while recording", "STOP refused", "idle while recording",
-        "recording while paused", "recording after the end", "more media than time", "malformed but accepted"])
+], ids=["refused while idle", "no room though there is", "accepted while recording", "STOP refused",
+        "idle while recording", "recording while paused", "recording after the end", "more media than time", "malformed but accepted"])
 def test_a_lying_reply_is_a_failure(place, lie, complaint):
     history = two_lectures()
     history[place] = lie
@@ -195,3 +198,16 @@ def test_timed_commands_run_in_the_order_of_their_dates():
 def test_a_sequence_comes_from_its_seed_alone():
     assert [str(sequence(seed)) for seed in range(50)] == [str(sequence(seed)) for seed in range(50)]
     assert {sequence(seed).theme for seed in range(300)} == set(THEMES)
+
+
+def test_cells_are_read_from_the_log():
+    story = ["lmxagentd (version 100) starting...", "Command is [STOP n=1]", "Command is [START n=2]",
+             "Process prepareCapture", "Command is [PAUSE n=3]", '"/A.mov" recording started', "Got Pause Signal",
+             '"/A.mov" recording paused (current duration: 0s)', "Command is [STATUS]", "Process stopCapture",
+             "Command is [START n=4]", "Submitting Stopped Recording", "Running deferred command: CANCEL",
+             '"/A.mov" recording stopped (duration: 0s)']
+    lines = [LogLine(Level.DEBUG, 3, 1, text, float(at), text) for at, text in enumerate(story)]
+    hit = {("STOP", "idle"), ("START", "idle"), ("PAUSE", "preparing"), ("USR1", "recording"), ("STATUS", "paused"),
+           ("START", "stopping"), ("timed CANCEL", "finishing"), ("KILL", "finishing")}
+    assert cells_hit(lines, [12.5]) == hit
+    assert "STOP: preparing, recording, paused, stopping, finishing, offline" in cells_missed(hit)

@@ -184,10 +184,13 @@ class Hall:
 
     def step(self, event):
         """Does what `event` says and notes it."""
-        let_pass(event.delay, "the sequence says so")
+        now = time.time()
+        let_pass(event.delay if event.verb != "WAIT" else 1 - (now + event.delay) % 1, "the sequence says so")
         self._up.wait(PATIENCE)
         if event.verb in ("TERM", "INT", "KILL"):
             self.restart(lambda: self.agent.stop(getattr(signal, "SIG" + event.verb), 40), event.verb)
+        elif event.verb == "WAIT":
+            return
         elif event.way == "signal":
             self._signal(event.verb)
         elif event.verb in ("SHORTAGE", "ROOM"):

@@ -1,5 +1,5 @@
-"""What the daemon may do with commands that meet each other: a sequential model, and a search for an order that explains
-all that was observed.
+"""What the daemon may do with commands that meet each other: a sequential model, and a search for an order that
+explains all that was observed.
 
 Each operation took effect at one moment between its sending and its end. There must be an order of these moments in
 which the model gives the very replies that came, and leaves what was found afterwards.

@@ -18,8 +18,8 @@ ACCEPTED = (  # lines at critical and above that the events explain, by the even
 
 def seconds_of(path):
     """Decodes the whole movie. @return the length of its pictures in seconds, and what is wrong with it"""
-    result = subprocess.run(["ffmpeg", "-nostdin", "-v", "warning", "-i", str(path), "-map", "0", "-f", "framecrc", "-"],
-                            capture_output=True, timeout=120, check=False)
+    command = ["ffmpeg", "-nostdin", "-v", "warning", "-i", str(path), "-map", "0", "-f", "framecrc", "-"]
+    result = subprocess.run(command, capture_output=True, timeout=120, check=False)
     frames = sum(line.startswith(b"0,") for line in result.stdout.splitlines())
     problem = result.stderr.decode(errors="replace").strip()
     if result.returncode != 0 or problem or not frames:

@@ -2,15 +2,22 @@
 import random
 from dataclasses import dataclass, field
 
-COMMANDS = {"START": 28, "STOP": 20, "PAUSE": 10, "RESUME": 10, "CANCEL": 6, "STATUS": 18, "BAD": 3, "USR1": 2, "USR2": 3}
+COMMANDS = {"START": 28, "STOP": 20, "PAUSE": 10, "RESUME": 10, "CANCEL": 6, "STATUS": 18, "BAD": 3, "USR1": 2,
+            "USR2": 3}
 TIMED = {"START": 10, "STOP": 10, "CANCEL": 2, "PAUSE": 1, "RESUME": 1}
-THEMES = {"serial": 38, "parallel": 34, "timed": 14, "restart": 9, "hang-up": 2, "shortage": 3, "loss": 1}
+THEMES = {"serial": 28, "parallel": 30, "aimed": 18, "timed": 12, "restart": 7, "hang-up": 2, "shortage": 2, "loss": 1}
 WAYS = ("local", "tunnel")
+ENDING = ("HUP", "INT", "TERM", "KILL")
+AIMED = {"START": 4, "STOP": 4, "PAUSE": 4, "RESUME": 4, "CANCEL": 4, "STATUS": 2, "USR1": 2, "USR2": 2, "HUP": 0.5,
+         "INT": 1, "TERM": 1, "KILL": 1, "TIMED START": 1, "TIMED STOP": 1, "TIMED PAUSE": 1, "TIMED RESUME": 1,
+         "TIMED CANCEL": 1}
+TARGETS = ("idle", "preparing", "recording", "paused", "stopping", "stopping", "finishing", "finishing")
 
 
 @dataclass(frozen=True)
 class Event:
-    """One step: what (a verb, "TIMED verb", or a mishap), by which way, how long after the step before."""
+    """One step: what (a verb, "TIMED verb", or a mishap), by which way, how long after the step before. WAIT: until so
+    long before the next full second."""
 
     verb: str
     way: str
@@ -73,6 +80,8 @@ def sequence(seed, theme=None):
         made.lanes = [[step(dice, way) for _ in range(dice.randint(2, 6))] for way in WAYS]
         if dice.random() < 0.4:
             made.lanes.append([Event(dice.choice(("USR1", "USR2")), "signal", delay(dice)) for _ in range(2)])
+    elif theme == "aimed":
+        made.lanes = aimed(dice)
     else:
         made.lanes = [[step(dice) for _ in range(dice.randint(4, 10))]]
     if theme == "timed":
@@ -80,6 +89,26 @@ def sequence(seed, theme=None):
                                  dice.choice((1, 1, 2))) for _ in range(dice.randint(1, 5))])
     made.lanes += mishap(dice, theme)
     return made
+
+
+def aimed(dice):
+    """One event that is to find the recorder in a certain state, some of which last for a few milliseconds."""
+    verb, target = chosen(dice, AIMED), dice.choice(TARGETS)
+    way = "signal" if verb in (*ENDING, "USR1", "USR2") else "local"
+    lead = [Event("START", "local", 0.0)] if target not in ("idle", "preparing") else []
+    if target == "paused" or (lead and dice.random() < 0.2):
+        lead.append(Event("PAUSE", "local", dice.uniform(0.1, 0.3)))
+    if target in ("stopping", "finishing"):
+        lead.append(Event("STOP", dice.choice(WAYS), dice.uniform(0.1, 0.4)))
+    moment = {"idle": 0.0, "recording": 0.2, "paused": 0.05, "preparing": dice.uniform(0.005, 0.03),
+              "stopping": dice.uniform(0.0, 0.02), "finishing": dice.uniform(0.0, 0.05)}[target]
+    if verb.startswith("TIMED"):
+        before = sum(event.delay for event in lead) + moment
+        start = [Event("START", "tunnel", 0.0)] if target == "preparing" else []
+        return [[Event(verb, "local", 0.0, 2), Event("WAIT", "world", before % 1), *lead, *start]]
+    if target == "preparing":
+        return [[Event("START", "tunnel", 0.0)], [Event(verb, way, moment)]]
+    return [[*lead, Event(verb, way, moment)]]
 
 
 def mishap(dice, theme):
