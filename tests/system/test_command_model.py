@@ -21,7 +21,8 @@ from harness.command_sequences import sequence
 
 COUNT = int(os.environ.get("LMX_SEQUENCES", "24"))
 SHARDS = min(int(os.environ.get("LMX_SHARDS", "2")), COUNT)
-SEED = int(os.environ.get("LMX_SEED") or random.SystemRandom().randrange(10**6))
+RUN = os.environ.get("PYTEST_XDIST_TESTRUNUID", str(os.getpid()) + str(time.time()))  # the same in all workers
+SEED = int(os.environ.get("LMX_SEED") or random.Random(RUN).randrange(10**6))
 THEME = os.environ.get("LMX_THEME")
 BATCH = 20  # sequences between two looks at what is left
 ENOUGH = 5  # failures, and no more sequences are played

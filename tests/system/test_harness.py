@@ -144,7 +144,8 @@ def test_doctored_remains_are_a_failure(left, complaint):
     (9, showing(0, 108.0, 20), "STATUS counts 20 s"),
     (6, said("BAD", 103.0), "BAD was answered"),
 ], ids=["refused while idle", "no room though there is", "accepted while recording", "STOP refused",
-        "idle while recording", "recording while paused", "recording after the end", "more media than time", "malformed but accepted"])
+        "idle while recording", "recording while paused", "recording after the end", "more media than time",
+        "malformed but accepted"])
 def test_a_lying_reply_is_a_failure(place, lie, complaint):
     history = two_lectures()
     history[place] = lie

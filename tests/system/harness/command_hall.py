@@ -121,7 +121,6 @@ class Hall:
         self._numbers = itertools.count(1)
         self._up = threading.Event()  # the daemon may be talked to
         self._turn = {"local": threading.Lock(), "tunnel": threading.Lock(), "signal": threading.Lock()}
-        self._waiting = {"local": 0, "tunnel": 0}  # timed commands whose replies may come in between
         self.tunnel = None
         # The daemon is killed when the thread that has started it ends: the lanes end sooner.
         self._starter = ThreadPoolExecutor(1)
@@ -133,6 +132,7 @@ class Hall:
         self.name, self.operations, self.complaints = name, [], []
         self._titles, self._guard = itertools.count(1), threading.Lock()
         self._timed = []
+        self._waiting = {"local": 0, "tunnel": 0}  # timed commands whose replies may come in between
         self.mark = self.agent.log.mark()
 
     def close(self):
@@ -294,7 +294,6 @@ class Hall:
             if not line.text.endswith(verb):
                 self.complain(f"the timed {verb} {title} was due, but this ran: {line.text}")
             self.note(verb, "timed", float(due), line.at + CLOCK + 0.3, (), title, number=number, due=due)
-        self._waiting = {"local": 0, "tunnel": 0}
 
     # Signals and mishaps ---------------------------------------------------------------------------------------
 
