@@ -1,7 +1,8 @@
 """Random sequences of commands from several channels at once, with signals and mishaps, against a model.
 
 Each failure prints its seed; LMX_SEED=<seed> LMX_SEQUENCES=1 plays that sequence again, LMX_SHRINK=1 looks for its
-shortest beginning that fails. LMX_SEQUENCES says how many sequences there are in all.
+shortest beginning that fails. LMX_SEQUENCES says how many sequences there are in all, LMX_SHARDS in how many tests,
+LMX_ENOUGH after how many failures to stop, LMX_THEME that all are of one kind (see harness/command_sequences.py).
 """
 import contextlib
 import os
@@ -25,7 +26,7 @@ RUN = os.environ.get("PYTEST_XDIST_TESTRUNUID", str(os.getpid()) + str(time.time
 SEED = int(os.environ.get("LMX_SEED") or random.Random(RUN).randrange(10**6))
 THEME = os.environ.get("LMX_THEME")
 BATCH = 20  # sequences between two looks at what is left
-ENOUGH = 5  # failures, and no more sequences are played
+ENOUGH = int(os.environ.get("LMX_ENOUGH", "5"))  # failures, and no more sequences are played
 
 
 def play(hall, script):

@@ -294,6 +294,8 @@ class Hall:
             if not line.text.endswith(verb):
                 self.complain(f"the timed {verb} {title} was due, but this ran: {line.text}")
             self.note(verb, "timed", float(due), line.at + CLOCK + 0.3, (), title, number=number, due=due)
+        for way in self._waiting:  # waits for the main thread: no reply of a timed command comes later
+            self.command("RESUME", way)
 
     # Signals and mishaps ---------------------------------------------------------------------------------------
 
