@@ -86,7 +86,8 @@ class Record:
         return bool(self.complaints or (self.explanation and self.explanation.complaints))
 
     def report(self, agent, left):
-        lines = [f"=== FAILED: LMX_SEED={self.script.seed} LMX_THEME={self.script.theme} LMX_SEQUENCES=1", str(self.script), "  what was done:"]
+        lines = [f"=== FAILED: LMX_SEED={self.script.seed} LMX_THEME={self.script.theme} LMX_SEQUENCES=1",
+                 str(self.script), "  what was done:"]
         lines += [f"    {op}" for op in sorted(self.operations, key=lambda op: op.sent)]
         lines += ["  what was left:"] + [f"    {title}: {found}" for title, found in left.items()]
         lines += [f"  {complaint}" for complaint in self.complaints]
