@@ -171,8 +171,18 @@ double CaptureActions::shiftedReferenceTime() const {
   return secondsSinceReferenceDate() - context_.state.timeshift_seconds.get();
 }
 
+/// A PAUSE has closed the span of its request as well. Without a span nothing would be recorded.
+void CaptureActions::resumeCaptureAndRequest() {
+  resumeCapture();
+  const auto controller = captureController();
+  if (!controller) return;
+  const RecordingRequest request = session()->request.get();
+  if (!request.uuid.empty())
+    controller->setStartWithUUID(request.uuid, shiftedReferenceTime(), request.properties);
+}
+
 void CaptureActions::pauseOrResume(bool pause) {
-  if (!context_.options.adhoc.get()) return pause ? pauseCapture() : resumeCapture();
+  if (!context_.options.adhoc.get()) return pause ? pauseCapture() : resumeCaptureAndRequest();
   const auto controller = captureController();
   if (!controller) return;
   const std::string uuid = session()->recording_uuid.get();

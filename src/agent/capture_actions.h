@@ -47,6 +47,7 @@ class CaptureActions {
  private:
   void configure(AgentRecord& record, const Dictionary& properties);
   void beginRequest(AgentRecord& record, const SharedDictionary& properties);
+  void resumeCaptureAndRequest();
   void setPreviewRunning(bool run);
   void stopOrCancelCapture(bool cancel);
   void stopOrCancelAdHoc(bool cancel);

@@ -35,6 +35,7 @@ void RequestMarks::start(const std::string& uuid, double t, SharedDictionary par
     request =
         &requests_.emplace_back(Request{.uuid = uuid, .parameters = std::move(parameters), .spans = {}});
   }
+  if (request->submit) return;
   if (!request->spans.empty()) {
     if (request->spans.back().open()) return;
     t = std::max(t, request->spans.back().stop);

@@ -184,6 +184,15 @@ TEST_F(Actions, ShutDownControlCancelsAndAsksForTheDeviceAgain) {
   EXPECT_GT(context_->state.last_device_check.get(), 0);
 }
 
+/// PAUSE closes the request's span as well as it pauses the capture.
+TEST_F(Actions, TheResumeSignalEndsThePauseOfACommandToo) {
+  const auto controller = start("R1");
+  agent_.signal(SIGUSR2);
+  EXPECT_EQ(controller->marks().back().operation, "setStart");
+  EXPECT_EQ(controller->marks().back().uuid, "request of R1");
+  EXPECT_EQ(lookUp(controller->marks().back().parameters, "RecordingMetadata_RECORDING_UUID"), "R1");
+}
+
 TEST_F(Actions, SignalsRunTheirActions) {
   start("R1");
   agent_.signal(SIGPIPE);
