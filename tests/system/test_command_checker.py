@@ -116,6 +116,9 @@ def test_timed_commands_run_in_the_order_of_their_dates():
     history = [said("START", 100.0, title="A"), timed("START", 103, 3, "B"), timed("STOP", 103, 2), said("STOP", 106.0)]
     assert complaints(history, {"A": kept(3.0, 0), "B": kept(3.0, 1)}) == []
     assert complaints(history, {"A": kept(6.0, 0), "B": Left()}), "the STOP was scheduled before the START"
+    late_stop = [history[0], timed("START", 103, 2, "B"), timed("STOP", 103, 3), history[3]]
+    assert complaints(late_stop, {"A": kept(3.0, 0), "B": kept(3.0, 1)}) == [], "in one second STOP comes first"
+    assert complaints(late_stop, {"A": kept(3.0, 0), "B": Left()}), "B was to begin when A had ended"
 
 
 def test_a_sequence_comes_from_its_seed_alone():

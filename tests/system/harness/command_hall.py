@@ -8,9 +8,9 @@ import socket
 import threading
 import time
 from concurrent.futures import ThreadPoolExecutor
+from dataclasses import replace
 
-from .agent import DEFAULTS
-from .command_model import Operation
+from .command_model import FOREVER, Operation
 from .commands import command_line, start_parameters, timed_line
 from .tunnel_server import TunnelServer
 from .waiting import let_pass, wait_until
@@ -282,7 +282,8 @@ class Hall:
         if self._ask(timed_line(verb, due, TimerID=f"T{number}", **parameters), event.way, number) is None:
             return
         if self.agent.log.wait("^(Not s|S)cheduling ", 5, after=mark).text.startswith("Scheduling"):
-            self._timed.append((due, number, verb, title))  # otherwise its time had passed when it was read
+            # Otherwise its time had passed when it was read.
+            self._timed.append(Operation(verb, "timed", float(due), FOREVER, (), title, number=number, due=due))
 
     def wait_timed(self):
         """Waits until all timed commands have run, and notes them."""
@@ -290,10 +291,11 @@ class Hall:
             return
         running = r"^Running deferred command: "
         ran = [self.agent.log.wait(running, PATIENCE, after=self.mark, count=i + 1) for i in range(len(self._timed))]
-        for line, (due, number, verb, title) in zip(ran, sorted(self._timed)):
-            if not line.text.endswith(verb):
-                self.complain(f"the timed {verb} {title} was due, but this ran: {line.text}")
-            self.note(verb, "timed", float(due), line.at + CLOCK + 0.3, (), title, number=number, due=due)
+        for line, timed in zip(ran, sorted(self._timed, key=Operation.turn)):
+            if not line.text.endswith(" " + timed.verb):
+                self.complain(f"the timed {timed.verb} {timed.title} was due, but this ran: {line.text}")
+            with self._guard:
+                self.operations.append(replace(timed, done=line.at + CLOCK + 0.3))
         for way in self._waiting:  # waits for the main thread: no reply of a timed command comes later
             self.command("RESUME", way)
 

@@ -34,6 +34,10 @@ class Operation:
     number: int = 0
     due: int = 0  # of a timed command
 
+    def turn(self):
+        """Where it comes among the timed commands: in one second what ends a recording runs before what begins one."""
+        return self.due, self.verb not in ("STOP", "CANCEL"), self.number
+
     def __str__(self):
         reply = " or ".join(text.strip() for text in self.replies) or "no reply known"
         name = f"{self.verb} {self.title}".strip() + (f" due {self.due % 1000}" if self.due else "")
@@ -92,7 +96,7 @@ def describe(state):
 
 def must_precede(first, second):
     """Whether `first` has certainly taken effect before `second`."""
-    if first.due and second.due and (first.due, first.number) < (second.due, second.number):
+    if first.due and second.due and first.turn() < second.turn():
         return True
     end = first.done
     if second.verb == "STATUS" and (first.verb in POSTED or first.due):

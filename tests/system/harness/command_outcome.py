@@ -42,7 +42,7 @@ def left_of(agent, op, submitted):
     name = re.escape(op.title)
     left = {"submissions": len(places), "place": places[0] if places else -1,
             "empty": bool(agent.log.lines(rf"nothing was captured for .*/{name}\.mov$")),
-            "named": bool(agent.log.lines(name + r"\b.*(was in hand|had been started|not started again)"))}
+            "named": bool(agent.log.lines(rf'^The agent ended while ".*/{name}\.mov" was being submitted'))}
     if not path.exists():
         orphan = path.with_suffix(".xml").exists()
         return Left(**left, problem="a document without its movie" if orphan else "")
