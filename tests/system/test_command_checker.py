@@ -1,10 +1,12 @@
 """The checker of the command model, fed with histories that no honest daemon leaves."""
+import datetime
 import re
 
 import pytest
 from harness.command_cells import cells_hit, cells_missed
-from harness.command_model import Left, Operation, direct_complaints, explain
-from harness.command_sequences import THEMES, sequence
+from harness.command_model import FOREVER, Left, Operation, direct_complaints, explain
+from harness.command_sequences import THEME_NAMES, sequence
+from harness.command_timed import TimedList, follow
 from harness.log_reader import Level, LogLine
 
 
@@ -123,17 +125,61 @@ def test_timed_commands_run_in_the_order_of_their_dates():
 
 def test_a_sequence_comes_from_its_seed_alone():
     assert [str(sequence(seed)) for seed in range(50)] == [str(sequence(seed)) for seed in range(50)]
-    assert {sequence(seed).theme for seed in range(300)} == set(THEMES)
+    assert {sequence(seed).theme for seed in range(300)} == set(THEME_NAMES)
+
+
+def log_of(story):
+    return [LogLine(Level.DEBUG, 3, 1, text, float(at), text) for at, text in enumerate(story)]
 
 
 def test_cells_are_read_from_the_log():
-    story = ["lmxagentd (version 100) starting...", "Command is [STOP n=1]", "Command is [START n=2]",
-             "Process prepareCapture", "Command is [PAUSE n=3]", '"/A.mov" recording started', "Got Pause Signal",
-             '"/A.mov" recording paused (current duration: 0s)', "Command is [STATUS]", "Process stopCapture",
-             "Command is [START n=4]", "Submitting Stopped Recording", "Running deferred command: CANCEL",
-             '"/A.mov" recording stopped (duration: 0s)']
-    lines = [LogLine(Level.DEBUG, 3, 1, text, float(at), text) for at, text in enumerate(story)]
+    lines = log_of(["lmxagentd (version 100) starting...", "Command is [STOP n=1]", "Command is [START n=2]",
+                    "Process prepareCapture", "Command is [PAUSE n=3]", '"/A.mov" recording started',
+                    '"/A.mov" recording paused (current duration: 0s)', "Command is [STATUS]", "Process stopCapture",
+                    "Command is [START n=4]", "Submitting Stopped Recording", '"/A.mov" recording stopped (duration: 0s)',
+                    "Got Signal (SIGHUP)", "Command is [CANCEL n=5]"])
     hit = {("STOP", "idle"), ("START", "idle"), ("PAUSE", "preparing"), ("USR1", "recording"), ("STATUS", "paused"),
-           ("START", "stopping"), ("timed CANCEL", "finishing"), ("KILL", "finishing")}
-    assert cells_hit(lines, [12.5]) == hit
+           ("START", "stopping"), ("shortage", "stopping"), ("timed CANCEL", "finishing"), ("KILL", "finishing"),
+           ("CANCEL", "idle"), ("CANCEL", "offline")}
+    arrived = [("USR1", 5.5), ("timed CANCEL", 10.3), ("KILL", 10.5)]
+    assert cells_hit(lines, arrived, [4]) == hit
     assert "STOP: preparing, recording, paused, stopping, finishing, offline" in cells_missed(hit)
+
+
+def scheduled(verb, number):
+    return Operation(verb, "timed", 100.0, FOREVER, (), number=number, due=100)
+
+
+def story_of(*story):
+    date = datetime.datetime.fromtimestamp(100, datetime.timezone.utc).strftime("%Y-%m-%d %H:%M:%S %z")
+    return log_of([text.replace("DATE", date) for text in story])
+
+
+STOP_AND_START = ("Scheduling START command to run at: DATE", "Scheduling STOP command to run at: DATE")
+SENT = (scheduled("START", 1), scheduled("STOP", 2))
+
+
+def test_timed_commands_are_followed_through_the_log():
+    ran = follow(SENT, story_of(*STOP_AND_START, "Running deferred command: STOP", "Running deferred command: START"))
+    assert [op.verb for op, _ in ran.ran] == ["STOP", "START"] and not ran.complaints
+    swapped = follow(SENT, story_of(*STOP_AND_START, "Running deferred command: START"))
+    assert "but a START ran" in swapped.complaints[0] and swapped.waiting
+
+
+def test_timed_commands_are_followed_over_a_restart():
+    start = "lmxagentd (version 100) starting..."
+    again = follow(SENT, story_of(*STOP_AND_START, start, *STOP_AND_START, "Running deferred command: STOP"))
+    assert [op.verb for op in again.waiting] == ["START"] and not again.lost
+    gone = follow(SENT, story_of(*STOP_AND_START, start,
+                                 "Not scheduling STOP command. The timer has expired: DATE"))
+    assert [op.verb for op in gone.expired] == ["STOP"] and [op.verb for op in gone.lost] == ["START"]
+
+
+def test_a_scheduled_command_may_be_lost_only_if_nobody_was_told_of_it():
+    for answered, complaints_expected in ((99.0, 1), (FOREVER, 0)):
+        commands = TimedList()
+        commands.add("STOP", 100, 1, "")
+        commands.answered(answered)
+        kill = Operation("KILL", "signal", 99.5, 99.6)
+        found = commands.outcome(story_of(STOP_AND_START[1], "lmxagentd (version 100) starting..."), 0.0, [kill])
+        assert len(found[1]) == complaints_expected, found

@@ -1,24 +1,19 @@
 """Which command came in which state, as the log tells it: the cells of the table in docs/architecture.md."""
+import contextlib
 import re
+import time
 
 STATES = ("idle", "preparing", "recording", "paused", "stopping", "finishing", "offline")
 COMMANDS = ("START", "STOP", "PAUSE", "RESUME", "CANCEL")
 EVENTS = (*COMMANDS, *(f"timed {command}" for command in COMMANDS), "STATUS", "USR1", "USR2", "HUP", "INT", "TERM",
           "KILL", "loss", "shortage")
-IMPOSSIBLE = {("loss", state) for state in ("idle", "preparing", "finishing", "offline")}  # no device is open then
+IMPOSSIBLE = {  # by construction
+    **{("loss", state): "no device is open" for state in ("idle", "finishing")},
+    ("loss", "preparing"): "the START fails; a synthetic device can't go before its first picture",
+}
 CANCELLED_FOR = 0.05  # seconds; the end of a cancelled capture has no line of its own
 
-SEEN = (  # what happens, by a line of the log
-    (r"^Command is \[(START|STOP|PAUSE|RESUME|CANCEL|STATUS)\b", "{0}"),
-    (r"^Running deferred command: (\w+)", "timed {0}"),
-    (r"^Got Pause Signal$", "USR1"),
-    (r"^Got Resume Signal$", "USR2"),
-    (r"^Got Signal \(SIGHUP\)$", "HUP"),
-    (r"^Got Stop Signal", "INT"),
-    (r"^Got Termination Signal", "TERM"),
-    (r"^\d+ MB is below threshold", "shortage"),
-    (r"^Process killed$", "KILL"),
-)
+COMMAND = re.compile(r"^Command is \[(START|STOP|PAUSE|RESUME|CANCEL|STATUS)\b(?:.*\bn=(\d+))?")
 
 
 class Recorder:
@@ -29,6 +24,8 @@ class Recorder:
         self.stopping = self.finishing = 0
         self.cancelled = 0.0  # when
         self.offline = False
+        self.lost = False
+        self.refused = frozenset()  # the numbers of the STARTs that were refused because there was no room
         self.hit = set()
 
     def states(self, at):
@@ -38,16 +35,20 @@ class Recorder:
         now = {self.state} if self.state != "idle" or not behind else behind
         return now | {"offline"} if self.offline else now
 
+    def event(self, name, at):
+        self.hit |= {(name, state) for state in self.states(at)}
+
     def line(self, text, at):
-        for pattern, name in SEEN:
-            match = re.search(pattern, text)
-            if match:
-                self.hit |= {(name.format(*match.groups()), state) for state in self.states(at)}
+        command = COMMAND.match(text)
+        if command:
+            self.event(command[1], at)
+            if command[2] and int(command[2]) in self.refused:
+                self.event("shortage", at)
         self._follow(text, at)
 
     def _follow(self, text, at):
         if re.search(r"^lmxagentd \(version", text):
-            self.state, self.stopping, self.finishing, self.offline = "idle", 0, 0, False
+            self.state, self.stopping, self.finishing, self.offline, self.lost = "idle", 0, 0, False, False
         elif text == "Process prepareCapture" and self.state == "idle":
             self.state = "preparing"
         elif text.endswith(("recording started", "recording resumed")):
@@ -66,6 +67,8 @@ class Recorder:
             self.offline = True
         elif text.startswith("Connecting to lmxserverd tunnel"):
             self.offline = False
+        elif text == "The capture device has been disconnected." and not self.lost:
+            self.hit.add(("loss", "stopping"))
 
     def _end(self, text, at):
         if self.state in ("recording", "paused"):
@@ -79,21 +82,69 @@ class Recorder:
         if self.stopping:
             self.stopping -= 1
         elif self.state in ("recording", "paused"):  # nobody has stopped it
-            self.hit.add(("loss", self.state))
-            self.state = "idle"
+            self.hit |= {("loss", self.state)} | ({("loss", "offline")} if self.offline else set())
+            self.state, self.lost = "idle", True
         self.finishing += 1
 
 
-def cells_hit(lines, kills=()):
-    """The (event, state) pairs in the log's lines; `kills` are the moments of kill -9, on the log's clock."""
+class StateWatch:
+    """Waits for states of the recorder."""
+
+    def __init__(self, log, mark):
+        self._log, self._seen, self._recorder = log, mark, Recorder()
+
+    def states(self):
+        """What the log so far tells."""
+        lines = self._log.lines("", after=self._seen)
+        self._seen += len(lines)
+        for line in lines:
+            self._recorder.line(line.text, line.at)
+        return self._recorder.states(time.monotonic())
+
+    def wait(self, wanted, timeout):
+        """Waits until the recorder is in one of the states `wanted`. @return whether it came to that"""
+        end = time.monotonic() + timeout
+        while not self.states() & wanted:
+            if time.monotonic() > end:
+                return False
+            with contextlib.suppress(AssertionError):
+                self._log.wait("", 0.2, after=self._seen)
+        return True
+
+
+def cells_hit(lines, arrivals=(), refused=()):
+    """The (event, state) pairs in the log's lines. `arrivals` are further events and when they came, on the log's
+    clock; `refused` the numbers of the STARTs that found no room."""
     recorder = Recorder()
-    for at, text in sorted([*((line.at, line.text) for line in lines), *((at, "Process killed") for at in kills)],
-                           key=lambda entry: entry[0]):
-        recorder.line(text, at)
+    recorder.refused = frozenset(refused)
+    happened = [(line.at, line.text, "") for line in lines] + [(at, "", name) for name, at in arrivals]
+    for at, text, name in sorted(happened, key=lambda entry: entry[0]):
+        if name:
+            recorder.event(name, at)
+        else:
+            recorder.line(text, at)
     return recorder.hit
 
 
 def cells_missed(hit):
     """The cells that no event has come to, a line for each event."""
-    missed = {event: [state for state in STATES if (event, state) not in hit | IMPOSSIBLE] for event in EVENTS}
+    missed = {event: [state for state in STATES if (event, state) not in hit and (event, state) not in IMPOSSIBLE]
+              for event in EVENTS}
     return [f"{event}: {', '.join(states)}" for event, states in missed.items() if states]
+
+
+def cells_impossible():
+    """The cells that can't be reached, and why."""
+    return [f"{event}, {state}: {reason}" for (event, state), reason in IMPOSSIBLE.items()]
+
+
+def arrivals(operations, clock):
+    """What `operations` says of events that the log shows too late: signals, and timed commands, which wait for the
+    main thread. `clock` leads from the log's clock to the wall clock."""
+    found = [(op.verb, op.sent - clock) for op in operations if op.way == "signal"]
+    return found + [(f"timed {op.verb}", op.due - clock) for op in operations if op.due]
+
+
+def refused_for_room(operations):
+    return [op.number for op in operations if op.verb == "START" and any(text.startswith("cmdStatus=30")
+                                                                         for text in op.replies)]

@@ -1,116 +1,24 @@
 """A hall under test: one daemon that sequences of commands are played to, by several at once."""
 import contextlib
 import itertools
-import queue
 import re
 import signal
-import socket
 import threading
 import time
 from concurrent.futures import ThreadPoolExecutor
-from dataclasses import replace
 
-from .command_model import FOREVER, Operation
+from .command_cells import StateWatch
+from .command_model import PROCESS_ENDS, Operation
+from .command_peers import PATIENCE, Gone, LocalPeer, TunnelPeer, replies_in
+from .command_timed import TimedList
 from .commands import command_line, start_parameters, timed_line
-from .tunnel_server import TunnelServer
 from .waiting import let_pass, wait_until
 
-PATIENCE = 20.0  # seconds for any single answer
 CLOCK = time.time() - time.monotonic()  # from the log's clock to the wall clock
 SMALL_CAMERA = "test://video?size=320x180&fps=30"
 ROOM, NO_ROOM = "1", "2000000000"  # megabytes that must be free
 SIGNAL_LINES = {"USR1": r"^Got Pause Signal$", "USR2": r"^Got Resume Signal$", "HUP": r"^Got Signal \(SIGHUP\)$",
                 "INT": r"^Got Stop Signal", "TERM": r"^Got Termination Signal"}
-
-
-class Gone(Exception):
-    """The daemon, or the connection to it, has gone before it answered."""
-
-
-def replies_in(text):
-    return tuple("cmdStatus=" + piece for piece in text.split("cmdStatus=")[1:])
-
-
-class TunnelPeer:
-    """The server's end of the tunnel. Takes every connection; replies are read as they come."""
-
-    def __init__(self, agent):
-        self._server = TunnelServer(agent)
-        self._replies = queue.Queue()
-        self.open = threading.Event()
-        self._connections = self._sent_on = 0
-        self._closed = False
-        self._thread = threading.Thread(target=self._serve, daemon=True)
-        self._thread.start()
-
-    def _serve(self):
-        while not self._closed:
-            try:
-                self._server.accept(0.2)
-                self._server.peer.settimeout(None)
-                self._connections += 1
-                self.open.set()
-                while True:
-                    self._replies.put((self._server.reply().rstrip("\n"), time.time()))
-            except TimeoutError:
-                continue
-            except (EOFError, OSError, ValueError, AssertionError):
-                self.open.clear()
-
-    def send(self, line):
-        """What has come unasked before is not an answer."""
-        while not self._replies.empty():
-            self._replies.get_nowait()
-        self._sent_on = self._connections
-        try:
-            self._server.send(line)
-        except OSError as error:
-            raise Gone from error
-
-    def next(self):
-        """The next reply and when it came; Gone when the connection that was asked has ended without one."""
-        end = time.monotonic() + PATIENCE
-        while time.monotonic() < end:
-            asked = self.open.is_set() and self._sent_on == self._connections
-            with contextlib.suppress(queue.Empty):
-                return self._replies.get(timeout=0.2 if asked else 0.0)
-            if not asked:
-                raise Gone
-        raise AssertionError("no reply on the tunnel")
-
-    def close(self):
-        self._closed = True
-        with contextlib.suppress(OSError):  # closing alone would not wake the thread
-            self._server.peer.shutdown(socket.SHUT_RDWR)
-        self._thread.join(5)
-        self._server.close()
-
-
-class LocalPeer:
-    """One connection to the local socket."""
-
-    def __init__(self, agent):
-        self._peer = agent.connect(PATIENCE)
-
-    def send(self, line):
-        try:
-            self._peer.sendall(line.encode() + b"\n")
-        except OSError as error:
-            raise Gone from error
-
-    def next(self):
-        try:
-            data = self._peer.recv(1 << 20)
-        except TimeoutError:
-            raise AssertionError("no reply on the local socket") from None
-        except OSError as error:
-            raise Gone from error
-        if not data:
-            raise Gone
-        return data.decode(), time.time()
-
-    def close(self):
-        self._peer.close()
 
 
 class Hall:
@@ -120,8 +28,10 @@ class Hall:
         self.agent = agent
         self._numbers = itertools.count(1)
         self._up = threading.Event()  # the daemon may be talked to
+        self._lives = 1  # of the daemon
         self._turn = {"local": threading.Lock(), "tunnel": threading.Lock(), "signal": threading.Lock()}
         self.tunnel = None
+        self.short = False
         # The daemon is killed when the thread that has started it ends: the lanes end sooner.
         self._starter = ThreadPoolExecutor(1)
         self.begin_sequence("")
@@ -131,8 +41,9 @@ class Hall:
     def begin_sequence(self, name):
         self.name, self.operations, self.complaints = name, [], []
         self._titles, self._guard = itertools.count(1), threading.Lock()
-        self._timed = []
-        self._waiting = {"local": 0, "tunnel": 0}  # timed commands whose replies may come in between
+        self._timed = TimedList()  # their replies may come in between, on the tunnel when their channel has gone
+        self._frozen = threading.Event()
+        self._first_life = self._lives
         self.mark = self.agent.log.mark()
 
     def close(self):
@@ -163,6 +74,7 @@ class Hall:
     def restart(self, end, verb, way="signal"):
         """Has `end` end the daemon, and starts it anew."""
         self._up.clear()
+        self._lives += 1
         sent = time.time()
         status = end()
         done = time.time()
@@ -184,13 +96,16 @@ class Hall:
 
     def step(self, event):
         """Does what `event` says and notes it."""
-        now = time.time()
-        let_pass(event.delay if event.verb != "WAIT" else 1 - (now + event.delay) % 1, "the sequence says so")
+        if event.frozen:
+            self._frozen.wait(5)
+        let_pass(max(0.0, self._delay(event)), "the sequence says so")
         self._up.wait(PATIENCE)
         if event.verb in ("TERM", "INT", "KILL"):
             self.restart(lambda: self.agent.stop(getattr(signal, "SIG" + event.verb), 40), event.verb)
         elif event.verb == "WAIT":
             return
+        elif event.verb == "FREEZE":
+            self._freeze(event)
         elif event.way == "signal":
             self._signal(event.verb)
         elif event.verb in ("SHORTAGE", "ROOM"):
@@ -201,6 +116,9 @@ class Hall:
             self._schedule(event)
         else:
             self.command(event.verb, event.way)
+
+    def _delay(self, event):
+        return self._timed.latest() - event.delay - time.time() if event.verb == "WAIT" else event.delay
 
     def command(self, verb, way):
         number = next(self._numbers)
@@ -260,15 +178,25 @@ class Hall:
             while "recordStatus" not in text:
                 text, at = peer.next()
             return at, replies_in(text)[-1:]
-        if not self._waiting[way]:
+        if not self._timed:
             return at, replies_in(text)
-        self.agent.log.wait(rf"^Command is \[{line.split(' ')[0]} .*\bn={number}\b", PATIENCE, after=self.mark)
+        self._wait_read(rf"^Command is \[{line.split(' ')[0]} .*\bn={number}\b")
         peer.send("STATUS n=0")
         came = text
         while "recordStatus" not in text:
             text, at = peer.next()
             came += text
         return at, replies_in(came[:came.index("cmdStatus=0,recordStatus")])
+
+    def _wait_read(self, pattern):
+        """Waits for the log's line that says that a command has been read; Gone when the daemon ends before."""
+        life, end = self._lives, time.monotonic() + PATIENCE
+        while not self.agent.log.lines(pattern, after=self.mark):
+            if life != self._lives or not self.agent.alive():
+                raise Gone
+            assert time.monotonic() < end, f"no log line {pattern}"
+            with contextlib.suppress(AssertionError):
+                self.agent.log.wait(pattern, 0.2, after=self.mark)
 
     # Timed commands --------------------------------------------------------------------------------------------
 
@@ -277,29 +205,56 @@ class Hall:
         title = f"{self.name}-{next(self._titles)}" if verb == "START" else ""
         parameters = self.start_parameters(title, number) if title else {"n": str(number)}
         due = int(time.time()) + event.ahead
-        self._waiting[event.way] += 1
-        mark = self.agent.log.mark()
-        if self._ask(timed_line(verb, due, TimerID=f"T{number}", **parameters), event.way, number) is None:
-            return
-        if self.agent.log.wait("^(Not s|S)cheduling ", 5, after=mark).text.startswith("Scheduling"):
-            # Otherwise its time had passed when it was read.
-            self._timed.append(Operation(verb, "timed", float(due), FOREVER, (), title, number=number, due=due))
+        self._timed.add(verb, due, number, title)
+        answer = self._ask(timed_line(verb, due, TimerID=f"T{number}", **parameters), event.way, number)
+        if answer and answer[3]:
+            self._timed.answered(answer[2])
 
     def wait_timed(self):
-        """Waits until all timed commands have run, and notes them."""
+        """Waits until all timed commands have run, or have expired while there was no daemon, and notes them."""
         if not self._timed:
             return
-        running = r"^Running deferred command: "
-        ran = [self.agent.log.wait(running, PATIENCE, after=self.mark, count=i + 1) for i in range(len(self._timed))]
-        for line, timed in zip(ran, sorted(self._timed, key=Operation.turn)):
-            if not line.text.endswith(" " + timed.verb):
-                self.complain(f"the timed {timed.verb} {timed.title} was due, but this ran: {line.text}")
-            with self._guard:
-                self.operations.append(replace(timed, done=line.at + CLOCK + 0.3))
-        for way in self._waiting:  # waits for the main thread: no reply of a timed command comes later
+        if self._lives != self._first_life:
+            self._wait_main()  # until then the timers file may not have been read
+        with contextlib.suppress(AssertionError):
+            wait_until(lambda: not self._timed.waiting(self._lines()), PATIENCE, "the timed commands")
+        self._wait_main()  # no reply of a timed command comes later
+        ends = [op for op in self.operations if op.verb in PROCESS_ENDS]
+        operations, complaints = self._timed.outcome(self._lines(), CLOCK, ends)
+        self.operations += operations
+        self.complaints += complaints
+
+    def _lines(self):
+        return self.agent.log.lines("", after=self.mark)
+
+    def _wait_main(self):
+        """Has the main thread's turn come on both ways."""
+        for way in ("local", "tunnel"):
             self.command("RESUME", way)
 
     # Signals and mishaps ---------------------------------------------------------------------------------------
+
+    def _freeze(self, event):
+        """Stops the daemon in a state that lasts for milliseconds only, so that others can be sure to meet it, and
+        lets it go again after a while or when the timed command is due."""
+        state = event.way
+        passing = {"stopping", "finishing"} if state == "finishing" else {state}
+        watch = StateWatch(self.agent.log, self.mark)
+        sandbox = self.agent.sandbox
+        with contextlib.suppress(OSError, TypeError, AssertionError):  # the daemon may be killed meanwhile
+            if watch.wait(passing, 5):
+                sandbox.freeze()
+                let_pass(0.002, "the log's reader catches up")
+                while not watch.states() & {state} and watch.states() & passing:
+                    sandbox.thaw()
+                    let_pass(0.0005, "a little of the daemon's work")
+                    sandbox.freeze()
+                    let_pass(0.002, "the log's reader catches up")
+            self._frozen.set()
+            until = self._timed.latest() + 0.005 - time.time() if event.ahead else event.delay
+            let_pass(max(0.0, until), "the others meet the daemon in this state")
+            sandbox.thaw()
+        self._frozen.set()
 
     def _signal(self, verb):
         with self._turn["signal"]:
@@ -321,9 +276,15 @@ class Hall:
         let_pass(0.05, "the line comes before the settings are in force")
         done = time.time()
         self.note(verb, "world", sent, done)
+        self.short = verb == "SHORTAGE"
         if verb == "ROOM":
             short = next(op for op in self.operations if op.verb == "SHORTAGE")
             self.note("GUARD", "world", short.sent, done, optional=True)
+
+    def make_room(self):
+        """Ends a shortage."""
+        if self.short:
+            self._change_room("ROOM")
 
     def end_of_loss(self, sent):
         """After a sequence with a camera that goes: the daemon ends by itself if its last recording has lost it."""
@@ -341,6 +302,15 @@ class Hall:
 
     # At the end ------------------------------------------------------------------------------------------------
 
+    def wait_still(self):
+        """Waits until nothing is recorded or finished any more."""
+        with contextlib.suppress(AssertionError):
+            wait_until(self._is_still, 5, "an idle recorder")
+
+    def _is_still(self):
+        captures = [name for name in self.agent.repository() if name.startswith(".lmxagentd/")]
+        return not captures and self.agent.command("STATUS").fields["recordStatus"] == "0"
+
     def wait_quiet(self, timeout):
         """Waits until nothing is recorded, finished or submitted any more, and says whether it came to that."""
         try:
@@ -350,11 +320,9 @@ class Hall:
             return False
 
     def _is_quiet(self):
-        status = self.agent.command("STATUS").fields["recordStatus"]
         begun, ended = self.agent.submitted(), self.agent.submitted("end")
         movies = len(self.agent.log.lines(r"recording stopped \(duration: "))
-        captures = [name for name in self.agent.repository() if name.startswith(".lmxagentd/")]
-        return status == "0" and not captures and len(begun) >= movies and len(ended) >= len(begun) - self.kills()
+        return self._is_still() and len(begun) >= movies and len(ended) >= len(begun) - self.kills()
 
     def kills(self):
         """How many tools may have been killed with the daemon."""

@@ -14,6 +14,7 @@ SHORT_LIFE = 0.2  # seconds; a recording that is no longer may have no picture
 ENDS = {"STOP": "stopped", "GUARD": "stopped", "LOSS": "stopped", "CANCEL": "cancelled", "HUP": "kept", "INT": "kept",
         "TERM": "kept", "KILL": "kept"}
 POSTED = ("STOP", "CANCEL", "GUARD", "LOSS", "HUP")  # answered, or seen, before the recorder has heard of it
+PROCESS_ENDS = ("INT", "TERM", "KILL", "END")
 PAUSES = ("PAUSE", "USR1")
 RESUMES = ("RESUME", "USR2")
 FOREVER = float("inf")
@@ -122,13 +123,19 @@ class Model:
         if op.verb == "STATUS":
             return self._status(state, op)
         if op.verb in ENDS:
-            return replace(self._end(state, op), ending=state.ending or op.verb in ("TERM", "INT", "KILL"))
+            return replace(self._end(state, op), ending=state.ending or op.verb in PROCESS_ENDS)
         if op.verb in PAUSES:
             return self._pause(state, op)
         if op.verb in RESUMES:
             return self._resume(state, op)
-        changes = {"RESTART": {"ending": False}, "SHORTAGE": {"room": False}, "ROOM": {"room": True}}
+        changes = {"RESTART": {"ending": False}, "END": {"ending": True}, "SHORTAGE": {"room": False}, "ROOM": {"room": True}}
         return replace(state, **changes.get(op.verb, {}))
+
+    def without(self, state, op):
+        """The state if `op` has never reached the daemon. Raises Refused if it has left something."""
+        if op.title and not self.left[op.title].nothing():
+            raise Refused(f"START {op.title} has had no effect, but left {self.left[op.title]}")
+        return state
 
     @staticmethod
     def _expect(op, *codes):
@@ -254,7 +261,7 @@ class _Search:
                 continue
             for skip in (False, True) if op.optional else (False,):
                 try:
-                    state = states[-1] if skip else self.model.after(states[-1], op)
+                    state = self.model.without(states[-1], op) if skip else self.model.after(states[-1], op)
                 except Refused as reason:
                     complaints.append(str(reason))
                     continue

@@ -8,6 +8,7 @@ from .command_model import Left
 from .log_reader import Level
 
 FPS = 30
+TEMPORARY = re.compile(r"^\.lmx-.*\.xml\.\w{6}$")
 ACCEPTED = (  # lines at critical and above that the events explain, by the events; each sequence ends with a STOP
     (r"^Recording canceled, missing RecordingMetadata_RECORDING_UUID\.$", set()),
     (r"^The recording could not be finished: nothing was captured for ", set()),
@@ -62,10 +63,11 @@ def collect(agent, operations):
         return dict(zip((op.title for op in starts), readers.map(lambda op: left_of(agent, op, submitted), starts)))
 
 
-def strays(agent, titles):
-    """Files in the repository that belong to none of the recordings."""
+def strays(agent, titles, killed):
+    """Files in the repository that belong to none of the recordings. A kill may leave a temporary beside a document."""
     known = {f"{title}.{kind}" for title in titles for kind in ("mov", "xml")} | {".lmxagentd"}
-    return [name for name in agent.repository() if name not in known]
+    unknown = [name for name in agent.repository() if name not in known]
+    return [name for name in unknown if not (killed and TEMPORARY.match(name))]
 
 
 def bad_lines(lines, verbs):
@@ -78,5 +80,5 @@ def bad_lines(lines, verbs):
 def sweep(agent):
     """Removes the finished movies, so that the repository does not grow from batch to batch."""
     for name in agent.repository():
-        if name.endswith((".mov", ".xml")):
+        if name.endswith((".mov", ".xml")) or TEMPORARY.match(name):
             agent.path(f"{REPOSITORY}/{name}").unlink()

@@ -5,27 +5,35 @@ from dataclasses import dataclass, field
 COMMANDS = {"START": 28, "STOP": 20, "PAUSE": 10, "RESUME": 10, "CANCEL": 6, "STATUS": 18, "BAD": 3, "USR1": 2,
             "USR2": 3}
 TIMED = {"START": 10, "STOP": 10, "CANCEL": 2, "PAUSE": 1, "RESUME": 1}
-THEMES = {"serial": 28, "parallel": 30, "aimed": 18, "timed": 12, "restart": 7, "hang-up": 2, "shortage": 2, "loss": 1}
+THEMES = {"serial": 22, "parallel": 24, "timed": 14, "restart": 8, "timed restart": 6, "offline": 3, "shortage": 3,
+          "loss": 2}
+AIMED_EVERY = 3  # the others have the themes above by their weights
 WAYS = ("local", "tunnel")
 ENDING = ("HUP", "INT", "TERM", "KILL")
-AIMED = {"START": 4, "STOP": 4, "PAUSE": 4, "RESUME": 4, "CANCEL": 4, "STATUS": 2, "USR1": 2, "USR2": 2, "HUP": 0.5,
-         "INT": 1, "TERM": 1, "KILL": 1, "TIMED START": 1, "TIMED STOP": 1, "TIMED PAUSE": 1, "TIMED RESUME": 1,
-         "TIMED CANCEL": 1}
-TARGETS = ("idle", "preparing", "recording", "paused", "stopping", "stopping", "finishing", "finishing")
+SIGNALS = (*ENDING, "USR1", "USR2")
+PASSING = ("preparing", "stopping", "finishing")  # states that last for milliseconds
+TARGETS = ("idle", "recording", "paused", *PASSING)
+AIMED = ("START", "STOP", "PAUSE", "RESUME", "CANCEL", "STATUS", *SIGNALS, "SHORTAGE", "TIMED START", "TIMED STOP",
+         "TIMED PAUSE", "TIMED RESUME", "TIMED CANCEL")
+CELLS = [*((verb, state) for verb in AIMED for state in TARGETS), ("LOSS", "paused"), ("LOSS", "stopping")]
+THEME_NAMES = (*THEMES, "aimed")
 
 
 @dataclass(frozen=True)
 class Event:
     """One step: what (a verb, "TIMED verb", or a mishap), by which way, how long after the step before. WAIT: until so
-    long before the next full second."""
+    long before the timed command is due. FREEZE: the daemon stands still in the state `way` for `delay`, or until the
+    timed command is due."""
 
     verb: str
     way: str
     delay: float
-    ahead: int = 0  # of a timed command: seconds from now, rounded down
+    ahead: int = 0  # of a timed command: seconds from now, rounded down; FREEZE: 1 if it lasts until one is due
+    frozen: bool = False  # waits for the daemon to stand still
 
     def __str__(self):
-        return f"{self.delay * 1000:4.0f} ms {self.way:6} {self.verb}" + (f" in {self.ahead} s" if self.ahead else "")
+        return (f"{self.delay * 1000:4.0f} ms {self.way:6} {self.verb}" + (f" in {self.ahead} s" if self.ahead else "")
+                + " to a daemon that stands still" * self.frozen)
 
 
 @dataclass
@@ -52,6 +60,9 @@ class Sequence:
         lanes = [[self.lanes[l][i] for i, l in kept if l == lane] for lane in range(len(self.lanes))]
         return Sequence(self.seed, self.theme, lanes, self.last, self.tool_delay)
 
+    def loses_camera(self):
+        return any(event.verb == "LOSS" for lane in self.lanes for event in lane)
+
     def length(self):
         return sum(len(lane) for lane in self.lanes)
 
@@ -73,50 +84,88 @@ def step(dice, way=None):
 def sequence(seed, theme=None):
     """The sequence of a seed."""
     dice = random.Random(seed)
-    theme = theme or chosen(dice, THEMES)
+    drawn = chosen(dice, THEMES)
+    theme = theme or (drawn if seed % AIMED_EVERY else "aimed")
     made = Sequence(seed, theme, last="CANCEL" if dice.random() < 0.15 else "STOP",
                     tool_delay=dice.choice((0.0, 0.0, 0.2, 0.6)))
-    if theme == "parallel":
+    if theme == "aimed":
+        made.lanes = aimed(dice, *CELLS[seed % len(CELLS)])
+    elif theme == "offline":
+        made.lanes = [offline(dice)]
+    elif theme == "parallel":
         made.lanes = [[step(dice, way) for _ in range(dice.randint(2, 6))] for way in WAYS]
         if dice.random() < 0.4:
             made.lanes.append([Event(dice.choice(("USR1", "USR2")), "signal", delay(dice)) for _ in range(2)])
-    elif theme == "aimed":
-        made.lanes = aimed(dice)
     else:
         made.lanes = [[step(dice) for _ in range(dice.randint(4, 10))]]
-    if theme == "timed":
-        made.lanes.append([Event("TIMED " + chosen(dice, TIMED), dice.choice(WAYS), dice.uniform(0, 0.1),
-                                 dice.choice((1, 1, 2))) for _ in range(dice.randint(1, 5))])
+    if theme.startswith("timed"):
+        made.lanes.append([timed(dice) for _ in range(dice.randint(1, 5))])
     made.lanes += mishap(dice, theme)
     return made
 
 
-def aimed(dice):
-    """One event that is to find the recorder in a certain state, some of which last for a few milliseconds."""
-    verb, target = chosen(dice, AIMED), dice.choice(TARGETS)
-    way = "signal" if verb in (*ENDING, "USR1", "USR2") else "local"
-    lead = [Event("START", "local", 0.0)] if target not in ("idle", "preparing") else []
-    if target == "paused" or (lead and dice.random() < 0.2):
-        lead.append(Event("PAUSE", "local", dice.uniform(0.1, 0.3)))
-    if target in ("stopping", "finishing"):
-        lead.append(Event("STOP", dice.choice(WAYS), dice.uniform(0.1, 0.4)))
-    moment = {"idle": 0.0, "recording": 0.2, "paused": 0.05, "preparing": dice.uniform(0.005, 0.03),
-              "stopping": dice.uniform(0.0, 0.02), "finishing": dice.uniform(0.0, 0.05)}[target]
+def timed(dice):
+    return Event("TIMED " + chosen(dice, TIMED), dice.choice(WAYS), dice.uniform(0, 0.1), dice.choice((1, 1, 2, 3)))
+
+
+def offline(dice):
+    """Everything that may come while there is no tunnel."""
+    events = [*(Event(verb, "local", delay(dice)) for verb in (*COMMANDS, "START", "START", "STOP") if verb[:3] != "USR"),
+              *(Event(verb, "signal", delay(dice)) for verb in ("USR1", "USR2", "HUP")),
+              *(Event("TIMED " + verb, "local", delay(dice), 1) for verb in dice.sample(tuple(TIMED), 2))]
+    dice.shuffle(events)
+    room = dice.randrange(len(events) + 1)
+    events[room:room] = [Event("SHORTAGE", "world", 0.0), Event("START", "local", 0.0), Event("ROOM", "world", 0.0)]
+    end = [Event(dice.choice(ENDING[1:]), "signal", dice.uniform(0, 0.4))] if dice.random() < 0.7 else []
+    return [Event("HUP", "signal", 0.0), *events, *end]
+
+
+def aimed(dice, verb, target):
+    """One event that is to find the recorder in a certain state."""
+    lead = [] if target == "idle" else [Event("START", "tunnel", 0.0)]
+    if target == "paused" or (target in ("stopping", "finishing") and dice.random() < 0.2):
+        lead.append(Event("PAUSE", "tunnel", dice.uniform(0.1, 0.3)))
+    if target in ("stopping", "finishing") and verb not in ("SHORTAGE", "LOSS"):
+        lead.append(Event("STOP", "tunnel", dice.uniform(0.15, 0.4)))
+    if verb == "LOSS":
+        return losing(lead, target)
+    if verb == "SHORTAGE":
+        return short_of_room(lead, target)
     if verb.startswith("TIMED"):
-        before = sum(event.delay for event in lead) + moment
-        start = [Event("START", "tunnel", 0.0)] if target == "preparing" else []
-        return [[Event(verb, "local", 0.0, 2), Event("WAIT", "world", before % 1), *lead, *start]]
+        before = 0.3 + sum(event.delay + 0.06 for event in lead)
+        lanes = [[Event(verb, dice.choice(WAYS), 0.0, 2), Event("WAIT", "world", before), *lead]]
+        return lanes + [[Event("FREEZE", target, 0.0, 1)]] * (target in PASSING)
+    event = Event(verb, "signal" if verb in SIGNALS else "local", dice.uniform(0.0, 0.02), frozen=target in PASSING)
+    if target in PASSING:
+        return [lead, [Event("FREEZE", target, dice.uniform(0.03, 0.08))], [event]]
+    return [[*lead, event]]
+
+
+def short_of_room(lead, target):
+    """A START that is refused because there is no room. The preferences are read between two of the main thread's
+    tasks, so that the START before is not concerned."""
+    short, start = Event("SHORTAGE", "world", 0.0), Event("START", "local", 0.0)
     if target == "preparing":
-        return [[Event("START", "tunnel", 0.0)], [Event(verb, way, moment)]]
-    return [[*lead, Event(verb, way, moment)]]
+        return [lead, [Event("FREEZE", target, 0.1)], [Event("SHORTAGE", "world", 0.0, frozen=True)],
+                [Event("START", "local", 0.04, frozen=True)]]
+    if target in PASSING:
+        return [[*lead, short, Event("STOP", "tunnel", 0.2)], [Event("FREEZE", target, 0.05)],
+                [Event("START", "local", 0.0, frozen=True)]]
+    return [[*lead, short, start]]
+
+
+def losing(lead, target):
+    """A camera that goes a second after its recording has begun."""
+    lost = [Event("LOSS", "world", 0.0), *lead]
+    if target == "stopping":
+        return [[*lost, Event("STOP", "tunnel", 0.9)], [Event("FREEZE", target, 0.3)]]
+    return [lost]
 
 
 def mishap(dice, theme):
     """The lane of what goes wrong."""
-    if theme == "restart":
+    if theme.endswith("restart"):
         return [[Event(dice.choice(("TERM", "INT", "KILL", "KILL")), "signal", dice.uniform(0, 1.5))]]
-    if theme == "hang-up":
-        return [[Event("HUP", "signal", dice.uniform(0, 1.0))]]
     if theme == "shortage":
         return [[Event("SHORTAGE", "world", dice.uniform(0, 0.5)), Event("ROOM", "world", dice.uniform(0.3, 1.0))]]
     if theme == "loss":
