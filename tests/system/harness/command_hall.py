@@ -118,6 +118,8 @@ class Hall:
             self.command(event.verb, event.way)
 
     def _delay(self, event):
+        if event.verb == "FREEZE":
+            return 0.0
         return self._timed.latest() - event.delay - time.time() if event.verb == "WAIT" else event.delay
 
     def command(self, verb, way):
@@ -247,7 +249,7 @@ class Hall:
                 let_pass(0.002, "the log's reader catches up")
                 while not watch.states() & {state} and watch.states() & passing:
                     sandbox.thaw()
-                    let_pass(0.0005, "a little of the daemon's work")
+                    let_pass(0.0002, "a little of the daemon's work")
                     sandbox.freeze()
                     let_pass(0.002, "the log's reader catches up")
             self._frozen.set()
