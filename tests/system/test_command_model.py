@@ -107,6 +107,7 @@ def check_batch(hall, records, state):
     hall.begin_sequence("end")
     quiet = hall.wait_quiet(15)
     hall.restart(hall.agent.stop, "TERM")
+    hall.wait_main()
     hall.wait_quiet(5)
     failures, titles = [], []
     for record in records:

@@ -7,6 +7,7 @@ import threading
 import time
 from concurrent.futures import ThreadPoolExecutor
 
+from .agent import TIMERS
 from .command_cells import StateWatch
 from .command_model import PROCESS_ENDS, Operation
 from .command_peers import PATIENCE, Gone, LocalPeer, TunnelPeer, replies_in
@@ -42,6 +43,7 @@ class Hall:
         self.name, self.operations, self.complaints = name, [], []
         self._titles, self._guard = itertools.count(1), threading.Lock()
         self._timed = TimedList()  # their replies may come in between, on the tunnel when their channel has gone
+        self._unasked = False  # timed commands from before the sequence answer in it
         self._frozen = threading.Event()
         self._first_life = self._lives
         self.mark = self.agent.log.mark()
@@ -83,6 +85,7 @@ class Hall:
             self.complain(f"{verb}: the daemon ended with status {status}\n{self.agent.errors()}")
         self.tunnel.close()
         begun = time.time()
+        self._unasked = bool(self.agent.path(TIMERS).exists() and self.agent.timers())
         self._start()
         self.note("RESTART", "world", begun, time.time())
 
@@ -180,7 +183,7 @@ class Hall:
             while "recordStatus" not in text:
                 text, at = peer.next()
             return at, replies_in(text)[-1:]
-        if not self._timed:
+        if not (self._timed or self._unasked):
             return at, replies_in(text)
         self._wait_read(rf"^Command is \[{line.split(' ')[0]} .*\bn={number}\b")
         peer.send("STATUS n=0")
@@ -217,10 +220,10 @@ class Hall:
         if not self._timed:
             return
         if self._lives != self._first_life:
-            self._wait_main()  # until then the timers file may not have been read
+            self.wait_main()  # until then the timers file may not have been read
         with contextlib.suppress(AssertionError):
             wait_until(lambda: not self._timed.waiting(self._lines()), PATIENCE, "the timed commands")
-        self._wait_main()  # no reply of a timed command comes later
+        self.wait_main()  # no reply of a timed command comes later
         ends = [op for op in self.operations if op.verb in PROCESS_ENDS]
         operations, complaints = self._timed.outcome(self._lines(), CLOCK, ends)
         self.operations += operations
@@ -229,8 +232,8 @@ class Hall:
     def _lines(self):
         return self.agent.log.lines("", after=self.mark)
 
-    def _wait_main(self):
-        """Has the main thread's turn come on both ways."""
+    def wait_main(self):
+        """Lets the main thread's turn come on both ways: what it did before has been answered."""
         for way in ("local", "tunnel"):
             self.command("RESUME", way)
 
@@ -310,7 +313,10 @@ class Hall:
             wait_until(self._is_still, 5, "an idle recorder")
 
     def _is_still(self):
-        captures = [name for name in self.agent.repository() if name.startswith(".lmxagentd/")]
+        try:
+            captures = [name for name in self.agent.repository() if name.startswith(".lmxagentd/")]
+        except FileNotFoundError:  # one is just being removed
+            return False
         return not captures and self.agent.command("STATUS").fields["recordStatus"] == "0"
 
     def wait_quiet(self, timeout):
