@@ -53,9 +53,9 @@ def play(hall, script):
     with contextlib.suppress(AssertionError if failures else ()):
         hall.wait_timed()
     hall.make_room()
-    hall.command(script.last, "local")
     if script.loses_camera():
         hall.end_of_loss(begun)
+    hall.command(script.last, "local")
     hall.expect_alive()
     complaints = [*hall.complaints, *(f"{type(failure).__name__}: {failure}" for failure in failures)]
     return Record(script, list(hall.operations), complaints, (begun, time.time()))

@@ -24,7 +24,6 @@ class Recorder:
         self.stopping = self.finishing = 0
         self.cancelled = 0.0  # when
         self.offline = False
-        self.lost = False
         self.refused = frozenset()  # the numbers of the STARTs that were refused because there was no room
         self.hit = set()
 
@@ -44,11 +43,13 @@ class Recorder:
             self.event(command[1], at)
             if command[2] and int(command[2]) in self.refused:
                 self.event("shortage", at)
+        if text.startswith("Capture device lost: "):
+            self.event("loss", at)
         self._follow(text, at)
 
     def _follow(self, text, at):
         if re.search(r"^lmxagentd \(version", text):
-            self.state, self.stopping, self.finishing, self.offline, self.lost = "idle", 0, 0, False, False
+            self.state, self.stopping, self.finishing, self.offline = "idle", 0, 0, False
         elif text == "Process prepareCapture" and self.state == "idle":
             self.state = "preparing"
         elif text.endswith(("recording started", "recording resumed")):
@@ -67,8 +68,6 @@ class Recorder:
             self.offline = True
         elif text.startswith("Connecting to lmxserverd tunnel"):
             self.offline = False
-        elif text == "The capture device has been disconnected." and not self.lost:
-            self.hit.add(("loss", "stopping"))
 
     def _end(self, text, at):
         if self.state in ("recording", "paused"):
@@ -82,8 +81,7 @@ class Recorder:
         if self.stopping:
             self.stopping -= 1
         elif self.state in ("recording", "paused"):  # nobody has stopped it
-            self.hit |= {("loss", self.state)} | ({("loss", "offline")} if self.offline else set())
-            self.state, self.lost = "idle", True
+            self.state = "idle"
         self.finishing += 1
 
 

@@ -114,7 +114,7 @@ class Hall:
         elif event.verb in ("SHORTAGE", "ROOM"):
             self._change_room(event.verb)
         elif event.verb == "LOSS":
-            self._preferences(RecordingVideoInput=SMALL_CAMERA + "&lost-after=1")
+            self._change(RecordingVideoInput=SMALL_CAMERA + "&lost-after=1")
         elif event.verb.startswith("TIMED "):
             self._schedule(event)
         else:
@@ -274,12 +274,16 @@ class Hall:
                 return
             self.note(verb, "signal", sent, line.at + CLOCK + 0.2)
 
-    def _change_room(self, verb):
+    def _change(self, **preferences):
+        """Changes preferences. @return when, and when they were in force"""
         mark, sent = self.agent.log.mark(), time.time()
-        self._preferences(RecordingDiskSpaceCutoffInMB=NO_ROOM if verb == "SHORTAGE" else ROOM)
+        self._preferences(**preferences)
         self.agent.log.wait(r"^Reading preferences\.\.\.$", 5, after=mark)
         let_pass(0.05, "the line comes before the settings are in force")
-        done = time.time()
+        return sent, time.time()
+
+    def _change_room(self, verb):
+        sent, done = self._change(RecordingDiskSpaceCutoffInMB=NO_ROOM if verb == "SHORTAGE" else ROOM)
         self.note(verb, "world", sent, done)
         self.short = verb == "SHORTAGE"
         if verb == "ROOM":
@@ -292,16 +296,21 @@ class Hall:
             self._change_room("ROOM")
 
     def end_of_loss(self, sent):
-        """After a sequence with a camera that goes: the daemon ends by itself if its last recording has lost it."""
-        lost = [op for op in self.operations if op.verb == "START"]
-        try:
-            self.agent.log.wait(r"^The capture device has been disconnected\.$", 9, after=self.mark)
-            ended = True
-        except AssertionError:
-            ended = False
+        """After a sequence with a camera that goes: the daemon ends by itself if a recording has lost it."""
+        def has_come(pattern, timeout):
+            try:
+                return bool(self.agent.log.wait(pattern, timeout, after=self.mark))
+            except AssertionError:
+                return False
+        with contextlib.suppress(OSError):  # it may be about to end
+            if self.agent.command("STATUS").fields.get("recordStatus", "0") != "0":
+                has_come("^Capture device lost: ", 4)
+        lost = has_come("^Capture device lost: ", 0.3)  # a stopped one waits for its last frame
+        ended = lost and has_come(r"^The capture device has been disconnected\.$", 8)
         self._preferences()
-        for _ in lost:
-            self.note("LOSS", "world", sent, time.time(), optional=True)
+        for op in list(self.operations):
+            if op.verb == "START":
+                self.note("LOSS", "world", sent, time.time(), optional=True)
         if ended:
             self.restart(self.agent.wait_exit, "END", "world")
 

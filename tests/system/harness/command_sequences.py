@@ -92,6 +92,8 @@ def sequence(seed, theme=None):
         made.lanes = aimed(dice, *CELLS[seed % len(CELLS)])
     elif theme == "offline":
         made.lanes = [offline(dice)]
+    elif theme == "loss":
+        made.lanes = [loss(dice)]
     elif theme == "parallel":
         made.lanes = [[step(dice, way) for _ in range(dice.randint(2, 6))] for way in WAYS]
         if dice.random() < 0.4:
@@ -123,12 +125,12 @@ def offline(dice):
 def aimed(dice, verb, target):
     """One event that is to find the recorder in a certain state."""
     lead = [] if target == "idle" else [Event("START", "tunnel", 0.0)]
-    if target == "paused" or (target in ("stopping", "finishing") and dice.random() < 0.2):
+    if target == "paused" or (target in ("stopping", "finishing") and verb != "LOSS" and dice.random() < 0.2):
         lead.append(Event("PAUSE", "tunnel", dice.uniform(0.1, 0.3)))
     if target in ("stopping", "finishing") and verb not in ("SHORTAGE", "LOSS"):
         lead.append(Event("STOP", "tunnel", dice.uniform(0.15, 0.4)))
     if verb == "LOSS":
-        return losing(lead, target)
+        return losing(dice, lead, target)
     if verb == "SHORTAGE":
         return short_of_room(lead, target)
     if verb.startswith("TIMED"):
@@ -154,11 +156,21 @@ def short_of_room(lead, target):
     return [[*lead, short, start]]
 
 
-def losing(lead, target):
+def loss(dice):
+    """Recordings of less and of more than the second that the camera lasts, half of them without a tunnel."""
+    events = [Event("HUP", "signal", 0.0)] if dice.random() < 0.5 else []
+    events += [Event("LOSS", "world", 0.0), Event("START", "local", 0.0)]
+    verbs = ("START", "PAUSE", "RESUME", "STATUS", "USR1", "USR2", "STOP", "CANCEL")
+    for verb in dice.choices(verbs, (2, 3, 3, 2, 1, 1, 1, 0.5), k=dice.randint(1, 6)):
+        events.append(Event(verb, "signal" if verb.startswith("USR") else "local", delay(dice)))
+    return events
+
+
+def losing(dice, lead, target):
     """A camera that goes a second after its recording has begun."""
     lost = [Event("LOSS", "world", 0.0), *lead]
     if target == "stopping":
-        return [[*lost, Event("STOP", "tunnel", 0.9)], [Event("FREEZE", target, 0.3)]]
+        lost.append(Event("STOP", "local", dice.uniform(0.945, 0.985)))  # its last frame is the one that does not come
     return [lost]
 
 
@@ -168,6 +180,4 @@ def mishap(dice, theme):
         return [[Event(dice.choice(("TERM", "INT", "KILL", "KILL")), "signal", dice.uniform(0, 1.5))]]
     if theme == "shortage":
         return [[Event("SHORTAGE", "world", dice.uniform(0, 0.5)), Event("ROOM", "world", dice.uniform(0.3, 1.0))]]
-    if theme == "loss":
-        return [[Event("LOSS", "world", dice.uniform(0, 0.4))]]
     return []
