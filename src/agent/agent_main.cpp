@@ -189,6 +189,16 @@ bool AgentMain::perform(Action action, Wait wait) {
   return loop_.post([this, action] { (this->*action)(); }, wait);
 }
 
+bool AgentMain::performFor(const std::string& request, Action action, Wait wait) {
+  return loop_.post(
+      [this, request, action] {
+        const auto record = context_->record_context();
+        if (!record || record->request.get().uuid == request) return (this->*action)();
+        context_->logDebug("A command for an earlier recording came too late");
+      },
+      wait);
+}
+
 int AgentMain::performStart(const SharedDictionary& properties) {
   int result = kRecordInvalidType;  // the main loop has ended: the peer must not take this for a recording
   loop_.post([&] { result = capture_.startRecording(properties); }, Wait::untilDone);

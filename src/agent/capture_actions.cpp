@@ -37,10 +37,15 @@ int CaptureActions::startRecording(const SharedDictionary& properties) {
     context_.state.status.set(*refusal);
     return *refusal;
   }
-  if (record) configure(*record, *properties);
   context_.state.properties.set(properties);
+  if (!record) return continuous ? kRecordSuccess : prepareCapture();
+  const std::string request = newUUIDString();
+  record->preparing_request.set(request);
+  const auto prepared = [](AgentRecord* session) { session->preparing_request.set({}); };
+  const std::unique_ptr<AgentRecord, decltype(prepared)> end_of_preparation(record.get(), prepared);
+  configure(*record, *properties);
   const int result = continuous ? kRecordSuccess : prepareCapture();
-  if (record && result == kRecordSuccess) beginRequest(*record, properties);
+  if (result == kRecordSuccess) beginRequest(*record, request, properties);
   return result;
 }
 
@@ -58,8 +63,9 @@ void CaptureActions::configure(AgentRecord& record, const Dictionary& properties
                 metadata_key::kAudioOnly);
 }
 
-void CaptureActions::beginRequest(AgentRecord& record, const SharedDictionary& properties) {
-  const RecordingRequest request{.uuid = newUUIDString(),
+void CaptureActions::beginRequest(AgentRecord& record, const std::string& uuid,
+                                  const SharedDictionary& properties) {
+  const RecordingRequest request{.uuid = uuid,
                                  .properties = properties,
                                  .user = context_.options.user.get(),
                                  .password = context_.options.password.get()};
@@ -115,6 +121,12 @@ void CaptureActions::stopCapture() {
 void CaptureActions::cancelCapture() {
   context_.logDebug("Process cancelCapture");
   stopOrCancelCapture(true);
+}
+
+void CaptureActions::cancelRecording() {
+  if (const auto controller = captureController())
+    controller->cancelRequestWithUUID(session()->request.get().uuid);
+  cancelCapture();
 }
 
 void CaptureActions::stopOrCancelCapture(bool cancel) {
