@@ -18,8 +18,12 @@
 namespace lmx {
 namespace {
 
-void copyIntoRepository(const std::string& from, const std::string& to) {
-  if (const int error = copyFileToNewName(from, to)) {
+constexpr mode_t kMovieMode = 0644;
+/// Documents hold the user's password.
+constexpr mode_t kDocumentMode = 0600;
+
+void copyIntoRepository(const std::string& from, const std::string& to, mode_t mode) {
+  if (const int error = copyFileToNewName(from, to, mode)) {
     LMPLogMessage(nullptr, kLogDebug, "\"%s\" was not copied to \"%s\": %s", from.c_str(), to.c_str(),
                   std::strerror(error));
   }
@@ -68,7 +72,8 @@ bool AgentSubmit::gather(const Text& movie, std::optional<TimeValue> started_dat
 
 bool AgentSubmit::tryWriteProperties() const {
   if (!properties_file_path) return true;
-  const int error = writeFileAtomically(*properties_file_path, propertiesXml(properties), 0644);
+  const int error = writeFileAtomically(*properties_file_path, propertiesXml(properties), kDocumentMode,
+                                        OldAccess::discard);
   if (error == 0) return true;
   LMPLogMessage(log(), kLogWarning, "The properties document \"%s\" could not be written: %s",
                 properties_file_path->c_str(), std::strerror(error));
@@ -130,9 +135,9 @@ int AgentSubmit::addRecording(ChildRunner& children) {
 void AgentSubmit::copyInputFile(const std::string& uuid) const {
   const std::string movie = recording_file_path.value_or("");
   const std::string copy = agentContext->recording.recording_repository_path.get().value_or("") + "/" + uuid;
-  copyIntoRepository(movie, copy + ".mov");
+  copyIntoRepository(movie, copy + ".mov", kMovieMode);
   copyIntoRepository(movie.substr(0, movie.size() - std::min<std::size_t>(3, movie.size())) + "xml",
-                     copy + ".xml");
+                     copy + ".xml", kDocumentMode);
 }
 
 }  // namespace lmx
