@@ -1,10 +1,12 @@
 """The preferences: each failure's message and level, and changes while the daemon runs."""
 import base64
 import plistlib
+import re
 
 import pytest
-from harness.agent import DEFAULTS, PREFERENCES, SERVER_UUID
+from harness.agent import DEFAULTS, PREFERENCES, SECRET, SERVER_UUID
 from harness.log_reader import Level
+from harness.tunnel_server import TunnelServer
 from harness.waiting import wait_until
 
 UNBOUND = (Level.ERROR, "lmxagentd cannot run in agent mode without being bound to a Lumex server.")
@@ -76,19 +78,30 @@ def test_broken_preferences(agent, case):
         assert [l for l in agent.log.lines(level=level) if text in l.text], (text, agent.report())
 
 
-@pytest.mark.parametrize("size", [15, 17, 0])
-def test_a_secret_of_the_wrong_size_fails_in_silence(agent, size):
-    agent.secret(base64.b64encode(bytes(size)).decode())
-    agent.start(wait=False)
-    disabled(agent)
-    assert not agent.log.lines("secret|bound")
+UNUSABLE = {
+    **{f"{size} bytes": (base64.b64encode(bytes(size)).decode(), f'"lmx_secret" has {size} bytes instead of 16')
+       for size in (15, 17, 0)},
+    "no Base64": ("*** no base64 ***", '"lmx_secret" is not Base64 text'),
+}
 
 
-def test_a_secret_that_is_no_base64_fails_in_silence(agent):
-    agent.secret("*** no base64 ***")
+@pytest.mark.parametrize("case", UNUSABLE)
+def test_a_secret_that_cannot_be_used_is_named(agent, case):
+    text, reason = UNUSABLE[case]
+    agent.secret(text)
     agent.start(wait=False)
     disabled(agent)
-    assert not agent.log.lines("secret|bound")
+    lines = [line.text for line in agent.log.lines("secret|bound", level=Level.ERROR)]
+    assert lines == [f'The shared secret in "/var/lmx/agent/secrets/{SERVER_UUID}.plist" can\'t be used: {reason}']
+    assert not text or not agent.log.lines(re.escape(text)), "it is never quoted"
+
+
+def test_a_pasted_secret_may_have_white_space_around_it(agent):
+    agent.secret(f"  {base64.b64encode(SECRET).decode()}\n")
+    with TunnelServer(agent.prepare()) as server:
+        agent.start()
+        server.accept()
+        assert server.command("STOP") == "cmdStatus=0"
 
 
 def test_a_missing_secret(agent):
