@@ -41,7 +41,8 @@ AgentMain::AgentMain(std::shared_ptr<AgentContext> context, AgentEnvironment env
                }),
       disk_space_guard_(*context_, capture_),
       cluster_(*context_, context_->server, context_->server_info, *environment_.children),
-      main_loop_({*context_, loop_, capture_, devices_, timed_commands_, environment_.serviceManager.get()}) {
+      main_loop_({*context_, loop_, capture_, devices_, timed_commands_, submission_,
+                  environment_.serviceManager.get()}) {
   loop_.adoptThread();
   setEngineEnvironment({context_, this, environment_.framework});
 }

@@ -94,6 +94,44 @@ TEST_F(MainLoopTest, ADeviceThatFailedGetsOneMoreRetryWithAWarning) {
   EXPECT_EQ(log_.count(kLogWarning, kOffline), 1);
 }
 
+TEST_F(MainLoopTest, NoDeviceIsLookedForDuringARecording) {
+  framework_->cameras_attach = false;
+  for (const RecorderStatus status : {kRecorderRecording, kRecorderPaused}) {
+    session_->status.set(status);
+    checkedDevice(1000);
+    EXPECT_TRUE(turn()) << "a failed retry would end the recording";
+    EXPECT_GT(context_->state.last_device_check.get(), 0) << "put off, not given up";
+  }
+  session_->status.set(kRecorderIdle);
+  EXPECT_FALSE(turn());
+}
+
+TEST_F(MainLoopTest, NoDeviceIsLookedForWhileAStoppedRecordingIsBeingClosed) {
+  const Controller controller = start("A");
+  agent_.stopCapture();
+  ASSERT_EQ(session_->status.get(), kRecorderIdle);
+  framework_->cameras_attach = false;
+  checkedDevice(1000);
+  EXPECT_TRUE(turn());
+  reportEnd(controller);
+  turnTheLoop();
+  EXPECT_NE(nextJob(), nullptr);
+  EXPECT_TRUE(testing::waitUntil([&] { return agent_.submission().isIdle(); }));
+  EXPECT_FALSE(turn());
+}
+
+TEST_F(MainLoopTest, ADeviceThatIsStillMissingDoesNotEndTheDaemonDuringASubmission) {
+  framework_->cameras_attach = false;
+  context_->post_process_list.postProcessListAddJob(std::make_shared<AgentSubmit>());
+  checkedDevice(11);
+  const std::int64_t before = std::time(nullptr);
+  EXPECT_TRUE(turn());
+  EXPECT_GE(context_->state.last_device_check.get(), before) << "to be looked for again ten seconds later";
+  EXPECT_NE(nextJob(), nullptr);
+  checkedDevice(11);
+  EXPECT_FALSE(turn());
+}
+
 TEST_F(MainLoopTest, AReturningDeviceClearsTheWarning) {
   agent_.shutDownControlBecauseDeviceFailed();
   checkedDevice(11);
@@ -156,6 +194,8 @@ void tellOnStandardError(void*, int level, const std::string& text) {
 class Refusal : public MainLoopTest {
  protected:
   static constexpr const char* kLine = "2 Server rejected agent connection, restarting for retry\\.";
+  static constexpr const char* kWaits =
+      "Server rejected agent connection; the restart waits until the recording is submitted";
   static constexpr int kWentOn = 7;
 
   Refusal() { GTEST_FLAG_SET(death_test_style, "threadsafe"); }
@@ -174,6 +214,39 @@ TEST_F(Refusal, EndsTheProcessWithZeroAfterAMinute) {
 
 TEST_F(Refusal, IsIgnoredBeforeAMinute) {
   EXPECT_EXIT(turnAfter(57), ::testing::ExitedWithCode(kWentOn), "");
+}
+
+TEST_F(Refusal, WaitsForARunningRecordingAndSaysSoOnce) {
+  for (const RecorderStatus status : {kRecorderRecording, kRecorderPaused}) {
+    session_->status.set(status);
+    context_->state.serverRejectTime.set(std::time(nullptr) - 1000);
+    EXPECT_TRUE(turn());
+    EXPECT_TRUE(turn());
+  }
+  EXPECT_EQ(log_.count(kLogNotice, kWaits), 1);
+  EXPECT_FALSE(log_.mentions("restarting for retry"));
+  session_->status.set(kRecorderIdle);
+  EXPECT_EXIT(turnAfter(60), ::testing::ExitedWithCode(0), kLine);
+}
+
+TEST_F(Refusal, WaitsUntilTheMovieIsClosed) {
+  const Controller controller = start("A");
+  agent_.stopCapture();
+  ASSERT_EQ(session_->status.get(), kRecorderIdle);
+  context_->state.serverRejectTime.set(std::time(nullptr) - 1000);
+  EXPECT_TRUE(turn());
+  EXPECT_EQ(log_.count(kLogNotice, kWaits), 1);
+  context_->state.serverRejectTime.set(0);
+  reportEnd(controller);
+}
+
+TEST_F(Refusal, WaitsForTheSubmission) {
+  context_->post_process_list.postProcessListAddJob(std::make_shared<AgentSubmit>());
+  context_->state.serverRejectTime.set(std::time(nullptr) - 1000);
+  EXPECT_TRUE(turn());
+  EXPECT_EQ(log_.count(kLogNotice, kWaits), 1);
+  EXPECT_NE(nextJob(), nullptr);
+  EXPECT_EXIT(turnAfter(60), ::testing::ExitedWithCode(0), kLine);
 }
 
 TEST_F(Refusal, IsIgnoredInAdhocMode) {
