@@ -75,6 +75,7 @@ int AgentMain::startupDaemon() {
   Start result = loadSettings();
   if (result == Start::ok) result = prepareGround();
   if (result == Start::ok) result = startServices();
+  if (result == Start::askedToEnd) return stopSequence(result, ProcessEnd::orderly);
   if (result != Start::ok) return stopSequence(result, ProcessEnd::internalError);
   startTimers();
   if (main_loop_.appLoop() == 1) return stopSequence(Start::fatal, ProcessEnd::internalError);
@@ -94,7 +95,8 @@ AgentMain::Start AgentMain::prepareGround() {
   const std::string repository = context_->recording.recording_repository_path.get().value_or("");
   if (!setupRecordingRepository(*context_, repository) || createPIDFile(*context_) != 0) return Start::fatal;
   submission_.recoverUnfinishedRecordings(environment_.framework);
-  cluster_.learnCluster();
+  if (!cluster_.learnCluster(loop_, [this] { return context_->state.running.get(); }))
+    return Start::askedToEnd;
   devices_.probeDevice(*start_settings_);
   return Start::ok;
 }
@@ -147,6 +149,7 @@ void AgentMain::shutdown() {
   clusterInfoTimer_ = nullptr;
   diskSpaceTimer_ = nullptr;
   context_->state.running.set(false);
+  cluster_.stop(loop_);
   const auto controller = capture_.captureController();
   while (controller && !controller->hasShutDown()) loop_.run(250ms);
   channels_.tunnel().tellServerOfTheEnd();

@@ -4,6 +4,7 @@
 #include <cstdio>
 #include <ctime>
 
+#include "agent/tunnel_keeper.h"
 #include "capture/api/capture_framework.h"
 #include "record/capture_delegate.h"
 #include "record/create_preview.h"
@@ -70,6 +71,15 @@ TEST_F(MainLoopTest, ASecondSignalWhileTheTunnelClosesIsHarmless) {
     turnTheLoop();
   }
   EXPECT_EQ(log_.count(kLogDebug, "Process shutDownControl"), 40);
+}
+
+TEST_F(MainLoopTest, ATunnelThatIsOpenIsNotOpenedAgain) {
+  TunnelKeeper keeper(context_, agent_, agent_.mainRunLoop());
+  ASSERT_TRUE(keeper.openTunnel());
+  const AgentControl* first = keeper.tunnel();
+  EXPECT_TRUE(keeper.openTunnel());
+  EXPECT_EQ(keeper.tunnel(), first);
+  keeper.closeTunnel();
 }
 
 TEST_F(MainLoopTest, ADeviceThatIsStillMissingEndsTheDaemon) {
