@@ -84,6 +84,8 @@ int AgentMain::startupDaemon() {
 
 AgentMain::Start AgentMain::loadSettings() {
   context_->recording.preview_directory.set(std::string(kStateDirectory));
+  // The reason may be over when the service manager starts the agent again, so the service is not disabled.
+  if (AgentPreferences().whyUnreadable()) return Start::fatal;
   start_settings_ = devices_.recordingContext();
   if (!start_settings_) return Start::fatalAndDisable;
   agentPrefs_ = std::make_unique<AgentPreferences>();

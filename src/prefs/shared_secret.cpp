@@ -6,6 +6,7 @@
 
 #include "platform/paths.h"
 #include "platform/plist/property_list.h"
+#include "prefs/steady_reading.h"
 #include "support/base64.h"
 
 namespace lmx {
@@ -24,9 +25,13 @@ SecretError unusable(const std::string& path, const std::string& reason) {
 
 }  // namespace
 
+std::string sharedSecretFile(const std::string& server_uuid) {
+  return systemPath(kSecretsDirectory) + "/" + server_uuid + ".plist";
+}
+
 Result<ServerSettings::Secret, SecretError> readSharedSecret(const std::string& server_uuid) {
-  const std::string path = systemPath(kSecretsDirectory) + "/" + server_uuid + ".plist";
-  const PlistResult file = readPropertyList(path);
+  const std::string path = sharedSecretFile(server_uuid);
+  const PlistResult file = readSteadily(path).file;
   const std::string* text = file ? file->textUnder("lmx_secret") : nullptr;
   if (text == nullptr) {
     return SecretError{SecretError::Kind::missing, "Failed to read shared secret from plist: " + path};

@@ -17,8 +17,12 @@ struct SecretError {
   std::string message;
 };
 
+/// The path of the file with the secret shared with `server_uuid`.
+std::string sharedSecretFile(const std::string& server_uuid);
+
 /// Reads the secret shared with `server_uuid` from its file. White space around the text is ignored: people
-/// paste it with the line feed that their shell has added.
+/// paste it with the line feed that their shell has added. While the file can't be read for a passing reason,
+/// the secret is the one last read.
 Result<ServerSettings::Secret, SecretError> readSharedSecret(const std::string& server_uuid);
 
 }  // namespace lmx
