@@ -14,6 +14,7 @@
 #include "postprocess/properties_document.h"
 #include "postprocess/property_gatherer.h"
 #include "postprocess/submission.h"
+#include "support/format.h"
 
 namespace lmx {
 namespace {
@@ -93,7 +94,7 @@ int AgentSubmit::addRecordingWithCommentary(ChildRunner& children) {
     if (addRecording(children) != 0) {
       const Text server = agentContext ? agentContext->server.lumex_url.get() : std::nullopt;
       LMPLogMessage(log(), kLogError, "An error occurred completing recording \"%s\"",
-                    server.value_or("(null)").c_str());
+                    textOrNull(server).c_str());
       LMPLogMessage(log(), kLogCritical, "An internal error occurred during agent post-processing");
       return -1;
     }
