@@ -210,6 +210,9 @@ def test_preferences_that_may_not_be_read_leave_the_settings_as_they_are(agent):
 
 
 def test_no_free_descriptor_leaves_the_settings_as_they_are(running):
+    running.record("A")
+    running.wait_tool_call("A", event="end")
+    running.log.wait(r"^Unable to update cluster information\.$")  # now the start and the libraries are done
     pid = running.sandbox.daemon_pid
     with running.connect() as peer:  # made while there are descriptors
         assert ",CameraName=Hall 3," in exchange(peer, "STATUS include_profile=true").text

@@ -127,6 +127,7 @@ TEST_F(MainLoopTest, NoDeviceIsLookedForWhileAStoppedRecordingIsBeingClosed) {
   turnTheLoop();
   EXPECT_NE(nextJob(), nullptr);
   EXPECT_TRUE(testing::waitUntil([&] { return agent_.submission().isIdle(); }));
+  turnTheLoop();
   EXPECT_FALSE(turn());
 }
 
