@@ -96,7 +96,7 @@ AgentMain::Start AgentMain::loadSettings() {
 AgentMain::Start AgentMain::prepareGround() {
   const std::string repository = context_->recording.recording_repository_path.get().value_or("");
   if (!setupRecordingRepository(*context_, repository) || createPIDFile(*context_) != 0) return Start::fatal;
-  submission_.recoverUnfinishedRecordings(environment_.framework);
+  submission_.takeUpUnfinished(environment_.framework);
   if (!cluster_.learnCluster(loop_, [this] { return context_->state.running.get(); }))
     return Start::askedToEnd;
   devices_.probeDevice(*start_settings_);
@@ -142,7 +142,10 @@ int AgentMain::stopSequence(Start result, ProcessEnd end) {
 void AgentMain::startTimers() {
   clusterInfoTimer_ = loop_.addRepeatingTimer(180s, [this] { cluster_.refreshClusterInformation(); });
   cluster_.refreshClusterInformation();
-  diskSpaceTimer_ = loop_.addRepeatingTimer(15s, [this] { disk_space_guard_.checkDiskSpace(); });
+  diskSpaceTimer_ = loop_.addRepeatingTimer(15s, [this] {
+    disk_space_guard_.checkDiskSpace();
+    submission_.letOverduePass();
+  });
   disk_space_guard_.checkDiskSpace();
   timed_commands_.loadSchedule();
 }
@@ -192,6 +195,12 @@ bool AgentMain::perform(Action action, Wait wait) {
   return loop_.post([this, action] { (this->*action)(); }, wait);
 }
 
+int AgentMain::performStart(const SharedDictionary& properties) {
+  int result = kRecordInvalidType;  // the main loop has ended: the peer must not take this for a recording
+  loop_.post([&] { result = capture_.startRecording(properties); }, Wait::untilDone);
+  return result;
+}
+
 void AgentMain::shutDownControl() {
   context_->logDebug("Process shutDownControl");
   cancelCapture();
@@ -231,8 +240,7 @@ void AgentMain::recordDidStopWithFile(const std::shared_ptr<AgentRecord>& sessio
                                       const SharedDictionary& metadata, std::optional<TimeValue> atTime,
                                       std::int64_t elapsedSeconds, std::optional<TimeValue> stoppedTime,
                                       bool canceled) {
-  static_cast<void>(
-      submission_.announceStop(session, file, metadata, atTime, elapsedSeconds, stoppedTime, canceled));
+  submission_.announceStop(session, file, metadata, atTime, elapsedSeconds, stoppedTime, canceled);
 }
 
 }  // namespace lmx

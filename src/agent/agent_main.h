@@ -53,6 +53,8 @@ class AgentMain final : public AgentActions {
   [[nodiscard]] Submission& submission() { return submission_; }
 
   bool perform(Action action, Wait wait) override;
+  int performStart(const SharedDictionary& properties) override;
+  [[nodiscard]] bool isMainThread() const override { return loop_.isOwnerThread(); }
   void prepareCapture() override { capture_.prepareCapture(); }
   void startPreview() override { capture_.startPreview(); }
   void stopPreview() override { capture_.stopPreview(); }

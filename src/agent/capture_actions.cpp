@@ -4,9 +4,11 @@
 #include "capture/api/capture_framework.h"
 #include "model/codes.h"
 #include "model/metadata_keys.h"
+#include "platform/identifiers.h"
 #include "platform/log.h"
 #include "record/prepare_capture.h"
 #include "record/preview_controller.h"
+#include "record/recording_limits.h"
 #include "record/stop_capture.h"
 
 namespace lmx {
@@ -16,12 +18,54 @@ std::shared_ptr<LMRCaptureController> CaptureActions::captureController() const 
   return record ? record->captureController.get() : nullptr;
 }
 
-void CaptureActions::prepareCapture() {
+int CaptureActions::prepareCapture() {
   context_.logDebug("Process prepareCapture");
   const SharedDictionary properties = context_.state.properties.get();
   context_.state.status.set(kRecordNotRunning);  // the result if an exception ends this function
-  context_.state.status.set(LXAgentRecordPrepareCapture(
-      context_, std::make_shared<const Dictionary>(properties ? *properties : Dictionary{})));
+  const int result = LXAgentRecordPrepareCapture(
+      context_, std::make_shared<const Dictionary>(properties ? *properties : Dictionary{}));
+  context_.state.status.set(result);
+  return result;
+}
+
+int CaptureActions::startRecording(const SharedDictionary& properties) {
+  const auto record = session();
+  const bool continuous = context_.recording.isContinuous();
+  context_.state.status.set(kRecordSuccess);
+  // A refused START must not touch what runs: not its parameters, its limits, nor its marks.
+  if (const auto refusal = record && !continuous ? LXAgentRecordRefusal(*record) : std::nullopt) {
+    context_.state.status.set(*refusal);
+    return *refusal;
+  }
+  if (record) configure(*record, *properties);
+  context_.state.properties.set(properties);
+  const int result = continuous ? kRecordSuccess : prepareCapture();
+  if (record && result == kRecordSuccess) beginRequest(*record, properties);
+  return result;
+}
+
+void CaptureActions::configure(AgentRecord& record, const Dictionary& properties) {
+  if (record.status.get() == kRecorderIdle) record.stop_times.clear();  // those of an earlier recording
+  configureStopTimes(properties, record.stop_times);
+  const auto setUnlessEmpty = [&](const char* key, SharedValue<std::optional<std::string>>& to) {
+    if (const auto value = lookUp(&properties, key); value && !value->empty()) to.set(value);
+  };
+  setUnlessEmpty(metadata_key::kAgentUsername, context_.options.user);
+  setUnlessEmpty(metadata_key::kAgentPassword, context_.options.password);
+  if (lookUp(&properties, metadata_key::kAudioOnly) != "true") return;
+  record.recordingType.set(kRecordingTypeAudio);
+  LMPLogMessage(context_.log_context(), kLogDebug, "%s: switching to audio-only recording type",
+                metadata_key::kAudioOnly);
+}
+
+void CaptureActions::beginRequest(AgentRecord& record, const SharedDictionary& properties) {
+  const RecordingRequest request{.uuid = newUUIDString(),
+                                 .properties = properties,
+                                 .user = context_.options.user.get(),
+                                 .password = context_.options.password.get()};
+  record.request.set(request);
+  if (const auto capture = record.captureController.get())
+    capture->setStartWithUUID(request.uuid, shiftedReferenceTime(), properties);
 }
 
 void CaptureActions::startPreview() {
@@ -127,8 +171,18 @@ double CaptureActions::shiftedReferenceTime() const {
   return secondsSinceReferenceDate() - context_.state.timeshift_seconds.get();
 }
 
+/// A PAUSE has closed the span of its request as well. Without a span nothing would be recorded.
+void CaptureActions::resumeCaptureAndRequest() {
+  resumeCapture();
+  const auto controller = captureController();
+  if (!controller) return;
+  const RecordingRequest request = session()->request.get();
+  if (!request.uuid.empty())
+    controller->setStartWithUUID(request.uuid, shiftedReferenceTime(), request.properties);
+}
+
 void CaptureActions::pauseOrResume(bool pause) {
-  if (!context_.options.adhoc.get()) return pause ? pauseCapture() : resumeCapture();
+  if (!context_.options.adhoc.get()) return pause ? pauseCapture() : resumeCaptureAndRequest();
   const auto controller = captureController();
   if (!controller) return;
   const std::string uuid = session()->recording_uuid.get();

@@ -17,7 +17,13 @@ class CaptureActions {
   CaptureActions(AgentContext& context, Submission& submission)
       : context_(context), submission_(submission) {}
 
-  void prepareCapture();
+  /// @return a RecordError
+  int prepareCapture();
+  /// What a START asks for: prepares a capture with `properties` (its parameters, never null) and begins its
+  /// request. In continuous mode the request begins in the capture that runs. While a recording runs it is
+  /// refused and changes nothing.
+  /// @return a RecordError
+  int startRecording(const SharedDictionary& properties);
   void startPreview();
   void stopPreview();
   void pauseCapture();
@@ -39,6 +45,9 @@ class CaptureActions {
   void recordRuntimeErrorCallback(int code) const;
 
  private:
+  void configure(AgentRecord& record, const Dictionary& properties);
+  void beginRequest(AgentRecord& record, const SharedDictionary& properties);
+  void resumeCaptureAndRequest();
   void setPreviewRunning(bool run);
   void stopOrCancelCapture(bool cancel);
   void stopOrCancelAdHoc(bool cancel);

@@ -40,7 +40,7 @@ int MainLoop::appLoop() {
     stopForgottenPreview(now);
     readTimeShift(state);
     reloadChangedPreferences();
-    parts_.timed_commands.runDueCommands(std::time(nullptr));
+    parts_.timed_commands.postDueCommand(std::time(nullptr));
     const auto turn = parts_.loop.run(parts_.timed_commands.timeToNextCommand(250ms));
     checkServerRefusal(std::time(nullptr));
     if (!state.running.get() || turn == RunLoop::Turn::stopped) return 0;

@@ -2,27 +2,33 @@
 #include "agent/schedule.h"
 
 #include <algorithm>
-#include <iterator>
 #include <utility>
 
 namespace lmx {
 namespace {
 
-bool earlier(std::time_t date, const Schedule::Command& command) { return date < command.date; }
+bool endsRecording(const Schedule::Command& command) {
+  const auto verb = lookUp(command.entry, "command");
+  return verb == "STOP" || verb == "CANCEL";
+}
+
+bool earlier(const Schedule::Command& a, const Schedule::Command& b) {
+  return a.date != b.date ? a.date < b.date : endsRecording(a) && !endsRecording(b);
+}
 
 }  // namespace
 
 void Schedule::add(Command command) {
   const std::lock_guard lock(mutex_);
-  const auto place = std::upper_bound(commands_.begin(), commands_.end(), command.date, earlier);
+  const auto place = std::upper_bound(commands_.begin(), commands_.end(), command, earlier);
   commands_.insert(place, std::move(command));
 }
 
-std::vector<Schedule::Command> Schedule::takeDue(std::time_t now) {
+std::optional<Schedule::Command> Schedule::takeDue(std::time_t now) {
   const std::lock_guard lock(mutex_);
-  const auto end = std::upper_bound(commands_.begin(), commands_.end(), now, earlier);
-  std::vector<Command> due(std::make_move_iterator(commands_.begin()), std::make_move_iterator(end));
-  commands_.erase(commands_.begin(), end);
+  if (commands_.empty() || commands_.front().date > now) return std::nullopt;
+  Command due = std::move(commands_.front());
+  commands_.erase(commands_.begin());
   return due;
 }
 

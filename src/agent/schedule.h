@@ -20,9 +20,10 @@ class Schedule {
   };
 
   void add(Command command);
-  /// Takes the commands whose date is not after `now`, earliest first. Equal dates keep the order in which
-  /// they were added.
-  std::vector<Command> takeDue(std::time_t now);
+  /// Takes the earliest command, if its date is not after `now`. At equal dates what ends a recording (STOP,
+  /// CANCEL) comes first: a lecture begins in the second in which the one before it ends, whichever was
+  /// scheduled first. Otherwise equal dates keep the order in which they were added.
+  std::optional<Command> takeDue(std::time_t now);
   /// The earliest date; absent when there are no commands.
   [[nodiscard]] std::optional<std::time_t> next() const;
 

@@ -1,13 +1,14 @@
 // Takes a recording from the end of its capture to the queue.
 #include "agent/submission.h"
 
+#include <utility>
+
 #include "capture/api/capture_framework.h"
 #include "model/agent_actions.h"
 #include "model/codes.h"
 #include "model/metadata_keys.h"
 #include "platform/log.h"
 #include "platform/work_queue.h"
-#include "postprocess/agent_submit.h"
 #include "record/capture_delegate.h"
 #include "record/stop_capture.h"
 
@@ -20,106 +21,107 @@ SharedDictionary withUuid(const SharedDictionary& metadata, const std::optional<
   return std::make_shared<const Dictionary>(std::move(all));
 }
 
-/// The START parameters of the recording in `stopped`.
-SharedDictionary propertiesOf(const AgentContext& context, const AgentRecord& stopped) {
-  const SharedDictionary own = stopped.request_properties.get();
-  return own ? own : context.state.properties.get();
+/// The START of the recording in `stopped`.
+RecordingRequest requestOf(const AgentContext& context, const AgentRecord& stopped) {
+  RecordingRequest request = stopped.request.get();
+  if (!request.properties) request.properties = context.state.properties.get();
+  return request;
 }
 
-/// The metadata of that recording. The request comes first: a START refused in the meantime has replaced the
-/// request, and so what is submitted, while `metadata` may still be that of the first START.
+/// What describes that recording.
 SharedDictionary metadataOf(const AgentContext& context, const AgentRecord& stopped) {
-  if (SharedDictionary own = stopped.request_properties.get()) return own;
+  if (SharedDictionary own = stopped.request.get().properties) return own;
   SharedDictionary prepared = stopped.metadata.get();
   return prepared ? prepared : context.state.properties.get();
 }
 
-TimeValue timeValueFrom(double secondsSinceReference) {
-  const double seconds = secondsSinceReference + kReferenceDateOffset;
-  const auto whole = static_cast<time_t>(seconds);
-  return {whole, static_cast<suseconds_t>((seconds - static_cast<double>(whole)) * 1e6)};
-}
-
 }  // namespace
 
-/// A recording on its way to the queue: counted for as long as somebody holds it.
-class Submission::HandOff {
- public:
-  explicit HandOff(std::atomic<int>& count) : count_(count) { ++count_; }
-  ~HandOff() { --count_; }
-  HandOff(const HandOff&) = delete;
-  HandOff& operator=(const HandOff&) = delete;
-
- private:
-  std::atomic<int>& count_;
-};
+Submission::Submission(std::shared_ptr<AgentContext> context, AgentActions& actions, RunLoop& loop,
+                       const PostProcessScheduler& scheduler)
+    : context_(std::move(context)),
+      actions_(actions),
+      loop_(loop),
+      scheduler_(scheduler),
+      order_(context_->post_process_list),
+      jobs_(context_),
+      recovered_(context_, jobs_, order_) {}
 
 bool Submission::isIdle() const {
-  return hand_offs_ == 0 && context_->post_process_list.postProcessListCount() == 0 && !scheduler_.busy();
+  return !order_.underWay() && context_->post_process_list.postProcessListCount() == 0 && !scheduler_.busy();
 }
+
+// ---- from the stop to the report
 
 void Submission::rememberStopped(const std::shared_ptr<LMRCaptureController>& controller) {
-  if (reported_.lock() == controller) return;
-  stopped_.try_emplace(controller.get(), context_->record_context()->copy());
+  const auto record = context_->record_context();
+  // Nothing runs: the capture has been remembered already, or it was never begun and reports nothing.
+  if (reported_.lock() == controller || record->status.get() == kRecorderIdle) return;
+  const auto [place, isNew] = stopped_.try_emplace(controller.get());
+  if (isNew) place->second = {.record = record->copy(), .ticket = order_.enter()};
 }
 
-std::shared_ptr<AgentRecord> Submission::takeStopped(const void* controller) {
-  std::shared_ptr<AgentRecord> stopped;
+Submission::Stopped Submission::takeStopped(const void* controller, Ticket reported) {
+  Stopped stopped;
   const auto found = stopped_.find(controller);
   if (found != stopped_.end()) {
     stopped = std::move(found->second);
     stopped_.erase(found);
   } else if (const auto record = context_->record_context();
              record && record->captureController.get().get() == controller) {
-    stopped = record->copy();
+    stopped = {.record = record->copy(), .ticket = std::move(reported)};
   }
-  if (stopped) reported_ = stopped->captureController.get();
+  if (stopped.record) reported_ = stopped.record->captureController.get();
   return stopped;
 }
 
 void Submission::captureDidComplete(const void* controller) {
+  // The ticket is there before the report has been handled: the agent must not end in between.
   loop_.post(
-      [this, controller, hand_off = std::make_shared<HandOff>(hand_offs_)] {
-        if (const auto stopped = takeStopped(controller)) submit(stopped, hand_off);
+      [this, controller, ticket = order_.enter()] {
+        if (auto stopped = takeStopped(controller, ticket); stopped.record) submit(std::move(stopped));
       },
       Wait::no);
 }
 
 void Submission::captureDidCancel(const void* controller) {
   loop_.post(
-      [this, controller] {
-        const auto stopped = takeStopped(controller);
+      [this, controller, ticket = order_.enter()] {
+        const Stopped stopped = takeStopped(controller, ticket);
         const auto record = context_->record_context();
         if (record && record->captureController.get().get() == controller) actions_.setRecorderStatusToIdle();
-        if (!stopped) return;
-        dispatchAsync([this, capture = stopped->captureController.get()] {
-          if (capture) keepRecovered(capture->recoverAbandonedRequests());
+        if (!stopped.record) return;
+        dispatchAsync([this, stopped] {
+          const auto capture = stopped.record->captureController.get();
+          if (!capture) return;
+          HandOffOrder::deliver(*stopped.ticket,
+                                recovered_.keep(capture->recoverAbandonedRequests(), *stopped.ticket));
         });
       },
       Wait::no);
 }
 
 void Submission::submitStoppedRecording() {
-  if (const auto record = context_->record_context()) {
-    submit(record->copy(), std::make_shared<HandOff>(hand_offs_));
-  }
+  if (const auto record = context_->record_context())
+    submit({.record = record->copy(), .ticket = order_.enter()});
 }
 
-void Submission::submit(const std::shared_ptr<AgentRecord>& stopped,
-                        const std::shared_ptr<HandOff>& hand_off) {
+void Submission::submit(Stopped stopped) {
   context_->logDebug("Submitting Stopped Recording");
-  const auto controller = stopped->captureController.get();
-  const double elapsed =
-      controller ? controller->elapsedTimeForRequestWithUUID(stopped->request_uuid.get()) : 0;
-  const SharedDictionary properties = propertiesOf(*context_, *stopped);
-  const auto uuid = lookUp(properties, metadata_key::kRecordingUUID);
-  const std::string repository = context_->recording.recording_repository_path.get().value_or("");
-  const std::string path = lookUp(properties, metadata_key::kAdHocFilePath)
-                               .value_or(repository + "/" + uuid.value_or("") + ".mov");
-  stopped->metadata.set(withUuid(metadataOf(*context_, *stopped), uuid));
-  stopped->startTime.set(stopped->beginning());
-  dispatchAsync([this, stopped, path, elapsed, hand_off] { handOff(stopped, path, elapsed); });
+  AgentRecord& record = *stopped.record;
+  const auto controller = record.captureController.get();
+  const RecordingRequest request = requestOf(*context_, record);
+  const double elapsed = controller ? controller->elapsedTimeForRequestWithUUID(request.uuid) : 0;
+  // An agent that is ending leaves the recording to the next start, which submits it only if it was stopped.
+  if (controller && context_->state.running.get()) controller->submitRequestWithUUID(request.uuid);
+  record.metadata.set(
+      withUuid(metadataOf(*context_, record), lookUp(request.properties, metadata_key::kRecordingUUID)));
+  record.request.set(request);
+  record.startTime.set(record.beginning());
+  dispatchAsync([this, stopped = std::move(stopped), elapsed] { handOff(stopped, elapsed); });
 }
+
+// ---- from the closed capture to the queue, on a worker
 
 /// The session, unless it has moved on to another capture.
 std::shared_ptr<AgentRecord> Submission::sessionOf(const LMRCaptureController* controller) const {
@@ -131,17 +133,25 @@ void Submission::leaveError(const LMRCaptureController* controller) {
   if (const auto record = sessionOf(controller)) record->error.set(kRecordCannotWrite);
 }
 
-void Submission::handOff(const std::shared_ptr<AgentRecord>& stopped, const std::string& path,
-                         double elapsed) {
-  const auto controller = stopped->captureController.get();
+void Submission::handOff(const Stopped& stopped, double elapsed) {
+  AgentRecord& record = *stopped.record;
+  const auto controller = record.captureController.get();
   // When the agent is ending, the next start makes both movie and document.
   if (!controller || !context_->state.running.get()) return;
-  const bool settled = finishMovie(stopped, *controller, path, elapsed);
-  if (!context_->state.running.get()) return;
-  // A movie or document that could not be written stays in the capture's journal. The next start tries again.
-  if (settled) {
-    controller->requestHandedOver(stopped->request_uuid.get());
-    keepRecovered(controller->recoverAbandonedRequests());
+  const auto movie = makeMovie(record, *controller);
+  if (movie) {
+    record.stopTime.set(shiftedNow(*context_));
+    auto job = announce({.record = stopped.record,
+                         .request = record.request.get(),
+                         .movie = *movie,
+                         .metadata = record.metadata.get(),
+                         .started = record.startTime.get(),
+                         .stopped = record.stopTime.get(),
+                         .seconds = static_cast<std::int64_t>(elapsed)},
+                        *stopped.ticket);
+    if (context_->state.running.get() || job) settle(stopped, *controller, std::move(job));
+  } else if (movie.error().code == kNoMedia && context_->state.running.get()) {
+    settle(stopped, *controller, nullptr);
   }
   // On the main thread, so that no START comes between the question and the answer.
   loop_.post(
@@ -151,79 +161,75 @@ void Submission::handOff(const std::shared_ptr<AgentRecord>& stopped, const std:
       Wait::no);
 }
 
-bool Submission::finishMovie(const std::shared_ptr<AgentRecord>& stopped, LMRCaptureController& controller,
-                             const std::string& path, double elapsed) {
-  const auto error = controller.processRequestWithUUID(stopped->request_uuid.get(), path);
-  if (const auto cause = controller.lastError()) {
-    LMPLogMessage(context_->log_context(), kLogError, "The capture of \"%s\" ended early: %s", path.c_str(),
-                  cause->message.c_str());
-    // A lost device is handled elsewhere. Otherwise a disk or an encoder has failed.
-    if (!meansDeviceLost(cause)) leaveError(&controller);
+Result<std::string, CaptureError> Submission::makeMovie(const AgentRecord& stopped,
+                                                        LMRCaptureController& controller) {
+  const RecordingRequest request = stopped.request.get();
+  const auto uuid = lookUp(request.properties, metadata_key::kRecordingUUID);
+  const auto chosen = lookUp(request.properties, metadata_key::kAdHocFilePath);
+  const std::string repository = context_->recording.recording_repository_path.get().value_or("");
+  const std::string path = chosen.value_or(repository + "/" + uuid.value_or("") + ".mov");
+  Result<std::string, CaptureError> movie = path;
+  if (chosen) {
+    movie = controller.processRequestBeside(request.uuid, path);
+  } else if (auto error = controller.processRequestWithUUID(request.uuid, path)) {
+    movie = *std::move(error);
   }
-  if (!error) {
-    stopped->stopTime.set(shiftedNow(*context_));
-    return announceStop(stopped, path, stopped->metadata.get(), stopped->startTime.get(),
-                        static_cast<std::int64_t>(elapsed), stopped->stopTime.get(), false);
-  }
+  logEarlyEnd(controller, path);
+  if (movie) return movie;
   LMPLogMessage(context_->log_context(), kLogCritical, "The recording could not be finished: %s",
-                error->message.c_str());
+                movie.error().message.c_str());
   actions_.recordRuntimeErrorCallback(kRecordCannotWrite);
   leaveError(&controller);
-  return error->code == kNoMedia;
+  return movie;
 }
 
-bool Submission::wantsSubmission(const SharedDictionary& properties) const {
-  return !context_->options.adhoc.get() && !context_->options.submit_disabled.get() &&
-         lookUp(properties, metadata_key::kAdHocSubmitDisabled) != "1";
+void Submission::logEarlyEnd(LMRCaptureController& controller, const std::string& path) {
+  const auto cause = controller.lastError();
+  if (!cause) return;
+  LMPLogMessage(context_->log_context(), kLogError, "The capture of \"%s\" ended early: %s", path.c_str(),
+                cause->message.c_str());
+  // A lost device is handled elsewhere. Otherwise a disk or an encoder has failed.
+  if (!meansDeviceLost(cause)) leaveError(&controller);
 }
 
-bool Submission::announceStop(const std::shared_ptr<AgentRecord>& session, const std::string& file,
+/// The capture forgets its recording before the job can begin: a crash must not submit it twice. One without
+/// its document stays in the capture's journal, and the next start writes that.
+void Submission::settle(const Stopped& stopped, LMRCaptureController& controller,
+                        std::shared_ptr<AgentSubmit> job) {
+  const std::string request = stopped.record->request.get().uuid;
+  HandOffOrder::Jobs jobs;
+  if (job && !job->documented()) {
+    controller.requestQueued(request);
+  } else {
+    controller.requestHandedOver(request);
+    jobs = recovered_.keep(controller.recoverAbandonedRequests(), *stopped.ticket);
+  }
+  if (job) jobs.insert(jobs.begin(), std::move(job));
+  HandOffOrder::deliver(*stopped.ticket, std::move(jobs));
+}
+
+std::shared_ptr<AgentSubmit> Submission::announce(const JobMaker::Finished& finished,
+                                                  const HandOffOrder::Ticket& ticket) {
+  if (!context_->state.running.get()) return nullptr;
+  LMPLogMessage(context_->log_context(), kLogNotice, "\"%s\" recording stopped (duration: %ds)",
+                finished.movie.c_str(), static_cast<int>(finished.seconds));
+  return jobs_.wantsSubmission(finished.request.properties) ? jobs_.make(finished, ticket) : nullptr;
+}
+
+void Submission::announceStop(const std::shared_ptr<AgentRecord>& session, const std::string& file,
                               const SharedDictionary& metadata, Time atTime, std::int64_t elapsedSeconds,
                               Time stoppedTime, bool canceled) {
-  if (!context_->state.running.get()) return true;
-  LMPLogMessage(context_->log_context(), kLogNotice, "\"%s\" recording stopped (duration: %ds)", file.c_str(),
-                static_cast<int>(elapsedSeconds));
-  const SharedDictionary properties = propertiesOf(*context_, *session);
-  if (!wantsSubmission(properties)) return true;
-  auto job = std::make_shared<AgentSubmit>();
-  job->recorded = session->copy();
-  job->adhoc_workflow_uuid = lookUp(properties, metadata_key::kAdHocWorkflowUUID);
-  job->setPropertyValuesWithContext(context_, file, atTime, stoppedTime, elapsedSeconds, metadata, canceled);
-  if (job->writeProperties() != 0) {
-    LMPLogMessage(context_->log_context(), kLogCritical,
-                  "Internal error occurred in did stop with success callback");
-    context_->state.running.set(false);
-    return true;
-  }
-  const bool documented = job->documented();
-  context_->post_process_list.postProcessListAddJob(std::move(job));
-  return documented;
-}
-
-void Submission::recoverUnfinishedRecordings(std::shared_ptr<CaptureFramework> framework) {
-  const auto repository = context_->recording.recording_repository_path.get();
-  if (!repository) return;
-  // On a worker: a long recording may have to be copied, and the agent must accept commands meanwhile.
-  dispatchAsync([this, repository, framework = std::move(framework)] {
-    keepRecovered(framework->recoverUnfinished(*repository));
-  });
-}
-
-void Submission::keepRecovered(const std::vector<RecoveredRecording>& recordings) {
-  for (const RecoveredRecording& recording : recordings) {
-    AgentSubmit document;
-    auto record = std::make_shared<AgentRecord>();
-    record->recordingType.set(recording.recordingType);
-    document.recorded = record;
-    document.setPropertyValuesWithContext(
-        context_, recording.path, timeValueFrom(recording.startTime), timeValueFrom(recording.stopTime),
-        static_cast<std::int64_t>(recording.duration), recording.parameters, false);
-    // Without its document the movie stays in the journal. The next start tries again.
-    if (!document.tryWriteProperties()) continue;
-    recording.forget();
-    LMPLogMessage(context_->log_context(), kLogNotice,
-                  "Recovered unfinished recording \"%s\" (duration: %ds); it was not submitted",
-                  recording.path.c_str(), static_cast<int>(recording.duration));
+  const Ticket ticket = order_.enter();
+  if (auto job = announce({.record = session,
+                           .request = requestOf(*context_, *session),
+                           .movie = file,
+                           .metadata = metadata,
+                           .started = atTime,
+                           .stopped = stoppedTime,
+                           .seconds = elapsedSeconds,
+                           .canceled = canceled},
+                          *ticket)) {
+    HandOffOrder::deliver(*ticket, {std::move(job)});
   }
 }
 

@@ -16,13 +16,21 @@ void TimedCommandRunner::scheduleTimedCommand(SharedDictionary entry, std::time_
 
 void TimedCommandRunner::loadSchedule() { channels_.channelOf(ChannelKind::tunnel).loadTimedCommands(); }
 
-void TimedCommandRunner::runDueCommands(std::time_t now) {
-  for (const Schedule::Command& command : schedule_.takeDue(now)) {
-    try {
-      channels_.channelOf(command.channel).completeTimedCommand(command.entry);
-    } catch (const std::exception& problem) {  // the remaining commands must still run
-      LMPLogMessage(log_.log_context(), kLogCritical, "A timed command failed: %s", problem.what());
-    }
+void TimedCommandRunner::postDueCommand(std::time_t now) {
+  if (posted_) return;
+  auto due = schedule_.takeDue(now);
+  if (!due) return;
+  posted_ = loop_.post([this, command = *std::move(due)] { run(command); }, Wait::no);
+}
+
+void TimedCommandRunner::run(const Schedule::Command& command) {
+  posted_ = false;
+  // An agent that is ending would refuse it. It stays in the timers file.
+  if (!context_.state.running.get()) return;
+  try {
+    channels_.channelOf(command.channel).completeTimedCommand(command.entry);
+  } catch (const std::exception& problem) {  // the remaining commands must still run
+    LMPLogMessage(context_.log_context(), kLogCritical, "A timed command failed: %s", problem.what());
   }
 }
 

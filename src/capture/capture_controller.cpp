@@ -114,6 +114,18 @@ void CaptureController::cancelRequestWithUUID(const std::string& uuid) {
   if (const auto recorder = this->recorder()) recorder->marks().cancel(uuid);
 }
 
+void CaptureController::submitRequestWithUUID(const std::string& uuid) {
+  const auto recorder = this->recorder();
+  if (!recorder) return;
+  recorder->marks().submit(uuid);
+  // The capture may have closed its marks just now: what comes after that is the closed capture's.
+  if (const auto finished = recorder->finished()) finished->submit(uuid);
+}
+
+void CaptureController::syncMarks() {
+  if (const auto recorder = this->recorder()) recorder->syncMarks();
+}
+
 // ---- status
 
 double CaptureController::elapsedTimeForRequestWithUUID(const std::string& uuid) {
@@ -153,8 +165,24 @@ std::optional<CaptureError> CaptureController::processRequestWithUUID(const std:
                                                                       const std::string& outputPath) {
   if (const auto recorder = this->recorder())
     return recorder->waitUntilFinished()->makeMovie(uuid, outputPath);
+  return nothingFor(outputPath);
+}
+
+Result<std::string, CaptureError> CaptureController::processRequestBeside(const std::string& uuid,
+                                                                          const std::string& outputPath) {
+  if (const auto recorder = this->recorder())
+    return recorder->waitUntilFinished()->makeMovieBeside(uuid, outputPath);
+  return nothingFor(outputPath);
+}
+
+CaptureError CaptureController::nothingFor(const std::string& outputPath) const {
   const CaptureError nothing{CaptureError::kDomain, kNoMedia, "nothing was captured for " + outputPath};
   return refusal().value_or(nothing);
+}
+
+void CaptureController::requestQueued(const std::string& uuid) {
+  const auto recorder = this->recorder();
+  if (const auto finished = recorder ? recorder->finished() : nullptr) finished->queued(uuid);
 }
 
 void CaptureController::requestHandedOver(const std::string& uuid) {

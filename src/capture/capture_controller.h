@@ -34,6 +34,8 @@ class CaptureController : public LMRCaptureController,
   void setStartWithUUID(const std::string& uuid, double atTime, SharedDictionary parameters) override;
   void setStopWithUUID(const std::string& uuid, double atTime) override;
   void cancelRequestWithUUID(const std::string& uuid) override;
+  void submitRequestWithUUID(const std::string& uuid) override;
+  void syncMarks() override;
   double elapsedTimeForRequestWithUUID(const std::string& uuid) override;
   std::int64_t elapsedTimeInMilliseconds() override;
   int recordingState() override;
@@ -43,11 +45,15 @@ class CaptureController : public LMRCaptureController,
   std::vector<double> audioAveragePowerLevels() override { return {}; }
   std::optional<CaptureError> processRequestWithUUID(const std::string& uuid,
                                                      const std::string& outputPath) override;
+  Result<std::string, CaptureError> processRequestBeside(const std::string& uuid,
+                                                         const std::string& outputPath) override;
+  void requestQueued(const std::string& uuid) override;
   void requestHandedOver(const std::string& uuid) override;
   std::vector<RecoveredRecording> recoverAbandonedRequests() override;
   std::optional<std::string> deleteEarliestSegment() override { return std::nullopt; }
 
  private:
+  [[nodiscard]] CaptureError nothingFor(const std::string& outputPath) const;
   bool refuse(const CaptureError& reason);
   /// How the end of the capture is reported; holds the delegate.
   [[nodiscard]] CaptureRecorder::Report reportOfTheEnd();

@@ -4,13 +4,17 @@
 #include <malloc.h>
 
 #include <algorithm>
+#include <cerrno>
 #include <chrono>
 #include <cmath>
+#include <cstring>
 #include <exception>
 #include <system_error>
 #include <thread>
 
+#include "platform/directories.h"
 #include "platform/log.h"
+#include "platform/paths.h"
 
 namespace lmx {
 
@@ -80,6 +84,20 @@ void CaptureRecorder::end(Ending how) {
   // has not delivered any picture yet gets longer: a recording that is stopped at once still holds one.
   const auto patience = recorded_frames_ > 0 ? 1s : 3s;
   queue_.hurry(realTime ? MediaQueue::Clock::now() + patience : MediaQueue::Clock::time_point::max());
+}
+
+void CaptureRecorder::syncMarks() const {
+  int error = journal_->sync();
+  // Some file systems keep only the names in directories that have been synced.
+  const std::string common = directoryOf(folder_);
+  for (const std::string& directory : {folder_, common, directoryOf(common)}) {
+    const int failure = syncDirectory(directory);
+    if (failure != ENOENT && error == 0) error = failure;  // a capture that is done with has gone
+  }
+  if (error == 0) return;
+  LMPLogMessage(nullptr, kLogError,
+                "The marks of %s could not be synced: %s; a power cut now would lose them", folder_.c_str(),
+                std::strerror(error));
 }
 
 // ---- status

@@ -48,6 +48,9 @@ class CaptureRecorder : public CaptureConsumer, public std::enable_shared_from_t
   void end(Ending how);
 
   [[nodiscard]] CaptureMarks& marks() { return marks_; }
+  /// Returns once all marks so far, and the names of the capture's files, survive a power cut (failures are
+  /// logged).
+  void syncMarks() const;
   /// Running time now; in a closed capture the time at which it ended.
   [[nodiscard]] double runningTime() const;
   /// Running time of a wall-clock time, seconds since 2001-01-01 UTC.

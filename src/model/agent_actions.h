@@ -35,6 +35,12 @@ class AgentActions {
   /// @return false when the main loop has ended and the action will not run
   virtual bool perform(Action action, Wait wait) = 0;
 
+  /// Starts the recording that a START asks for, on the main thread; waits for it. Any thread.
+  /// @param properties  the parameters of the START
+  /// @return a RecordError; kRecordInvalidType when the main loop has ended
+  virtual int performStart(const SharedDictionary& properties) = 0;
+  [[nodiscard]] virtual bool isMainThread() const = 0;
+
   // Actions, main thread only. Those with a result store it in the context's `status`.
   virtual void prepareCapture() = 0;
   virtual void startPreview() = 0;

@@ -36,7 +36,8 @@ bool nameTaken(const std::string& path) {
   return lstat(path.c_str(), &status) == 0;  // true for a dangling link, too
 }
 
-/// @return 0 or the errno; EEXIST when the name is taken.
+}  // namespace
+
 int renameToFreeName(const std::string& from, const std::string& to) {
   if (renameat2(AT_FDCWD, from.c_str(), AT_FDCWD, to.c_str(), RENAME_NOREPLACE) == 0) return 0;
   // Some file systems don't support RENAME_NOREPLACE. There only a check beforehand protects an existing
@@ -45,8 +46,6 @@ int renameToFreeName(const std::string& from, const std::string& to) {
   if (nameTaken(to)) return EEXIST;
   return rename(from.c_str(), to.c_str()) == 0 ? 0 : errno;
 }
-
-}  // namespace
 
 int copyFileToNewName(const std::string& from, const std::string& to, mode_t mode) {
   if (nameTaken(to)) return EEXIST;

@@ -1,4 +1,4 @@
-// Copies a file so that an incomplete copy is never visible under the target's name.
+// Copies and renames files without replacing any, and without showing an incomplete copy.
 #pragma once
 #include <sys/types.h>
 
@@ -10,5 +10,9 @@ namespace lmx {
 /// it is complete.
 /// @return 0 or the errno; EEXIST when `to` exists, which is never replaced
 int copyFileToNewName(const std::string& from, const std::string& to, mode_t mode);
+
+/// Renames `from` to the new name `to` on the same file system. @return 0 or the errno; EEXIST when `to`
+/// exists (also as a dangling link), which is never replaced
+int renameToFreeName(const std::string& from, const std::string& to);
 
 }  // namespace lmx

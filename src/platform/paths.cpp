@@ -22,6 +22,16 @@ std::string systemPath(std::string_view fixedPath) {
   return root + std::string(fixedPath);
 }
 
+std::string documentPathOf(const std::string& movie) {
+  std::string path = movie;
+  bool replaced = false;
+  for (std::size_t at = path.find(".mov"); at != std::string::npos; at = path.find(".mov", at + 4)) {
+    path.replace(at, 4, ".xml");
+    replaced = true;
+  }
+  return replaced ? path : path + ".xml";
+}
+
 std::string directoryOf(std::string_view path) {
   const auto slash = path.rfind('/');
   if (slash == std::string_view::npos) return ".";

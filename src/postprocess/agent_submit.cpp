@@ -87,6 +87,12 @@ int AgentSubmit::writeProperties() {
 }
 
 int AgentSubmit::addRecordingWithCommentary(ChildRunner& children) {
+  const int result = submitOrCleanUp(children);
+  if (stored) stored->remove();
+  return result;
+}
+
+int AgentSubmit::submitOrCleanUp(ChildRunner& children) {
   const bool disabled = agentContext && agentContext->options.submit_disabled.get();
   LMPLogMessage(log(), kLogInfo, "Post-process mechanism is starting...");
   if (!disabled && !canceled) {
@@ -117,18 +123,21 @@ int AgentSubmit::addRecording(ChildRunner& children) {
   if (!agentContext || !uuid) return failedBeforeTheTool();
   const auto record = session();
   if (record && record->recordedType() == kRecordingTypeFile) copyInputFile(*uuid);
-  SubmissionRequest request{.server = agentContext->server.lumex_url.get().value_or(""),
-                            .recordingUUID = *uuid};
+  SubmissionRequest submission{.server = agentContext->server.lumex_url.get().value_or(""),
+                               .recordingUUID = *uuid};
   if (adhoc_workflow_uuid) {
-    const auto user = agentContext->options.user.get();
-    const auto password = agentContext->options.password.get();
-    if (!user || !password) return failedBeforeTheTool();
-    request.workflow = *adhoc_workflow_uuid;
-    request.file = recording_file_path.value_or("");
-    request.user = *user;
-    request.password = *password;
+    const Text submitter = user ? user : agentContext->options.user.get();
+    const Text secret = password ? password : agentContext->options.password.get();
+    if (!submitter || !secret) return failedBeforeTheTool();
+    submission.workflow = *adhoc_workflow_uuid;
+    submission.file = recording_file_path.value_or("");
+    submission.user = *submitter;
+    submission.password = *secret;
   }
-  return submitWithTool(children, submissionArguments(request));
+  if (stored) stored->begin();
+  const int result = submitWithTool(children, submissionArguments(submission));
+  if (stored) stored->remove();  // before anybody is told: a crash now must not name it as interrupted
+  return result;
 }
 
 /// The tool looks for a recording in the repository, so the input file of a "File" recording and its document

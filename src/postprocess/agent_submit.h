@@ -7,6 +7,7 @@
 
 #include "model/agent_context.h"
 #include "platform/child_process.h"
+#include "postprocess/job_store.h"
 #include "record/agent_record.h"
 #include "support/dictionary.h"
 #include "support/time_value.h"
@@ -31,6 +32,11 @@ class AgentSubmit {
   Text recording_file_path;
   Text properties_file_path;
   Text adhoc_workflow_uuid;
+  // Who submits to the workflow; absent: whom the agent knows when the job runs.
+  Text user;
+  Text password;
+  std::string request;                ///< identifies the request in the journal of its capture
+  std::shared_ptr<StoredJob> stored;  ///< null: the job is only in memory
   bool canceled = false;
 
   /// Gathers everything for the properties document. A failure is logged and ends the gathering; what was
@@ -49,13 +55,14 @@ class AgentSubmit {
   /// Whether the last writeProperties() wrote a document.
   [[nodiscard]] bool documented() const { return documented_; }
 
-  /// Submits the recording and logs the progress.
+  /// Submits the recording and logs the progress. The job is over then, whatever the result.
   /// @return 0 when the job ended normally, -1 when the submission failed
   int addRecordingWithCommentary(ChildRunner& children);
   /// Runs the tool. @return 0 when it exited with 0, else 1 (logged)
   int addRecording(ChildRunner& children);
 
  private:
+  int submitOrCleanUp(ChildRunner& children);
   [[nodiscard]] bool gather(const Text& movie, std::optional<TimeValue> started_date,
                             std::optional<TimeValue> stopped_date, std::int64_t duration);
   void copyInputFile(const std::string& uuid) const;

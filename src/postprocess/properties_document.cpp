@@ -6,6 +6,7 @@
 #include <sstream>
 #include <string_view>
 
+#include "platform/paths.h"
 #include "support/utf8.h"
 
 namespace lmx {
@@ -36,16 +37,11 @@ std::string propertiesXml(const Dictionary& properties) {
 }
 
 std::string propertiesPathFor(const std::string& movie, LMPLogContext log) {
-  std::string path = movie;
-  bool replaced = false;
-  for (std::size_t at = path.find(".mov"); at != std::string::npos; at = path.find(".mov", at + 4)) {
-    path.replace(at, 4, ".xml");
-    replaced = true;
+  if (movie.find(".mov") == std::string::npos) {
+    LMPLogMessage(log, kLogWarning, "The movie \"%s\" is not named .mov: its properties go to \"%s.xml\"",
+                  movie.c_str(), movie.c_str());
   }
-  if (replaced) return path;
-  LMPLogMessage(log, kLogWarning, "The movie \"%s\" is not named .mov: its properties go to \"%s.xml\"",
-                movie.c_str(), movie.c_str());
-  return movie + ".xml";
+  return documentPathOf(movie);
 }
 
 }  // namespace lmx

@@ -45,8 +45,7 @@ std::shared_ptr<AgentRecord> AgentRecord::copy() const {
   take(other->metadata, metadata);
   take(other->videoWidth, videoWidth);
   take(other->videoHeight, videoHeight);
-  take(other->request_uuid, request_uuid);
-  take(other->request_properties, request_properties);
+  take(other->request, request);
   take(other->status, status);
   take(other->error, error);
   take(other->launchTime, launchTime);
@@ -62,6 +61,13 @@ std::shared_ptr<AgentRecord> AgentRecord::copy() const {
   return other;
 }
 
+void AgentRecord::releaseCapture() {
+  captureThread.set(nullptr);
+  previewController.set(nullptr);
+  captureController.set(nullptr);
+  captureControllerDelegate.set(nullptr);
+}
+
 void AgentRecord::cleanup() {
   if (cleaned_up_.exchange(true)) return;
   // Only the session itself may stop a capture; a copy describes one that has already been stopped. The
@@ -73,11 +79,8 @@ void AgentRecord::cleanup() {
   autoShutoffCheckTimer.set(false);
   for (auto* time : {&elapsedTime, &launchTime, &startTime, &stopTime, &lastContact}) time->set(std::nullopt);
   stop_times.clear();
-  captureThread.set(nullptr);
   metadata.set(nullptr);
-  previewController.set(nullptr);
-  captureController.set(nullptr);
-  captureControllerDelegate.set(nullptr);
+  releaseCapture();
   recording_uuid.set({});
 }
 

@@ -7,6 +7,7 @@
 
 #include "capture/api/capture_framework.h"
 #include "model/codes.h"
+#include "model/recording_request.h"
 #include "model/recording_settings.h"
 #include "record/stop_times.h"
 #include "support/dictionary.h"
@@ -45,10 +46,9 @@ class AgentRecord : public RecordingSettings, public std::enable_shared_from_thi
   SharedValue<std::uint32_t> videoHeight;
 
   // Who requested it.
-  SharedValue<std::string> request_uuid;
-  /// The START parameters that came with request_uuid. They name and describe the finished recording even
-  /// when a later START has replaced the agent's properties.
-  SharedValue<SharedDictionary> request_properties;
+  /// The last START that was granted. It names and describes the finished recording even when a later START
+  /// has replaced the agent's properties.
+  SharedValue<RecordingRequest> request;
 
   // Its progress.
   SharedValue<std::int32_t> status{kRecorderIdle};
@@ -85,6 +85,8 @@ class AgentRecord : public RecordingSettings, public std::enable_shared_from_thi
 
   /// A copy with its own values and its own unlocked mutexes, but shared capture objects. It has no timer.
   [[nodiscard]] std::shared_ptr<AgentRecord> copy() const;
+  /// Lets go of the capture objects, of a copy that only describes the recording.
+  void releaseCapture();
   /// Stops a running capture and releases everything. Takes effect once.
   void cleanup();
 

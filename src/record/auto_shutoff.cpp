@@ -32,7 +32,9 @@ int doAutoShutoff(AgentRecord& session) {
   const auto hard = session.stop_times.hardStopTime.get();
   const auto soft = session.stop_times.softStopTime.get();
   if (const auto controller = session.captureController.get()) {
-    controller->setStopWithUUID(session.request_uuid.get(), secondsSinceReferenceDate());
+    const std::string request = session.request.get().uuid;
+    controller->setStopWithUUID(request, secondsSinceReferenceDate());
+    controller->submitRequestWithUUID(request);
   }
   if (environment.actions != nullptr) {
     environment.actions->perform(&AgentActions::stopRecording, Wait::untilDone);

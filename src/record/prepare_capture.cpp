@@ -2,7 +2,6 @@
 #include "record/prepare_capture.h"
 
 #include <cerrno>
-#include <cstdlib>
 #include <mutex>
 
 #include "model/codes.h"
@@ -15,6 +14,7 @@
 #include "record/capture_thread.h"
 #include "record/disk_space.h"
 #include "record/engine_environment.h"
+#include "record/recording_limits.h"
 #include "record/status_lock.h"
 
 namespace lmx {
@@ -42,9 +42,7 @@ std::optional<MovieChoice> chooseMovie(AgentContext& context, AgentRecord& sessi
   }
   const std::string identifier = lookUp(metadata, metadata_key::kRecordingUUID).value_or("test");
   const bool audioOnly = isAudioOnly(metadata);
-  if (const auto minutes = lookUp(metadata, metadata_key::kUnattendedMinutes)) {
-    session.stop_times.maxUnattendedRecordingMinutes.set(std::atoi(minutes->c_str()));
-  }
+  if (metadata) configureUnattendedLimit(*metadata, session.stop_times);
   return MovieChoice{*repository + "/" + identifier + ".mov", audioOnly};
 }
 
@@ -67,12 +65,20 @@ std::int32_t wantedType(const AgentRecord& session, const SharedDictionary& meta
   return soundOnly ? kRecordingTypeAudio : type;
 }
 
-int prepareByType(AgentContext& context, AgentRecord& session, std::int32_t type) {
-  if (session.status.get() != kRecorderIdle) {
-    LMPLogMessage(nullptr, kLogError, "Unable to start, capture not idle");
-    reportRuntimeError(kRecordNotIdle);
-    return kRecordNotIdle;
+/// The answer while a recording runs, of which nothing changes. The status lock is held.
+int refuseSecondRecording(AgentRecord& session) {
+  if (LXAgentRecordHasDiskSpace(session.diskSpaceCutoffInMB.get(), session.filename.get().value_or("")) ==
+      0) {
+    return kRecordNoDiskSpace;
   }
+  session.recording_uuid.set(newUUIDString());
+  LMPLogMessage(nullptr, kLogError, "Unable to start, capture not idle");
+  reportRuntimeError(kRecordNotIdle);
+  session.error.set(kRecordNotIdle);
+  return kRecordNotIdle;
+}
+
+int prepareByType(AgentContext& context, AgentRecord& session, std::int32_t type) {
   session.setRecordedType(type);
   if (type == kRecordingTypeFile) return kRecordSuccess;
   if (type < kRecordingTypeAudio || type > kRecordingTypeFile) {
@@ -114,10 +120,18 @@ void restoreType(const AgentContext& context, AgentRecord& session) {
 
 }  // namespace
 
+std::optional<int> LXAgentRecordRefusal(AgentRecord& session) {
+  const StatusAndTimingLock lock(session);
+  if (!lock.locked()) return kRecordLockFailed;
+  if (session.status.get() == kRecorderIdle) return std::nullopt;
+  return refuseSecondRecording(session);
+}
+
 int LXAgentRecordPrepareCapture(AgentContext& context, SharedDictionary metadata) {
   if (!context.state.running.get()) return kRecordInvalidType;
   const auto session = context.record_context();
   if (!session) return LXAgentRecordPrepareCaptureSync(context, std::nullopt, std::move(metadata));
+  if (const auto refusal = LXAgentRecordRefusal(*session)) return *refusal;
   const auto movie = chooseMovie(context, *session, metadata);
   if (!movie) return kRecordInvalidType;
   if (context.control_action_mutex.lock() != 0) {
@@ -138,7 +152,8 @@ int LXAgentRecordPrepareCaptureSync(AgentContext& context, const std::optional<s
   if (!session || !path) return invalidArguments("LXAgentRecordPrepareCapture");
   const StatusAndTimingLock lock(*session);
   if (!lock.locked()) return kRecordLockFailed;
-  if (session->status.get() == kRecorderIdle) session->filename.set(path);
+  if (session->status.get() != kRecorderIdle) return refuseSecondRecording(*session);
+  session->filename.set(path);
   if (LXAgentRecordHasDiskSpace(session->diskSpaceCutoffInMB.get(), session->filename.get().value_or("")) ==
       0) {
     return kRecordNoDiskSpace;

@@ -1,7 +1,9 @@
 // Sets and checks the deadlines of a recording.
 #include "record/stop_times.h"
 
+#include <algorithm>
 #include <cstdlib>
+#include <limits>
 
 #include "platform/log.h"
 
@@ -51,9 +53,8 @@ void StopTimes::updateSoftStopTime() {
   softStopTime.set(std::nullopt);
   const std::int32_t minutes = maxUnattendedRecordingMinutes.get();
   if (minutes <= 0) return;
-  // 32 bits may wrap. A limit of more than 68 years need not be exact.
-  const auto seconds = static_cast<std::int32_t>(static_cast<std::uint32_t>(minutes) * 60U);
-  const Time deadline = deadlineIn(seconds);
+  constexpr std::int64_t kMost = std::numeric_limits<std::int32_t>::max();  // as for the hard stop
+  const Time deadline = deadlineIn(static_cast<std::int32_t>(std::min(std::int64_t{minutes} * 60, kMost)));
   if (!deadline) return;
   softStopTime.set(deadline);
   logTime("unattended stop time set to: ", *deadline);

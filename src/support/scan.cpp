@@ -4,6 +4,8 @@
 #include <algorithm>
 #include <charconv>
 #include <cmath>
+#include <cstdlib>
+#include <limits>
 
 namespace lmx {
 namespace {
@@ -26,6 +28,12 @@ std::optional<Number> scan(std::string_view text) {
 }
 
 }  // namespace
+
+std::int32_t decimalValue(const std::string& text) {
+  using Limits = std::numeric_limits<std::int32_t>;
+  const long long value = std::strtoll(text.c_str(), nullptr, 10);
+  return static_cast<std::int32_t>(std::clamp<long long>(value, Limits::min(), Limits::max()));
+}
 
 std::optional<int> scanInteger(std::string_view text) { return scan<int>(text); }
 

@@ -4,7 +4,11 @@ import subprocess
 import numpy
 import pytest
 from harness import movie
+from harness.agent import REPOSITORY
+from harness.one_thread import main_thread_held
+from harness.power_cut import PowerCut
 from harness.unread import all_read, wait_read
+from harness.waiting import let_pass
 
 
 def picture(counter, width=320, height=180):
@@ -77,3 +81,57 @@ def test_what_the_daemon_has_not_read_is_seen(agent, server, way):
         agent.sandbox.thaw()
         wait_read(agent, peer)
         assert all_read(agent, peer)
+
+
+WRITER = """
+import os
+os.chdir("REPOSITORY")
+def write(path, text, mode="w", sync=True):
+    with open(path, mode) as file:
+        file.write(text)
+        file.flush()
+        if sync:
+            os.fdatasync(file)
+def sync_names(path):
+    descriptor = os.open(path, os.O_RDONLY)
+    os.fsync(descriptor)
+write("whole", "one")
+write("whole", " and two", mode="a", sync=False)
+write("empty", "lost", sync=False)
+write("old name", "renamed")
+os.mkdir("folder")
+sync_names(".")
+write("folder/inner", "text")
+os.rename("old name", "new name")
+write("elsewhere", "synced, its name not")
+LAST
+write("late", "lost", sync=False)
+"""
+
+
+@pytest.mark.parametrize("names, last, left", [
+    ("apart", "", {"whole": "one", "empty": "", "old name": "renamed"}),
+    ("apart", "sync_names('.')", {"whole": "one", "empty": "", "new name": "renamed",
+                                  "elsewhere": "synced, its name not"}),
+    ("apart", "sync_names('folder')", {"whole": "one", "empty": "", "old name": "renamed", "folder/inner": "text"}),
+    ("together", "", {"whole": "one", "empty": "", "new name": "renamed", "elsewhere": "synced, its name not",
+                      "folder/inner": "text"})])
+def test_a_power_cut_leaves_what_was_synced(agent, names, last, left):
+    power = PowerCut(agent, names)
+    script = WRITER.replace("REPOSITORY", REPOSITORY).replace("LAST", last)
+    result = agent.run(prefix=(*power.prefix, "/usr/bin/python3", "-c", script))
+    assert (result.returncode, result.stderr) == (0, "")
+    power.restore()
+    top = agent.path(REPOSITORY)
+    assert {str(path.relative_to(top)): path.read_text() for path in top.rglob("*") if path.is_file()} == left
+
+
+def test_the_main_thread_is_held_and_no_other(agent, server):
+    with main_thread_held(agent):
+        assert server.command("STATUS").startswith("cmdStatus=0")
+        mark = agent.log.mark()
+        server.send("PAUSE")  # waits for the main thread
+        let_pass(0.5, "nothing happens")
+        assert not agent.log.lines("Process pauseCapture", after=mark)
+    assert server.reply() == "cmdStatus=0"
+    assert agent.log.lines("Process pauseCapture", after=mark)

@@ -11,6 +11,7 @@
 
 #include "capture/api/capture_settings.h"
 #include "support/dictionary.h"
+#include "support/result.h"
 
 namespace lmx {
 
@@ -55,12 +56,15 @@ class CaptureSession {
 
 /// A movie that was not submitted in the ordinary way and has been put into the repository.
 struct RecoveredRecording {
+  std::string request;          ///< its identifier
+  bool submit = false;          ///< it was stopped for good, but its job was not queued yet
   std::string path;             ///< of the movie, whole and in place
   SharedDictionary parameters;  ///< of the START that asked for it; never null
   int recordingType = 0;        ///< code of the type that was recorded
   double startTime = 0;         ///< seconds since 2001-01-01 UTC of its first frame
   double stopTime = 0;
   double duration = 0;           ///< seconds of media
+  std::function<void()> queued;  ///< call it once its job is kept elsewhere: a restart must not submit it
   std::function<void()> forget;  ///< call it once the document is written: what is left of the capture goes
 };
 
@@ -99,7 +103,13 @@ class LMRCaptureController {
   /// once the capture is ending.
   virtual void setStartWithUUID(const std::string& uuid, double atTime, SharedDictionary parameters) = 0;
   virtual void setStopWithUUID(const std::string& uuid, double atTime) = 0;
+  /// Does nothing once the request is to be submitted.
   virtual void cancelRequestWithUUID(const std::string& uuid) = 0;
+  /// The request has been stopped for good and is to be submitted: a restart that finds it unfinished does
+  /// so, and it can't be cancelled any more.
+  virtual void submitRequestWithUUID(const std::string& uuid) = 0;
+  /// Returns once all marks so far survive a power cut. Blocks for as long as the disk needs.
+  virtual void syncMarks() = 0;
 
   /// Recorded seconds of the request (for the tag: seconds since it was set) up to now; 0 for an unknown one.
   virtual double elapsedTimeForRequestWithUUID(const std::string& uuid) = 0;
@@ -119,7 +129,15 @@ class LMRCaptureController {
   /// capture to shut down first. @return nothing on success.
   virtual std::optional<CaptureError> processRequestWithUUID(const std::string& uuid,
                                                              const std::string& outputPath) = 0;
-  /// The request's movie and document are in place: a restart need not care for it any more.
+  /// The same, but nothing that exists is moved or replaced: where `outputPath` is taken the movie gets a
+  /// name with a number beside it.
+  /// @return the movie's path
+  virtual Result<std::string, CaptureError> processRequestBeside(const std::string& uuid,
+                                                                 const std::string& outputPath) = 0;
+  /// The request's job is kept elsewhere: a restart must not submit it any more. Blocks until that survives a
+  /// power cut.
+  virtual void requestQueued(const std::string& uuid) = 0;
+  /// The request's movie and document are in place: a restart need not care for it any more. Blocks likewise.
   virtual void requestHandedOver(const std::string& uuid) = 0;
   /// Makes movies of the requests that nobody stopped or cancelled, after the capture has shut down and the
   /// one that was submitted has been processed. Blocks.

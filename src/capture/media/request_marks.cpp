@@ -35,6 +35,7 @@ void RequestMarks::start(const std::string& uuid, double t, SharedDictionary par
     request =
         &requests_.emplace_back(Request{.uuid = uuid, .parameters = std::move(parameters), .spans = {}});
   }
+  if (request->submit) return;
   if (!request->spans.empty()) {
     if (request->spans.back().open()) return;
     t = std::max(t, request->spans.back().stop);
@@ -50,7 +51,15 @@ void RequestMarks::stop(const std::string& uuid, double t) {
 }
 
 void RequestMarks::cancel(const std::string& uuid) {
-  if (Request* request = editable(uuid)) request->cancelled = true;
+  if (Request* request = editable(uuid)) request->cancelled = !request->submit;
+}
+
+void RequestMarks::submit(const std::string& uuid) {
+  if (Request* request = editable(uuid)) request->submit = !request->cancelled;
+}
+
+void RequestMarks::markQueued(const std::string& uuid) {
+  if (Request* request = editable(uuid)) request->queued = true;
 }
 
 void RequestMarks::markDone(const std::string& uuid) {

@@ -25,7 +25,9 @@ struct Request {
   SharedDictionary parameters;  ///< never null
   std::vector<Span> spans;      ///< ascending
   bool cancelled = false;
-  bool done = false;  ///< handed over: movie and document are in place
+  bool done = false;    ///< handed over: movie and document are in place
+  bool submit = false;  ///< stopped for good, to be submitted
+  bool queued = false;  ///< its submission is kept elsewhere
 
   [[nodiscard]] bool wanted(double t) const;
   /// Neither cancelled nor handed over.
@@ -35,13 +37,16 @@ struct Request {
 /// All times are running time in seconds. Not thread-safe; its owner locks.
 class RequestMarks {
  public:
-  /// Opens a span. Does nothing while the request has an open span. A start before the end of the last span
+  /// Opens a span. Does nothing while the request has an open span, or once it is to be submitted. A start before the end of the last span
   /// counts from that end. `parameters` are kept with the first span only; null counts as empty.
   void start(const std::string& uuid, double t, SharedDictionary parameters);
   /// Closes the open span, or cuts the last one shorter; never before its start. An unknown request is
   /// ignored.
   void stop(const std::string& uuid, double t);
+  /// Does nothing to a request that is to be submitted.
   void cancel(const std::string& uuid);
+  void submit(const std::string& uuid);
+  void markQueued(const std::string& uuid);
   void markDone(const std::string& uuid);
   void pause(double t);
   void resume(double t);

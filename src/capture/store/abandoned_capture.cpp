@@ -63,7 +63,13 @@ CaptureRecord wholeOf(const CaptureRecord& damaged, const MovieIndex& index, con
     parameters = std::make_shared<const Dictionary>(
         Dictionary{{kRecordingUuidKey, folder.substr(folder.rfind('/') + 1)}});
   }
-  record.marks.start("recovered", 0, parameters);
+  // Its only request stays known by its name: what had been asked for must not be forgotten, nor done twice.
+  const auto& requests = damaged.marks.requests();
+  const bool single = requests.size() == 1;
+  const std::string uuid = single ? requests.front().uuid : "recovered";
+  record.marks.start(uuid, 0, parameters);
+  if (single && requests.front().submit) record.marks.submit(uuid);
+  if (single && requests.front().queued) record.marks.markQueued(uuid);
   return record;
 }
 

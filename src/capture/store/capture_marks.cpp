@@ -23,9 +23,18 @@ void CaptureMarks::stop(const std::string& uuid, double t) {
 
 void CaptureMarks::cancel(const std::string& uuid) {
   const std::lock_guard lock(mutex_);
-  if (closed_ || marks_.find(uuid) == nullptr) return;
+  const Request* request = marks_.find(uuid);
+  if (closed_ || request == nullptr || request->submit) return;
   marks_.cancel(uuid);
   journal_->cancel(uuid);
+}
+
+void CaptureMarks::submit(const std::string& uuid) {
+  const std::lock_guard lock(mutex_);
+  const Request* request = marks_.find(uuid);
+  if (closed_ || request == nullptr || request->submit || request->cancelled) return;
+  marks_.submit(uuid);
+  journal_->submit(uuid);
 }
 
 void CaptureMarks::pause(double t) {

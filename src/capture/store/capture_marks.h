@@ -21,7 +21,9 @@ class CaptureMarks {
   /// Opens a span of a request. Does nothing once the capture is ending.
   void start(const std::string& uuid, double t, const SharedDictionary& parameters);
   void stop(const std::string& uuid, double t);
+  /// Does nothing to a request that is to be submitted.
   void cancel(const std::string& uuid);
+  void submit(const std::string& uuid);
   void pause(double t);
   void resume(double t);
   /// Names the whole capture, from `t` on. The tag is no request: it records nothing and is not journalled.

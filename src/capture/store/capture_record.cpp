@@ -65,6 +65,10 @@ bool applyRequestLine(CaptureRecord& record, const JournalWords& words) {
     if (line.ok()) record.marks.stop(words[1], t);
   } else if (line.is("cancel", 2)) {
     record.marks.cancel(words[1]);
+  } else if (line.is("submit", 2)) {
+    record.marks.submit(words[1]);
+  } else if (line.is("queued", 2)) {
+    record.marks.markQueued(words[1]);
   } else if (line.is("done", 2)) {
     record.marks.markDone(words[1]);
   } else if (line.is("movie", 3)) {

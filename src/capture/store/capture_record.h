@@ -12,6 +12,9 @@ namespace lmx {
 /// The parameter of a START that names the recording and its movie.
 inline constexpr const char* kRecordingUuidKey = "RecordingMetadata_RECORDING_UUID";
 
+/// The one that says where it goes instead of into the repository.
+inline constexpr const char* kAdHocFilePathKey = "RecordingMetadata_ADHOC_FILE_PATH";
+
 /// A capture's runs, marks and movies. Pure data.
 struct CaptureRecord {
   bool intact = false;      ///< it names the capture and a request, and every whole line was understood

@@ -14,11 +14,15 @@
 #include "capture/store/movie_names.h"
 #include "capture/store/request_frames.h"
 #include "platform/directories.h"
+#include "platform/file_copy.h"
 #include "platform/log.h"
 #include "platform/paths.h"
 
 namespace lmx {
 namespace {
+
+/// How often a name is tried that somebody else takes at the same time.
+constexpr int kAttempts = 100;
 
 bool exists(const std::string& path) { return access(path.c_str(), F_OK) == 0; }
 
@@ -28,8 +32,16 @@ CaptureError diskError(int error, const std::string& what) {
 }
 
 int moveFile(const std::string& from, const std::string& to) {
-  if (rename(from.c_str(), to.c_str()) != 0) return errno;
+  if (const int error = renameToFreeName(from, to)) return error;
   return syncDirectory(directoryOf(to));
+}
+
+CaptureError unknownRequest(const std::string& uuid) {
+  return {CaptureError::kDomain, kNoMedia, "no recording of request " + uuid};
+}
+
+CaptureError nothingCaptured(const std::string& path) {
+  return {CaptureError::kDomain, kNoMedia, "nothing was captured for " + path};
 }
 
 std::string fileNameFor(const Request& request) {
@@ -39,9 +51,11 @@ std::string fileNameFor(const Request& request) {
   return name.empty() ? "test" : name;
 }
 
+/// The tool knows a recording by its name, so one that is to be submitted gets that.
 std::string recoveredPath(const Request& request, const std::string& repository) {
   const std::string stem = repository + "/" + fileNameFor(request);
-  return (exists(stem + ".mov") ? freeStem(stem + "-recovered") : stem) + ".mov";
+  const bool taken = !request.submit && exists(stem + ".mov");
+  return (taken ? freeStem(stem + "-recovered") : stem) + ".mov";
 }
 
 }  // namespace
@@ -60,25 +74,56 @@ FinishedCapture::FinishedCapture(std::string folder, std::shared_ptr<Journal> jo
 std::optional<CaptureError> FinishedCapture::makeMovie(const std::string& uuid, const std::string& path) {
   const std::lock_guard lock(mutex_);
   const Request* request = record_.marks.find(uuid);
-  if (request == nullptr)
-    return CaptureError{CaptureError::kDomain, kNoMedia, "no recording of request " + uuid};
-  return makeMovieLocked(*request, path);
+  return request == nullptr ? unknownRequest(uuid) : makeMovieLocked(*request, path);
 }
 
 std::optional<CaptureError> FinishedCapture::makeMovieLocked(const Request& request,
                                                              const std::string& path) {
   const auto ranges = framesFor(request);
-  if (ranges.empty())
-    return CaptureError{CaptureError::kDomain, kNoMedia, "nothing was captured for " + path};
-  journal_->movie(request.uuid, path);
-  (void)journal_->sync();  // when it fails the movie is worth making all the same
-  if (const int error = setAside(path)) {
-    return diskError(error, "an earlier movie is in the way of " + path);
+  if (ranges.empty()) return nothingCaptured(path);
+  int error = EEXIST;
+  for (int attempt = 0; error == EEXIST && attempt < kAttempts; ++attempt) {
+    if (const int inTheWay = setAside(path))
+      return diskError(inTheWay, "an earlier movie is in the way of " + path);
+    error = placeMovie(request, ranges, path);
   }
+  if (error == 0) return std::nullopt;
+  return diskError(error, "could not write " + path);
+}
+
+Result<std::string, CaptureError> FinishedCapture::makeMovieBeside(const std::string& uuid,
+                                                                   const std::string& path) {
+  const std::lock_guard lock(mutex_);
+  const Request* request = record_.marks.find(uuid);
+  if (request == nullptr) return unknownRequest(uuid);
+  return makeMovieBesideLocked(*request, path);
+}
+
+Result<std::string, CaptureError> FinishedCapture::makeMovieBesideLocked(const Request& request,
+                                                                         const std::string& path) {
+  const auto ranges = framesFor(request);
+  if (ranges.empty()) return nothingCaptured(path);
+  std::string free;
+  int error = EEXIST;
+  for (int attempt = 0; error == EEXIST && attempt < kAttempts; ++attempt) {
+    free = freePath(path);
+    error = placeMovie(request, ranges, free);
+  }
+  if (error != 0) return diskError(error, "could not write " + free);
+  if (free != path) {
+    LMPLogMessage(nullptr, kLogWarning, "\"%s\" is there already and stays as it is: the movie is \"%s\"",
+                  path.c_str(), free.c_str());
+  }
+  return free;
+}
+
+int FinishedCapture::placeMovie(const Request& request, const std::vector<FrameRange>& ranges,
+                                const std::string& path) {
+  journal_->movie(request.uuid, path);
+  syncJournal();  // when it fails the movie is worth making all the same
   if (needsAllMedia(request, ranges)) {
     const int error = moveFile(media_, path);
-    if (error == 0) return std::nullopt;
-    if (error != EXDEV) return diskError(error, "could not move the movie to " + path);
+    if (error != EXDEV) return error;
   }
   return copyFrames(ranges, path);
 }
@@ -88,16 +133,13 @@ bool FinishedCapture::needsAllMedia(const Request& request, const std::vector<Fr
          !record_.marks.othersPending(request.uuid);
 }
 
-std::optional<CaptureError> FinishedCapture::copyFrames(const std::vector<FrameRange>& ranges,
-                                                        const std::string& path) {
+int FinishedCapture::copyFrames(const std::vector<FrameRange>& ranges, const std::string& path) {
   const auto index = readMovieIndex(media_);
-  if (!index) return CaptureError{CaptureError::kDomain, kWriteFailed, media_ + " can't be read"};
+  if (!index) return EBADMSG;
   // Written in the capture's own folder: no other capture writes there, and a crash's leftovers go with it.
-  int error = copyOver(*index, ranges, folder_ + "/" + kPartName, path);
-  if (error == EXDEV)
-    error = copyOver(*index, ranges, path + "." + folder_.substr(folder_.rfind('/') + 1) + ".part", path);
-  if (error == 0) return std::nullopt;
-  return diskError(error, "could not write " + path);
+  const int error = copyOver(*index, ranges, folder_ + "/" + kPartName, path);
+  if (error != EXDEV) return error;
+  return copyOver(*index, ranges, path + "." + folder_.substr(folder_.rfind('/') + 1) + ".part", path);
 }
 
 /// Copies into `temporary` and renames it to `path`. @return 0 or the errno; nothing is left then
@@ -128,6 +170,9 @@ std::optional<RecoveredRecording> FinishedCapture::recover(const Request& reques
   const auto made = record_.movies.find(request.uuid);
   const bool onlyLacksItsDocument = made != record_.movies.end() && exists(made->second) && !exists(media_);
   if (onlyLacksItsDocument) return describe(request, made->second);
+  if (const auto wanted = lookUp(request.parameters, kAdHocFilePathKey); wanted && request.submit) {
+    if (const auto path = makeMovieBesideLocked(request, *wanted)) return describe(request, *path);
+  }
   const std::string path = recoveredPath(request, repository);
   if (const auto error = makeMovieLocked(request, path)) {
     giveUp(request, *error);
@@ -149,9 +194,12 @@ void FinishedCapture::giveUp(const Request& request, const CaptureError& error) 
 
 RecoveredRecording FinishedCapture::describe(const Request& request, const std::string& path) {
   RecoveredRecording recording;
+  recording.request = request.uuid;
+  recording.submit = request.submit && !request.queued;
   recording.path = path;
   recording.parameters = request.parameters;
   recording.recordingType = record_.recordingType;
+  recording.queued = [self = shared_from_this(), uuid = request.uuid] { self->queued(uuid); };
   recording.forget = [self = shared_from_this(), uuid = request.uuid] { self->handedOver(uuid); };
   const std::vector<FrameRange> ranges = framesFor(request);
   if (ranges.empty()) return recording;
@@ -179,11 +227,33 @@ std::vector<FrameRange> FinishedCapture::framesFor(const Request& request) const
 
 // ---- the end
 
+void FinishedCapture::submit(const std::string& uuid) {
+  const std::lock_guard lock(mutex_);
+  const Request* request = record_.marks.find(uuid);
+  if (request == nullptr || !request->pending() || request->submit) return;
+  record_.marks.submit(uuid);
+  journal_->submit(uuid);
+}
+
+void FinishedCapture::queued(const std::string& uuid) {
+  const std::lock_guard lock(mutex_);
+  record_.marks.markQueued(uuid);
+  journal_->queued(uuid);
+  syncJournal();
+}
+
 void FinishedCapture::handedOver(const std::string& uuid) {
   const std::lock_guard lock(mutex_);
   record_.marks.markDone(uuid);
   journal_->done(uuid);
+  syncJournal();  // the removal may not survive a power cut, and nothing is to be submitted twice
   removeIfResolvedLocked();
+}
+
+void FinishedCapture::syncJournal() const {
+  if (const int error = journal_->sync())
+    LMPLogMessage(nullptr, kLogError, "The journal of %s could not be synced: %s", folder_.c_str(),
+                  std::strerror(error));
 }
 
 void FinishedCapture::removeIfResolved() {

@@ -11,6 +11,7 @@
 #include "capture/movie/movie_index.h"
 #include "capture/store/capture_record.h"
 #include "capture/store/journal.h"
+#include "support/result.h"
 
 namespace lmx {
 
@@ -30,9 +31,17 @@ class FinishedCapture : public std::enable_shared_from_this<FinishedCapture> {
   /// file just moves; else its frames are copied. A file that has the name is set aside, never overwritten.
   /// @return nothing on success
   std::optional<CaptureError> makeMovie(const std::string& uuid, const std::string& path);
+  /// The same, but what exists stays where it is: the movie gets `path`, or beside it a name with a number
+  /// (logged).
+  /// @return the path that the movie has got
+  Result<std::string, CaptureError> makeMovieBeside(const std::string& uuid, const std::string& path);
   /// Makes movies of all requests that are neither cancelled nor handed over. Those that can't be made for
   /// now (logged) stay pending.
   std::vector<RecoveredRecording> recoverPending(const std::string& repository);
+  /// `uuid` is to be submitted.
+  void submit(const std::string& uuid);
+  /// The submission of `uuid` is kept elsewhere from now on.
+  void queued(const std::string& uuid);
   /// The movie of `uuid` and its document are in place. The folder goes when nothing in it is needed any
   /// more.
   void handedOver(const std::string& uuid);
@@ -42,8 +51,11 @@ class FinishedCapture : public std::enable_shared_from_this<FinishedCapture> {
  private:
   // All of these: with mutex_ held.
   std::optional<CaptureError> makeMovieLocked(const Request& request, const std::string& path);
+  Result<std::string, CaptureError> makeMovieBesideLocked(const Request& request, const std::string& path);
+  /// Gives the movie the free name `path`. @return 0 or the errno; EEXIST when it is not free
+  int placeMovie(const Request& request, const std::vector<FrameRange>& ranges, const std::string& path);
   [[nodiscard]] bool needsAllMedia(const Request& request, const std::vector<FrameRange>& ranges) const;
-  std::optional<CaptureError> copyFrames(const std::vector<FrameRange>& ranges, const std::string& path);
+  int copyFrames(const std::vector<FrameRange>& ranges, const std::string& path);
   int copyOver(const MovieIndex& index, const std::vector<FrameRange>& ranges, const std::string& temporary,
                const std::string& path);
   std::optional<RecoveredRecording> recover(const Request& request, const std::string& repository);
@@ -52,6 +64,7 @@ class FinishedCapture : public std::enable_shared_from_this<FinishedCapture> {
   [[nodiscard]] double wallTimeOf(std::uint32_t frame) const;
   [[nodiscard]] std::vector<FrameRange> framesFor(const Request& request) const;
   void removeIfResolvedLocked();
+  void syncJournal() const;
 
   const std::string folder_;
   const std::string media_;  ///< path

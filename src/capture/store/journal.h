@@ -29,10 +29,14 @@ class Journal {
   void capture(int recordingType, double frameSeconds, double wallOffset);
   /// A run has begun; its length is found in the movie.
   void run(const MovieRun& begun);
-  /// Passwords among `parameters` are left out.
+  /// Passwords among `parameters` are kept, like in the document: a restart may have to submit the recording.
   void start(const std::string& uuid, double t, const SharedDictionary& parameters);
   void stop(const std::string& uuid, double t);
   void cancel(const std::string& uuid);
+  /// The request has been stopped for good and is to be submitted.
+  void submit(const std::string& uuid);
+  /// The submission of the request is kept elsewhere from now on.
+  void queued(const std::string& uuid);
   void pause(double t);
   void resume(double t);
   /// The request is about to get its movie at `path`.

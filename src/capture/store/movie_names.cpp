@@ -1,7 +1,7 @@
 // Finds free names and renames what is in the way.
 #include "capture/store/movie_names.h"
 
-#include <unistd.h>
+#include <sys/stat.h>
 
 #include <algorithm>
 #include <cerrno>
@@ -13,16 +13,18 @@
 namespace lmx {
 namespace {
 
-constexpr std::size_t kLongestName = 200;
-
-bool exists(const std::string& path) { return access(path.c_str(), F_OK) == 0; }
+/// Also for a link that leads nowhere.
+bool exists(const std::string& path) {
+  struct stat status {};
+  return lstat(path.c_str(), &status) == 0;
+}
 
 bool continuesCharacter(char c) { return (static_cast<unsigned char>(c) & 0xC0) == 0x80; }
 
 }  // namespace
 
 std::string fittingName(std::string name) {
-  std::size_t length = std::min(name.size(), kLongestName);
+  std::size_t length = std::min(name.size(), kLongestRecordingName);
   while (length > 0 && length < name.size() && continuesCharacter(name[length])) --length;
   name.resize(length);
   return name;
@@ -31,6 +33,16 @@ std::string fittingName(std::string name) {
 std::string freeStem(const std::string& stem) {
   std::string free = stem;
   for (int i = 1; exists(free + ".mov") || exists(free + ".xml"); ++i) free = stem + "-" + std::to_string(i);
+  return free;
+}
+
+std::string freePath(const std::string& path) {
+  const std::size_t name = path.rfind('/') == std::string::npos ? 0 : path.rfind('/') + 1;
+  std::size_t dot = path.rfind('.');
+  if (dot == std::string::npos || dot <= name) dot = path.size();
+  std::string free = path;
+  for (int i = 1; exists(free) || exists(documentPathOf(free)); ++i)
+    free = path.substr(0, dot) + "-" + std::to_string(i) + path.substr(dot);
   return free;
 }
 

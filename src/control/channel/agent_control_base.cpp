@@ -167,7 +167,6 @@ void AgentControlBase::stop() {
     return;
   }
   disconnect();
-  handlers_.recording().properties.set(nullptr);
   context_.release();
 }
 

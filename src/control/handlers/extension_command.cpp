@@ -1,9 +1,9 @@
 // The verbs that begin with "X-".
 #include "control/handlers/extension_command.h"
 
-#include "control/protocol/command_text.h"
 #include "record/agent_record.h"
 #include "record/preview_controller.h"
+#include "support/scan.h"
 
 namespace lmx {
 

@@ -1,18 +1,20 @@
 // The commands that drive a recording: START, STOP, PAUSE, RESUME, CANCEL.
 #pragma once
+#include <memory>
 #include <string>
 
+#include "capture/api/capture_framework.h"
 #include "control/handlers/channel_context.h"
 #include "control/handlers/reply_sink.h"
 #include "model/agent_actions.h"
 #include "support/dictionary.h"
-#include "support/shared_value.h"
 
 namespace lmx {
 
 /// Each handler replies at most once; `parameters` is null when the command had none. They run on the
 /// channel's thread, or on the main thread when a timer runs them: what they ask of it is then done in place.
-/// In continuous mode the capture runs all the time and the commands only mark times.
+/// In continuous mode the capture runs all the time and the commands only mark times. They keep nothing
+/// between two commands.
 class RecordingCommands {
  public:
   /// All three outlive this object.
@@ -22,7 +24,7 @@ class RecordingCommands {
 
   /// START RecordingMetadata_RECORDING_UUID=…,RecordingMetadata_MAX_RECORDING_MINUTES=50,…  →  cmdStatus=0
   void handleSTART(const Dictionary* parameters);
-  /// STOP  →  cmdStatus=0
+  /// STOP  →  cmdStatus=0. By then a power cut can't undo it, unless a timer gave the command.
   void handleSTOP(const Dictionary* parameters);
   /// PAUSE  →  cmdStatus=0
   void handlePAUSE(const Dictionary* parameters);
@@ -31,19 +33,9 @@ class RecordingCommands {
   /// CANCEL  →  cmdStatus=0
   void handleCANCEL(const Dictionary* parameters);
 
-  /// Takes over the recording properties that came with a command. @return 0, or 1 when given none.
-  int configure(const Dictionary* parameters);
-
-  /// Recording properties that came with the last START; null before.
-  SharedValue<SharedDictionary> properties;
-
  private:
-  [[nodiscard]] bool canStart(const Dictionary* parameters) const;
-  void prepare(AgentState& state);
-  void markStart(AgentRecord& session, const std::string& request,
-                 const SharedDictionary& request_properties) const;
-  void markStop(AgentRecord& session) const;
   bool performOnMain(AgentActions::Action action, Wait wait);
+  void syncMarks(const std::shared_ptr<LMRCaptureController>& capture) const;
   [[nodiscard]] bool continuous() const;
   [[nodiscard]] double shiftedReferenceTime() const;
   void reply(CommandError error);

@@ -1,8 +1,8 @@
 // SERVER: the server says who it is and which protocol it speaks.
 #include "control/handlers/server_command.h"
 
-#include "control/protocol/command_text.h"
 #include "control/protocol/reply.h"
+#include "support/scan.h"
 
 namespace lmx {
 

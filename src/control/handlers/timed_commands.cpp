@@ -77,7 +77,9 @@ bool TimedCommands::scheduleCommand(const Dictionary* parameters, Origin origin)
   if (!append(entry, origin)) return false;
   context_.logInfo("Scheduling " + command + " command to run at: " + when);
   if (origin == Origin::peer) writeTimerListToDisk();
-  if (actions_ != nullptr) actions_->scheduleTimedCommand(entry, date.value_or(now), channel_);
+  // What an earlier process has left is the server's: it answers on the tunnel, when that is there by then.
+  const ChannelKind channel = origin == Origin::file ? ChannelKind::tunnel : channel_;
+  if (actions_ != nullptr) actions_->scheduleTimedCommand(entry, date.value_or(now), channel);
   reply(CommandError::none);
   return true;
 }

@@ -1,10 +1,8 @@
-// Small text rules of the command protocol: what is trimmed, what is counted, what is hidden from the log.
+// Small text rules of the command protocol: what is trimmed, what is hidden from the log.
 #include "control/protocol/command_text.h"
 
 #include <algorithm>
 #include <array>
-#include <cstdlib>
-#include <limits>
 
 #include "model/metadata_keys.h"
 
@@ -33,12 +31,6 @@ std::string_view trimLineBreaks(std::string_view text) {
   while (std::any_of(kLineBreaks.begin(), kLineBreaks.end(), cutBack)) {
   }
   return text;
-}
-
-std::int32_t decimalValue(const std::string& text) {
-  using Limits = std::numeric_limits<std::int32_t>;
-  const long long value = std::strtoll(text.c_str(), nullptr, 10);
-  return static_cast<std::int32_t>(std::clamp<long long>(value, Limits::min(), Limits::max()));
 }
 
 std::string withoutSecrets(std::string_view command) {

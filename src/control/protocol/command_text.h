@@ -1,6 +1,5 @@
-// Small text rules of the command protocol: what is trimmed, what is counted, what is hidden from the log.
+// Small text rules of the command protocol: what is trimmed, what is hidden from the log.
 #pragma once
-#include <cstdint>
 #include <string>
 #include <string_view>
 
@@ -9,10 +8,6 @@ namespace lmx {
 /// `text` without the line breaks at both ends: line feed, vertical tab, form feed, carriage return and the
 /// UTF-8 forms of U+0085, U+2028 and U+2029.
 std::string_view trimLineBreaks(std::string_view text);
-
-/// The decimal number at the start of `text`, 0 when there is none; what 32 bits can't hold becomes the
-/// nearest limit.
-std::int32_t decimalValue(const std::string& text);
 
 /// `command` for the log: the value of every RecordingMetadata_AGENT_PASSWORD is replaced by stars.
 std::string withoutSecrets(std::string_view command);

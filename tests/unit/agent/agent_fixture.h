@@ -2,6 +2,7 @@
 #pragma once
 #include <gtest/gtest.h>
 
+#include <filesystem>
 #include <memory>
 #include <string>
 
@@ -24,6 +25,7 @@ class AgentTest : public ::testing::Test {
   using Controller = std::shared_ptr<testing::ScriptedCaptureController>;
 
   AgentTest() {
+    std::filesystem::remove_all(systemPath(kJobsDirectory));  // those of the test before
     testing::writePreferences(testing::capturePreferences(repository_.path()));
     framework_->on_new_controller = [](auto& controller) {
       controller.on_process_request = [](const std::string& path) {
@@ -67,8 +69,7 @@ class AgentTest : public ::testing::Test {
     setParameters(std::move(more));
     agent_.prepareCapture();
     EXPECT_EQ(context_->state.status.get(), 0);
-    session_->request_uuid.set("request of " + uuid);
-    session_->request_properties.set(context_->state.properties.get());
+    session_->request.set({.uuid = "request of " + uuid, .properties = context_->state.properties.get()});
     Controller made = framework_->controller(framework_->controllersMade() - 1);
     made->state = 3;
     return made;

@@ -1,4 +1,5 @@
 // Main-thread actions, engine callbacks and loss of the device.
+#include <algorithm>
 #include <chrono>
 #include <csignal>
 #include <ctime>
@@ -138,8 +139,9 @@ TEST_F(Actions, AdhocStopMarksTheShiftedStopThenStopsTheRecording) {
   setContinuous();  // submits instead of stopping again
   const double before = secondsSinceReferenceDate();
   agent_.stopCapture();
-  const auto mark = controller->marks().back();
-  EXPECT_EQ(mark.operation, "setStop");
+  const auto marks = controller->marks();
+  const auto mark =
+      *std::find_if(marks.rbegin(), marks.rend(), [](const auto& one) { return one.operation == "setStop"; });
   EXPECT_EQ(mark.uuid, session_->recording_uuid.get());
   EXPECT_NEAR(*mark.time, before - 20, 1.0);
   EXPECT_TRUE(log_.contains(kLogDebug, "Process stopRecording"));
@@ -180,6 +182,15 @@ TEST_F(Actions, ShutDownControlCancelsAndAsksForTheDeviceAgain) {
   EXPECT_TRUE(log_.contains(kLogDebug, "Process shutDownControl"));
   EXPECT_EQ(journalCount("cancelRecording"), 1);
   EXPECT_GT(context_->state.last_device_check.get(), 0);
+}
+
+/// PAUSE closes the request's span as well as it pauses the capture.
+TEST_F(Actions, TheResumeSignalEndsThePauseOfACommandToo) {
+  const auto controller = start("R1");
+  agent_.signal(SIGUSR2);
+  EXPECT_EQ(controller->marks().back().operation, "setStart");
+  EXPECT_EQ(controller->marks().back().uuid, "request of R1");
+  EXPECT_EQ(lookUp(controller->marks().back().parameters, "RecordingMetadata_RECORDING_UUID"), "R1");
 }
 
 TEST_F(Actions, SignalsRunTheirActions) {

@@ -14,7 +14,8 @@ using ::testing::IsEmpty;
 
 std::vector<std::string> due(Schedule& schedule, std::time_t now) {
   std::vector<std::string> names;
-  for (const auto& command : schedule.takeDue(now)) names.push_back(lookUp(command.entry, "command").value());
+  while (const auto command = schedule.takeDue(now))
+    names.push_back(lookUp(command->entry, "command").value());
   return names;
 }
 Schedule::Command at(std::time_t date, const char* name) {
@@ -33,6 +34,13 @@ TEST(Schedule, CommandsComeOnceInTheOrderOfTheirDates) {
   EXPECT_EQ(schedule.next(), 200);
   EXPECT_THAT(due(schedule, 1000), ElementsAre("late"));
   EXPECT_EQ(schedule.next(), std::nullopt);
+}
+
+TEST(Schedule, WhatEndsARecordingComesFirstInItsSecond) {
+  Schedule schedule;
+  for (const char* name : {"START", "PAUSE", "STOP", "CANCEL", "STATUS"}) schedule.add(at(100, name));
+  schedule.add(at(99, "START"));
+  EXPECT_THAT(due(schedule, 100), ElementsAre("START", "STOP", "CANCEL", "START", "PAUSE", "STATUS"));
 }
 
 TEST(Schedule, FollowsAWallClockThatIsSet) {
@@ -120,6 +128,77 @@ TEST_F(TimedCommands, AThousandEntriesAreLoaded) {
   writeTimers(many);
   agent_.timedCommands().loadSchedule();
   EXPECT_EQ(waiting().size(), 1000U);
+}
+
+class DueTogether : public AgentTest {
+ protected:
+  DueTogether() { agent_.mainRunLoop().adoptThread(); }
+  void schedule(const char* command, const std::string& uuid, std::time_t date = 1000) {
+    const auto entry = std::make_shared<const Dictionary>(
+        Dictionary{{"command", command},
+                   {"TimerID", command + uuid},
+                   {"RecordingMetadata_RECORDING_UUID", uuid},
+                   {"RecordingMetadata_MAX_RECORDING_MINUTES", "60"},
+                   {"RecordingMetadata_UNATTENDED_RECORDING_MINUTES", "60"}});
+    context_->timedCmdList.append(entry);
+    agent_.scheduleTimedCommand(entry, date, ChannelKind::detached);
+  }
+  /// As the main loop: one command, then one source, until nothing is left.
+  void runAll() {
+    RunLoop::Turn turn = RunLoop::Turn::handledSource;
+    while (turn == RunLoop::Turn::handledSource) {
+      agent_.timedCommands().postDueCommand(2000);
+      turn = agent_.mainRunLoop().run(std::chrono::milliseconds(0));
+    }
+  }
+  /// The recordings that have begun, by their files.
+  Entries begun() {
+    Entries files;
+    for (const auto& entry : log_.entries()) {
+      if (entry.text.ends_with(" recording started")) files.push_back(entry.text);
+    }
+    return files;
+  }
+};
+
+TEST_F(DueTogether, AStopAndTheNextStartAreTwoWholeRecordings) {
+  const auto first = start("R1");
+  schedule("START", "R2");
+  schedule("STOP", "R1");
+  runAll();
+  EXPECT_EQ(begun().size(), 2U);
+  EXPECT_EQ(journalCount("controller stopRecording"), 1);
+  EXPECT_FALSE(log_.mentions("capture not idle"));
+  EXPECT_EQ(lookUp(session_->request.get().properties, "RecordingMetadata_RECORDING_UUID"), "R2");
+}
+
+TEST_F(DueTogether, AStopThatWaitsInTheLoopComesBeforeTheStart) {
+  start("R1");
+  schedule("START", "R2");
+  agent_.mainRunLoop().post([] {}, Wait::no);
+  agent_.perform(&AgentActions::stopRecording, Wait::no);
+  runAll();
+  EXPECT_EQ(begun().size(), 2U);
+}
+
+TEST_F(DueTogether, TwentyLecturesAfterAStall) {
+  start("L0");
+  for (int i = 1; i <= 20; ++i) {
+    schedule("START", "L" + std::to_string(i), 1000 + i);
+    schedule("STOP", "L" + std::to_string(i - 1), 1000 + i);
+  }
+  runAll();
+  EXPECT_EQ(begun().size(), 21U);
+  EXPECT_EQ(journalCount("controller stopRecording"), 20);
+}
+
+TEST_F(DueTogether, AnAgentThatEndsLeavesThemInTheFile) {
+  schedule("START", "R1");
+  agent_.timedCommands().postDueCommand(1000);
+  context_->state.running.set(false);
+  turnTheLoop();
+  EXPECT_EQ(begun().size(), 0U);
+  EXPECT_EQ(context_->timedCmdList.entries().size(), 1U);
 }
 
 TEST_F(TimedCommands, ADueCommandRunsInTheMainLoop) {

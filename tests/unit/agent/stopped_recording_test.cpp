@@ -55,6 +55,8 @@ TEST_F(StoppedRecording, GoesToTheChosenFile) {
   const auto job = nextJob();
   ASSERT_NE(job, nullptr);
   EXPECT_EQ(job->recording_file_path, movie("chosen.mov"));
+  EXPECT_EQ(journalCount("processRequestBeside request of R1 " + movie("chosen.mov")), 1)
+      << "what is there stays";
 }
 
 TEST_F(StoppedRecording, CarriesItsWorkflow) {
@@ -255,7 +257,6 @@ TEST_F(StoppedRecording, AFileRecordingSurvivesARefusedAudioOnlyRequest) {
   agent_.prepareCapture();
   ASSERT_EQ(context_->state.status.get(), 0);
   const auto begun = session_->launchTime.get();
-  session_->recordingType.set(kRecordingTypeAudio);  // as the handler of START does
   setParameters({{"RecordingMetadata_RECORDING_UUID", "F2"}, {"RecordingMetadata_AUDIO_ONLY", "true"}});
   agent_.prepareCapture();
   EXPECT_EQ(context_->state.status.get(), 4);
@@ -298,21 +299,6 @@ TEST_F(StoppedRecording, OfALostDeviceLeavesNoDiskError) {
   EXPECT_EQ(session_->error.get(), kRecordSuccess);
 }
 
-TEST_F(StoppedRecording, IsDescribedByALaterRefusedRequest) {
-  const auto controller = start("R1", {{"RecordingMetadata_TITLE", "First"}});
-  session_->diskSpaceCutoffInMB.set(0xFFFFFFFFU);
-  setParameters({{"RecordingMetadata_RECORDING_UUID", "R2"}, {"RecordingMetadata_TITLE", "Second"}});
-  agent_.prepareCapture();
-  ASSERT_EQ(context_->state.status.get(), 30);
-  session_->request_uuid.set("request of R2");
-  session_->request_properties.set(context_->state.properties.get());
-  stopAndReport(controller);
-  const auto job = nextJob();
-  ASSERT_NE(job, nullptr);
-  EXPECT_EQ(getProperty(job->properties, "RecordingMetadata_RECORDING_UUID"), "R2");
-  EXPECT_EQ(getProperty(job->properties, "RecordingMetadata_TITLE"), "Second");
-}
-
 TEST_F(StoppedRecording, RecoveredOnesGetTheirDocumentAndAreNotSubmitted) {
   bool forgotten = false;
   RecoveredRecording recovered;
@@ -326,9 +312,10 @@ TEST_F(StoppedRecording, RecoveredOnesGetTheirDocumentAndAreNotSubmitted) {
     EXPECT_TRUE(std::filesystem::exists(movie("R9.xml"))) << "forgotten before the document is there";
     forgotten = true;
   };
-  agent_.submission().keepRecovered({recovered});
+  framework_->unfinished = {recovered};
+  agent_.submission().takeUpUnfinished(framework_);
+  EXPECT_TRUE(testing::waitUntil([&] { return agent_.submission().isIdle(); }));
   EXPECT_TRUE(forgotten);
-  EXPECT_EQ(context_->post_process_list.postProcessListCount(), 0U);
   const std::string xml = readFile(movie("R9.xml"));
   for (const char* part :
        {"value=\"Lost\"", "value=\"100\"", "value=\"160\"", "value=\"60\"", "value=\"Video\""}) {
@@ -343,8 +330,161 @@ TEST_F(StoppedRecording, ARecoveredOneWithoutItsDocumentIsKeptForTheNextStart) {
   RecoveredRecording recovered;
   recovered.path = movie("missing-folder/R9.mov");
   recovered.forget = [&] { forgotten = true; };
-  agent_.submission().keepRecovered({recovered});
+  framework_->unfinished = {recovered};
+  agent_.submission().takeUpUnfinished(framework_);
+  EXPECT_TRUE(testing::waitUntil([&] { return agent_.submission().isIdle(); }));
   EXPECT_FALSE(forgotten);
+}
+
+// ---- what an earlier process has left
+
+class LeftOver : public StoppedRecording {
+ protected:
+  RecoveredRecording stopped(const std::string& uuid, double stopTime) {
+    RecoveredRecording recording;
+    recording.request = "request of " + uuid;
+    recording.submit = true;
+    recording.path = movie(uuid + ".mov");
+    recording.parameters =
+        std::make_shared<const Dictionary>(Dictionary{{"RecordingMetadata_RECORDING_UUID", uuid}});
+    recording.recordingType = kRecordingTypeAudioVideo;
+    recording.stopTime = stopTime;
+    recording.forget = [this, uuid] { journal_.add("forget " + uuid); };
+    recording.queued = [this, uuid] { journal_.add("queued " + uuid); };
+    return recording;
+  }
+  /// @return the recordings of the jobs in the list, in order
+  Entries takeUp() {
+    agent_.submission().takeUpUnfinished(framework_);
+    testing::waitUntil([&] { return context_->post_process_list.postProcessListCount() >= expected_; });
+    Entries names;
+    while (const auto job = context_->post_process_list.postProcessListNext()) {
+      names.push_back(getProperty(job->properties, "RecordingMetadata_RECORDING_UUID").value_or("?"));
+      jobs_.push_back(job);
+    }
+    return names;
+  }
+  std::size_t expected_ = 1;
+  std::vector<std::shared_ptr<AgentSubmit>> jobs_;
+};
+
+TEST_F(LeftOver, StoppedRecordingsGoToTheServerOldestFirst) {
+  framework_->unfinished = {stopped("B", 200), stopped("A", 100)};
+  expected_ = 2;
+  EXPECT_EQ(takeUp(), (Entries{"A", "B"}));
+  EXPECT_EQ(journalCount("forget A") + journalCount("forget B"), 2);
+  EXPECT_TRUE(
+      log_.contains(kLogNotice, "Finished recording \"" + movie("A.mov") +
+                                    "\" (duration: 0s), which had been stopped; it goes to the server"));
+}
+
+TEST_F(LeftOver, WaitingJobsComeBeforeThem) {
+  JobStore earlier(systemPath(kJobsDirectory));
+  AgentSubmit waiting;
+  waiting.request = "request of W";
+  waiting.properties["RecordingMetadata_RECORDING_UUID"] = "W";
+  waiting.recording_file_path = movie("W.mov");
+  earlier.keep(waiting, 7);
+  framework_->unfinished = {stopped("A", 100)};
+  expected_ = 2;
+  EXPECT_EQ(takeUp(), (Entries{"W", "A"}));
+  EXPECT_TRUE(log_.contains(kLogNotice, "\"" + movie("W.mov") + "\" still waits for its submission"));
+}
+
+/// The process was killed after it had stored the job and before the capture knew of that.
+TEST_F(LeftOver, OneThatHasItsJobAlreadyGetsNoSecond) {
+  JobStore earlier(systemPath(kJobsDirectory));
+  AgentSubmit waiting;
+  waiting.request = "request of A";
+  waiting.properties["RecordingMetadata_RECORDING_UUID"] = "A";
+  waiting.recording_file_path = movie("A.mov");
+  earlier.keep(waiting, 1);
+  framework_->unfinished = {stopped("A", 100)};
+  EXPECT_EQ(takeUp(), Entries{"A"});
+  EXPECT_TRUE(testing::waitUntil([&] { return agent_.submission().isIdle(); }));
+  EXPECT_EQ(journalCount("forget A"), 1);
+}
+
+TEST_F(LeftOver, OneWhoseSubmissionIsDisabledGetsItsDocumentOnly) {
+  auto disabled = stopped("A", 100);
+  disabled.parameters = std::make_shared<const Dictionary>(Dictionary{
+      {"RecordingMetadata_RECORDING_UUID", "A"}, {"RecordingMetadata_ADHOC_SUBMIT_DISABLED", "1"}});
+  framework_->unfinished = {disabled};
+  agent_.submission().takeUpUnfinished(framework_);
+  EXPECT_TRUE(testing::waitUntil([&] { return agent_.submission().isIdle(); }));
+  EXPECT_TRUE(std::filesystem::exists(movie("A.xml")));
+}
+
+TEST_F(LeftOver, OneWithoutItsDocumentIsSubmittedOnceAndKept) {
+  auto homeless = stopped("A", 100);
+  homeless.path = movie("missing-folder/A.mov");
+  framework_->unfinished = {homeless};
+  EXPECT_EQ(takeUp(), Entries{"A"});
+  EXPECT_EQ(journalCount("queued A"), 1);
+  EXPECT_EQ(journalCount("forget A"), 0);
+}
+
+TEST_F(LeftOver, ACancelledCaptureSubmitsWhatHadBeenStopped) {
+  const auto controller = start("R1");
+  controller->on_recover = [this] { return std::vector{stopped("R1", 100)}; };
+  agent_.cancelCapture();
+  controller->shut_down = true;
+  controller->delegate()->lmrCaptureDidCancel(std::nullopt);
+  turnTheLoop();
+  const auto job = nextJob();
+  ASSERT_NE(job, nullptr);
+  EXPECT_EQ(job->recording_file_path, movie("R1.mov"));
+  controller->on_recover = nullptr;
+}
+
+TEST_F(StoppedRecording, TheCaptureForgetsItBeforeItsJobCanBegin) {
+  const auto controller = start("R1");
+  stopAndReport(controller);
+  const auto job = nextJob();
+  ASSERT_NE(job, nullptr);
+  EXPECT_EQ(journalCount("requestHandedOver request of R1"), 1);
+  EXPECT_NE(job->stored, nullptr) << "a restart takes it up";
+  EXPECT_EQ(job->recorded->captureController.get(), nullptr) << "it keeps no file of the capture open";
+}
+
+TEST_F(StoppedRecording, AnAgentThatEndsMarksOnlyWhatWasStopped) {
+  const auto controller = start("R1");
+  agent_.stopCapture();  // as SIGTERM does
+  context_->state.running.set(false);
+  reportEnd(controller);
+  turnTheLoop();
+  EXPECT_EQ(journalCount("submitRequest"), 0);
+}
+
+TEST_F(StoppedRecording, ThatEndedByItselfIsToBeSubmitted) {
+  reportEnd(start("R1"));
+  turnTheLoop();
+  EXPECT_EQ(journalCount("submitRequest"), 1);
+  EXPECT_NE(nextJob(), nullptr);
+}
+
+/// The first one is long and takes its time.
+TEST_F(StoppedRecording, TheyAreQueuedInTheOrderOfTheirStops) {
+  const auto first = start("R1");
+  agent_.stopRecording();
+  const auto second = start("R2");
+  stopAndReport(second);
+  EXPECT_TRUE(testing::waitUntil([&] { return journalCount("requestHandedOver request of R2") == 1; }));
+  EXPECT_EQ(context_->post_process_list.postProcessListCount(), 0U);
+  EXPECT_FALSE(agent_.submission().isIdle());
+  reportEnd(first);
+  turnTheLoop();
+  EXPECT_EQ(nextJob()->recording_file_path, movie("R1.mov"));
+  EXPECT_EQ(nextJob()->recording_file_path, movie("R2.mov"));
+}
+
+TEST_F(StoppedRecording, AStopOfACaptureThatNeverBeganHoldsNobodyUp) {
+  framework_->on_new_controller = [](auto& controller) { controller.prepare_succeeds = false; };
+  setParameters({{"RecordingMetadata_RECORDING_UUID", "R1"}});
+  agent_.prepareCapture();
+  ASSERT_EQ(context_->state.status.get(), 3);
+  agent_.stopRecording();
+  EXPECT_TRUE(agent_.submission().isIdle());
 }
 
 }  // namespace

@@ -1,5 +1,6 @@
 // Recordings with the synthetic devices, from the marks to the movie.
 #include <gtest/gtest.h>
+#include <unistd.h>
 
 #include <algorithm>
 #include <cmath>
@@ -231,6 +232,33 @@ TEST(LiveRecording, StoppedAtOnceStillHoldsAFrame) {
     EXPECT_EQ(decodeMovie(folder.file("R.mov")).frameNumbers.size(), 1U);
     capture.controller->requestHandedOver("R");
   }
+}
+
+/// The path comes from a peer, which must not be able to move away or replace anything.
+TEST(LiveRecording, WhatHasTheChosenNameStaysAsItIs) {
+  const Folder folder;
+  std::ofstream(folder.file("a.mov")) << "another's movie";
+  std::ofstream(folder.file("a-1.xml")) << "another's document";
+  ASSERT_EQ(symlink("nowhere", folder.file("a-2.mov").c_str()), 0);
+  std::filesystem::create_directory(folder.file("a-3.mov"));
+  LogCapture log;
+  Capture capture(folder);
+  ASSERT_TRUE(capture.prepare());
+  capture.controller->setStartWithUUID("R", secondsSinceReferenceDate(), parametersFor("R"));
+  capture.controller->setStopWithUUID("R", secondsSinceReferenceDate());
+  capture.controller->stopRecording();
+  ASSERT_EQ(capture.reports->wait(), Kind::complete);
+  const auto made = capture.controller->processRequestBeside("R", folder.file("a.mov"));
+  ASSERT_TRUE(made);
+  EXPECT_EQ(*made, folder.file("a-4.mov"));
+  EXPECT_EQ(decodeMovie(*made).frameNumbers.size(), 1U);
+  EXPECT_TRUE(log.contains(kLogWarning, "\"" + folder.file("a.mov") +
+                                            "\" is there already and stays as it is: " + "the movie is \"" +
+                                            folder.file("a-4.mov") + "\""));
+  EXPECT_EQ(std::filesystem::file_size(folder.file("a.mov")), 15U);
+  EXPECT_TRUE(std::filesystem::is_symlink(folder.file("a-2.mov")));
+  EXPECT_TRUE(std::filesystem::is_directory(folder.file("a-3.mov")));
+  capture.controller->requestHandedOver("R");
 }
 
 TEST(LiveRecording, TwoRequestsOfOneCaptureEachGetTheirSpan) {

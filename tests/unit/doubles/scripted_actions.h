@@ -8,6 +8,7 @@
 #include <vector>
 
 #include "model/agent_actions.h"
+#include "model/codes.h"
 #include "tests/unit/doubles/journal.h"
 
 namespace lmx::testing {
@@ -30,6 +31,17 @@ class ScriptedActions : public AgentActions {
     waiting_ = false;
     return true;
   }
+
+  int performStart(const SharedDictionary& properties) override {
+    if (!loop_runs) return kRecordInvalidType;
+    started.push_back(properties);
+    note("performStart");
+    return start_result;
+  }
+  [[nodiscard]] bool isMainThread() const override { return is_main_thread; }
+  std::vector<SharedDictionary> started;  ///< the parameters of each START
+  int start_result = kRecordSuccess;
+  bool is_main_thread = false;
 
   void prepareCapture() override { note("prepareCapture", on_prepare_capture); }
   void startPreview() override { note("startPreview"); }

@@ -45,7 +45,8 @@ class ScriptedCaptureController : public LMRCaptureController {
   std::vector<double> power_levels;
   std::optional<CaptureError> error;
   std::function<std::optional<std::string>()> on_delete_segment;
-  std::atomic<bool> devices_run{false};      ///< result of its session's isRunning()
+  std::atomic<bool> devices_run{false};  ///< result of its session's isRunning()
+  std::function<void()> on_sync_marks;
   std::function<void()> on_start_recording;  ///< called on the capture thread
   /// Replaces the result `error` of processRequest.
   std::function<std::optional<CaptureError>(const std::string& path)> on_process_request;
@@ -95,6 +96,13 @@ class ScriptedCaptureController : public LMRCaptureController {
     mark({"cancelRequest", uuid, std::nullopt, nullptr});
   }
 
+  void submitRequestWithUUID(const std::string& uuid) override {
+    mark({"submitRequest", uuid, std::nullopt, nullptr});
+  }
+  void syncMarks() override {
+    journal_.add("syncMarks");
+    if (on_sync_marks) on_sync_marks();
+  }
   double elapsedTimeForRequestWithUUID(const std::string&) override { return elapsed_of_request; }
   std::int64_t elapsedTimeInMilliseconds() override { return elapsed_milliseconds; }
   int recordingState() override { return state; }
@@ -108,8 +116,19 @@ class ScriptedCaptureController : public LMRCaptureController {
     journal_.add("processRequest " + uuid + " " + outputPath);
     return on_process_request ? on_process_request(outputPath) : error;
   }
+  Result<std::string, CaptureError> processRequestBeside(const std::string& uuid,
+                                                         const std::string& outputPath) override {
+    journal_.add("processRequestBeside " + uuid + " " + outputPath);
+    const auto failure = on_process_request ? on_process_request(outputPath) : error;
+    if (failure) return *failure;
+    return outputPath;
+  }
+  void requestQueued(const std::string& uuid) override { journal_.add("requestQueued " + uuid); }
   void requestHandedOver(const std::string& uuid) override { journal_.add("requestHandedOver " + uuid); }
-  std::vector<RecoveredRecording> recoverAbandonedRequests() override { return {}; }
+  std::function<std::vector<RecoveredRecording>()> on_recover;
+  std::vector<RecoveredRecording> recoverAbandonedRequests() override {
+    return on_recover ? on_recover() : std::vector<RecoveredRecording>();
+  }
   std::optional<std::string> deleteEarliestSegment() override {
     return on_delete_segment ? on_delete_segment() : std::nullopt;
   }

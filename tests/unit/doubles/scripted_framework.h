@@ -54,7 +54,8 @@ class ScriptedFramework : public CaptureFramework {
   }
   void warmUp() override { journal_.add("warmUp"); }
   std::string deviceInformation() override { return "camera, microphone\n"; }
-  std::vector<RecoveredRecording> recoverUnfinished(const std::string&) override { return {}; }
+  std::vector<RecoveredRecording> unfinished;
+  std::vector<RecoveredRecording> recoverUnfinished(const std::string&) override { return unfinished; }
 
   std::optional<std::string> defaultVideoDevice() override { return "camera"; }
   std::optional<std::string> defaultMuxedDevice() override { return std::nullopt; }

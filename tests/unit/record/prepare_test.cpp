@@ -242,7 +242,6 @@ TEST_F(Prepare, TheRecordedTypeIsThatOfThePreparation) {
 TEST_F(Prepare, ARefusedRequestForSoundChangesNoType) {
   context_->recording.recording_type.set("Audio+Video");
   ASSERT_EQ(prepare(), 0);
-  session_->recordingType.set(kRecordingTypeAudio);  // as the handler of START does
   EXPECT_EQ(LXAgentRecordPrepareCapture(*context_, std::make_shared<const Dictionary>(
                                                        Dictionary{{"RecordingMetadata_AUDIO_ONLY", "true"}})),
             4);

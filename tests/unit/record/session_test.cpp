@@ -31,7 +31,7 @@ TEST_F(Session, CopyHasTheValuesAndSharesTheCapture) {
   const auto controller = std::make_shared<ScriptedCaptureController>(journal_);
   session_->captureController.set(controller);
   session_->filename.set("/r/A.mov");
-  session_->request_uuid.set("Q");
+  session_->request.set({.uuid = "Q"});
   session_->recording_uuid.set("U");
   session_->status.set(2);
   session_->startTime.set(TimeValue{5, 6});
@@ -39,7 +39,7 @@ TEST_F(Session, CopyHasTheValuesAndSharesTheCapture) {
   const auto copy = session_->copy();
   EXPECT_EQ(copy->captureController.get(), controller);
   EXPECT_EQ(copy->filename.get(), "/r/A.mov");
-  EXPECT_EQ(copy->request_uuid.get(), "Q");
+  EXPECT_EQ(copy->request.get().uuid, "Q");
   EXPECT_EQ(copy->recording_uuid.get(), "U");
   EXPECT_EQ(copy->status.get(), 2);
   EXPECT_EQ(copy->recordingType.get(), kRecordingTypeAudioVideo);
@@ -165,9 +165,9 @@ TEST_F(Session, CleanupOfACopyStopsNothing) {
 }
 
 TEST_F(Session, CleanupKeepsTheRequest) {
-  session_->request_uuid.set("Q");
+  session_->request.set({.uuid = "Q"});
   session_->cleanup();
-  EXPECT_EQ(session_->request_uuid.get(), "Q");
+  EXPECT_EQ(session_->request.get().uuid, "Q");
   EXPECT_EQ(session_->recording_uuid.get(), "");
 }
 

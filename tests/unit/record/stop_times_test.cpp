@@ -19,7 +19,7 @@ class StopTimes : public EngineTest {
  protected:
   StopTimes() {
     session_->captureController.set(controller_);
-    session_->request_uuid.set("request");
+    session_->request.set({.uuid = "request"});
     session_->recording_uuid.set("recording");
   }
   std::shared_ptr<ScriptedCaptureController> controller_ =
@@ -121,7 +121,7 @@ TEST_F(StopTimes, AutoShutoffMarksTheRequestWaitsAndClearsBothDeadlines) {
   const double before = secondsSinceReferenceDate();
   checkForAutoShutoffConditions(*session_);
   EXPECT_TRUE(log_.contains(kLogNotice, "Doing Auto-Shutoff: Video"));
-  EXPECT_EQ(journal_.entries(), (Entries{"setStop", "stopRecording, waiting"}));
+  EXPECT_EQ(journal_.entries(), (Entries{"setStop", "submitRequest", "stopRecording, waiting"}));
   EXPECT_EQ(controller_->marks()[0].uuid, "request");
   EXPECT_GE(*controller_->marks()[0].time, before);
   EXPECT_LE(*controller_->marks()[0].time, secondsSinceReferenceDate());

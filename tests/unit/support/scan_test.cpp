@@ -2,7 +2,9 @@
 #include "support/scan.h"
 
 #include <gtest/gtest.h>
+
 #include <stdlib.h>
+#include <limits>
 
 #include "support/date_text.h"
 
@@ -97,6 +99,16 @@ TEST(DateFromText, RejectsOtherFormsAndInvalidDates) {
 TEST_F(DateText, RoundTrips) {
   zone("IST-5:30");
   for (const std::time_t at : {0L, 1246363500L, 1835438400L}) EXPECT_EQ(dateFromText(*dateText(at)), at);
+}
+
+TEST(Scan, DecimalValueStopsAtTheFirstOtherCharacterAndAtTheLimits) {
+  EXPECT_EQ(decimalValue("2"), 2);
+  EXPECT_EQ(decimalValue(" 17minutes"), 17);
+  EXPECT_EQ(decimalValue("-3"), -3);
+  EXPECT_EQ(decimalValue("x"), 0);
+  EXPECT_EQ(decimalValue(""), 0);
+  EXPECT_EQ(decimalValue("99999999999999999999"), std::numeric_limits<std::int32_t>::max());
+  EXPECT_EQ(decimalValue("-99999999999"), std::numeric_limits<std::int32_t>::min());
 }
 
 }  // namespace

@@ -27,6 +27,15 @@ TEST(RequestMarks, SecondStartOfAnOpenSpanChangesNothing) {
   EXPECT_EQ(spansOf(marks, "R"), (std::vector<Span>{{.start = 1}}));
 }
 
+TEST(RequestMarks, NoSpanBeginsOnceItIsToBeSubmitted) {
+  RequestMarks marks;
+  marks.start("A", 1, nullptr);
+  marks.stop("A", 2);
+  marks.submit("A");
+  marks.start("A", 3, nullptr);
+  EXPECT_EQ(marks.find("A")->spans, (std::vector<Span>{{1, 2}}));
+}
+
 TEST(RequestMarks, StartBeforeTheLastStopCountsFromThere) {
   RequestMarks marks;
   marks.start("R", 1, nullptr);

@@ -49,6 +49,53 @@ TEST(Recovery, MakesAMovieNamedForTheRecording) {
   EXPECT_EQ(readMovieIndex(repository.file("LECTURE.mov"))->tracks[0].sizes.size(), 60U);
 }
 
+TEST(Recovery, TellsWhatHadBeenStopped) {
+  for (const auto& [lines, submit] : std::vector<std::pair<std::string, bool>>{
+           {"", false},
+           {"stop R 1\n", false},  // may be a pause
+           {"stop R 1\nsubmit R\n", true},
+           {"stop R 1\nsubmit R\nqueued R\n", false},
+           {"stop R 1\nsubmit R\ncancel R\n", true},
+           {"stop R 1\nsubmit R\nrun x\n", true}}) {  // a damaged journal
+    const Folder repository;
+    const auto capture = openAbandonedCapture(crashedCapture(repository, kJournal + lines, 4));
+    ASSERT_TRUE(capture);
+    const auto recovered = capture->recoverPending(repository.path());
+    ASSERT_EQ(recovered.size(), 1U) << lines;
+    EXPECT_EQ(recovered[0].submit, submit) << lines;
+    EXPECT_EQ(recovered[0].request, "R") << lines;
+  }
+}
+
+/// The tool finds a recording by its name.
+TEST(Recovery, OfWhatIsToBeSubmittedGetsItsNameEvenIfThatIsTaken) {
+  const Folder repository;
+  std::ofstream(repository.file("LECTURE.mov")) << "an earlier one";
+  const auto capture =
+      openAbandonedCapture(crashedCapture(repository, std::string(kJournal) + "stop R 2\nsubmit R\n", 4));
+  const auto recovered = capture->recoverPending(repository.path());
+  ASSERT_EQ(recovered.size(), 1U);
+  EXPECT_EQ(recovered[0].path, repository.file("LECTURE.mov"));
+  EXPECT_TRUE(readMovieIndex(repository.file("LECTURE.mov")));
+  EXPECT_EQ(std::filesystem::file_size(repository.file("LECTURE-replaced.mov")), 14U);
+}
+
+TEST(Recovery, OfWhatIsToBeSubmittedGoesToItsChosenFile) {
+  for (const bool there : {true, false}) {
+    const Folder repository;
+    const std::string chosen = repository.file(there ? "chosen.mov" : "no-such-folder/chosen.mov");
+    const auto capture = openAbandonedCapture(crashedCapture(
+        repository,
+        "capture 2 0.033333333333 1000.0\nstart R 0.0 RecordingMetadata_RECORDING_UUID LECTURE "
+        "RecordingMetadata_ADHOC_FILE_PATH " +
+            chosen + "\nrun 0.0 0\nstop R 2\nsubmit R\n",
+        4));
+    const auto recovered = capture->recoverPending(repository.path());
+    ASSERT_EQ(recovered.size(), 1U);
+    EXPECT_EQ(recovered[0].path, there ? chosen : repository.file("LECTURE.mov"));
+  }
+}
+
 TEST(Recovery, TimesOfARequestThatBeganInALaterRun) {
   const Folder repository;
   const auto capture = openAbandonedCapture(crashedCapture(repository,

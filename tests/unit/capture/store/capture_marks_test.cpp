@@ -37,6 +37,23 @@ TEST_F(CaptureMarksTest, AreJournalledAsTheyCome) {
   EXPECT_EQ(record.marks.requests().size(), 2U);
 }
 
+TEST_F(CaptureMarksTest, WhatIsToBeSubmittedCanNotBeCancelledAnyMore) {
+  marks_.start("A", 1, nullptr);
+  marks_.stop("A", 2);
+  marks_.submit("A");
+  marks_.submit("A");
+  marks_.cancel("A");
+  marks_.start("B", 1, nullptr);
+  marks_.cancel("B");
+  marks_.submit("B");
+  const CaptureRecord record = journal();
+  EXPECT_TRUE(record.marks.find("A")->submit);
+  EXPECT_FALSE(record.marks.find("A")->cancelled);
+  EXPECT_TRUE(record.marks.find("B")->cancelled);
+  EXPECT_FALSE(record.marks.find("B")->submit);
+  EXPECT_TRUE(record.intact || record.frameSeconds == 0) << "every line was understood";
+}
+
 TEST_F(CaptureMarksTest, TheFirstEndCounts) {
   EXPECT_FALSE(marks_.endTime());
   EXPECT_TRUE(marks_.end(Ending::stop, 5));

@@ -24,14 +24,18 @@ TEST(Journal, WritesALineForEachEvent) {
       {"RecordingMetadata_AGENT_PASSWORD", "secret"}, {"TITLE", "My Talk, 100%"}, {"x", ""}};
   (*journal)->start("R", 1.4, std::make_shared<const Dictionary>(parameters));
   (*journal)->stop("R", 3);
+  (*journal)->submit("R");
   (*journal)->movie("R", "/r/My Talk.mov");
+  (*journal)->queued("R");
   std::ifstream file(folder.file("journal"));
   EXPECT_EQ(std::string((std::istreambuf_iterator<char>(file)), {}),
             "capture 2 0.040000000000 1000.5000000\n"
             "run 1.5000000 30\n"
-            "start R 1.4000000 TITLE My%20Talk,%20100%25 x %\n"
+            "start R 1.4000000 RecordingMetadata_AGENT_PASSWORD secret TITLE My%20Talk,%20100%25 x %\n"
             "stop R 3.0000000\n"
-            "movie R /r/My%20Talk.mov\n");
+            "submit R\n"
+            "movie R /r/My%20Talk.mov\n"
+            "queued R\n");
 }
 
 TEST(Journal, IsLockedWhileItIsOpen) {

@@ -12,7 +12,11 @@ namespace lmx::testing {
 /// Thread-safe.
 class CollectedReplies final : public ReplySink {
  public:
-  void sendReply(const std::string& reply) override { replies_.add(reply); }
+  std::function<void()> on_reply;
+  void sendReply(const std::string& reply) override {
+    if (on_reply) on_reply();
+    replies_.add(reply);
+  }
   [[nodiscard]] std::vector<std::string> all() const { return replies_.entries(); }
   /// "(none)" when there is none.
   [[nodiscard]] std::string last() const { return all().empty() ? "(none)" : all().back(); }

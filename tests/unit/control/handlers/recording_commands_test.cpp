@@ -3,7 +3,9 @@
 
 #include <gtest/gtest.h>
 
+#include <atomic>
 #include <map>
+#include <thread>
 
 #include "control/protocol/command_parser.h"
 #include "record/agent_record.h"
@@ -11,6 +13,7 @@
 #include "tests/unit/doubles/log_capture.h"
 #include "tests/unit/doubles/scripted_actions.h"
 #include "tests/unit/doubles/scripted_capture.h"
+#include "tests/unit/doubles/wait_until.h"
 
 namespace lmx {
 namespace {
@@ -72,75 +75,14 @@ class RecordingCommandsTest : public ::testing::Test {
   RecordingCommands commands_{held_, &actions_, replies_};
 };
 
-TEST_F(RecordingCommandsTest, StartPreparesThenMarksThenReplies) {
-  const auto mark = onlyMark(kStart);
-  EXPECT_EQ(replies_.all(), Lines{"cmdStatus=0"});
-  EXPECT_EQ(journal_.entries(), (Lines{"prepareCapture, waiting", "setStart"}));
-  EXPECT_EQ(mark.uuid, session_->request_uuid.get());
-  EXPECT_EQ(mark.uuid.size(), 36U);
-  EXPECT_EQ(lookUp(mark.parameters, "RecordingMetadata_TITLE"), "My Talk");
-}
-
-TEST_F(RecordingCommandsTest, StartHandsItsPropertiesToContextAndSession) {
-  run(kStart);
-  EXPECT_EQ(lookUp(context_->state.properties.get(), "RecordingMetadata_RECORDING_UUID"), "R1");
-  EXPECT_EQ(session_->request_properties.get(), context_->state.properties.get());
-  EXPECT_EQ(session_->stop_times.maxUnattendedRecordingMinutes.get(), 20);
-}
-
-TEST_F(RecordingCommandsTest, StartPropertiesAreThereBeforeThePrepare) {
-  std::optional<std::string> seen;
-  actions_.on_prepare_capture = [&] {
-    seen = lookUp(context_->state.properties.get(), "RecordingMetadata_TITLE");
-  };
-  run(kStart);
-  EXPECT_EQ(seen, "My Talk");
-}
-
-TEST_F(RecordingCommandsTest, StartMarksTheShiftedTime) {
-  context_->state.timeshift_seconds.set(300);
-  onlyMark(kStart);
-}
-
-TEST_F(RecordingCommandsTest, StartRepliesWithTheStatusOfThePrepare) {
-  context_->state.status.set(3);
-  actions_.on_prepare_capture = [&] { context_->state.status.set(30); };
+TEST_F(RecordingCommandsTest, StartHandsItsParametersToTheAgentAndRepliesWithTheResult) {
+  actions_.start_result = 30;
+  context_->state.status.set(3);  // another action's
   EXPECT_EQ(run(kStart), Lines{"cmdStatus=30"});
-}
-
-TEST_F(RecordingCommandsTest, StartClearsTheStatusOfAnEarlierAction) {
-  context_->state.status.set(3);
-  EXPECT_EQ(run(kStart), Lines{"cmdStatus=0"});
-}
-
-TEST_F(RecordingCommandsTest, RefusedSecondStartStillReplacesTheRequestAndMarks) {
-  run(kStart);
-  const std::string first = session_->request_uuid.get();
-  actions_.on_prepare_capture = [&] { context_->state.status.set(4); };
-  EXPECT_EQ(run(kStart), (Lines{"cmdStatus=0", "cmdStatus=4"}));
-  EXPECT_NE(session_->request_uuid.get(), first);
-  ASSERT_EQ(capture_->marks().size(), 2U);
-  EXPECT_EQ(capture_->marks()[1].uuid, session_->request_uuid.get());
-}
-
-TEST_F(RecordingCommandsTest, StartWithoutControllerHasNothingToMark) {
-  session_->captureController.set(nullptr);
-  actions_.on_prepare_capture = [&] { context_->state.status.set(3); };
-  EXPECT_EQ(run(kStart), Lines{"cmdStatus=3"});
-}
-
-TEST_F(RecordingCommandsTest, StartMarksOnTheControllerThatThePrepareMade) {
-  auto made = std::make_shared<ScriptedCaptureController>(journal_);
-  actions_.on_prepare_capture = [&] { session_->captureController.set(made); };
-  run(kStart);
-  EXPECT_TRUE(capture_->marks().empty());
-  EXPECT_EQ(made->marks().size(), 1U);
-}
-
-TEST_F(RecordingCommandsTest, StartInContinuousModeOnlyMarks) {
-  setContinuous(true);
-  EXPECT_EQ(run(kStart), Lines{"cmdStatus=0"});
-  EXPECT_EQ(journal_.entries(), Lines{"setStart"});
+  EXPECT_EQ(journal_.entries(), Lines{"performStart"});
+  ASSERT_EQ(actions_.started.size(), 1U);
+  EXPECT_EQ(lookUp(actions_.started[0], "RecordingMetadata_TITLE"), "My Talk");
+  EXPECT_EQ(lookUp(actions_.started[0], "RecordingMetadata_RECORDING_UUID"), "R1");
 }
 
 TEST_F(RecordingCommandsTest, StartWhenTheMainLoopHasEndedIsNotReportedAsARecording) {
@@ -160,44 +102,43 @@ TEST_F(RecordingCommandsTest, StartWithoutARequiredParameterChangesNothing) {
   EXPECT_TRUE(journal_.entries().empty());
   EXPECT_EQ(context_->state.properties.get(), nullptr);
   EXPECT_FALSE(session_->stop_times.hardStopTime.get().has_value());
-  EXPECT_EQ(session_->request_uuid.get(), "");
-}
-
-TEST_F(RecordingCommandsTest, StartWithoutSessionStillReplies) {
-  context_->releaseRecord();
-  EXPECT_EQ(run(kStart), Lines{"cmdStatus=0"});
-}
-
-TEST_F(RecordingCommandsTest, OnlyTheExactTextTrueMakesAudioOnly) {
-  session_->recordingType.set(kRecordingTypeAudioVideo);
-  std::string line(kStart);
-  line.append(",RecordingMetadata_AUDIO_ONLY=");
-  for (const char* value : {"TRUE", "yes", "1", ""}) {
-    run(line + value);
-    EXPECT_EQ(session_->recordingType.get(), kRecordingTypeAudioVideo) << value;
-  }
-  run(line + "true");
-  EXPECT_EQ(session_->recordingType.get(), kRecordingTypeAudio);
-  EXPECT_TRUE(
-      log_.contains(kLogDebug, "RecordingMetadata_AUDIO_ONLY: switching to audio-only recording type"));
 }
 
 TEST_F(RecordingCommandsTest, StopMarksThenAsksForTheStopWithoutWaiting) {
-  session_->request_uuid.set("Q1");
+  session_->request.set({.uuid = "Q1"});
   context_->state.timeshift_seconds.set(60);
-  EXPECT_EQ(onlyMark("STOP").uuid, "Q1");
-  EXPECT_EQ(replies_.all(), Lines{"cmdStatus=0"});
-  EXPECT_EQ(journal_.entries(), (Lines{"setStop", "stopRecording"}));
+  const double before = secondsSinceReferenceDate() - 60;
+  EXPECT_EQ(run("STOP"), Lines{"cmdStatus=0"});
+  EXPECT_EQ(journal_.entries(), (Lines{"setStop", "submitRequest", "stopRecording", "syncMarks"}));
+  for (const auto& mark : capture_->marks()) EXPECT_EQ(mark.uuid, "Q1");
+  EXPECT_GE(capture_->marks().at(0).time.value_or(0), before);
+  EXPECT_LE(capture_->marks().at(0).time.value_or(0), before + 30);
+}
+
+TEST_F(RecordingCommandsTest, StopIsOnTheDiskBeforeItsReply) {
+  bool synced = false;
+  replies_.on_reply = [&] { synced = journal_.entries().back() == "syncMarks"; };
+  run("STOP");
+  EXPECT_TRUE(synced);
+}
+
+TEST_F(RecordingCommandsTest, TheMainThreadDoesNotWaitForTheDisk) {
+  actions_.is_main_thread = true;
+  const auto caller = std::this_thread::get_id();
+  std::atomic<bool> elsewhere{false};
+  capture_->on_sync_marks = [&] { elsewhere = std::this_thread::get_id() != caller; };
+  EXPECT_EQ(run("STOP"), Lines{"cmdStatus=0"});
+  EXPECT_TRUE(testing::waitUntil([&] { return elsewhere.load(); }));
 }
 
 TEST_F(RecordingCommandsTest, StopDoesNotCareForContinuousMode) {
   setContinuous(true);
   run("STOP");
-  EXPECT_EQ(journal_.entries(), (Lines{"setStop", "stopRecording"}));
+  EXPECT_EQ(journal_.entries(), (Lines{"setStop", "submitRequest", "stopRecording", "syncMarks"}));
 }
 
 TEST_F(RecordingCommandsTest, PauseMarksBeforeItPauses) {
-  session_->request_uuid.set("Q1");
+  session_->request.set({.uuid = "Q1"});
   const auto mark = onlyMark("PAUSE");
   EXPECT_EQ(mark.operation + " " + mark.uuid, "setStop Q1");
   EXPECT_EQ(replies_.all(), Lines{"cmdStatus=0"});
@@ -211,7 +152,7 @@ TEST_F(RecordingCommandsTest, PauseInContinuousModeOnlyMarks) {
 }
 
 TEST_F(RecordingCommandsTest, ResumeMarksAfterItHasResumed) {
-  session_->request_uuid.set("Q1");
+  session_->request.set({.uuid = "Q1"});
   const auto mark = onlyMark("RESUME");
   EXPECT_EQ(mark.operation + " " + mark.uuid, "setStart Q1");
   EXPECT_EQ(replies_.all(), Lines{"cmdStatus=0"});
@@ -225,7 +166,7 @@ TEST_F(RecordingCommandsTest, ResumeInContinuousModeOnlyMarks) {
 }
 
 TEST_F(RecordingCommandsTest, CancelCancelsTheRequestAndTheCaptureWithoutWaiting) {
-  session_->request_uuid.set("Q1");
+  session_->request.set({.uuid = "Q1"});
   EXPECT_EQ(onlyMark("CANCEL").uuid, "Q1");
   EXPECT_EQ(replies_.all(), Lines{"cmdStatus=0"});
   EXPECT_EQ(journal_.entries(), (Lines{"cancelRequest", "cancelCapture"}));
@@ -262,7 +203,9 @@ TEST_F(RecordingCommandsTest, WithoutActionsTheyStillReply) {
   commands.handlePAUSE(nullptr);
   commands.handleRESUME(nullptr);
   commands.handleCANCEL(nullptr);
-  EXPECT_EQ(replies_.all(), Lines(5, "cmdStatus=0"));
+  EXPECT_EQ(replies_.all(),
+            (Lines{"cmdStatus=1", "cmdStatus=0", "cmdStatus=0", "cmdStatus=0", "cmdStatus=0"}))
+      << "nobody has started anything";
 }
 
 TEST_F(RecordingCommandsTest, StartAfterTheChannelHasStoppedItselfIsNotAnswered) {
@@ -277,35 +220,6 @@ TEST_F(RecordingCommandsTest, AMovieCannotBeNamedOutOfTheRepository) {
           "RecordingMetadata_UNATTENDED_RECORDING_MINUTES=5"),
       Lines{"cmdStatus=31"});
   EXPECT_TRUE(journal_.entries().empty());
-}
-
-TEST_F(RecordingCommandsTest, StartForgetsDeadlinesOfAnEarlierRecordingOnly) {
-  const auto inAnHour = std::time(nullptr) + 3600;
-  session_->stop_times.softStopTime.set(TimeValue{inAnHour, 0});
-  session_->stop_times.hardStopTime.set(TimeValue{inAnHour, 0});
-  run("START RecordingMetadata_RECORDING_UUID=R,RecordingMetadata_MAX_RECORDING_MINUTES=0,"
-      "RecordingMetadata_UNATTENDED_RECORDING_MINUTES=0");
-  EXPECT_FALSE(session_->stop_times.hardStopTime.get()) << "that of the recording before";
-  EXPECT_FALSE(session_->stop_times.softStopTime.get());
-  run(kStart);
-  const auto own = session_->stop_times.hardStopTime.get();
-  EXPECT_TRUE(own);
-  EXPECT_FALSE(session_->stop_times.softStopTime.get());
-  session_->status.set(kRecorderRecording);
-  session_->stop_times.softStopTime.set(TimeValue{1000, 0});
-  run(kStart);
-  EXPECT_NE(session_->stop_times.softStopTime.get().value_or(TimeValue{}).tv_sec, 0)
-      << "a running one keeps its deadline";
-}
-
-TEST_F(RecordingCommandsTest, NoPropertiesAreRefused) { EXPECT_EQ(commands_.configure(nullptr), 1); }
-
-TEST_F(RecordingCommandsTest, PropertiesAreReplacedNotMerged) {
-  const Dictionary first{{"a", "1"}};
-  const Dictionary second{{"b", "2"}};
-  EXPECT_EQ(commands_.configure(&first), 0);
-  EXPECT_EQ(commands_.configure(&second), 0);
-  EXPECT_EQ(*commands_.properties.get(), second);
 }
 
 }  // namespace

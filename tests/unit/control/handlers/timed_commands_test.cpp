@@ -106,8 +106,9 @@ TEST_F(TimedCommandsTest, StartIsScheduledWithItsParametersAndAnIdentity) {
   EXPECT_TRUE(log_.contains(kLogInfo, "Running deferred command: START"));
   EXPECT_THAT(listed(), IsEmpty());
   EXPECT_THAT(stored(), IsEmpty());
-  EXPECT_EQ(context_->state.properties.get()->at("TimerID"), id) << "the handler gets the whole entry";
-  EXPECT_THAT(journal_.entries(), ::testing::Contains("prepareCapture, waiting"));
+  ASSERT_EQ(actions_.started.size(), 1U);
+  EXPECT_EQ(actions_.started[0]->at("TimerID"), id) << "the handler gets the whole entry";
+  EXPECT_THAT(journal_.entries(), ::testing::Contains("performStart"));
 }
 
 TEST_F(TimedCommandsTest, AServersOwnIdentityIsKept) {

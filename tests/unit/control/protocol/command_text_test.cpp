@@ -15,16 +15,6 @@ TEST(CommandText, LineBreaksAreTrimmedAtBothEndsOnly) {
   EXPECT_EQ(trimLineBreaks("\n\r\n"), "");
 }
 
-TEST(CommandText, DecimalValueStopsAtTheFirstOtherCharacterAndAtTheLimits) {
-  EXPECT_EQ(decimalValue("2"), 2);
-  EXPECT_EQ(decimalValue(" 17minutes"), 17);
-  EXPECT_EQ(decimalValue("-3"), -3);
-  EXPECT_EQ(decimalValue("x"), 0);
-  EXPECT_EQ(decimalValue(""), 0);
-  EXPECT_EQ(decimalValue("99999999999999999999"), std::numeric_limits<std::int32_t>::max());
-  EXPECT_EQ(decimalValue("-99999999999"), std::numeric_limits<std::int32_t>::min());
-}
-
 TEST(CommandText, PasswordsAreStarsInTheLog) {
   EXPECT_EQ(withoutSecrets("START a=1,RecordingMetadata_AGENT_PASSWORD=open sesame=,b=2"),
             "START a=1,RecordingMetadata_AGENT_PASSWORD=****,b=2");

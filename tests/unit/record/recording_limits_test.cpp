@@ -1,9 +1,11 @@
-// The limits of a recording, and who submits it, from the parameters of a START.
-#include "control/handlers/recording_configuration.h"
+// The limits of a recording, from the parameters of its START.
+#include "record/recording_limits.h"
 
 #include <gtest/gtest.h>
 
 #include <limits>
+#include <utility>
+#include <vector>
 
 namespace lmx {
 namespace {
@@ -68,13 +70,29 @@ TEST_F(StopTimesOfStart, EmptyValuesLeaveThemAsTheyWere) {
   EXPECT_EQ(stop_times_.maxUnattendedRecordingMinutes.get(), 7);
 }
 
-TEST(SubmissionOfStart, EmptyAndMissingValuesLeaveItAsItWas) {
-  RunOptions options;
-  configureSubmission(
-      {{"RecordingMetadata_AGENT_USERNAME", "bob"}, {"RecordingMetadata_AGENT_PASSWORD", "sesame"}}, options);
-  configureSubmission({{"RecordingMetadata_AGENT_USERNAME", ""}}, options);
-  EXPECT_EQ(options.user.get(), "bob");
-  EXPECT_EQ(options.password.get(), "sesame");
+/// Minutes that do not fit, or whose seconds do not fit, into 32 bits; 35791394 is the greatest that does.
+TEST_F(StopTimesOfStart, AnEndlessUnattendedLimitDoesNotEndTheRecording) {
+  constexpr std::int64_t kMost = std::numeric_limits<std::int32_t>::max();
+  for (const auto& [minutes, seconds] :
+       std::vector<std::pair<const char*, std::int64_t>>{{"2147483647", kMost},
+                                                         {"4294967297", kMost},
+                                                         {"99999999999999999999", kMost},
+                                                         {"35791395", kMost},
+                                                         {"35791394", 35791394LL * 60}}) {
+    configure("RecordingMetadata_UNATTENDED_RECORDING_MINUTES", minutes);
+    stop_times_.updateSoftStopTime();
+    const auto stop = stop_times_.softStopTime.get();
+    ASSERT_TRUE(stop) << minutes;
+    EXPECT_NEAR(static_cast<double>(stop->tv_sec - lmp_gettimeofday()->tv_sec), static_cast<double>(seconds), 1.0)
+        << minutes;
+    EXPECT_FALSE(stop_times_.shouldStopRecording()) << minutes;
+  }
+}
+
+TEST_F(StopTimesOfStart, ANegativeLimitIsNone) {
+  configure("RecordingMetadata_UNATTENDED_RECORDING_MINUTES", "-99999999999");
+  stop_times_.updateSoftStopTime();
+  EXPECT_FALSE(stop_times_.softStopTime.get());
 }
 
 }  // namespace

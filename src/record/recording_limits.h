@@ -1,9 +1,8 @@
-// What the parameters of a START say about the recording: its limits, and who submits it.
+// The limits of a recording, from the parameters of its START.
 #pragma once
 #include <cstdint>
 #include <string>
 
-#include "model/run_options.h"
 #include "record/stop_times.h"
 #include "support/dictionary.h"
 
@@ -14,10 +13,10 @@ namespace lmx {
 /// less gives 0 (no hard stop); more than 32 bits hold gives the most they hold.
 std::int32_t hardStopSeconds(const std::string& minutes);
 
-/// Sets the limits that `parameters` name; one that is missing or empty stays as it was.
-void configureStopTimes(const Dictionary& parameters, StopTimes& stop_times);
+/// Sets the unattended limit that `parameters` name; one that is missing or empty stays as it was.
+void configureUnattendedLimit(const Dictionary& parameters, StopTimes& stop_times);
 
-/// Sets the user and the password of the submission in the same way.
-void configureSubmission(const Dictionary& parameters, RunOptions& options);
+/// Sets both limits in the same way.
+void configureStopTimes(const Dictionary& parameters, StopTimes& stop_times);
 
 }  // namespace lmx

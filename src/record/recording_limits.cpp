@@ -1,12 +1,12 @@
-// What the parameters of a START say about the recording: its limits, and who submits it.
-#include "control/handlers/recording_configuration.h"
+// Reads the limits of a recording from the parameters of its START.
+#include "record/recording_limits.h"
 
 #include <cmath>
 #include <cstdlib>
 #include <limits>
 
-#include "control/protocol/command_text.h"
 #include "model/metadata_keys.h"
+#include "support/scan.h"
 
 namespace lmx {
 namespace {
@@ -24,18 +24,15 @@ std::int32_t hardStopSeconds(const std::string& minutes) {
   return seconds >= kMost ? kMost : static_cast<std::int32_t>(seconds);
 }
 
-void configureStopTimes(const Dictionary& parameters, StopTimes& stop_times) {
-  if (const auto minutes = given(parameters, metadata_key::kMaxRecordingMinutes); !minutes.empty())
-    stop_times.setRecordHardStopTimeSeconds(hardStopSeconds(minutes));
+void configureUnattendedLimit(const Dictionary& parameters, StopTimes& stop_times) {
   if (const auto minutes = given(parameters, metadata_key::kUnattendedMinutes); !minutes.empty())
     stop_times.maxUnattendedRecordingMinutes.set(decimalValue(minutes));
 }
 
-void configureSubmission(const Dictionary& parameters, RunOptions& options) {
-  if (const auto user = given(parameters, metadata_key::kAgentUsername); !user.empty())
-    options.user.set(user);
-  if (const auto password = given(parameters, metadata_key::kAgentPassword); !password.empty())
-    options.password.set(password);
+void configureStopTimes(const Dictionary& parameters, StopTimes& stop_times) {
+  if (const auto minutes = given(parameters, metadata_key::kMaxRecordingMinutes); !minutes.empty())
+    stop_times.setRecordHardStopTimeSeconds(hardStopSeconds(minutes));
+  configureUnattendedLimit(parameters, stop_times);
 }
 
 }  // namespace lmx
