@@ -86,7 +86,7 @@ class AgentMain final : public AgentActions {
 
  private:
   // Steps of startupDaemon, in order.
-  enum class Start { ok, fatal, fatalAndDisable };
+  enum class Start { ok, askedToEnd, fatal, fatalAndDisable };
   Start loadSettings();
   Start prepareGround();
   Start startServices();

@@ -12,7 +12,7 @@ from harness.commands import exchange, start_line
 from harness.log_reader import Level
 from harness.tunnel_server import TunnelServer
 from harness.unread import all_read, wait_read
-from harness.waiting import wait_until
+from harness.waiting import let_pass, wait_until
 
 
 def descriptors(agent):
@@ -58,16 +58,40 @@ def test_a_server_that_never_reads(agent):
         server.accept(30)
 
 
-@pytest.mark.slow
-def test_the_refusal_in_two_pieces_ends_the_agent_after_a_minute(agent, server):
+def refuse(agent, server):
+    """Only a refusal that comes in two pieces is understood as one."""
     server.peer.setsockopt(socket.IPPROTO_TCP, socket.TCP_NODELAY, 1)
     server.peer.sendall(b"ERR Unb")
     wait_read(agent, server.peer)
     server.peer.sendall(b"ound agent\n")
+
+
+@pytest.mark.slow
+def test_the_refusal_in_two_pieces_ends_the_agent_after_a_minute(agent, server):
+    refuse(agent, server)
     refused = agent.log.wait("^Server rejected agent connection, sleeping for one minute\\.$", level=Level.WARNING)
     assert agent.wait_exit(100) == 0
     assert 58 < time.monotonic() - refused.at < 90
     agent.log.wait("^Server rejected agent connection, restarting for retry\\.$", level=Level.CRITICAL)
+
+
+@pytest.mark.slow
+def test_a_refusal_waits_for_the_recording_and_its_submission(agent, server):
+    agent.set_tool({"when": "--submit", "hang": True})
+    agent.start_recording("A")
+    refuse(agent, server)
+    agent.log.wait("^Server rejected agent connection; the restart waits until the recording is submitted$", timeout=90,
+                   level=Level.NOTICE)
+    assert agent.command("STATUS").fields["recordStatus"] == "2"
+    assert agent.command("STOP").text == "cmdStatus=0"
+    agent.wait_tool_call("A")
+    let_pass(1, "the daemon looks four times a second whether it may end")
+    assert agent.alive() and not agent.log.lines("restarting for retry"), "the submission is still running"
+    agent.release_tool()
+    assert agent.wait_exit() == 0
+    agent.log.wait("^Server rejected agent connection, restarting for retry\\.$", level=Level.CRITICAL)
+    assert agent.submitted("end") == ["A"]
+    assert len(agent.log.lines("the restart waits")) == 1
 
 
 def test_back_off(agent):
