@@ -54,20 +54,25 @@ void DeviceWatch::probeDevice(const LMRRecordingContext& settings) {
   device_offline_ = true;
 }
 
+void DeviceWatch::deviceFound() {
+  context_->state.last_device_check.set(0);
+  shouldDisplayOfflineMessage_ = false;
+  if (!device_is_back_()) context_->state.running.set(false);
+}
+
 void DeviceWatch::retryDevice(std::int64_t now) {
   const std::int64_t last = context_->state.last_device_check.get();
   if (last < 1 || isAhead(now, last, kDeviceRetrySeconds + 1)) return;
-  // A retry that fails ends the agent. Meanwhile a START may have found the camera.
-  if (recordingInHand(*context_)) return;
+  // A retry that fails ends the agent, and a START may have found the camera meanwhile. What records has its
+  // devices open, so the server need not wait for the end of the recording either.
+  if (recordingInHand(*context_)) {
+    if (context_->record_context()->status.get() != kRecorderIdle) deviceFound();
+    return;
+  }
   context_->state.last_device_check.set(now);
   const auto settings = recordingContext();
   if (!settings) return giveUp();
-  if (openAgain(*settings)) {
-    context_->state.last_device_check.set(0);
-    shouldDisplayOfflineMessage_ = false;
-    if (!device_is_back_()) context_->state.running.set(false);
-    return;
-  }
+  if (openAgain(*settings)) return deviceFound();
   if (!shouldDisplayOfflineMessage_) return giveUp();
   LMPLogMessage(nullptr, kLogWarning, "%s", kOfflineMessage);
   shouldDisplayOfflineMessage_ = false;

@@ -42,6 +42,7 @@ class DeviceWatch {
   void announceLostDevice() const;
 
  private:
+  void deviceFound();
   void giveUp();
   [[nodiscard]] bool openAgain(const LMRRecordingContext& settings);
 
