@@ -8,6 +8,7 @@
 #include "record/prepare_capture.h"
 #include "record/preview_controller.h"
 #include "record/stop_capture.h"
+#include "support/optional_text.h"
 
 namespace lmx {
 
@@ -49,7 +50,7 @@ void CaptureActions::pauseCapture() {
   const bool wasRecording = controller->recordingState() == kCaptureRecording;
   controller->pauseRecording();
   if (wasRecording) {
-    recordDidPauseWithFile(session()->filename.get().value_or(""),
+    recordDidPauseWithFile(orAbsent(session()->filename.get()),
                            controller->elapsedTimeInMilliseconds() / 1000);
   }
 }
@@ -60,7 +61,7 @@ void CaptureActions::resumeCapture() {
   if (!controller) return;
   const bool wasPaused = controller->recordingState() == kCapturePaused;
   controller->resumeRecording();
-  if (wasPaused) recordDidResumeWithFile(session()->filename.get().value_or(""));
+  if (wasPaused) recordDidResumeWithFile(orAbsent(session()->filename.get()));
 }
 
 void CaptureActions::stopCapture() {

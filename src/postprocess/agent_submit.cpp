@@ -14,6 +14,7 @@
 #include "postprocess/properties_document.h"
 #include "postprocess/property_gatherer.h"
 #include "postprocess/submission.h"
+#include "support/optional_text.h"
 
 namespace lmx {
 namespace {
@@ -25,11 +26,11 @@ void copyIntoRepository(const std::string& from, const std::string& to) {
   }
 }
 
-void removeFile(LMPLogContext log, const std::string& path) {
-  if (unlink(path.c_str()) == 0) {
-    LMPLogMessage(log, kLogInfo, "File \"%s\" was removed", path.c_str());
+void removeFile(LMPLogContext log, const std::optional<std::string>& path) {
+  if (path && unlink(path->c_str()) == 0) {
+    LMPLogMessage(log, kLogInfo, "File \"%s\" was removed", path->c_str());
   } else {
-    LMPLogMessage(log, kLogError, "An error occurred removing file \"%s\"", path.c_str());
+    LMPLogMessage(log, kLogError, "An error occurred removing file \"%s\"", orAbsent(path).c_str());
   }
 }
 
@@ -88,7 +89,7 @@ int AgentSubmit::addRecordingWithCommentary(ChildRunner& children) {
     if (addRecording(children) != 0) {
       const Text server = agentContext ? agentContext->server.lumex_url.get() : std::nullopt;
       LMPLogMessage(log(), kLogError, "An error occurred completing recording \"%s\"",
-                    server.value_or("(null)").c_str());
+                    orAbsent(server).c_str());
       LMPLogMessage(log(), kLogCritical, "An internal error occurred during agent post-processing");
       return -1;
     }
@@ -102,8 +103,8 @@ int AgentSubmit::addRecordingWithCommentary(ChildRunner& children) {
 }
 
 void AgentSubmit::removeFiles() const {
-  removeFile(log(), recording_file_path.value_or(""));
-  removeFile(log(), properties_file_path.value_or(""));
+  removeFile(log(), recording_file_path);
+  removeFile(log(), properties_file_path);
 }
 
 int AgentSubmit::addRecording(ChildRunner& children) {

@@ -11,6 +11,7 @@
 #include "platform/identifiers.h"
 #include "platform/paths.h"
 #include "support/date_text.h"
+#include "support/optional_text.h"
 
 namespace lmx {
 namespace {
@@ -59,9 +60,9 @@ std::string TimedCommands::timerListReply() const {
 /// @return whether it was added to the list
 bool TimedCommands::scheduleCommand(const Dictionary* parameters, Origin origin) {
   const auto date = dateFromText(lookUp(parameters, "time").value_or(""));
-  const std::string command = lookUp(parameters, "command").value_or("(null)");
+  const std::string command = orAbsent(lookUp(parameters, "command"));
   const std::time_t now = std::time(nullptr);
-  const std::string when = dateText(date.value_or(now)).value_or("?");
+  const std::string when = orAbsent(dateText(date.value_or(now)));
   if (date && *date <= now) {
     context_.logInfo("Not scheduling " + command + " command. The timer has expired: " + when);
     reply(CommandError::missingParameter);
@@ -95,7 +96,7 @@ void TimedCommands::completeTimedCommand(const SharedDictionary& entry) {
     context_.logInfo("Not running deferred command");
     return reply(CommandError::timerRevoked);
   }
-  const std::string command = lookUp(entry, "command").value_or("");
+  const std::string command = orAbsent(lookUp(entry, "command"));
   context_.logInfo("Running deferred command: " + command);
   writeTimerListToDisk();
   if (const auto* handler = verbs_.handlerForVerb(command)) (*handler)(entry.get());
