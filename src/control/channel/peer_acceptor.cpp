@@ -3,11 +3,13 @@
 
 #include <sys/socket.h>
 
+#include <array>
 #include <cerrno>
 #include <chrono>
 
 #include "platform/net/socket_io.h"
 #include "support/format.h"
+#include "support/unique_fd.h"
 
 namespace lmx {
 
@@ -17,20 +19,16 @@ int PeerAcceptor::acceptPeer(int listening) {
   int previous = sockets_.previous();
   Readiness readiness = Readiness::interrupted;
   while (readiness == Readiness::interrupted || readiness == Readiness::otherReadable) {
-    readiness = awaitReadable(listening, wake_, -1ms, previous);
+    readiness = awaitReadable(listening, wake_, -1ms, std::array{previous});
     if (readiness != Readiness::otherReadable) continue;
-    if (sockets_.previousSpeaks()) {
-      context_.logDebug("The previous peer speaks again");
-      sockets_.restorePrevious();
-      return 0;
-    }
+    if (sockets_.previousSpeaks()) return -1;
     previous = -1;  // it has gone
   }
   if (readiness == Readiness::woken) return -1;
 
   const int peer = ::accept4(listening, nullptr, nullptr, SOCK_CLOEXEC);
   const int error = errno;
-  sockets_.setCurrent(peer);
+  sockets_.setCurrent(UniqueFd(peer));
   context_.logInfo(string_with_format("accepted connection fd = %d from listen fd = %d", peer, listening));
   if (peer == -1) {
     // The peer stays in the queue while the machine has no descriptor for it: don't spin on that.

@@ -12,9 +12,9 @@ class PeerAcceptor {
   PeerAcceptor(const ChannelContext& context, PeerSockets& sockets, ChannelClock& clock, int wake)
       : context_(context), sockets_(sockets), clock_(clock), wake_(wake) {}
 
-  /// Waits for a peer on `listening` and makes it the present one. The previous peer becomes it again when it
-  /// speaks before another one comes. Channel thread.
-  /// @return 0; -1 when none was accepted, or when the listening socket refused the keep-alive option.
+  /// Waits for a peer on `listening` and makes it the present one. Channel thread.
+  /// @return 0; -1 when none was accepted, as when the previous peer speaks before another one comes, or when
+  /// the listening socket refused the keep-alive option.
   int acceptPeer(int listening);
 
  private:

@@ -29,7 +29,7 @@ class AgentControlUnix final : public AgentControlBase {
   int run() override;
   int connect() override { return localAccept(); }
   std::optional<std::string> commandFromReceivedData(const std::string& line) override;
-  void sendReply(const std::string& reply) override;
+  bool deliver(const std::string& reply) override;
 
  private:
   int localConnect();

@@ -285,6 +285,36 @@ TEST_F(LocalSocket, ReplyLongerThanTheSocketBufferArrivesWhole) {
   EXPECT_EQ(preview.size(), 4194304U);
 }
 
+TEST_F(LocalSocket, RepliesBeyondAsciiAreWhole) {
+  const std::string image = "/tmp/unit_control_image_" + std::to_string(::getpid());
+  std::ofstream(image, std::ios::binary) << "abcdef";
+  context_->server.machine_name.set("Hörsaal Süd");
+  context_->recording.preview_file.set(image);
+  Peer peer;
+  peer.send("STATUS include_profile=true,include_preview=true\n");
+  const std::string end = "preview-size=8,preview=YWJjZGVm";
+  EXPECT_NE(peer.receiveUpTo(end).find(",CameraName=Hörsaal Süd,TunnelHost="), std::string::npos);
+  ::unlink(image.c_str());
+  peer.send("TIMEDCMD command=STOP,time=2100-01-01 00:00:00 +0000,TITLE=Größe\n");
+  EXPECT_EQ(peer.receiveUpTo("cmdStatus=0"), "cmdStatus=0");
+  peer.send("TIMEDCMD command=TIMERLIST\n");
+  const std::string list = peer.receiveUpTo("</plist>\n");
+  EXPECT_TRUE(list.ends_with("</plist>\n"));
+  EXPECT_NE(list.find("<string>Größe</string>"), std::string::npos) << list;
+}
+
+TEST_F(LocalSocket, WhenTheLoopThrowsNobodyListensAnyMore) {
+  Peer peer;
+  peer.send("STOP\n");
+  peer.receiveUpTo("cmdStatus=0");
+  actions_.network_changed();
+  clock_.ahead_seconds += 2;
+  clock_.throws = true;
+  ASSERT_TRUE(log_.waitFor(kLogCritical, "Control channel has ended: the clock has stopped"));
+  EXPECT_TRUE(peer.isClosed());
+  EXPECT_FALSE(std::filesystem::exists(socketPath()));
+}
+
 TEST_F(LocalSocket, StopReturnsAtOnceWhileWaitingForAPeer) {
   ASSERT_TRUE(log_.waitFor(kLogInfo, "Connecting local pipe"));
   const auto before = std::chrono::steady_clock::now();
