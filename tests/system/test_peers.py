@@ -1,13 +1,15 @@
 """Peers that are slow, silent, impolite or far from ASCII: nobody else has to wait for them."""
 import contextlib
+import os
 import plistlib
 import time
 
 import pytest
 
 from harness.commands import exchange, start_parameters, timed_line
+from harness.log_reader import Level
 from harness.tunnel_server import TunnelServer
-from harness.unread import all_read, small_buffers
+from harness.unread import all_read, small_buffers, wait_read
 from harness.waiting import let_pass, wait_until
 
 
@@ -75,6 +77,45 @@ def test_a_server_that_speaks_and_hangs_up_is_not_stormed(agent):
             assert server.command("PAUSE") == "cmdStatus=0"
             server.hang_up()
     assert all(later - earlier > 4.5 for earlier, later in zip(times, times[1:])), times
+
+
+def test_a_silent_peer_keeps_nobody_out(agent, running):
+    with agent.connect() as silent:
+        assert exchange(silent, "PAUSE").text == "cmdStatus=0"
+        silent.sendall(b"PAU")
+        wait_read(agent, silent)
+        begin = time.monotonic()
+        with agent.connect() as other:
+            assert exchange(other, "STOP").text == "cmdStatus=0"
+            assert 9 < time.monotonic() - begin < 13
+            begin = time.monotonic()
+            assert exchange(silent, "SE").text == "cmdStatus=0", "the end of the line that it had begun"
+            assert exchange(other, "STATUS").text.startswith("cmdStatus=0,recordStatus=0,")
+            assert exchange(silent, "RESUME").text == "cmdStatus=0"
+            assert time.monotonic() - begin < 2, "both are heard at once"
+    commands = [line.text.split("[")[1] for line in agent.log.lines(r"^Command is \[")]
+    assert commands[-5:] == ["PAUSE]", "STOP]", "PAUSE]", "STATUS]", "RESUME]"]
+
+
+def test_a_queue_of_silent_peers_is_drained_at_once(agent, running):
+    with contextlib.ExitStack() as peers:
+        silent = [peers.enter_context(agent.connect()) for _ in range(200)]
+        begin = time.monotonic()
+        assert agent.command("STOP").text == "cmdStatus=0"
+        assert time.monotonic() - begin < 13
+        assert exchange(silent[-1], "PAUSE").text == "cmdStatus=0"
+        assert silent[0].recv(1) == b"", "there is no place for all"
+        assert len(agent.log.lines("^More than 64 silent peers", level=Level.INFO)) == 136
+        used = processor_time(agent)
+        let_pass(2, "nobody says anything")
+        assert processor_time(agent) - used <= 0.1, "nothing spins"
+
+
+def processor_time(agent):
+    """The seconds of processor time that the daemon has used."""
+    with open(f"/proc/{agent.sandbox.daemon_pid}/stat", encoding="ascii") as stat:
+        words = stat.read().rpartition(") ")[2].split()
+    return (int(words[11]) + int(words[12])) / os.sysconf("SC_CLK_TCK")
 
 
 def timer_titles(reply):

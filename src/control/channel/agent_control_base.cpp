@@ -3,11 +3,13 @@
 
 #include <sys/socket.h>
 
+#include <algorithm>
 #include <array>
 #include <cerrno>
 #include <chrono>
 #include <exception>
 #include <utility>
+#include <vector>
 
 #include "control/channel/back_off.h"
 #include "control/protocol/command_text.h"
@@ -125,15 +127,27 @@ void AgentControlBase::receiveUntilGone() {
 bool AgentControlBase::waitForPacket() {
   const int socket = sockets_.current();
   if (socket == -1) return false;
-  const std::array others{outbox_.descriptor()};
-  auto readiness = awaitReadable(socket, wakeDescriptor(), kReceiveWait, others);
+  std::vector<int> others{outbox_.descriptor()};
+  std::chrono::milliseconds limit = kReceiveWait;
+  if (const auto* acceptor = peerAcceptor()) limit = std::min(limit, acceptor->addOthers(others));
+  auto readiness = awaitReadable(socket, wakeDescriptor(), limit, others);
   if (readiness == Readiness::interrupted) clock_.sleep(1ms, wakeDescriptor());
   if (readiness == Readiness::otherReadable) {
     flushReplies();
-    if (isReadable(socket)) readiness = Readiness::readable;
+    readiness = somebodySpeaks() ? Readiness::readable : Readiness::timedOut;
   }
-  if (readiness == Readiness::readable && running()) return receivePacket(socket);
+  if (readiness == Readiness::readable && running()) return receivePacket(sockets_.current());
   return readiness != Readiness::badDescriptor;
+}
+
+/// Whether the present peer is to be read, which may be another one now. Of several that talk each has its
+/// turn: who is set aside for another stands behind all others that were.
+bool AgentControlBase::somebodySpeaks() {
+  PeerAcceptor* const acceptor = peerAcceptor();
+  if (acceptor != nullptr && acceptor->takeSpeaking()) return true;
+  if (isReadable(sockets_.current())) return true;
+  if (acceptor != nullptr) acceptor->takeWaiting();
+  return false;
 }
 
 bool AgentControlBase::receivePacket(int socket) {
@@ -141,6 +155,7 @@ bool AgentControlBase::receivePacket(int socket) {
   const ssize_t received = ::recv(socket, buffer.data(), buffer.size(), MSG_DONTWAIT);
   if (received == 0) return connected();
   if (received < 0) return errno != EBADF && errno != ECONNRESET && errno != ETIMEDOUT;
+  if (auto* acceptor = peerAcceptor()) acceptor->heard();
   packetReceived(buffer.data(), static_cast<std::uint32_t>(received));
   return true;
 }

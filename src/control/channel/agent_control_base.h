@@ -11,6 +11,7 @@
 #include "control/channel/channel_thread.h"
 #include "control/channel/command_dispatcher.h"
 #include "control/channel/outbox.h"
+#include "control/channel/peer_acceptor.h"
 #include "control/channel/peer_sockets.h"
 #include "control/channel/reconnect_reasons.h"
 #include "control/handlers/channel_context.h"
@@ -81,6 +82,8 @@ class AgentControlBase : private ReplySink {
   void sendReply(const std::string& reply) override;
   /// Whether every command but USERAUTH is to be refused.
   [[nodiscard]] virtual bool requiresAuthentication() const { return false; }
+  /// A listening channel's, else null. Channel thread.
+  virtual PeerAcceptor* peerAcceptor() { return nullptr; }
   /// The thread's body: connect, receive, reconnect. @return 0, or -1 when the channel could not be set up.
   virtual int run();
 
@@ -94,6 +97,8 @@ class AgentControlBase : private ReplySink {
   [[nodiscard]] const ChannelContext& context() const { return context_; }
   [[nodiscard]] PeerSockets& sockets() { return sockets_; }
   [[nodiscard]] ChannelClock& clock() const { return clock_; }
+  /// What the present peer has left unfinished. Channel thread.
+  [[nodiscard]] LineAssembler& partialCommand() { return partial_command_; }
   /// Whether it was the peer that ended the last connection. Channel thread.
   [[nodiscard]] bool peerHasGone() const { return peer_has_gone_; }
   [[nodiscard]] bool running() const { return thread_.running(); }
@@ -106,6 +111,7 @@ class AgentControlBase : private ReplySink {
   void takeBackPreviousPeer();
   void receiveUntilGone();
   bool waitForPacket();
+  bool somebodySpeaks();
   void flushReplies();
   bool receivePacket(int socket);
 

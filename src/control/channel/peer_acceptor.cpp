@@ -1,42 +1,105 @@
-// How a listening channel gets its next peer.
+// How a listening channel gets its next peer, and which of several it hears.
 #include "control/channel/peer_acceptor.h"
 
 #include <sys/socket.h>
 
-#include <array>
+#include <algorithm>
 #include <cerrno>
-#include <chrono>
+#include <utility>
 
 #include "platform/net/socket_io.h"
 #include "support/format.h"
-#include "support/unique_fd.h"
 
 namespace lmx {
 
 using namespace std::chrono_literals;
 
-int PeerAcceptor::acceptPeer(int listening) {
-  int previous = sockets_.previous();
-  Readiness readiness = Readiness::interrupted;
-  while (readiness == Readiness::interrupted || readiness == Readiness::otherReadable) {
-    readiness = awaitReadable(listening, wake_, -1ms, std::array{previous});
-    if (readiness != Readiness::otherReadable) continue;
-    if (sockets_.previousSpeaks()) return -1;
-    previous = -1;  // it has gone
-  }
-  if (readiness == Readiness::woken) return -1;
+void PeerAcceptor::close() {
+  listening_ = -1;
+  parked_.closeAll();
+}
 
-  const int peer = ::accept4(listening, nullptr, nullptr, SOCK_CLOEXEC);
-  const int error = errno;
-  sockets_.setCurrent(UniqueFd(peer));
-  context_.logInfo(string_with_format("accepted connection fd = %d from listen fd = %d", peer, listening));
-  if (peer == -1) {
-    // The peer stays in the queue while the machine has no descriptor for it: don't spin on that.
-    if (error == EMFILE || error == ENFILE || error == ENOBUFS || error == ENOMEM) clock_.sleep(100ms, wake_);
-    return -1;
+int PeerAcceptor::acceptPeer() {
+  int previous = channel_.sockets.previous();
+  for (;;) {
+    std::vector<int> others{previous};
+    parked_.addDescriptors(others);
+    const Readiness readiness = awaitReadable(listening_, channel_.wake, -1ms, others);
+    if (readiness == Readiness::woken) return -1;
+    if (readiness == Readiness::interrupted) continue;
+    if (readiness != Readiness::otherReadable) break;
+    if (channel_.sockets.previousSpeaks()) return -1;
+    if (takeSpeaking()) return 0;
+    if (isReadable(previous)) previous = -1;  // it has gone
   }
+  UniqueFd peer = acceptNext();
+  if (!peer.valid()) return -1;
+  heard();
+  return setCurrent(std::move(peer)) ? 0 : -1;
+}
+
+/// @return the next peer's socket; none when it could not be taken on (logged)
+UniqueFd PeerAcceptor::acceptNext() {
+  UniqueFd peer(::accept4(listening_, nullptr, nullptr, SOCK_CLOEXEC));
+  const int error = errno;
+  channel_.context.logInfo(
+      string_with_format("accepted connection fd = %d from listen fd = %d", peer.get(), listening_));
+  // The peer stays in the queue while the machine has no descriptor for it: don't spin on that.
+  if (!peer.valid() && (error == EMFILE || error == ENFILE || error == ENOBUFS || error == ENOMEM))
+    channel_.clock.sleep(100ms, channel_.wake);
+  return peer;
+}
+
+/// @return false when the listening socket refused the keep-alive option
+bool PeerAcceptor::setCurrent(UniqueFd peer) {
+  channel_.sockets.setCurrent(std::move(peer));
   const int on = 1;
-  return ::setsockopt(listening, SOL_SOCKET, SO_KEEPALIVE, &on, sizeof on) == 0 ? 0 : -1;
+  return ::setsockopt(listening_, SOL_SOCKET, SO_KEEPALIVE, &on, sizeof on) == 0;
+}
+
+std::chrono::milliseconds PeerAcceptor::silenceLeft() const {
+  const auto left = heard_ + silence_ - channel_.clock.steadyNow();
+  return std::max(std::chrono::ceil<std::chrono::milliseconds>(left), 0ms);
+}
+
+std::chrono::milliseconds PeerAcceptor::addOthers(std::vector<int>& polled) const {
+  parked_.addDescriptors(polled);
+  const auto left = silenceLeft();
+  if (left > 0ms) return left;
+  polled.push_back(listening_);
+  return std::chrono::milliseconds::max();
+}
+
+bool PeerAcceptor::takeSpeaking() {
+  auto speaking = parked_.takeSpeaking();
+  if (!speaking) return false;
+  channel_.context.logDebug("A peer that was set aside speaks again");
+  setAside();
+  channel_.sockets.restore(std::move(speaking->connection));
+  channel_.line = std::move(speaking->line);
+  return true;
+}
+
+void PeerAcceptor::takeWaiting() {
+  if (silenceLeft() > 0ms || !isReadable(listening_)) return;
+  UniqueFd peer = acceptNext();
+  if (!peer.valid()) return;
+  channel_.context.logDebug(
+      "Nobody has said anything for some time: the present peer is set aside for the next");
+  setAside();
+  setCurrent(std::move(peer));
+}
+
+/// Parks the present peer, or the one that has just lost its place and doesn't know it, with what it has left
+/// unfinished.
+void PeerAcceptor::setAside() {
+  PeerConnection peer = channel_.sockets.takeCurrent();
+  if (!peer.socket.valid() && channel_.sockets.previousIfAlive() != -1)
+    peer = channel_.sockets.takePrevious();
+  if (!peer.socket.valid()) return;
+  if (parked_.park({std::move(peer), std::exchange(channel_.line, LineAssembler())})) return;
+  channel_.context.logInfo(string_with_format(
+      "More than %zu silent peers: the one that was set aside first is closed", kParkedPeersLimit));
 }
 
 }  // namespace lmx

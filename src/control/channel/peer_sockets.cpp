@@ -58,6 +58,11 @@ PeerConnection PeerSockets::takeCurrent() {
   return std::exchange(current_, {});
 }
 
+PeerConnection PeerSockets::takePrevious() {
+  const std::lock_guard lock(mutex_);
+  return std::exchange(previous_, {});
+}
+
 void PeerSockets::restore(PeerConnection connection) { exchange(current_, std::move(connection)); }
 
 int PeerSockets::previousIfAlive() const {
@@ -70,10 +75,7 @@ bool PeerSockets::previousSpeaks() const {
   return ::recv(previous(), &next, 1, MSG_PEEK | MSG_DONTWAIT) > 0;
 }
 
-void PeerSockets::restorePrevious() {
-  const std::lock_guard lock(mutex_);
-  current_ = std::exchange(previous_, {});
-}
+void PeerSockets::restorePrevious() { restore(takePrevious()); }
 
 void PeerSockets::closeCurrent() { exchange(current_, {}); }
 

@@ -35,8 +35,9 @@ class PeerSockets {
   void setGreeted();
   /// The present peer becomes the previous one, in the place of any other.
   void retireCurrent();
-  /// Takes the present peer away, for restore() to bring it back later.
+  /// Takes the present, respectively the previous, peer away, for restore() to bring it back later.
   [[nodiscard]] PeerConnection takeCurrent();
+  [[nodiscard]] PeerConnection takePrevious();
   void restore(PeerConnection connection);
 
   /// The previous peer's socket if that may still say something, else -1.

@@ -35,6 +35,7 @@ int AgentControlUnix::run() {
   const struct AtEnd {
     AgentControlUnix& channel;
     ~AtEnd() {
+      channel.acceptor_.close();
       channel.localDomainSocket_.reset();
       channel.cleanup();
     }
@@ -64,6 +65,7 @@ int AgentControlUnix::localConnect() {
     return errno;
   socket_path_.set(path);
   if (::listen(localDomainSocket_.get(), kBacklog) != 0) return errno;
+  acceptor_.listenOn(localDomainSocket_.get());
   localAccept();  // a peer that could not be taken on is the next turn's business
   return 0;
 }
