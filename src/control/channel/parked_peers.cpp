@@ -41,6 +41,13 @@ std::optional<ParkedPeer> ParkedPeers::takeSpeaking() {
   return std::nullopt;
 }
 
+std::optional<ParkedPeer> ParkedPeers::takeLast() {
+  if (peers_.empty()) return std::nullopt;
+  ParkedPeer last = std::move(peers_.back());
+  peers_.pop_back();
+  return last;
+}
+
 void ParkedPeers::addDescriptors(std::vector<int>& polled) const {
   for (const ParkedPeer& peer : peers_) polled.push_back(peer.connection.socket.get());
 }

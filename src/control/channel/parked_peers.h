@@ -30,6 +30,8 @@ class ParkedPeers {
   /// Of those that have said something the one that has been here longest, no longer among them. Closes those
   /// that have hung up without a word.
   [[nodiscard]] std::optional<ParkedPeer> takeSpeaking();
+  /// The one that was set aside last, no longer among them; none when there is none.
+  [[nodiscard]] std::optional<ParkedPeer> takeLast();
   /// Adds their descriptors to `polled`. One of them is readable when takeSpeaking() has something to do.
   void addDescriptors(std::vector<int>& polled) const;
   void closeAll() { peers_.clear(); }

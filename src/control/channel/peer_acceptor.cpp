@@ -20,6 +20,7 @@ void PeerAcceptor::close() {
 }
 
 int PeerAcceptor::acceptPeer() {
+  if (takeBackSilent()) return 0;
   int previous = channel_.sockets.previous();
   for (;;) {
     std::vector<int> others{previous};
@@ -53,6 +54,7 @@ UniqueFd PeerAcceptor::acceptNext() {
 /// @return false when the listening socket refused the keep-alive option
 bool PeerAcceptor::setCurrent(UniqueFd peer) {
   channel_.sockets.setCurrent(std::move(peer));
+  if (left_over_.partialCommand()) channel_.line = std::exchange(left_over_, LineAssembler());
   const int on = 1;
   return ::setsockopt(listening_, SOL_SOCKET, SO_KEEPALIVE, &on, sizeof on) == 0;
 }
@@ -74,10 +76,27 @@ bool PeerAcceptor::takeSpeaking() {
   auto speaking = parked_.takeSpeaking();
   if (!speaking) return false;
   channel_.context.logDebug("A peer that was set aside speaks again");
-  setAside();
-  channel_.sockets.restore(std::move(speaking->connection));
-  channel_.line = std::move(speaking->line);
+  putInPlace(std::move(*speaking));
   return true;
+}
+
+/// With nobody else there, the one that was set aside last is the present one again, as it would be had
+/// nobody come in between: a timed command may have something to say to it. Its silence has lasted already:
+/// whoever comes is served at once.
+bool PeerAcceptor::takeBackSilent() {
+  if (isReadable(listening_) || channel_.sockets.previousIfAlive() != -1) return false;
+  auto last = parked_.takeLast();
+  if (!last) return false;
+  putInPlace(std::move(*last));
+  heard_ = {};
+  channel_.context.logDebug("Nobody else is there: the peer that was set aside last has its place again");
+  return true;
+}
+
+void PeerAcceptor::putInPlace(ParkedPeer peer) {
+  setAside();
+  channel_.sockets.restore(std::move(peer.connection));
+  channel_.line = std::move(peer.line);
 }
 
 void PeerAcceptor::takeWaiting() {
@@ -96,7 +115,10 @@ void PeerAcceptor::setAside() {
   PeerConnection peer = channel_.sockets.takeCurrent();
   if (!peer.socket.valid() && channel_.sockets.previousIfAlive() != -1)
     peer = channel_.sockets.takePrevious();
-  if (!peer.socket.valid()) return;
+  if (!peer.socket.valid()) {
+    left_over_ = std::exchange(channel_.line, LineAssembler());
+    return;
+  }
   if (parked_.park({std::move(peer), std::exchange(channel_.line, LineAssembler())})) return;
   channel_.context.logInfo(string_with_format(
       "More than %zu silent peers: the one that was set aside first is closed", kParkedPeersLimit));

@@ -52,12 +52,15 @@ class PeerAcceptor {
   [[nodiscard]] std::chrono::milliseconds silenceLeft() const;
   UniqueFd acceptNext();
   bool setCurrent(UniqueFd peer);
+  bool takeBackSilent();
+  void putInPlace(ParkedPeer peer);
   void setAside();
 
   const Channel channel_;
   const std::chrono::milliseconds silence_;
   int listening_ = -1;
   std::chrono::steady_clock::time_point heard_{};
+  LineAssembler left_over_;  ///< of a peer that has gone, for the next new one
   ParkedPeers parked_;
 };
 

@@ -14,6 +14,7 @@
 
 #include "control/local/agent_control_unix.h"
 #include "record/agent_record.h"
+#include "support/dictionary.h"
 #include "tests/unit/control/channel/turned_clock.h"
 #include "tests/unit/control/local/local_peer.h"
 #include "tests/unit/doubles/log_capture.h"
@@ -29,6 +30,9 @@ using testing::LocalPeer;
 
 constexpr const char* kSetAside =
     "Nobody has said anything for some time: the present peer is set aside for the next";
+
+constexpr const char* kTakenBack =
+    "Nobody else is there: the peer that was set aside last has its place again";
 
 /// Its steady time is turned by hand; it counts how often it is read, once for each turn of the loop.
 class WatchedClock final : public testing::TurnedClock {
@@ -155,6 +159,53 @@ TEST_F(SeveralPeers, WhenThePresentOneLeavesThoseSetAsideAreStillHeard) {
     ASSERT_TRUE(isServed(next));
   }
   EXPECT_TRUE(isServed(silent));
+}
+
+TEST_F(SeveralPeers, WhenThePresentOneLeavesATimedCommandAnswersTheOneSetAside) {
+  LocalPeer silent;
+  ASSERT_TRUE(isServed(silent));
+  {
+    LocalPeer next;
+    letSilencePass();
+    ASSERT_TRUE(isServed(next));
+  }
+  ASSERT_TRUE(log_.waitFor(kLogDebug, kTakenBack));
+  channel_->completeTimedCommand(std::make_shared<const Dictionary>(Dictionary{{"command", "STOP"}}));
+  EXPECT_EQ(silent.receiveUpTo("cmdStatus=38"), "cmdStatus=38");
+}
+
+TEST_F(SeveralPeers, OneThatIsSilentForLongDoesNotMakeLaterOnesWait) {
+  LocalPeer silent;
+  ASSERT_TRUE(isServed(silent));
+  {
+    LocalPeer next;
+    letSilencePass();
+    ASSERT_TRUE(isServed(next));
+  }
+  for (int i = 0; i < 3; ++i) {
+    LocalPeer later;
+    EXPECT_TRUE(isServed(later));
+  }
+  EXPECT_TRUE(isServed(silent));
+}
+
+TEST_F(SeveralPeers, HalfALineOfOneThatLeftIsForTheNextNewOne) {
+  LocalPeer silent;
+  ASSERT_TRUE(isServed(silent));
+  {
+    LocalPeer next;
+    letSilencePass();
+    ASSERT_TRUE(isServed(next));
+    next.send("PA");
+    ASSERT_TRUE(testing::waitUntil([&] { return next.isRead(); }));
+  }
+  ASSERT_TRUE(log_.waitFor(kLogDebug, kTakenBack));
+  EXPECT_TRUE(isServed(silent));
+  letSilencePass();
+  LocalPeer another;
+  another.send("USE\n");
+  EXPECT_EQ(another.receiveUpTo("cmdStatus=0"), "cmdStatus=0");
+  EXPECT_TRUE(log_.contains(kLogDebug, "Command is [PAUSE]"));
 }
 
 TEST_F(SeveralPeers, OneThatLostItsPlaceToANetworkChangeIsSetAsideForOneThatWas) {
