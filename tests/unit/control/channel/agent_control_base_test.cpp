@@ -378,7 +378,10 @@ class BusyChannel : public Lifecycle {
     say(connections_.peer(0), "STOP\n");
     busy_.wait();
   }
-  ~BusyChannel() override { release(); }
+  ~BusyChannel() override {
+    release();
+    channel_.stop();  // before what its replies reach is gone
+  }
   void release() {
     if (!released_.try_wait()) released_.count_down();
   }
