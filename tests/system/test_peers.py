@@ -93,6 +93,7 @@ def test_a_silent_peer_keeps_nobody_out(agent, running):
             assert exchange(other, "STATUS").text.startswith("cmdStatus=0,recordStatus=0,")
             assert exchange(silent, "RESUME").text == "cmdStatus=0"
             assert time.monotonic() - begin < 2, "both are heard at once"
+    agent.log.wait("^Command: RESUME took")
     commands = [line.text.split("[")[1] for line in agent.log.lines(r"^Command is \[")]
     assert commands[-5:] == ["PAUSE]", "STOP]", "PAUSE]", "STATUS]", "RESUME]"]
 
