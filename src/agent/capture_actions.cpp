@@ -10,6 +10,7 @@
 #include "record/preview_controller.h"
 #include "record/recording_limits.h"
 #include "record/stop_capture.h"
+#include "support/format.h"
 
 namespace lmx {
 
@@ -99,7 +100,7 @@ void CaptureActions::pauseCapture() {
   const bool wasRecording = controller->recordingState() == kCaptureRecording;
   controller->pauseRecording();
   if (wasRecording) {
-    recordDidPauseWithFile(session()->filename.get().value_or(""),
+    recordDidPauseWithFile(textOrNull(session()->filename.get()),
                            controller->elapsedTimeInMilliseconds() / 1000);
   }
 }
@@ -110,7 +111,7 @@ void CaptureActions::resumeCapture() {
   if (!controller) return;
   const bool wasPaused = controller->recordingState() == kCapturePaused;
   controller->resumeRecording();
-  if (wasPaused) recordDidResumeWithFile(session()->filename.get().value_or(""));
+  if (wasPaused) recordDidResumeWithFile(textOrNull(session()->filename.get()));
 }
 
 void CaptureActions::stopCapture() {

@@ -30,11 +30,11 @@ void copyIntoRepository(const std::string& from, const std::string& to, mode_t m
   }
 }
 
-void removeFile(LMPLogContext log, const std::string& path) {
-  if (unlink(path.c_str()) == 0) {
-    LMPLogMessage(log, kLogInfo, "File \"%s\" was removed", path.c_str());
+void removeFile(LMPLogContext log, const std::optional<std::string>& path) {
+  if (path && unlink(path->c_str()) == 0) {
+    LMPLogMessage(log, kLogInfo, "File \"%s\" was removed", path->c_str());
   } else {
-    LMPLogMessage(log, kLogError, "An error occurred removing file \"%s\"", path.c_str());
+    LMPLogMessage(log, kLogError, "An error occurred removing file \"%s\"", textOrNull(path).c_str());
   }
 }
 
@@ -114,8 +114,8 @@ int AgentSubmit::submitOrCleanUp(ChildRunner& children) {
 }
 
 void AgentSubmit::removeFiles() const {
-  removeFile(log(), recording_file_path.value_or(""));
-  removeFile(log(), properties_file_path.value_or(""));
+  removeFile(log(), recording_file_path);
+  removeFile(log(), properties_file_path);
 }
 
 int AgentSubmit::addRecording(ChildRunner& children) {
