@@ -76,8 +76,11 @@ std::optional<std::string> AgentControlUnix::commandFromReceivedData(const std::
 
 bool AgentControlUnix::deliver(const std::string& reply) {
   const int error = sendPlainReply(sockets().current(), reply, wakeDescriptor());
-  if (error != 0) context().logDebug(string_with_format("Could not answer to tunnel (errno = %d)", error));
-  return error == 0;
+  if (error == 0) return true;
+  context().logDebug(string_with_format("Could not answer to tunnel (errno = %d)", error));
+  // Half a reply would garble the next, and each might keep the others waiting for as long.
+  if (error == ETIMEDOUT) ::shutdown(sockets().current(), SHUT_RDWR);
+  return false;
 }
 
 }  // namespace lmx
