@@ -41,7 +41,8 @@ AgentMain::AgentMain(std::shared_ptr<AgentContext> context, AgentEnvironment env
                }),
       disk_space_guard_(*context_, capture_),
       cluster_(*context_, context_->server, context_->server_info, *environment_.children),
-      main_loop_({*context_, loop_, capture_, devices_, timed_commands_, environment_.serviceManager.get()}) {
+      main_loop_({*context_, loop_, capture_, devices_, timed_commands_, submission_,
+                  environment_.serviceManager.get()}) {
   loop_.adoptThread();
   setEngineEnvironment({context_, this, environment_.framework});
 }
@@ -74,6 +75,7 @@ int AgentMain::startupDaemon() {
   Start result = loadSettings();
   if (result == Start::ok) result = prepareGround();
   if (result == Start::ok) result = startServices();
+  if (result == Start::askedToEnd) return stopSequence(result, ProcessEnd::orderly);
   if (result != Start::ok) return stopSequence(result, ProcessEnd::internalError);
   startTimers();
   if (main_loop_.appLoop() == 1) return stopSequence(Start::fatal, ProcessEnd::internalError);
@@ -82,6 +84,8 @@ int AgentMain::startupDaemon() {
 
 AgentMain::Start AgentMain::loadSettings() {
   context_->recording.preview_directory.set(std::string(kStateDirectory));
+  // The reason may be over when the service manager starts the agent again, so the service is not disabled.
+  if (AgentPreferences().whyUnreadable()) return Start::fatal;
   start_settings_ = devices_.recordingContext();
   if (!start_settings_) return Start::fatalAndDisable;
   agentPrefs_ = std::make_unique<AgentPreferences>();
@@ -93,7 +97,8 @@ AgentMain::Start AgentMain::prepareGround() {
   const std::string repository = context_->recording.recording_repository_path.get().value_or("");
   if (!setupRecordingRepository(*context_, repository) || createPIDFile(*context_) != 0) return Start::fatal;
   submission_.takeUpUnfinished(environment_.framework);
-  cluster_.learnCluster();
+  if (!cluster_.learnCluster(loop_, [this] { return context_->state.running.get(); }))
+    return Start::askedToEnd;
   devices_.probeDevice(*start_settings_);
   return Start::ok;
 }
@@ -149,6 +154,7 @@ void AgentMain::shutdown() {
   clusterInfoTimer_ = nullptr;
   diskSpaceTimer_ = nullptr;
   context_->state.running.set(false);
+  cluster_.stop(loop_);
   const auto controller = capture_.captureController();
   while (controller && !controller->hasShutDown()) loop_.run(250ms);
   channels_.tunnel().tellServerOfTheEnd();
@@ -187,6 +193,16 @@ void AgentMain::signal(int number) {
 
 bool AgentMain::perform(Action action, Wait wait) {
   return loop_.post([this, action] { (this->*action)(); }, wait);
+}
+
+bool AgentMain::performFor(const std::string& request, Action action, Wait wait) {
+  return loop_.post(
+      [this, request, action] {
+        const auto record = context_->record_context();
+        if (!record || record->request.get().uuid == request) return (this->*action)();
+        context_->logDebug("A command for an earlier recording came too late");
+      },
+      wait);
 }
 
 int AgentMain::performStart(const SharedDictionary& properties) {

@@ -53,6 +53,7 @@ class AgentMain final : public AgentActions {
   [[nodiscard]] Submission& submission() { return submission_; }
 
   bool perform(Action action, Wait wait) override;
+  bool performFor(const std::string& request, Action action, Wait wait) override;
   int performStart(const SharedDictionary& properties) override;
   [[nodiscard]] bool isMainThread() const override { return loop_.isOwnerThread(); }
   void prepareCapture() override { capture_.prepareCapture(); }
@@ -62,6 +63,7 @@ class AgentMain final : public AgentActions {
   void resumeCapture() override { capture_.resumeCapture(); }
   void stopCapture() override { capture_.stopCapture(); }
   void cancelCapture() override { capture_.cancelCapture(); }
+  void cancelRecording() override { capture_.cancelRecording(); }
   void stopRecording() override { capture_.stopRecording(); }
   void setRecorderStatusToIdle() override { capture_.setRecorderStatusToIdle(); }
   void submitStoppedRecording() override { submission_.submitStoppedRecording(); }
@@ -84,7 +86,7 @@ class AgentMain final : public AgentActions {
 
  private:
   // Steps of startupDaemon, in order.
-  enum class Start { ok, fatal, fatalAndDisable };
+  enum class Start { ok, askedToEnd, fatal, fatalAndDisable };
   Start loadSettings();
   Start prepareGround();
   Start startServices();

@@ -10,6 +10,7 @@
 #include "record/preview_controller.h"
 #include "record/recording_limits.h"
 #include "record/stop_capture.h"
+#include "support/format.h"
 
 namespace lmx {
 
@@ -37,10 +38,15 @@ int CaptureActions::startRecording(const SharedDictionary& properties) {
     context_.state.status.set(*refusal);
     return *refusal;
   }
-  if (record) configure(*record, *properties);
   context_.state.properties.set(properties);
+  if (!record) return continuous ? kRecordSuccess : prepareCapture();
+  const std::string request = newUUIDString();
+  record->preparing_request.set(request);
+  const auto prepared = [](AgentRecord* session) { session->preparing_request.set({}); };
+  const std::unique_ptr<AgentRecord, decltype(prepared)> end_of_preparation(record.get(), prepared);
+  configure(*record, *properties);
   const int result = continuous ? kRecordSuccess : prepareCapture();
-  if (record && result == kRecordSuccess) beginRequest(*record, properties);
+  if (result == kRecordSuccess) beginRequest(*record, request, properties);
   return result;
 }
 
@@ -58,8 +64,9 @@ void CaptureActions::configure(AgentRecord& record, const Dictionary& properties
                 metadata_key::kAudioOnly);
 }
 
-void CaptureActions::beginRequest(AgentRecord& record, const SharedDictionary& properties) {
-  const RecordingRequest request{.uuid = newUUIDString(),
+void CaptureActions::beginRequest(AgentRecord& record, const std::string& uuid,
+                                  const SharedDictionary& properties) {
+  const RecordingRequest request{.uuid = uuid,
                                  .properties = properties,
                                  .user = context_.options.user.get(),
                                  .password = context_.options.password.get()};
@@ -93,7 +100,7 @@ void CaptureActions::pauseCapture() {
   const bool wasRecording = controller->recordingState() == kCaptureRecording;
   controller->pauseRecording();
   if (wasRecording) {
-    recordDidPauseWithFile(session()->filename.get().value_or(""),
+    recordDidPauseWithFile(textOrNull(session()->filename.get()),
                            controller->elapsedTimeInMilliseconds() / 1000);
   }
 }
@@ -104,7 +111,7 @@ void CaptureActions::resumeCapture() {
   if (!controller) return;
   const bool wasPaused = controller->recordingState() == kCapturePaused;
   controller->resumeRecording();
-  if (wasPaused) recordDidResumeWithFile(session()->filename.get().value_or(""));
+  if (wasPaused) recordDidResumeWithFile(textOrNull(session()->filename.get()));
 }
 
 void CaptureActions::stopCapture() {
@@ -115,6 +122,12 @@ void CaptureActions::stopCapture() {
 void CaptureActions::cancelCapture() {
   context_.logDebug("Process cancelCapture");
   stopOrCancelCapture(true);
+}
+
+void CaptureActions::cancelRecording() {
+  if (const auto controller = captureController())
+    controller->cancelRequestWithUUID(session()->request.get().uuid);
+  cancelCapture();
 }
 
 void CaptureActions::stopOrCancelCapture(bool cancel) {

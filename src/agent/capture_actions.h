@@ -30,6 +30,8 @@ class CaptureActions {
   void resumeCapture();
   void stopCapture();
   void cancelCapture();
+  /// Cancels the session's request, which may not have been known when the command came in, and its capture.
+  void cancelRecording();
   void stopRecording();
   void setRecorderStatusToIdle();
   /// Handles SIGUSR1 and SIGUSR2. In ad-hoc mode this only marks the recording.
@@ -46,7 +48,7 @@ class CaptureActions {
 
  private:
   void configure(AgentRecord& record, const Dictionary& properties);
-  void beginRequest(AgentRecord& record, const SharedDictionary& properties);
+  void beginRequest(AgentRecord& record, const std::string& uuid, const SharedDictionary& properties);
   void resumeCaptureAndRequest();
   void setPreviewRunning(bool run);
   void stopOrCancelCapture(bool cancel);

@@ -10,6 +10,7 @@
 #include <thread>
 
 #include "agent/elapsed.h"
+#include "agent/recording_in_hand.h"
 #include "model/codes.h"
 #include "platform/log.h"
 #include "prefs/recording_context.h"
@@ -53,21 +54,33 @@ void DeviceWatch::probeDevice(const LMRRecordingContext& settings) {
   device_offline_ = true;
 }
 
+void DeviceWatch::deviceFound() {
+  context_->state.last_device_check.set(0);
+  shouldDisplayOfflineMessage_ = false;
+  if (!device_is_back_()) context_->state.running.set(false);
+}
+
 void DeviceWatch::retryDevice(std::int64_t now) {
   const std::int64_t last = context_->state.last_device_check.get();
   if (last < 1 || isAhead(now, last, kDeviceRetrySeconds + 1)) return;
-  const auto settings = recordingContext();
-  if (!settings) return context_->state.running.set(false);
-  if (openAgain(*settings)) {
-    context_->state.last_device_check.set(0);
-    shouldDisplayOfflineMessage_ = false;
-    if (!device_is_back_()) context_->state.running.set(false);
+  // A retry that fails ends the agent, and a START may have found the camera meanwhile. What records has its
+  // devices open, so the server need not wait for the end of the recording either.
+  if (recordingInHand(*context_)) {
+    if (context_->record_context()->status.get() != kRecorderIdle) deviceFound();
     return;
   }
   context_->state.last_device_check.set(now);
-  if (!shouldDisplayOfflineMessage_) return context_->state.running.set(false);
+  const auto settings = recordingContext();
+  if (!settings) return giveUp();
+  if (openAgain(*settings)) return deviceFound();
+  if (!shouldDisplayOfflineMessage_) return giveUp();
   LMPLogMessage(nullptr, kLogWarning, "%s", kOfflineMessage);
   shouldDisplayOfflineMessage_ = false;
+}
+
+void DeviceWatch::giveUp() {
+  // The end of the agent would leave a recording on its way to the queue unsubmitted: the next retry decides.
+  if (submission_.isIdle()) context_->state.running.set(false);
 }
 
 /// @return whether nothing is missing. An agent that doesn't record video has no camera to wait for.

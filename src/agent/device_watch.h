@@ -28,8 +28,9 @@ class DeviceWatch {
   /// Checks whether the camera of `settings` can be opened. Without it the agent stays offline for now.
   void probeDevice(const LMRRecordingContext& settings);
   [[nodiscard]] bool deviceIsOffline() const { return device_offline_; }
-  /// Looks for a missing camera every eleven seconds. If it is still missing the agent ends; after a failure
-  /// in use there is one warning and another attempt first.
+  /// Looks for a missing camera every eleven seconds, but not during a recording: then as soon as that has
+  /// ended. If it is still missing the agent ends, once nothing waits for its submission; after a failure in
+  /// use there is one warning and another attempt first.
   void retryDevice(std::int64_t now);
   /// The camera failed in use, so its absence is worth a warning.
   void deviceFailed() { shouldDisplayOfflineMessage_ = true; }
@@ -41,6 +42,8 @@ class DeviceWatch {
   void announceLostDevice() const;
 
  private:
+  void deviceFound();
+  void giveUp();
   [[nodiscard]] bool openAgain(const LMRRecordingContext& settings);
 
   const std::shared_ptr<AgentContext> context_;

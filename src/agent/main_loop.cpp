@@ -6,8 +6,10 @@
 #include <chrono>
 #include <cstdio>
 #include <ctime>
+#include <utility>
 
 #include "agent/elapsed.h"
+#include "agent/recording_in_hand.h"
 #include "agent/service_disable.h"
 #include "agent/time_shift.h"
 #include "model/codes.h"
@@ -64,6 +66,13 @@ void MainLoop::checkServerRefusal(std::int64_t now) {
   AgentState& state = parts_.context.state;
   const std::int64_t refused = state.serverRejectTime.get();
   if (parts_.context.options.adhoc.get() || refused == 0 || isAhead(now, refused, kRefusalSeconds)) return;
+  if (recordingInHand(parts_.context) || !parts_.submission.isIdle()) {
+    if (!std::exchange(refusal_waits_, true)) {
+      LMPLogMessage(parts_.context.log_context(), kLogNotice,
+                    "Server rejected agent connection; the restart waits until the recording is submitted");
+    }
+    return;
+  }
   state.serverRejectTime.set(0);
   LMPLogMessage(parts_.context.log_context(), kLogCritical,
                 "Server rejected agent connection, restarting for retry.");

@@ -5,6 +5,7 @@
 
 #include "agent/capture_actions.h"
 #include "agent/device_watch.h"
+#include "agent/submission.h"
 #include "agent/timed_command_runner.h"
 #include "model/agent_context.h"
 #include "platform/run_loop.h"
@@ -23,6 +24,7 @@ class MainLoop {
     CaptureActions& capture;
     DeviceWatch& devices;
     TimedCommandRunner& timed_commands;
+    const Submission& submission;
     ServiceManager* service_manager;  ///< null only in tests that don't change preferences
   };
   explicit MainLoop(const Parts& parts) : parts_(parts) {}
@@ -35,10 +37,13 @@ class MainLoop {
  private:
   void stopForgottenPreview(std::int64_t now);
   void reloadChangedPreferences();
+  /// Ends the process a minute after the server has refused the agent, but never during a recording: the
+  /// refusal is a line that anybody on the way can write.
   void checkServerRefusal(std::int64_t now);
 
   const Parts parts_;
   AgentPreferences* preferences_ = nullptr;
+  bool refusal_waits_ = false;  ///< the notice about the wait for a recording has been written
 };
 
 }  // namespace lmx

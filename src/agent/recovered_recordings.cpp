@@ -94,7 +94,7 @@ HandOffOrder::Jobs RecoveredRecordings::keep(const std::vector<RecoveredRecordin
     }
     // Without its document the movie stays in the journal. The next start tries again.
     if (documented) recording.forget();
-    if (!documented && !submit) continue;
+    if ((!documented && !submit) || jobs_.store().tookUp(recording.request)) continue;
     LMPLogMessage(
         context_->log_context(), kLogNotice,
         submit ? "Finished recording \"%s\" (duration: %ds), which had been stopped; it goes to the server"

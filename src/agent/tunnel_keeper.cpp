@@ -17,6 +17,7 @@ constexpr auto kThreadPatience = 10s;
 }  // namespace
 
 bool TunnelKeeper::openTunnel() {
+  if (agentControl_) return true;
   agentControl_ = newControlChannel<AgentControl>(context_, &actions_);
   return agentControl_ != nullptr;
 }

@@ -18,7 +18,7 @@ class TunnelKeeper {
 
   /// The tunnel; null while it is closed.
   [[nodiscard]] AgentControl* tunnel() const { return agentControl_.get(); }
-  /// Call it while the tunnel is closed. @return false when it can't be started (logged)
+  /// Does nothing while the tunnel is open. @return false when it can't be started (logged)
   bool openTunnel();
   /// Ends the tunnel. Keeps running the loop, since the tunnel's thread may be waiting for this one. A thread
   /// that has not ended after ten seconds is abandoned.

@@ -35,6 +35,11 @@ class AgentActions {
   /// @return false when the main loop has ended and the action will not run
   virtual bool perform(Action action, Wait wait) = 0;
 
+  /// The same, unless by then a later START has been granted than that of `request`: a STOP that comes twice
+  /// must not end the next lecture.
+  /// @param request  AgentRecord::addressedRequest() when the command came in
+  virtual bool performFor(const std::string& request, Action action, Wait wait) = 0;
+
   /// Starts the recording that a START asks for, on the main thread; waits for it. Any thread.
   /// @param properties  the parameters of the START
   /// @return a RecordError; kRecordInvalidType when the main loop has ended
@@ -49,6 +54,8 @@ class AgentActions {
   virtual void resumeCapture() = 0;
   virtual void stopCapture() = 0;
   virtual void cancelCapture() = 0;
+  /// Cancels the session's request with its capture, so that nothing is left of it.
+  virtual void cancelRecording() = 0;
   virtual void stopRecording() = 0;
   virtual void setRecorderStatusToIdle() = 0;
   virtual void submitStoppedRecording() = 0;

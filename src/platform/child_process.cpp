@@ -13,6 +13,7 @@
 #include <csignal>
 #include <cstdint>
 #include <memory>
+#include <optional>
 
 #include "support/unique_fd.h"
 
@@ -69,6 +70,11 @@ bool readOutput(int fd, std::string& output, std::size_t limit) {
   return true;
 }
 
+bool readable(int fd) {
+  pollfd polled{fd, POLLIN, 0};
+  return fd >= 0 && poll(&polled, 1, 0) > 0;
+}
+
 /// Waits for a child to end and reads its output in the meantime.
 class ChildWait {
  public:
@@ -80,18 +86,14 @@ class ChildWait {
 
   ChildResult run() {
     ChildResult result;
-    bool killed = false;
     while (!hasEnded()) {
       const milliseconds left = nextWait();
-      if (left.count() == 0 && limitReached() && !killed) {
-        killed = true;
-        kill(child_, SIGKILL);
-      }
-      waitOnce(left, killed, result.output);
+      if (!killed_) killIfDue();
+      waitOnce(left, result.output);
       reportIfDue();
     }
     drain(result.output);
-    return collect(killed, std::move(result));
+    return collect(std::move(result));
   }
 
  private:
@@ -105,7 +107,16 @@ class ChildWait {
     return ended_;
   }
 
-  ChildResult collect(bool killed, ChildResult result) const {
+  void killIfDue() {
+    if (readable(options_.cancel)) {
+      killed_ = ChildResult::End::cancelled;
+    } else if (limitReached()) {
+      killed_ = ChildResult::End::timedOut;
+    }
+    if (killed_) kill(child_, SIGKILL);
+  }
+
+  ChildResult collect(ChildResult result) const {
     int status = 0;
     pid_t reaped = 0;
     do {
@@ -116,8 +127,8 @@ class ChildWait {
       return result;
     }
     // A child that exited just before our SIGKILL finished its work and counts as such.
-    const bool by_us = killed && WIFSIGNALED(status) && WTERMSIG(status) == SIGKILL;
-    result.end = by_us                 ? ChildResult::End::timedOut
+    const bool by_us = killed_ && WIFSIGNALED(status) && WTERMSIG(status) == SIGKILL;
+    result.end = by_us                 ? *killed_
                  : WIFSIGNALED(status) ? ChildResult::End::signalled
                                        : ChildResult::End::exited;
     result.status = WIFSIGNALED(status) ? WTERMSIG(status) : WEXITSTATUS(status);
@@ -138,11 +149,13 @@ class ChildWait {
     return wait;
   }
 
-  void waitOnce(milliseconds wait, bool killed, std::string& output) {
-    if (killed) wait = std::chrono::hours(1);
+  void waitOnce(milliseconds wait, std::string& output) {
+    if (killed_) wait = std::chrono::hours(1);
     if (!handle_.valid()) wait = std::min(wait, milliseconds(20));
-    pollfd polled[2] = {{handle_.get(), POLLIN, 0}, {output_.get(), POLLIN, 0}};
-    const int ready = poll(polled, 2, static_cast<int>(wait.count()) + 1);
+    // A cancellation stays readable: once the child is killed for it, it would keep this from sleeping.
+    const int cancel = killed_ ? -1 : options_.cancel;
+    pollfd polled[3] = {{handle_.get(), POLLIN, 0}, {output_.get(), POLLIN, 0}, {cancel, POLLIN, 0}};
+    const int ready = poll(polled, 3, static_cast<int>(wait.count()) + 1);
     if (ready <= 0) return;
     if (polled[1].revents != 0 && !readOutput(output_.get(), output, options_.maximumOutput)) output_.reset();
     if (polled[0].revents != 0) ended_ = true;
@@ -174,6 +187,7 @@ class ChildWait {
   UniqueFd handle_;
   const Clock::time_point started_ = Clock::now();
   std::int64_t reports_ = 0;
+  std::optional<ChildResult::End> killed_;  ///< why we have killed it
   bool ended_ = false;
 };
 
@@ -181,6 +195,10 @@ class SystemChildRunner : public ChildRunner {
  public:
   ChildResult run(const std::vector<std::string>& argv, const ChildOptions& options) override {
     ChildResult result;
+    if (readable(options.cancel)) {
+      result.end = ChildResult::End::cancelled;
+      return result;
+    }
     UniqueFd reading;
     UniqueFd writing;
     if (options.captureOutput) {

@@ -15,6 +15,7 @@ struct ChildResult {
     signalled,   ///< `status` is the signal
     notStarted,  ///< `status` is the errno of the start
     timedOut,    ///< killed by us when the time limit was reached
+    cancelled,   ///< killed by us, or not even started, because it was cancelled
   };
   End end = End::notStarted;
   int status = 0;
@@ -27,7 +28,10 @@ struct ChildOptions {
   bool captureOutput = false;                      ///< false: the child inherits the standard streams
   std::size_t maximumOutput = 16U << 20;           ///< bytes kept; further output is read and dropped
   std::optional<std::chrono::milliseconds> limit;  ///< none: wait indefinitely
-  std::chrono::milliseconds reportEvery{0};        ///< > 0: call `stillRunning` at this interval
+  /// A descriptor that becomes readable when the child is to be killed, and stays so; -1: none. It outlives
+  /// the run.
+  int cancel = -1;
+  std::chrono::milliseconds reportEvery{0};                     ///< > 0: call `stillRunning` at this interval
   std::function<void(std::chrono::milliseconds)> stillRunning;  ///< receives the time since the start
 };
 

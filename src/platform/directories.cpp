@@ -53,10 +53,15 @@ int takeOverAccess(int fd, const std::string& path, mode_t mode) {
   return fchmod(fd, mode) == 0 ? 0 : errno;
 }
 
+int setAccess(int fd, const std::string& path, mode_t mode, OldAccess old) {
+  if (old == OldAccess::keep) return takeOverAccess(fd, path, mode);
+  return fchmod(fd, mode) == 0 ? 0 : errno;
+}
+
 int fillAndRename(int fd, const std::string& temporary, const std::string& path, const std::string& content,
-                  mode_t mode) {
+                  mode_t mode, OldAccess old) {
   if (const int error = writeAll(fd, content)) return error;
-  if (const int error = takeOverAccess(fd, path, mode)) return error;
+  if (const int error = setAccess(fd, path, mode, old)) return error;
   if (fsync(fd) != 0) return errno;
   if (rename(temporary.c_str(), path.c_str()) != 0) return errno;
   return 0;
@@ -79,12 +84,12 @@ int syncDirectory(const std::string& directory) {
   return fsync(fd.get()) == 0 ? 0 : errno;
 }
 
-int writeFileAtomically(const std::string& path, const std::string& content, mode_t mode) {
+int writeFileAtomically(const std::string& path, const std::string& content, mode_t mode, OldAccess old) {
   const std::string directory = directoryOf(path);
   std::string temporary = directory + "/.lmx-" + path.substr(path.rfind('/') + 1) + ".XXXXXX";
   const UniqueFd fd(mkostemp(temporary.data(), O_CLOEXEC));
   if (!fd.valid()) return errno;
-  if (const int error = fillAndRename(fd.get(), temporary, path, content, mode)) {
+  if (const int error = fillAndRename(fd.get(), temporary, path, content, mode, old)) {
     unlink(temporary.c_str());
     return error;
   }

@@ -47,7 +47,7 @@ int renameToFreeName(const std::string& from, const std::string& to) {
   return rename(from.c_str(), to.c_str()) == 0 ? 0 : errno;
 }
 
-int copyFileToNewName(const std::string& from, const std::string& to) {
+int copyFileToNewName(const std::string& from, const std::string& to, mode_t mode) {
   if (nameTaken(to)) return EEXIST;
   const UniqueFd source(open(from.c_str(), O_RDONLY | O_CLOEXEC));
   if (!source.valid()) return errno;
@@ -55,7 +55,7 @@ int copyFileToNewName(const std::string& from, const std::string& to) {
   const UniqueFd target(mkostemp(temporary.data(), O_CLOEXEC));
   if (!target.valid()) return errno;
   int error = copyContents(source.get(), target.get());
-  if (error == 0 && fchmod(target.get(), 0644) != 0) error = errno;
+  if (error == 0 && fchmod(target.get(), mode) != 0) error = errno;
   if (error == 0) error = renameToFreeName(temporary, to);
   if (error != 0) {
     unlink(temporary.c_str());

@@ -14,22 +14,27 @@
 #include "postprocess/properties_document.h"
 #include "postprocess/property_gatherer.h"
 #include "postprocess/submission.h"
+#include "support/format.h"
 
 namespace lmx {
 namespace {
 
-void copyIntoRepository(const std::string& from, const std::string& to) {
-  if (const int error = copyFileToNewName(from, to)) {
+constexpr mode_t kMovieMode = 0644;
+/// Documents hold the user's password.
+constexpr mode_t kDocumentMode = 0600;
+
+void copyIntoRepository(const std::string& from, const std::string& to, mode_t mode) {
+  if (const int error = copyFileToNewName(from, to, mode)) {
     LMPLogMessage(nullptr, kLogDebug, "\"%s\" was not copied to \"%s\": %s", from.c_str(), to.c_str(),
                   std::strerror(error));
   }
 }
 
-void removeFile(LMPLogContext log, const std::string& path) {
-  if (unlink(path.c_str()) == 0) {
-    LMPLogMessage(log, kLogInfo, "File \"%s\" was removed", path.c_str());
+void removeFile(LMPLogContext log, const std::optional<std::string>& path) {
+  if (path && unlink(path->c_str()) == 0) {
+    LMPLogMessage(log, kLogInfo, "File \"%s\" was removed", path->c_str());
   } else {
-    LMPLogMessage(log, kLogError, "An error occurred removing file \"%s\"", path.c_str());
+    LMPLogMessage(log, kLogError, "An error occurred removing file \"%s\"", textOrNull(path).c_str());
   }
 }
 
@@ -68,7 +73,8 @@ bool AgentSubmit::gather(const Text& movie, std::optional<TimeValue> started_dat
 
 bool AgentSubmit::tryWriteProperties() const {
   if (!properties_file_path) return true;
-  const int error = writeFileAtomically(*properties_file_path, propertiesXml(properties), 0644);
+  const int error = writeFileAtomically(*properties_file_path, propertiesXml(properties), kDocumentMode,
+                                        OldAccess::discard);
   if (error == 0) return true;
   LMPLogMessage(log(), kLogWarning, "The properties document \"%s\" could not be written: %s",
                 properties_file_path->c_str(), std::strerror(error));
@@ -94,7 +100,7 @@ int AgentSubmit::submitOrCleanUp(ChildRunner& children) {
     if (addRecording(children) != 0) {
       const Text server = agentContext ? agentContext->server.lumex_url.get() : std::nullopt;
       LMPLogMessage(log(), kLogError, "An error occurred completing recording \"%s\"",
-                    server.value_or("(null)").c_str());
+                    textOrNull(server).c_str());
       LMPLogMessage(log(), kLogCritical, "An internal error occurred during agent post-processing");
       return -1;
     }
@@ -108,8 +114,8 @@ int AgentSubmit::submitOrCleanUp(ChildRunner& children) {
 }
 
 void AgentSubmit::removeFiles() const {
-  removeFile(log(), recording_file_path.value_or(""));
-  removeFile(log(), properties_file_path.value_or(""));
+  removeFile(log(), recording_file_path);
+  removeFile(log(), properties_file_path);
 }
 
 int AgentSubmit::addRecording(ChildRunner& children) {
@@ -139,9 +145,9 @@ int AgentSubmit::addRecording(ChildRunner& children) {
 void AgentSubmit::copyInputFile(const std::string& uuid) const {
   const std::string movie = recording_file_path.value_or("");
   const std::string copy = agentContext->recording.recording_repository_path.get().value_or("") + "/" + uuid;
-  copyIntoRepository(movie, copy + ".mov");
+  copyIntoRepository(movie, copy + ".mov", kMovieMode);
   copyIntoRepository(movie.substr(0, movie.size() - std::min<std::size_t>(3, movie.size())) + "xml",
-                     copy + ".xml");
+                     copy + ".xml", kDocumentMode);
 }
 
 }  // namespace lmx

@@ -13,6 +13,8 @@
 #include "platform/log.h"
 #include "platform/paths.h"
 #include "prefs/adhoc_defaults.h"
+#include "prefs/shared_secret.h"
+#include "prefs/steady_reading.h"
 #include "support/format.h"
 
 namespace lmx {
@@ -24,17 +26,22 @@ bool missesSilently(const std::string& key) {
   return key == "RecordingPreviewIntervalInSeconds" || key == "PreviewPath";
 }
 
-/// The whole file; nothing when it does not exist or can't be used.
+/// A whole file.
+struct Loaded {
+  std::optional<PlistDictionary> dictionary;  ///< absent when the file does not exist or can't be used
+  bool stale = false;                         ///< it is the one last read; the file can't be read at present
+};
+
 /// @param complained  whether an error line has named the file already; set when this writes one
-std::optional<PlistDictionary> loadFile(const std::string& path, bool& complained) {
-  PlistResult file = readPropertyList(path);
-  if (file && file->dictionary() != nullptr) return *file->dictionary();
-  if (complained || (!file && file.error().systemError == ENOENT)) return std::nullopt;
+Loaded loadFile(const std::string& path, bool& complained) {
+  auto [file, unreadable] = readSteadily(path);
+  if (file && file->dictionary() != nullptr) return {*file->dictionary(), unreadable.has_value()};
+  if (unreadable || complained || (!file && file.error().systemError == ENOENT)) return {};
   complained = true;
   LMPLogMessage(nullptr, kLogError,
                 "The preferences file \"%s\" can't be used: %s. Nothing is read from it; correct it.",
                 path.c_str(), file ? "its top level is not a dictionary" : file.error().message.c_str());
-  return std::nullopt;
+  return {};
 }
 
 /// A number as decimal text without an exponent; nothing for any other value.
@@ -91,7 +98,7 @@ std::optional<PlistValue> AgentPreferences::getFromPrefsFile(const std::string& 
   std::optional<PlistValue> value;
   {
     const std::lock_guard lock(prefsCacheMutex_);
-    if (!prefsDict_) prefsDict_ = loadFile(systemPath(kPreferencesFile), complained_);
+    fillCache();
     if (prefsDict_) {
       const auto found = prefsDict_->find(key);
       if (found != prefsDict_->end()) value = typed(key, found->second);
@@ -103,11 +110,32 @@ std::optional<PlistValue> AgentPreferences::getFromPrefsFile(const std::string& 
   return value;
 }
 
+void AgentPreferences::fillCache() {
+  if (prefsDict_) return;
+  auto [dictionary, stale] = loadFile(systemPath(kPreferencesFile), complained_);
+  prefsDict_ = std::move(dictionary);
+  stale_ = stale;
+}
+
+std::optional<Error> AgentPreferences::whyUnreadable() {
+  const std::lock_guard lock(prefsCacheMutex_);
+  if (!prefsDict_) {
+    auto [file, unreadable] = readSteadily(systemPath(kPreferencesFile));
+    if (unreadable) return unreadable;
+    if (!file || file->dictionary() == nullptr) return std::nullopt;  // whoever asks for a key logs why
+    prefsDict_ = *file->dictionary();
+    stale_ = false;
+  }
+  const auto server = prefsDict_->find("ServerUUID");
+  if (server == prefsDict_->end() || server->second.string() == nullptr) return std::nullopt;
+  return readSteadily(sharedSecretFile(*server->second.string())).unreadable;
+}
+
 std::array<std::optional<PlistDictionary>, 3> AgentPreferences::domainLayers() {
   const std::lock_guard lock(prefsCacheMutex_);
   const std::string user = userPreferencesFile();
-  return {user.empty() ? std::nullopt : loadFile(user, user_complained_),
-          loadFile(systemPath(kPreferencesFile), complained_), adHocDefaults()};
+  return {user.empty() ? std::nullopt : loadFile(user, user_complained_).dictionary,
+          loadFile(systemPath(kPreferencesFile), complained_).dictionary, adHocDefaults()};
 }
 
 std::optional<PlistValue> AgentPreferences::get(const std::string& key) {
@@ -127,8 +155,15 @@ void AgentPreferences::setupPrefsFileWatcher() {
 }
 
 bool AgentPreferences::prefsFileChanged() {
+  if (watchedFileChanged()) unread_change_ = true;
+  if (!unread_change_ || whyUnreadable()) return false;
+  unread_change_ = false;
+  return true;
+}
+
+bool AgentPreferences::watchedFileChanged() {
   const std::string path = systemPath(kPreferencesFile);
-  const auto exists = [&path] { return access(path.c_str(), F_OK) == 0; };
+  const auto exists = [&path] { return access(path.c_str(), F_OK) == 0 || isPassing({{}, errno}); };
   if (!watcher_.isOpen()) {
     if (!exists()) return false;
     setupPrefsFileWatcher();
@@ -149,7 +184,7 @@ bool AgentPreferences::prefsFileChanged() {
 void AgentPreferences::migrateOldKeys() {
   const std::lock_guard lock(prefsCacheMutex_);  // recursive: the read below locks it again
   const auto old = textOf(getFromPrefsFile("RecordingPreviewIntervalInSeconds"));
-  if (!old || !prefsDict_) return;
+  if (!old || !prefsDict_ || stale_) return;
   const auto seconds = static_cast<std::uint32_t>(std::atoi(old->c_str()));
   // The old default of 3 s maps to the new default, not to its equivalent in milliseconds.
   const std::string milliseconds =

@@ -61,9 +61,8 @@ class SettingsReader {
       context_.server.shared_secret.set(*secret);
       return true;
     }
-    if (secret.error().message.empty()) return false;
     LMPLogMessage(nullptr, kLogError, "%s", secret.error().message.c_str());
-    return notBound();
+    return secret.error().kind == SecretError::Kind::missing && notBound();
   }
 
   bool readRepository() {

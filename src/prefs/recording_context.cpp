@@ -7,6 +7,7 @@
 #include "platform/paths.h"
 #include "prefs/continuous_settings.h"
 #include "prefs/recording_types.h"
+#include "support/format.h"
 
 namespace lmx {
 namespace {
@@ -93,16 +94,16 @@ std::shared_ptr<LMRRecordingContext> RecordingContextBuilder::newRecordingContex
 void RecordingContextBuilder::chooseVideo(LMRRecordingContext& context, const Text& preset) {
   context.videoDeviceID = chooseVideoDevice(text("RecordingVideoInput"), catalog_);
   context.videoCompressionOptions = catalog_.compressionOptions(MediaType::video, qualityOf(preset));
-  if (!context.videoCompressionOptions) failInvalidCompression("RecordingCapturePreset", preset.value_or(""));
+  if (!context.videoCompressionOptions) failInvalidCompression("RecordingCapturePreset", textOrNull(preset));
 }
 
 void RecordingContextBuilder::chooseAudio(LMRRecordingContext& context, const Text& preset) {
   context.audioDeviceID = chooseAudioDevice(text("RecordingAudioInput"), context.videoDeviceID, catalog_);
   if (!catalog_.audioDeviceUsable(context.audioDeviceID)) {
-    failInvalidDevice("RecordingAudioInput", context.audioDeviceID.value_or(""));
+    failInvalidDevice("RecordingAudioInput", textOrNull(context.audioDeviceID));
   }
   context.audioCompressionOptions = catalog_.compressionOptions(MediaType::audio, qualityOf(preset));
-  if (!context.audioCompressionOptions) failInvalidCompression("RecordingCapturePreset", preset.value_or(""));
+  if (!context.audioCompressionOptions) failInvalidCompression("RecordingCapturePreset", textOrNull(preset));
 }
 
 std::shared_ptr<LMRRecordingContext> newRecordingContextForAdHoc(CaptureCatalog& catalog) {

@@ -20,6 +20,11 @@ std::int32_t AgentRecord::recordedType() const {
   return type == kRecordingTypeNone ? recordingType.get() : type;
 }
 
+std::string AgentRecord::addressedRequest() const {
+  const std::string preparing = preparing_request.get();
+  return preparing.empty() ? request.get().uuid : preparing;
+}
+
 void AgentRecord::updateLastContact() {
   lastContact.set(lmp_gettimeofday());
   if (status.get() != kRecorderIdle) stop_times.updateSoftStopTime();

@@ -49,6 +49,10 @@ class AgentRecord : public RecordingSettings, public std::enable_shared_from_thi
   /// The last START that was granted. It names and describes the finished recording even when a later START
   /// has replaced the agent's properties.
   SharedValue<RecordingRequest> request;
+  SharedValue<std::string> preparing_request;  ///< identifies the START that is being prepared; empty: none
+  /// The request that a command which comes in now is about: that of the START being prepared, else the last
+  /// one that was granted; empty before the first.
+  [[nodiscard]] std::string addressedRequest() const;
 
   // Its progress.
   SharedValue<std::int32_t> status{kRecorderIdle};

@@ -31,13 +31,13 @@ int doAutoShutoff(AgentRecord& session) {
   if (environment.context && environment.context->options.adhoc.get()) std::_Exit(0);
   const auto hard = session.stop_times.hardStopTime.get();
   const auto soft = session.stop_times.softStopTime.get();
+  const std::string request = session.request.get().uuid;
   if (const auto controller = session.captureController.get()) {
-    const std::string request = session.request.get().uuid;
     controller->setStopWithUUID(request, secondsSinceReferenceDate());
     controller->submitRequestWithUUID(request);
   }
   if (environment.actions != nullptr) {
-    environment.actions->perform(&AgentActions::stopRecording, Wait::untilDone);
+    environment.actions->performFor(request, &AgentActions::stopRecording, Wait::untilDone);
   }
   forget(session.stop_times.hardStopTime, hard);
   forget(session.stop_times.softStopTime, soft);

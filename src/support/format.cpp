@@ -32,4 +32,6 @@ std::string string_with_format(const char* format, ...) {
   return text;
 }
 
+std::string textOrNull(const std::optional<std::string>& text) { return text.value_or("(null)"); }
+
 }  // namespace lmx

@@ -62,11 +62,6 @@ bool isUtf8(std::string_view text) {
   return true;
 }
 
-std::size_t characterCount(std::string_view utf8) {
-  return static_cast<std::size_t>(std::count_if(
-      utf8.begin(), utf8.end(), [](char c) { return !isContinuation(static_cast<unsigned char>(c)); }));
-}
-
 std::string xmlText(std::string_view text, std::string_view substitute) {
   std::string out;
   while (!text.empty()) {

@@ -16,9 +16,6 @@ std::size_t xmlCharacterLength(std::string_view text);
 /// Whether all of `text` is well-formed.
 bool isUtf8(std::string_view text);
 
-/// Number of characters (not bytes) in a UTF-8 text.
-std::size_t characterCount(std::string_view utf8);
-
 /// Replaces each byte that XML can't represent with `substitute`: one stray byte in a title must not make a
 /// whole document unreadable.
 std::string xmlText(std::string_view text, std::string_view substitute);

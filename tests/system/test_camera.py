@@ -1,4 +1,5 @@
 """Cameras that are missing, late, or lost in the middle; a movie file as a camera."""
+import signal
 import subprocess
 
 import numpy
@@ -89,6 +90,21 @@ def test_a_lost_camera_waits_for_the_submission(agent):
     agent.release_tool()
     assert agent.wait_exit(30) == 1
     assert agent.submitted("end") == ["FIRST", "LOST"]
+
+
+def test_no_camera_is_looked_for_during_a_recording(agent):
+    """After SIGHUP the camera is looked for again ten seconds later; not finding it would end the daemon."""
+    agent.start()
+    agent.sandbox.signal(signal.SIGHUP)
+    agent.log.wait("^Process cancelCapture$", level=Level.DEBUG)
+    assert agent.start_recording("LECTURE").text == "cmdStatus=0"
+    agent.preferences(RecordingVideoInput="file:///nowhere.mov")
+    mark = agent.log.mark()
+    agent.log.wait("^Connecting to lmxserverd tunnel", timeout=20, after=mark)  # what records proves the camera
+    assert agent.command("STATUS").fields["recordStatus"] == "2"
+    assert agent.command("STOP").text == "cmdStatus=0"
+    agent.wait_tool_call("LECTURE", event="end")
+    assert agent.alive() and agent.submitted("end") == ["LECTURE"]
 
 
 def test_a_movie_file_as_the_camera_with_its_sound(agent, lecture):

@@ -1,10 +1,11 @@
 """Cluster members: queried with the tool, read from the cache, tried in turn."""
 import plistlib
+import signal
 import time
 
 import pytest
 from harness.log_reader import Level
-from harness.tunnel_server import in_network_of
+from harness.tunnel_server import TunnelServer, in_network_of
 from harness.waiting import wait_until
 
 CACHE = "/var/lmx/agent/com.zandor.lmxserverinfo.plist"
@@ -54,6 +55,38 @@ def test_the_start_waits_half_a_minute_for_the_tool_at_most(agent):
     agent.wait_started(40)
     assert 28 < time.monotonic() - begin < 45
     agent.log.wait("^Hosts: 127.0.0.1:1, 127.0.0.1:2$", level=Level.DEBUG)
+
+
+@pytest.mark.parametrize("number, text", [(signal.SIGTERM, r"^Got Termination Signal \(SIGTERM\)$"),
+                                          (signal.SIGINT, r"^Got Stop Signal \(SIGINT\)$")])
+def test_the_question_at_the_start_does_not_hold_up_the_end(agent, number, text):
+    agent.set_tool({"when": "--listinfo", "hang": True})
+    agent.start(wait=False)
+    wait_until(lambda: agent.tool_calls(having="--listinfo"), 20, "the question")
+    begin = time.monotonic()
+    assert agent.stop(number) == 0
+    assert time.monotonic() - begin < 8, "nobody waits for the tool"
+    agent.log.wait(text, level=Level.DEBUG)
+    lines = [line.text for line in agent.log.lines()]
+    assert lines.index("lmxagentd is stopping...") < lines.index("lmxagentd stopped")
+    assert not agent.log.lines("cluster|Internal error|No cluster members")
+    assert not agent.path("/var/run/lmxagentd.pid").exists()
+    assert not agent.tool_calls("end")
+
+
+def test_a_hang_up_during_the_question_at_the_start_does_no_harm(agent):
+    agent.set_tool({"when": "--listinfo", "hang": True})
+    with TunnelServer(agent.prepare()) as server:
+        agent.start(wait=False)
+        wait_until(lambda: agent.tool_calls(having="--listinfo"), 20, "the question")
+        agent.sandbox.signal(signal.SIGHUP)
+        agent.log.wait("^Process shutDownControl$", level=Level.DEBUG)
+        agent.release_tool()
+        server.accept()
+        mark = agent.log.mark()
+        agent.log.wait("^Using Video Device Named: ", timeout=30, after=mark, level=Level.DEBUG)  # the camera retry
+        assert server.command("STATUS").startswith("cmdStatus=0,recordStatus=0,"), "the tunnel is the same one"
+        assert len(agent.log.lines("^Sent: AGENT")) == 1
 
 
 def test_a_v6_member(agent):

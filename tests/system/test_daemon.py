@@ -213,6 +213,7 @@ def test_lines_without_a_reply(running, line, text):
 
 @pytest.mark.parametrize("line", ["X-FOO", "X-PREVIEW refresh_milliseconds=500", "SERVER version=2,server_uuid=X"])
 def test_accepted_without_a_reply(running, line):
+    running.log.wait(r"^Unable to update cluster information\.$")  # the last error of the start
     before = running.log.mark()
     assert STATUS.fullmatch(running.send(line))
     assert not running.log.lines(after=before, level=Level.ERROR)

@@ -1,11 +1,17 @@
 """The preferences: each failure's message and level, and changes while the daemon runs."""
 import base64
+import errno
+import os
 import plistlib
+import re
+import resource
 
 import pytest
-from harness.agent import DEFAULTS, PREFERENCES, SERVER_UUID
+from harness.agent import DEFAULTS, PREFERENCES, SECRET, SERVER_UUID
+from harness.commands import exchange
 from harness.log_reader import Level
-from harness.waiting import wait_until
+from harness.tunnel_server import TunnelServer
+from harness.waiting import let_pass, wait_until
 
 UNBOUND = (Level.ERROR, "lmxagentd cannot run in agent mode without being bound to a Lumex server.")
 INVALID_CONTINUOUS = (Level.CRITICAL, "Continuous capture is enabled, but the preferences are invalid.")
@@ -76,19 +82,30 @@ def test_broken_preferences(agent, case):
         assert [l for l in agent.log.lines(level=level) if text in l.text], (text, agent.report())
 
 
-@pytest.mark.parametrize("size", [15, 17, 0])
-def test_a_secret_of_the_wrong_size_fails_in_silence(agent, size):
-    agent.secret(base64.b64encode(bytes(size)).decode())
-    agent.start(wait=False)
-    disabled(agent)
-    assert not agent.log.lines("secret|bound")
+UNUSABLE = {
+    **{f"{size} bytes": (base64.b64encode(bytes(size)).decode(), f'"lmx_secret" has {size} bytes instead of 16')
+       for size in (15, 17, 0)},
+    "no Base64": ("*** no base64 ***", '"lmx_secret" is not Base64 text'),
+}
 
 
-def test_a_secret_that_is_no_base64_fails_in_silence(agent):
-    agent.secret("*** no base64 ***")
+@pytest.mark.parametrize("case", UNUSABLE)
+def test_a_secret_that_cannot_be_used_is_named(agent, case):
+    text, reason = UNUSABLE[case]
+    agent.secret(text)
     agent.start(wait=False)
     disabled(agent)
-    assert not agent.log.lines("secret|bound")
+    lines = [line.text for line in agent.log.lines("secret|bound", level=Level.ERROR)]
+    assert lines == [f'The shared secret in "/var/lmx/agent/secrets/{SERVER_UUID}.plist" can\'t be used: {reason}']
+    assert not text or not agent.log.lines(re.escape(text)), "it is never quoted"
+
+
+def test_a_pasted_secret_may_have_white_space_around_it(agent):
+    agent.secret(f"  {base64.b64encode(SECRET).decode()}\n")
+    with TunnelServer(agent.prepare()) as server:
+        agent.start()
+        server.accept()
+        assert server.command("STOP") == "cmdStatus=0"
 
 
 def test_a_missing_secret(agent):
@@ -162,6 +179,73 @@ def test_a_deleted_file_disables_the_service(running):
     disabled_after_change(running)
     assert len(running.log.lines("^The agent preferences file has been deleted$", level=Level.CRITICAL)) == 1
     assert [l for l in running.log.lines(level=Level.ERROR) if l.text == UNBOUND[1]]
+
+
+def unreadable(path, number):
+    return (f'^The settings file "{re.escape(path)}" can\'t be read at present: {os.strerror(number)} '
+            rf"\(errno {number}\)$")
+
+
+WITHOUT_OVERRIDE = ["setpriv", "--bounding-set=-dac_override,-dac_read_search",
+                    "--inh-caps=-dac_override,-dac_read_search", "--"]
+
+
+def test_preferences_that_may_not_be_read_leave_the_settings_as_they_are(agent):
+    """Runs without the capabilities that would let root read them all the same."""
+    agent.start(prefix=WITHOUT_OVERRIDE)
+    path = agent.path(PREFERENCES)
+    new = path.with_suffix(".tmp")
+    new.write_bytes(plistlib.dumps({**DEFAULTS, "CameraName": "Hall 4"}))
+    new.chmod(0)
+    new.rename(path)
+    agent.log.wait(unreadable(PREFERENCES, errno.EACCES), level=Level.ERROR)
+    assert profile(agent) == "Hall 3"
+    agent.record("A", seconds=2)
+    agent.wait_tool_call("A")
+    assert len(agent.log.lines("can't be read at present")) == 1, "not once for each look at the file"
+    path.chmod(0o644)
+    wait_until(lambda: profile(agent) == "Hall 4", what="the new name")
+    agent.log.wait(f'^The settings file "{PREFERENCES}" can be read again$', level=Level.NOTICE)
+    assert not agent.log.lines("Disabling")
+
+
+def test_no_free_descriptor_leaves_the_settings_as_they_are(running):
+    running.record("A")
+    running.wait_tool_call("A", event="end")
+    running.log.wait(r"^Unable to update cluster information\.$")  # now the start and the libraries are done
+    pid = running.sandbox.daemon_pid
+    with running.connect() as peer:  # made while there are descriptors
+        assert ",CameraName=Hall 3," in exchange(peer, "STATUS include_profile=true").text
+        limits = resource.prlimit(pid, resource.RLIMIT_NOFILE)
+        resource.prlimit(pid, resource.RLIMIT_NOFILE, (3, limits[1]))
+        running.preferences(CameraName="Hall 4")
+        running.log.wait(unreadable(PREFERENCES, errno.EMFILE), level=Level.ERROR)
+        mark = running.log.mark()
+        let_pass(1, "the daemon looks four times a second")
+        assert not running.log.lines("read", after=mark), running.report()
+        resource.prlimit(pid, resource.RLIMIT_NOFILE, limits)
+        wait_until(lambda: ",CameraName=Hall 4," in exchange(peer, "STATUS include_profile=true").text,
+                   what="the new name")
+    assert len(running.log.lines("can be read again", level=Level.NOTICE)) == 1
+    assert not running.log.lines("Disabling")
+
+
+@pytest.mark.parametrize("path", [PREFERENCES, f"/var/lmx/agent/secrets/{SERVER_UUID}.plist"])
+def test_a_start_that_may_not_read_its_settings_ends_without_disabling_the_service(agent, path):
+    agent.path(path).chmod(0)
+    agent.start(wait=False, prefix=WITHOUT_OVERRIDE)
+    assert agent.wait_exit() == 1
+    agent.log.wait(unreadable(path, errno.EACCES), level=Level.ERROR)
+    agent.log.wait("^Internal error caused application to stop$", level=Level.CRITICAL)
+    assert not agent.log.lines("Disabling|Removing|bound")
+
+
+def test_a_directory_in_place_of_the_preferences_disables_the_service(agent):
+    agent.path(PREFERENCES).unlink()
+    agent.path(PREFERENCES).mkdir()
+    agent.start(wait=False)
+    disabled(agent)
+    assert [l for l in agent.log.lines("not a regular file") if l.level <= Level.ERROR], agent.report()
 
 
 def disabled_after_change(agent):

@@ -38,6 +38,7 @@ def test_a_recording_of_ten_seconds(running):
     times = movie.frame_times(path)
     assert all(abs(b - a - 1 / FPS) < 0.002 for a, b in zip(times, times[1:]))
     check_document(running.document("TALK-1"), start, stop, seconds)
+    assert path.with_suffix(".xml").stat().st_mode & 0o777 == 0o600, "documents may hold a password"
 
 
 def check_document(document, start, stop, seconds):

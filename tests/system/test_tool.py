@@ -114,4 +114,6 @@ def test_recordings_of_an_input_file(agent):
     assert agent.repository() == ["FILE.mov", "FILE.xml"]
     assert agent.movie("FILE").read_bytes() == b"a movie of its own"
     assert agent.document("FILE")["RecordingMetadata_TYPE"] == "File"
+    for document in (agent.movie("FILE").with_suffix(".xml"), agent.path("/var/lmx/agent/input.xml")):
+        assert document.stat().st_mode & 0o777 == 0o600, f"{document} may hold a password"
     assert agent.path("/var/lmx/agent/input.mov").exists()

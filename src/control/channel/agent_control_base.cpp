@@ -3,11 +3,13 @@
 
 #include <sys/socket.h>
 
+#include <algorithm>
 #include <array>
 #include <cerrno>
 #include <chrono>
 #include <exception>
 #include <utility>
+#include <vector>
 
 #include "control/channel/back_off.h"
 #include "control/protocol/command_text.h"
@@ -21,6 +23,16 @@ using namespace std::chrono_literals;
 namespace {
 
 constexpr auto kReceiveWait = 2s;
+
+/// One command or reply that can't be dealt with must not cost the channel.
+template <class Work>
+void runGuarded(const ChannelContext& context, const Work& work) {
+  try {
+    work();
+  } catch (const std::exception& problem) {
+    LMPLogMessage(context.log(), kLogCritical, "Internal error occurred: %s", problem.what());
+  }
+}
 
 }  // namespace
 
@@ -43,7 +55,8 @@ bool AgentControlBase::initWithAgentContext() {
   const auto announce = [this] {
     LMPLogMessage(context_.log(), kLogNotice, "Control module started with success");
   };
-  if (thread_.canBeStopped() && thread_.start([this] { runSafely(); }, announce)) return true;
+  if (thread_.canBeStopped() && outbox_.usable() && thread_.start([this] { runSafely(); }, announce))
+    return true;
   LMPLogMessage(context_.log(), kLogError, "Control module cannot be started");
   return false;
 }
@@ -81,50 +94,60 @@ int AgentControlBase::run() {
 bool AgentControlBase::connectWithBackOff() {
   for (auto delay = kFirstBackOff; sockets_.current() == -1;) {
     if (!running()) return false;
-    if (connect() != 1) continue;
-    context_.logInfo(string_with_format("Failed to connect to server, retrying in %d seconds.",
-                                        static_cast<int>(delay.count())));
-    // A stop ends the sleep at once.
-    if (running()) clock_.sleep(delay, wakeDescriptor(), sockets_.previousIfAlive());
-    if (takeBackPreviousPeer()) break;
-    delay = nextBackOff(delay);
+    if (connect() == 1) {
+      context_.logInfo(string_with_format("Failed to connect to server, retrying in %d seconds.",
+                                          static_cast<int>(delay.count())));
+      // A stop ends the sleep at once.
+      if (running()) clock_.sleep(delay, wakeDescriptor(), sockets_.previousIfAlive());
+      delay = nextBackOff(delay);
+    }
+    if (sockets_.current() == -1) takeBackPreviousPeer();
   }
   return true;
 }
 
 /// Gives the previous peer its place again if it has said something: one that lost it to a change of the
 /// network, or to ten minutes without a command, knows nothing of that, and its STOP must not be lost.
-/// @return whether it has
-bool AgentControlBase::takeBackPreviousPeer() {
-  if (!sockets_.previousSpeaks()) return false;
-  previousPeerSpeaks();
+void AgentControlBase::takeBackPreviousPeer() {
+  if (!sockets_.previousSpeaks()) return;
   context_.logDebug("The previous peer speaks again");
   sockets_.restorePrevious();
-  return true;
 }
 
 void AgentControlBase::receiveUntilGone() {
   peer_has_gone_ = false;
-  while (running()) {
-    if (reconnect_reasons_.mustReconnect()) return;
-    if (!waitForPacket()) {
-      peer_has_gone_ = true;
-      return;
-    }
+  while (running() && !peer_has_gone_) {
+    if (reconnect_reasons_.mustReconnect()) break;
+    peer_has_gone_ = !waitForPacket();
   }
+  flushReplies();  // what was given before the end is still this peer's
 }
 
 /// @return false when the connection is gone.
 bool AgentControlBase::waitForPacket() {
   const int socket = sockets_.current();
   if (socket == -1) return false;
-  auto readiness = awaitReadable(socket, wakeDescriptor(), kReceiveWait);
-  while (readiness == Readiness::interrupted && running()) {
-    clock_.sleep(1ms, wakeDescriptor());
-    readiness = awaitReadable(socket, wakeDescriptor(), kReceiveWait);
+  std::vector<int> others{outbox_.descriptor()};
+  std::chrono::milliseconds limit = kReceiveWait;
+  if (const auto* acceptor = peerAcceptor()) limit = std::min(limit, acceptor->addOthers(others));
+  auto readiness = awaitReadable(socket, wakeDescriptor(), limit, others);
+  if (readiness == Readiness::interrupted) clock_.sleep(1ms, wakeDescriptor());
+  if (readiness == Readiness::otherReadable) {
+    flushReplies();
+    readiness = somebodySpeaks() ? Readiness::readable : Readiness::timedOut;
   }
-  if (readiness == Readiness::readable && running()) return receivePacket(socket);
+  if (readiness == Readiness::readable && running()) return receivePacket(sockets_.current());
   return readiness != Readiness::badDescriptor;
+}
+
+/// Whether the present peer is to be read, which may be another one now. Of several that talk each has its
+/// turn: who is set aside for another stands behind all others that were.
+bool AgentControlBase::somebodySpeaks() {
+  PeerAcceptor* const acceptor = peerAcceptor();
+  if (acceptor != nullptr && acceptor->takeSpeaking()) return true;
+  if (isReadable(sockets_.current())) return true;
+  if (acceptor != nullptr) acceptor->takeWaiting();
+  return false;
 }
 
 bool AgentControlBase::receivePacket(int socket) {
@@ -132,12 +155,13 @@ bool AgentControlBase::receivePacket(int socket) {
   const ssize_t received = ::recv(socket, buffer.data(), buffer.size(), MSG_DONTWAIT);
   if (received == 0) return connected();
   if (received < 0) return errno != EBADF && errno != ECONNRESET && errno != ETIMEDOUT;
+  if (auto* acceptor = peerAcceptor()) acceptor->heard();
   packetReceived(buffer.data(), static_cast<std::uint32_t>(received));
   return true;
 }
 
 void AgentControlBase::packetReceived(const char* bytes, std::uint32_t size) {
-  try {
+  runGuarded(context_, [&] {
     const auto result = partial_command_.feed(std::string_view(bytes, size));
     if (result.appended) LMPLogMessage(context_.log(), kLogDebug, "Appending to existing partial command");
     if (result.dropped) {
@@ -147,20 +171,48 @@ void AgentControlBase::packetReceived(const char* bytes, std::uint32_t size) {
     if (!result.line) return;
     if (const auto text = commandFromReceivedData(*result.line))
       dispatcher_.execute(std::string(trimLineBreaks(*text)), !requiresAuthentication());
-  } catch (const std::exception& problem) {
-    // One command that can't be executed must not cost the channel.
-    LMPLogMessage(context_.log(), kLogCritical, "Internal error occurred: %s", problem.what());
+  });
+}
+
+void AgentControlBase::sendReply(const std::string& reply) {
+  const auto connection = sockets_.replyTarget();
+  if (connection == 0) return logNobodyToReplyTo(reply);
+  if (thread_.isCurrent()) {
+    deliver(reply);
+  } else if (!outbox_.push({reply, connection})) {
+    context_.logDebug("Too many replies wait for the peer, one is dropped: " + reply);
   }
+}
+
+void AgentControlBase::logNobodyToReplyTo(const std::string& reply) const {
+  context_.logDebug("Nobody to send the reply to: " + reply);
+}
+
+/// Sends what other threads have answered. A peer that takes no more loses the rest: each reply might keep
+/// the thread for the whole limit.
+void AgentControlBase::flushReplies() {
+  bool taken = true;
+  for (const auto& [reply, connection] : outbox_.takeAll()) {
+    if (taken && connection == sockets_.replyTarget()) {
+      runGuarded(context_, [&, &text = reply] { taken = deliver(text); });
+    } else {
+      context_.logDebug("Reply dropped because its peer has gone or does not read: " + reply);
+    }
+  }
+}
+
+void AgentControlBase::askToStop() {
+  if (const auto context = context_.get(); context && !stop_announced_.exchange(true))
+    LMPLogMessage(context->log_context(), kLogNotice, "Control module is stopping...");
+  thread_.askToStop();
 }
 
 void AgentControlBase::stop() {
   askToStop();
-  const auto context = context_.get();
-  if (!context) {  // the channel has stopped itself before
+  if (!context_.get()) {  // the channel has stopped itself before
     if (!thread_.isCurrent()) thread_.waitUntilEnded();
     return;
   }
-  LMPLogMessage(context->log_context(), kLogNotice, "Control module is stopping...");
   if (!thread_.isCurrent() && thread_.waitUntilEnded()) {
     sockets_.closeAll();  // a peer that still saw the old connection open would count two channels after a
                           // restart

@@ -1,5 +1,6 @@
 // What the control channels share: one connection at a time, and the commands that come over it.
 #pragma once
+#include <atomic>
 #include <cstdint>
 #include <memory>
 #include <optional>
@@ -9,6 +10,8 @@
 #include "control/channel/channel_clock.h"
 #include "control/channel/channel_thread.h"
 #include "control/channel/command_dispatcher.h"
+#include "control/channel/outbox.h"
+#include "control/channel/peer_acceptor.h"
 #include "control/channel/peer_sockets.h"
 #include "control/channel/reconnect_reasons.h"
 #include "control/handlers/channel_context.h"
@@ -41,8 +44,8 @@ class AgentControlBase : private ReplySink {
   /// a command finishes it first. Such a command may wait for the main thread: a caller on the main thread
   /// uses askToStop() and keeps its loop turning until threadHasEnded(), or both wait for ever.
   void stop();
-  /// The part of stop() that never waits.
-  void askToStop() { thread_.askToStop(); }
+  /// The part of stop() that never waits. Logged, once.
+  void askToStop();
   [[nodiscard]] bool threadHasEnded() const { return thread_.hasEnded(); }
 
   /// Asks to be told when the network changes: the connection is then made anew a second later. Main thread.
@@ -51,10 +54,6 @@ class AgentControlBase : private ReplySink {
 
   /// Whether the current connection's peer is still there.
   [[nodiscard]] bool connected() const { return sockets_.connected(); }
-  /// Close the current, respectively the previous, connection. Of two callers one wins and closes.
-  void disconnect();
-  void disconnectOld();
-
   /// One chunk from the peer: executes the line that it ends, if any. Channel thread.
   void packetReceived(const char* bytes, std::uint32_t size);
 
@@ -73,16 +72,33 @@ class AgentControlBase : private ReplySink {
   virtual int connect() = 0;
   /// Turns one raw line into command text; nothing: the line is ignored.
   virtual std::optional<std::string> commandFromReceivedData(const std::string& line) = 0;
+  /// Sends `reply` to the present peer, which is greeted. Channel thread.
+  /// @return false when the peer takes no more (logged)
+  virtual bool deliver(const std::string& reply) = 0;
+  /// A reply was given while there was no peer to send it to: logs that. Any thread.
+  virtual void logNobodyToReplyTo(const std::string& reply) const;
+  /// On the channel's own thread: delivers `reply` at once. On any other: leaves it to that thread, for the
+  /// connection that is the present one now, and never waits.
+  void sendReply(const std::string& reply) override;
   /// Whether every command but USERAUTH is to be refused.
   [[nodiscard]] virtual bool requiresAuthentication() const { return false; }
-  /// The connection before is about to have its place again. Channel thread.
-  virtual void previousPeerSpeaks() {}
+  /// A listening channel's, else null. Channel thread.
+  virtual PeerAcceptor* peerAcceptor() { return nullptr; }
   /// The thread's body: connect, receive, reconnect. @return 0, or -1 when the channel could not be set up.
   virtual int run();
 
+  /// Close the current, respectively the previous, connection (logged even when there is none). Channel
+  /// thread, or when there is none.
+  void disconnect();
+  void disconnectOld();
+  /// Ends the channel's thread behind the command that it executes. Channel thread.
+  void endAfterThisCommand() { thread_.askToStop(); }
+
   [[nodiscard]] const ChannelContext& context() const { return context_; }
   [[nodiscard]] PeerSockets& sockets() { return sockets_; }
-  [[nodiscard]] ChannelClock& clock() { return clock_; }
+  [[nodiscard]] ChannelClock& clock() const { return clock_; }
+  /// What the present peer has left unfinished. Channel thread.
+  [[nodiscard]] LineAssembler& partialCommand() { return partial_command_; }
   /// Whether it was the peer that ended the last connection. Channel thread.
   [[nodiscard]] bool peerHasGone() const { return peer_has_gone_; }
   [[nodiscard]] bool running() const { return thread_.running(); }
@@ -92,9 +108,11 @@ class AgentControlBase : private ReplySink {
  private:
   void runSafely() noexcept;
   bool connectWithBackOff();
-  bool takeBackPreviousPeer();
+  void takeBackPreviousPeer();
   void receiveUntilGone();
   bool waitForPacket();
+  bool somebodySpeaks();
+  void flushReplies();
   bool receivePacket(int socket);
 
   ChannelContext context_;
@@ -104,6 +122,8 @@ class AgentControlBase : private ReplySink {
   CommandHandlers handlers_;
   CommandDispatcher dispatcher_;
   ReconnectReasons reconnect_reasons_;
+  Outbox outbox_;
+  std::atomic<bool> stop_announced_{false};
   LineAssembler partial_command_;  // channel thread only, as the next
   bool peer_has_gone_ = false;
   std::unique_ptr<RunLoop::Source> network_watch_;  // main thread only

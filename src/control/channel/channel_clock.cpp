@@ -11,6 +11,7 @@ namespace {
 class SystemChannelClock final : public ChannelClock {
  public:
   std::optional<TimeValue> now() override { return lmp_gettimeofday(); }
+  std::chrono::steady_clock::time_point steadyNow() override { return std::chrono::steady_clock::now(); }
   void sleep(std::chrono::milliseconds span, int wake, int other) override {
     std::array<pollfd, 2> waited{{{wake, POLLIN, 0}, {other, POLLIN, 0}}};
     // A signal may end the sleep early: the callers look at their own condition again.

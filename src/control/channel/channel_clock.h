@@ -13,6 +13,8 @@ class ChannelClock {
   virtual ~ChannelClock() = default;
   /// Wall clock; absent when it can't be read.
   virtual std::optional<TimeValue> now() = 0;
+  /// For spans of time: setting the wall clock doesn't move it.
+  virtual std::chrono::steady_clock::time_point steadyNow() = 0;
   /// Sleeps for `span`, less when descriptor `wake` or `other` becomes readable (negative: none).
   virtual void sleep(std::chrono::milliseconds span, int wake, int other = -1) = 0;
 };

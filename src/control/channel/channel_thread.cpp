@@ -5,7 +5,7 @@
 #include <unistd.h>
 
 #include <cstdint>
-#include <system_error>
+#include <exception>
 #include <utility>
 
 namespace lmx {
@@ -25,7 +25,7 @@ bool ChannelThread::start(std::function<void()> body, const std::function<void()
     ended_ = false;
     try {
       thread_ = std::thread([this, body = std::move(body)] { live(body); });
-    } catch (const std::system_error&) {
+    } catch (const std::exception&) {  // no thread to be had, or no memory
       running_ = false;
       ended_ = true;
       return false;

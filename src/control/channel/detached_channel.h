@@ -19,9 +19,7 @@ class DetachedChannel final : public AgentControlBase {
  protected:
   int connect() override { return 1; }
   std::optional<std::string> commandFromReceivedData(const std::string&) override { return std::nullopt; }
-  void sendReply(const std::string& reply) override {
-    context().logDebug("Nobody to send the reply to: " + reply);
-  }
+  bool deliver(const std::string&) override { return false; }
 };
 
 }  // namespace lmx

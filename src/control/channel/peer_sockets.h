@@ -1,51 +1,63 @@
 // The sockets of the present peer and of the one before it.
 #pragma once
-#include <atomic>
+#include <cstdint>
 #include <mutex>
+
+#include "support/unique_fd.h"
 
 namespace lmx {
 
+/// One connection to a peer.
+struct PeerConnection {
+  UniqueFd socket;
+  std::uint64_t number = 0;  ///< of no other connection of this channel; 0: there is none
+  bool greeted = false;      ///< the peer may be sent replies
+};
+
+/// Whether a connection may carry replies from its beginning.
+enum class Greeting { none, comesFirst };
+
 /// Owns both. The previous peer's stays open until the next connection is made: its peer may not know that it
-/// has lost its place. Thread-safe. "No socket" is -1.
+/// has lost its place. "No socket" is -1. Only the channel's thread, while there is one, changes what is here
+/// and uses the descriptors; connected() and replyTarget() are thread-safe and never meet a closed one.
 class PeerSockets {
  public:
-  PeerSockets() = default;
-  ~PeerSockets() { closeAll(); }
-  PeerSockets(const PeerSockets&) = delete;
-  PeerSockets& operator=(const PeerSockets&) = delete;
-
-  /// Held while a reply is sent: timed commands answer from the main thread, and their socket must not be
-  /// closed, and its number reused, meanwhile.
-  [[nodiscard]] std::mutex& sendMutex() { return send_mutex_; }
-
-  [[nodiscard]] int current() const { return current_; }
-  [[nodiscard]] int previous() const { return previous_; }
+  [[nodiscard]] int current() const;
+  [[nodiscard]] int previous() const;
   /// Whether the present peer is still there.
   [[nodiscard]] bool connected() const;
+  /// The number of the present connection if it may carry replies, else 0.
+  [[nodiscard]] std::uint64_t replyTarget() const;
 
-  /// Makes `socket` the present peer's. There must be none.
-  void setCurrent(int socket) { current_ = socket; }
-  /// The present peer becomes the previous one. There must be no other.
-  void retireCurrent() { previous_ = current_.exchange(-1); }
+  /// Makes `socket` the present peer's, in the place of any other.
+  /// @param greeting  comesFirst: no replies before setGreeted()
+  void setCurrent(UniqueFd socket, Greeting greeting = Greeting::none);
+  void setGreeted();
+  /// The present peer becomes the previous one, in the place of any other.
+  void retireCurrent();
+  /// Takes the present, respectively the previous, peer away, for restore() to bring it back later.
+  [[nodiscard]] PeerConnection takeCurrent();
+  [[nodiscard]] PeerConnection takePrevious();
+  void restore(PeerConnection connection);
 
   /// The previous peer's socket if that may still say something, else -1.
   [[nodiscard]] int previousIfAlive() const;
   /// Whether the previous peer has said something.
   [[nodiscard]] bool previousSpeaks() const;
-  /// Gives the previous peer its place again. The present peer must have none.
-  void restorePrevious() { current_ = previous_.exchange(-1); }
+  /// Gives the previous peer its place again.
+  void restorePrevious();
 
-  // Of two callers one wins and closes.
-  void closeCurrent() { close(current_); }
-  void closePrevious() { close(previous_); }
+  void closeCurrent();
+  void closePrevious();
   void closeAll();
 
  private:
-  void close(std::atomic<int>& socket);
+  void exchange(PeerConnection& place, PeerConnection connection);
 
-  std::mutex send_mutex_;
-  std::atomic<int> current_{-1};
-  std::atomic<int> previous_{-1};
+  mutable std::mutex mutex_;  // guards all that follow; held for moments only
+  PeerConnection current_;
+  PeerConnection previous_;
+  std::uint64_t last_number_ = 0;
 };
 
 }  // namespace lmx

@@ -1,18 +1,10 @@
 // Commands and replies as plain text.
 #include "control/channel/plain_text.h"
 
-#include <chrono>
-
-#include "control/protocol/reply.h"
 #include "platform/net/socket_io.h"
 #include "support/utf8.h"
 
 namespace lmx {
-namespace {
-
-constexpr std::chrono::seconds kReplyPatience{5};
-
-}  // namespace
 
 std::optional<std::string> plainCommand(const std::string& line, LMPLogContext log) {
   if (isUtf8(line)) return line;
@@ -21,7 +13,7 @@ std::optional<std::string> plainCommand(const std::string& line, LMPLogContext l
 }
 
 int sendPlainReply(int socket, std::string_view reply, int wake) {
-  return sendWhole(socket, replyBytes(reply), kReplyPatience, wake);
+  return sendWhole(socket, reply, kReplyLimit, wake);
 }
 
 }  // namespace lmx

@@ -26,13 +26,18 @@ void RecordingCommands::handleSTART(const Dictionary* parameters) {
 void RecordingCommands::handleSTOP(const Dictionary*) {
   const auto session = context_.session();
   if (!session) return reply(CommandError::noSession);
-  const auto capture = session->captureController.get();
-  if (capture) {
-    const std::string request = session->request.get().uuid;
+  const std::string request = session->addressedRequest();
+  const bool preparing = request != session->request.get().uuid;
+  auto capture = session->captureController.get();
+  if (capture && !preparing) {
     capture->setStopWithUUID(request, shiftedReferenceTime());
     capture->submitRequestWithUUID(request);
   }
-  performOnMain(&AgentActions::stopRecording, Wait::no);
+  performFor(request, &AgentActions::stopRecording, preparing ? Wait::untilDone : Wait::no);
+  if (preparing) {
+    capture = session->captureController.get();
+    if (capture) capture->submitRequestWithUUID(request);
+  }
   if (capture) syncMarks(capture);
   reply(CommandError::none);
 }
@@ -52,34 +57,36 @@ void RecordingCommands::syncMarks(const std::shared_ptr<LMRCaptureController>& c
 void RecordingCommands::handlePAUSE(const Dictionary*) {
   const auto session = context_.session();
   if (!session) return reply(CommandError::noSession);
+  const std::string request = session->addressedRequest();
   if (const auto capture = session->captureController.get())
-    capture->setStopWithUUID(session->request.get().uuid, shiftedReferenceTime());
-  if (!continuous()) performOnMain(&AgentActions::pauseCapture, Wait::untilDone);
+    capture->setStopWithUUID(request, shiftedReferenceTime());
+  if (!continuous()) performFor(request, &AgentActions::pauseCapture, Wait::untilDone);
   reply(CommandError::none);
 }
 
 void RecordingCommands::handleRESUME(const Dictionary*) {
   const auto session = context_.session();
   if (!session) return reply(CommandError::noSession);
-  if (!continuous()) performOnMain(&AgentActions::resumeCapture, Wait::untilDone);
-  if (const auto capture = session->captureController.get()) {
-    const RecordingRequest request = session->request.get();
+  const std::string addressed = session->addressedRequest();
+  if (!continuous()) performFor(addressed, &AgentActions::resumeCapture, Wait::untilDone);
+  const RecordingRequest request = session->request.get();
+  const auto capture = session->captureController.get();
+  if (capture && request.uuid == addressed)
     capture->setStartWithUUID(request.uuid, shiftedReferenceTime(), request.properties);
-  }
   reply(CommandError::none);
 }
 
 void RecordingCommands::handleCANCEL(const Dictionary*) {
   const auto session = context_.session();
   if (!session) return reply(CommandError::noSession);
-  if (const auto capture = session->captureController.get())
-    capture->cancelRequestWithUUID(session->request.get().uuid);
-  if (!continuous()) performOnMain(&AgentActions::cancelCapture, Wait::no);
+  const std::string request = session->addressedRequest();
+  if (const auto capture = session->captureController.get()) capture->cancelRequestWithUUID(request);
+  if (!continuous()) performFor(request, &AgentActions::cancelRecording, Wait::no);
   reply(CommandError::none);
 }
 
-bool RecordingCommands::performOnMain(AgentActions::Action action, Wait wait) {
-  return actions_ != nullptr && actions_->perform(action, wait);
+void RecordingCommands::performFor(const std::string& request, AgentActions::Action action, Wait wait) {
+  if (actions_ != nullptr) actions_->performFor(request, action, wait);
 }
 
 bool RecordingCommands::continuous() const {

@@ -34,7 +34,7 @@ class RecordingCommands {
   void handleCANCEL(const Dictionary* parameters);
 
  private:
-  bool performOnMain(AgentActions::Action action, Wait wait);
+  void performFor(const std::string& request, AgentActions::Action action, Wait wait);
   void syncMarks(const std::shared_ptr<LMRCaptureController>& capture) const;
   [[nodiscard]] bool continuous() const;
   [[nodiscard]] double shiftedReferenceTime() const;

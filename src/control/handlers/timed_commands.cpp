@@ -11,6 +11,7 @@
 #include "platform/identifiers.h"
 #include "platform/paths.h"
 #include "support/date_text.h"
+#include "support/format.h"
 
 namespace lmx {
 namespace {
@@ -59,9 +60,9 @@ std::string TimedCommands::timerListReply() const {
 /// @return whether it was added to the list
 bool TimedCommands::scheduleCommand(const Dictionary* parameters, Origin origin) {
   const auto date = dateFromText(lookUp(parameters, "time").value_or(""));
-  const std::string command = lookUp(parameters, "command").value_or("(null)");
+  const std::string command = textOrNull(lookUp(parameters, "command"));
   const std::time_t now = std::time(nullptr);
-  const std::string when = dateText(date.value_or(now)).value_or("?");
+  const std::string when = textOrNull(dateText(date.value_or(now)));
   if (date && *date <= now) {
     context_.logInfo("Not scheduling " + command + " command. The timer has expired: " + when);
     reply(CommandError::missingParameter);
@@ -97,7 +98,7 @@ void TimedCommands::completeTimedCommand(const SharedDictionary& entry) {
     context_.logInfo("Not running deferred command");
     return reply(CommandError::timerRevoked);
   }
-  const std::string command = lookUp(entry, "command").value_or("");
+  const std::string command = textOrNull(lookUp(entry, "command"));
   context_.logInfo("Running deferred command: " + command);
   writeTimerListToDisk();
   if (const auto* handler = verbs_.handlerForVerb(command)) (*handler)(entry.get());

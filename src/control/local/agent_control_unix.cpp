@@ -31,14 +31,21 @@ void AgentControlUnix::cleanup() {
 }
 
 int AgentControlUnix::run() {
+  // Nobody listens behind this function, however it is left.
+  const struct AtEnd {
+    AgentControlUnix& channel;
+    ~AtEnd() {
+      channel.acceptor_.close();
+      channel.localDomainSocket_.reset();
+      channel.cleanup();
+    }
+  } at_end{*this};
   const int listening = localConnect();
   if (listening != 0 && running()) {
     LMPLogMessage(context().log(), kLogError, "The local control socket %s could not be set up: %s",
                   systemPath(kLocalSocket).c_str(), std::strerror(listening));
   }
-  const int result = listening == 0 ? AgentControlBase::run() : -1;
-  localDomainSocket_.reset();
-  return result;
+  return listening == 0 ? AgentControlBase::run() : -1;
 }
 
 /// Sets up the listener and waits for the first peer. @return 0, or the errno of the set-up.
@@ -58,6 +65,7 @@ int AgentControlUnix::localConnect() {
     return errno;
   socket_path_.set(path);
   if (::listen(localDomainSocket_.get(), kBacklog) != 0) return errno;
+  acceptor_.listenOn(localDomainSocket_.get());
   localAccept();  // a peer that could not be taken on is the next turn's business
   return 0;
 }
@@ -66,10 +74,13 @@ std::optional<std::string> AgentControlUnix::commandFromReceivedData(const std::
   return plainCommand(line, context().log());
 }
 
-void AgentControlUnix::sendReply(const std::string& reply) {
-  const std::lock_guard lock(sockets().sendMutex());
+bool AgentControlUnix::deliver(const std::string& reply) {
   const int error = sendPlainReply(sockets().current(), reply, wakeDescriptor());
-  if (error != 0) context().logDebug(string_with_format("Could not answer to tunnel (errno = %d)", error));
+  if (error == 0) return true;
+  context().logDebug(string_with_format("Could not answer to tunnel (errno = %d)", error));
+  // Half a reply would garble the next, and each might keep the others waiting for as long.
+  if (error == ETIMEDOUT) ::shutdown(sockets().current(), SHUT_RDWR);
+  return false;
 }
 
 }  // namespace lmx

@@ -1,5 +1,6 @@
 // The local control socket: commands of local tools, in plain text, from one peer at a time.
 #pragma once
+#include <chrono>
 #include <memory>
 #include <optional>
 #include <string>
@@ -12,8 +13,11 @@
 
 namespace lmx {
 
-/// Listens on "/var/run/lmxagentd.comm". Peers queue up until the one before them has closed. A listener that
-/// can't be set up leaves the channel in place without a thread to serve it.
+/// How long nobody on the local socket has said anything when a peer that waits is taken on all the same.
+inline constexpr std::chrono::seconds kSilenceBeforeTheNext{10};
+
+/// Listens on "/var/run/lmxagentd.comm". Peers queue up until the one before them has closed, or says nothing
+/// for long. A listener that can't be set up leaves the channel in place without a thread to serve it.
 class AgentControlUnix final : public AgentControlBase {
  public:
   AgentControlUnix(std::shared_ptr<AgentContext> context, AgentActions* actions,
@@ -28,14 +32,16 @@ class AgentControlUnix final : public AgentControlBase {
  protected:
   int run() override;
   int connect() override { return localAccept(); }
+  PeerAcceptor* peerAcceptor() override { return &acceptor_; }
   std::optional<std::string> commandFromReceivedData(const std::string& line) override;
-  void sendReply(const std::string& reply) override;
+  bool deliver(const std::string& reply) override;
 
  private:
   int localConnect();
-  int localAccept() { return acceptor_.acceptPeer(localDomainSocket_.get()); }
+  int localAccept() { return acceptor_.acceptPeer(); }
 
-  PeerAcceptor acceptor_{context(), sockets(), clock(), wakeDescriptor()};
+  PeerAcceptor acceptor_{{context(), sockets(), partialCommand(), clock(), wakeDescriptor()},
+                         kSilenceBeforeTheNext};
   UniqueFd localDomainSocket_;            // channel thread only
   SharedValue<std::string> socket_path_;  // empty while no file of ours is there
 };

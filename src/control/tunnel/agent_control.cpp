@@ -14,13 +14,13 @@
 
 #include "control/channel/back_off.h"
 #include "control/channel/plain_text.h"
-#include "control/protocol/reply.h"
 #include "control/tunnel/cluster_hosts.h"
 #include "control/tunnel/hello.h"
 #include "platform/net/connect_multiple.h"
 #include "platform/net/socket_io.h"
 #include "support/base64.h"
 #include "support/format.h"
+#include "support/unique_fd.h"
 
 namespace lmx {
 namespace {
@@ -28,8 +28,8 @@ namespace {
 constexpr const char* kRejected = "ERR Unbound agent";
 constexpr int kHelloNotSent = 24;
 constexpr int kNotConnected = 1;
-/// A server that takes nothing for so long has lost what we say.
-constexpr std::chrono::seconds kSendPatience{5};
+/// The hello fits into any buffer: a server that has not taken it after so long never will.
+constexpr std::chrono::seconds kHelloLimit{5};
 
 CipherBlock newVector() {
   CipherBlock vector{};
@@ -53,10 +53,10 @@ AgentControl::AgentControl(std::shared_ptr<AgentContext> context, AgentActions* 
 
 AgentControl::~AgentControl() { stop(); }
 
-/// A server that accepts and hangs up would otherwise be called ten thousand times a second.
+/// A server that accepts and hangs up, whatever it says in between, would otherwise be called hundreds of
+/// times a second.
 bool AgentControl::wasDroppedAtOnce() const {
-  return peerHasGone() && connected_at_ && !spoken_to_ &&
-         std::chrono::steady_clock::now() - *connected_at_ < kFirstBackOff;
+  return peerHasGone() && connected_at_ && clock().steadyNow() - *connected_at_ < kFirstBackOff;
 }
 
 /// Has the system find out that a silent server is gone: local commands count as contact too, so the
@@ -77,21 +77,19 @@ int AgentControl::connect() {
   if (!agent) return kNotConnected;
   if (wasDroppedAtOnce()) {
     connected_at_ = std::nullopt;
-    context().logDebug("The server has closed the last connection without a word");
+    context().logDebug("The server has closed the last connection within 5 seconds");
     return kNotConnected;
   }
-  const std::string port = agent->server.tunnel_port.get().value_or("");
-  context().logInfo("Connecting to lmxserverd tunnel at " +
-                    agent->server.tunnel_host.get().value_or("(null)") + ":" + port);
-  hello_sent_ = false;
+  context().logInfo("Connecting to lmxserverd tunnel at " + textOrNull(agent->server.tunnel_host.get()) +
+                    ":" + textOrNull(agent->server.tunnel_port.get()));
   disconnect();
   int socket = -1;
+  const std::string port = agent->server.tunnel_port.get().value_or("");
   const auto members = agent->server_info.get();
   if (lmp_connect_multiple(hostsToTry(members.get(), agent->server), port, &socket, wakeDescriptor()) == -1)
     return kNotConnected;
-  sockets().setCurrent(socket);
-  connected_at_ = std::chrono::steady_clock::now();
-  spoken_to_ = false;
+  sockets().setCurrent(UniqueFd(socket), Greeting::comesFirst);
+  connected_at_ = clock().steadyNow();
   watchPeer();
   logPeer(agent->server);
   if (sendAGENT() == 0) return 0;
@@ -109,8 +107,7 @@ void AgentControl::logPeer(const ServerSettings& server) {
     LMPLogMessage(context().log(), kLogInfo, "Connected to %s:%d", address, ntohs(peer.sin_port));
   } else {
     LMPLogMessage(context().log(), kLogInfo, "Connected to %s:%s",
-                  server.tunnel_host.get().value_or("").c_str(),
-                  server.tunnel_port.get().value_or("").c_str());
+                  textOrNull(server.tunnel_host.get()).c_str(), textOrNull(server.tunnel_port.get()).c_str());
   }
 }
 
@@ -123,10 +120,10 @@ int AgentControl::sendAGENT() {
   };
   const std::string vector = lmp_encode_base64(
       {reinterpret_cast<const char*>(initialization_vector_.data()), initialization_vector_.size()});
-  const int error = sendWhole(sockets().current(), hello(vector), kSendPatience, wakeDescriptor());
+  const int error = sendWhole(sockets().current(), hello(vector), kHelloLimit, wakeDescriptor());
   if (error != 0)
     context().logDebug(string_with_format("Could not send AGENT to tunnel (errno = %d)", error));
-  hello_sent_ = error == 0;
+  if (error == 0) sockets().setGreeted();
   agent->state.agent_sent_or_fail.set(true);
   context().logInfo("Sent: " + hello("*"));
   return error == 0 ? 0 : kHelloNotSent;
@@ -137,7 +134,6 @@ std::optional<std::string> AgentControl::commandFromReceivedData(const std::stri
   const auto secret = agent ? agent->server.shared_secret.get() : std::nullopt;
   if (secret) {
     const auto plaintext = agent_decrypt_message(initialization_vector_, *secret, line);
-    spoken_to_ = spoken_to_ || plaintext;
     if (plaintext) return plainCommand(messageIn(*plaintext), context().log());
   }
   // To the byte: a refusal in one piece still has its line feed and is taken for noise. Servers have come to
@@ -149,23 +145,26 @@ std::optional<std::string> AgentControl::commandFromReceivedData(const std::stri
 void AgentControl::serverRejected() {
   LMPLogMessage(context().log(), kLogWarning, "Server rejected agent connection, sleeping for one minute.");
   if (const auto agent = context().get()) agent->state.serverRejectTime.set(std::time(nullptr));
-  askToStop();
+  endAfterThisCommand();
 }
 
-void AgentControl::sendReply(const std::string& reply) {
+void AgentControl::logNobodyToReplyTo(const std::string& reply) const {
+  context().logDebug("No reply before the hello: " + reply);
+}
+
+bool AgentControl::deliver(const std::string& reply) {
   const auto agent = context().get();
   const auto secret = agent ? agent->server.shared_secret.get() : std::nullopt;
-  const std::lock_guard lock(sockets().sendMutex());
-  if (!hello_sent_) return context().logDebug("No reply before the hello: " + reply);
-  if (!secret) return;
-  const auto text = agent_encrypt_message(initialization_vector_, *secret,
-                                          agent_random_bytes(kRandomPrefix).append(replyBytes(reply)));
-  if (!text) return;
-  const int error = sendWhole(sockets().current(), *text + "\n", kSendPatience, wakeDescriptor());
-  if (error == 0) return;
+  if (!secret) return true;
+  const auto text =
+      agent_encrypt_message(initialization_vector_, *secret, agent_random_bytes(kRandomPrefix).append(reply));
+  if (!text) return true;
+  const int error = sendWhole(sockets().current(), *text + "\n", kReplyLimit, wakeDescriptor());
+  if (error == 0) return true;
   context().logDebug(string_with_format("Could not answer to tunnel (errno = %d)", error));
   // Half a line would garble the next reply: the connection is of no use any more.
   if (error == ETIMEDOUT) ::shutdown(sockets().current(), SHUT_RDWR);
+  return false;
 }
 
 }  // namespace lmx

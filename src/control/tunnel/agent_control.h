@@ -1,6 +1,5 @@
 // The server tunnel: we connect, say who we are in clear, then every line is encrypted.
 #pragma once
-#include <atomic>
 #include <chrono>
 #include <memory>
 #include <optional>
@@ -20,8 +19,8 @@ class AgentControl final : public AgentControlBase {
  protected:
   int connect() override;
   std::optional<std::string> commandFromReceivedData(const std::string& line) override;
-  void sendReply(const std::string& reply) override;
-  void previousPeerSpeaks() override { hello_sent_ = true; }  // on that connection, and with the same vector
+  bool deliver(const std::string& reply) override;
+  void logNobodyToReplyTo(const std::string& reply) const override;
 
  private:
   /// Announces the agent on the connection. @return 0; 24 when it could not be sent, 1 without a context.
@@ -32,10 +31,8 @@ class AgentControl final : public AgentControlBase {
   void serverRejected();
 
   const CipherBlock initialization_vector_;
-  std::atomic<bool> hello_sent_{false};
-  // Channel thread only:
-  std::optional<std::chrono::steady_clock::time_point> connected_at_;  ///< the last connection's
-  bool spoken_to_ = false;                                             ///< a line of it could be decrypted
+  /// When the last connection was made. Channel thread only.
+  std::optional<std::chrono::steady_clock::time_point> connected_at_;
 };
 
 }  // namespace lmx

@@ -1,6 +1,8 @@
 // The line by which the agent introduces itself to the server.
 #include "control/tunnel/hello.h"
 
+#include "support/format.h"
+
 namespace lmx {
 namespace {
 
@@ -10,7 +12,7 @@ constexpr int kProtocolVersion = 100;
 
 std::string helloLine(const std::optional<std::string>& agent_uuid, const std::string& vector,
                       bool can_record) {
-  return "AGENT protocol=1,agent_uuid=" + agent_uuid.value_or("(null)") + ",iv=" + vector +
+  return "AGENT protocol=1,agent_uuid=" + textOrNull(agent_uuid) + ",iv=" + vector +
          ",version=" + std::to_string(kProtocolVersion) +
          (can_record ? "" : ",agent_recording_status=offline") + "\n";
 }

@@ -18,6 +18,7 @@
 #include <system_error>
 #include <thread>
 
+#include "platform/net/socket_io.h"
 #include "support/unique_fd.h"
 
 namespace lmx {
@@ -95,11 +96,6 @@ bool awaitEvent(int fd, short events, const Patience& patience) {
     if (ready > 0) return polled[1].revents == 0;
     if (ready == 0 || errno != EINTR) return false;
   }
-}
-
-bool isReadable(int fd) {
-  pollfd polled{fd, POLLIN, 0};
-  return poll(&polled, 1, 0) > 0;
 }
 
 /// Shared by a resolver thread and a caller that may have stopped waiting for it.

@@ -5,6 +5,7 @@ import plistlib
 import re
 import signal
 import socket
+import subprocess
 from pathlib import Path
 
 from .commands import exchange, start_line
@@ -106,6 +107,10 @@ class Agent:
     def popen(self, *arguments, env=None):
         """Starts the program with `arguments` and does not wait for its end."""
         return self.sandbox.popen(arguments, env=self._environment(env))
+
+    def in_network(self, *command):
+        """Runs a command in the agent's network namespace."""
+        subprocess.run([*self.sandbox.entering("net"), *command], check=True)
 
     def _environment(self, env):
         environment = dict(env or {})

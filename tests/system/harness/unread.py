@@ -8,6 +8,12 @@ from pathlib import Path
 from .waiting import wait_until
 
 
+def small_buffers(agent):
+    """Lets a few replies fill what the system buffers of a TCP connection in the agent's network."""
+    agent.in_network("sh", "-c", "echo 4096 4096 16384 > /proc/sys/net/ipv4/tcp_wmem; "
+                                 "echo 4096 4096 16384 > /proc/sys/net/ipv4/tcp_rmem")
+
+
 def all_read(agent, peer):
     """Whether the daemon has read all that was sent on this local socket or IPv4 connection."""
     unsent = struct.unpack("i", fcntl.ioctl(peer, termios.TIOCOUTQ, bytes(4)))[0]  # for a local socket: and unread

@@ -1,6 +1,11 @@
 // Cluster information from a scripted tool and from the cache on disk.
 #include <gmock/gmock.h>
 
+#include <cerrno>
+#include <csignal>
+#include <cstdlib>
+#include <future>
+
 #include "tests/unit/agent/agent_fixture.h"
 
 namespace lmx {
@@ -117,6 +122,57 @@ TEST_F(Cluster, TheSecondCacheIsReadOnlyWithoutTheFirst) {
   EXPECT_TRUE(ClusterWatch::clusterInformationFromDisk()->contains("first"));
   testing::writeFile(systemPath(kServerInformation), "half a file");
   EXPECT_TRUE(ClusterWatch::clusterInformationFromDisk()->contains("second"));
+}
+
+TEST_F(Cluster, TheFirstQueryKeepsTheLoopRunning) {
+  std::promise<void> turned;
+  children_.answer = [&](const auto&) {
+    const bool ran = turned.get_future().wait_for(std::chrono::seconds(30)) == std::future_status::ready;
+    return ran ? exited(0, propertyListXml(members({"a", "b"}))) : exited(1);
+  };
+  agent_.mainRunLoop().post([&] { turned.set_value(); }, Wait::no);
+  EXPECT_TRUE(watch_.learnCluster(agent_.mainRunLoop(), [] { return true; }));
+  EXPECT_TRUE(log_.contains(kLogDebug, "Hosts: a:1, b:1"));
+  EXPECT_EQ(count(context_->server_info.get()), 2U);
+}
+
+/// With a real tool that hangs.
+class HangingTool : public Cluster {
+ protected:
+  HangingTool() {
+    const std::string tool = systemPath(kLumexTool);
+    std::filesystem::create_directories(directoryOf(tool));
+    testing::writeFile(tool, "#!/bin/sh\necho $$ > '" + pidFile() + "'\nexec sleep 600\n");
+    std::filesystem::permissions(tool, std::filesystem::perms{0755});
+  }
+  ~HangingTool() override { std::filesystem::remove(systemPath(kLumexTool)); }
+  [[nodiscard]] std::string pidFile() const { return repository_.file("pid"); }
+  [[nodiscard]] pid_t pid() const { return std::atoi(testing::readFile(pidFile()).c_str()); }
+  [[nodiscard]] bool toolIsGone() const { return kill(pid(), 0) != 0 && errno == ESRCH; }
+  /// Asks the agent to end once the tool runs.
+  [[nodiscard]] std::function<bool()> untilTheToolRuns() const {
+    return [this] { return pid() == 0; };
+  }
+
+  ClusterWatch hanging_{*context_, context_->server, context_->server_info, systemChildRunner()};
+};
+
+TEST_F(HangingTool, IsEndedWhenTheAgentIsAskedToEnd) {
+  cache(kServerInformation, members({"a", "b"}));
+  const auto begin = std::chrono::steady_clock::now();
+  EXPECT_FALSE(hanging_.learnCluster(agent_.mainRunLoop(), untilTheToolRuns()));
+  EXPECT_LT(std::chrono::steady_clock::now() - begin, std::chrono::seconds(15));
+  EXPECT_TRUE(toolIsGone());
+  EXPECT_EQ(context_->server_info.get(), nullptr);
+  EXPECT_FALSE(log_.mentions("cluster")) << "an end that was asked for is no failure";
+}
+
+TEST_F(HangingTool, OfARefreshIsEndedWithTheAgent) {
+  hanging_.refreshClusterInformation();
+  ASSERT_TRUE(testing::waitUntil([this] { return pid() != 0; }));
+  hanging_.stop(agent_.mainRunLoop());
+  EXPECT_TRUE(toolIsGone());
+  EXPECT_FALSE(log_.mentions("cluster"));
 }
 
 TEST_F(Cluster, ARefreshThatFailsKeepsTheOldInformation) {

@@ -4,6 +4,7 @@
 #include <cstdio>
 #include <ctime>
 
+#include "agent/tunnel_keeper.h"
 #include "capture/api/capture_framework.h"
 #include "record/capture_delegate.h"
 #include "record/create_preview.h"
@@ -72,6 +73,15 @@ TEST_F(MainLoopTest, ASecondSignalWhileTheTunnelClosesIsHarmless) {
   EXPECT_EQ(log_.count(kLogDebug, "Process shutDownControl"), 40);
 }
 
+TEST_F(MainLoopTest, ATunnelThatIsOpenIsNotOpenedAgain) {
+  TunnelKeeper keeper(context_, agent_, agent_.mainRunLoop());
+  ASSERT_TRUE(keeper.openTunnel());
+  const AgentControl* first = keeper.tunnel();
+  EXPECT_TRUE(keeper.openTunnel());
+  EXPECT_EQ(keeper.tunnel(), first);
+  keeper.closeTunnel();
+}
+
 TEST_F(MainLoopTest, ADeviceThatIsStillMissingEndsTheDaemon) {
   framework_->cameras_attach = false;
   checkedDevice(11);
@@ -92,6 +102,46 @@ TEST_F(MainLoopTest, ADeviceThatFailedGetsOneMoreRetryWithAWarning) {
   checkedDevice(11);
   EXPECT_FALSE(turn());
   EXPECT_EQ(log_.count(kLogWarning, kOffline), 1);
+}
+
+/// The recording has it: the tunnel is opened at once.
+TEST_F(MainLoopTest, NoDeviceIsLookedForDuringARecording) {
+  framework_->cameras_attach = false;
+  for (const RecorderStatus status : {kRecorderRecording, kRecorderPaused}) {
+    session_->status.set(status);
+    checkedDevice(1000);
+    EXPECT_TRUE(turn()) << "a failed retry would end the recording";
+    EXPECT_EQ(context_->state.last_device_check.get(), 0);
+    EXPECT_TRUE(log_.contains(kLogNotice, "Control module started with success"));
+  }
+  session_->status.set(kRecorderIdle);
+}
+
+TEST_F(MainLoopTest, NoDeviceIsLookedForWhileAStoppedRecordingIsBeingClosed) {
+  const Controller controller = start("A");
+  agent_.stopCapture();
+  ASSERT_EQ(session_->status.get(), kRecorderIdle);
+  framework_->cameras_attach = false;
+  checkedDevice(1000);
+  EXPECT_TRUE(turn());
+  reportEnd(controller);
+  turnTheLoop();
+  EXPECT_NE(nextJob(), nullptr);
+  EXPECT_TRUE(testing::waitUntil([&] { return agent_.submission().isIdle(); }));
+  turnTheLoop();
+  EXPECT_FALSE(turn());
+}
+
+TEST_F(MainLoopTest, ADeviceThatIsStillMissingDoesNotEndTheDaemonDuringASubmission) {
+  framework_->cameras_attach = false;
+  context_->post_process_list.postProcessListAddJob(std::make_shared<AgentSubmit>());
+  checkedDevice(11);
+  const std::int64_t before = std::time(nullptr);
+  EXPECT_TRUE(turn());
+  EXPECT_GE(context_->state.last_device_check.get(), before) << "to be looked for again ten seconds later";
+  EXPECT_NE(nextJob(), nullptr);
+  checkedDevice(11);
+  EXPECT_FALSE(turn());
 }
 
 TEST_F(MainLoopTest, AReturningDeviceClearsTheWarning) {
@@ -156,6 +206,9 @@ void tellOnStandardError(void*, int level, const std::string& text) {
 class Refusal : public MainLoopTest {
  protected:
   static constexpr const char* kLine = "2 Server rejected agent connection, restarting for retry\\.";
+  static constexpr const char* kNotice =
+      "Server rejected agent connection; the restart waits until the recording is submitted";
+  static constexpr const char* kWaits = "5 Server rejected agent connection; the restart waits";
   static constexpr int kWentOn = 7;
 
   Refusal() { GTEST_FLAG_SET(death_test_style, "threadsafe"); }
@@ -174,6 +227,41 @@ TEST_F(Refusal, EndsTheProcessWithZeroAfterAMinute) {
 
 TEST_F(Refusal, IsIgnoredBeforeAMinute) {
   EXPECT_EXIT(turnAfter(57), ::testing::ExitedWithCode(kWentOn), "");
+}
+
+TEST_F(Refusal, WaitsForARunningRecording) {
+  for (const RecorderStatus status : {kRecorderRecording, kRecorderPaused}) {
+    session_->status.set(status);
+    EXPECT_EXIT(turnAfter(1000), ::testing::ExitedWithCode(kWentOn), kWaits);
+  }
+  session_->status.set(kRecorderIdle);
+  EXPECT_EXIT(turnAfter(60), ::testing::ExitedWithCode(0), kLine);
+}
+
+TEST_F(Refusal, SaysOnceThatItWaits) {
+  const auto turns = [this] {
+    session_->status.set(kRecorderRecording);
+    context_->state.serverRejectTime.set(std::time(nullptr) - 1000);
+    for (int i = 0; i < 3; ++i) turn();
+    const bool once = log_.count(kLogNotice, kNotice) == 1 && !log_.mentions("restarting for retry");
+    _exit(once ? kWentOn : 1);
+  };
+  EXPECT_EXIT(turns(), ::testing::ExitedWithCode(kWentOn), "");
+}
+
+TEST_F(Refusal, WaitsUntilTheMovieIsClosed) {
+  const Controller controller = start("A");
+  agent_.stopCapture();
+  ASSERT_EQ(session_->status.get(), kRecorderIdle);
+  EXPECT_EXIT(turnAfter(1000), ::testing::ExitedWithCode(kWentOn), kWaits);
+  reportEnd(controller);
+}
+
+TEST_F(Refusal, WaitsForTheSubmission) {
+  context_->post_process_list.postProcessListAddJob(std::make_shared<AgentSubmit>());
+  EXPECT_EXIT(turnAfter(1000), ::testing::ExitedWithCode(kWentOn), kWaits);
+  EXPECT_NE(nextJob(), nullptr);
+  EXPECT_EXIT(turnAfter(60), ::testing::ExitedWithCode(0), kLine);
 }
 
 TEST_F(Refusal, IsIgnoredInAdhocMode) {

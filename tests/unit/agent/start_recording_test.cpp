@@ -137,6 +137,42 @@ TEST_F(StartRecording, RefusedWhileARecordingRunsChangesNothing) {
   EXPECT_EQ(lastController()->marks().size(), marks);
 }
 
+/// A timed STOP and the server's own, and the next lecture in the same second.
+TEST_F(StartRecording, IsNotEndedByAStopForTheRecordingBefore) {
+  ASSERT_EQ(agent_.performStart(parameters("R1")), 0);
+  const std::string first = session_->addressedRequest();
+  agent_.stopRecording();
+  agent_.performFor(first, &AgentActions::stopRecording, Wait::no);  // came in while R1 ran
+  ASSERT_EQ(agent_.performStart(parameters("R2")), 0);
+  turnTheLoop();
+  EXPECT_EQ(session_->status.get(), kRecorderRecording);
+  EXPECT_TRUE(log_.contains(kLogDebug, "A command for an earlier recording came too late"));
+  agent_.performFor(session_->addressedRequest(), &AgentActions::stopRecording, Wait::no);
+  turnTheLoop();
+  EXPECT_EQ(session_->status.get(), kRecorderIdle);
+}
+
+TEST_F(StartRecording, IsAddressedWhileItIsPrepared) {
+  std::string addressed;
+  framework_->on_new_controller = [&](auto&) { addressed = session_->addressedRequest(); };
+  ASSERT_EQ(agent_.performStart(parameters("R1")), 0);
+  EXPECT_EQ(addressed, session_->request.get().uuid);
+  EXPECT_EQ(session_->preparing_request.get(), "");
+  framework_->on_new_controller = [](auto& controller) { controller.prepare_succeeds = false; };
+  session_->status.set(kRecorderIdle);
+  EXPECT_EQ(agent_.performStart(parameters("R2")), kRecordNotRunning);
+  EXPECT_EQ(session_->preparing_request.get(), "");
+  framework_->controller(0)->shut_down = true;
+}
+
+TEST_F(StartRecording, CancelledLeavesNoRequest) {
+  ASSERT_EQ(agent_.performStart(parameters("R1")), 0);
+  agent_.cancelRecording();
+  EXPECT_EQ(lastController()->marks().back().operation, "cancelRequest");
+  EXPECT_EQ(lastController()->marks().back().uuid, session_->request.get().uuid);
+  EXPECT_EQ(journalCount("cancelRecording"), 1);
+}
+
 TEST_F(StartRecording, ForgetsTheDeadlinesOfAnEarlierRecording) {
   const auto inAnHour = std::time(nullptr) + 3600;
   session_->stop_times.softStopTime.set(TimeValue{inAnHour, 0});

@@ -22,6 +22,7 @@ class ScriptedActions : public AgentActions {
   bool loop_runs = true;  ///< false: the main loop has ended and nothing is performed
   std::function<void()> on_prepare_capture;
   std::function<void()> on_stop_recording;
+  std::function<void()> on_resume_capture;
   std::function<void()> on_stop_capture;
 
   bool perform(Action action, Wait wait) override {
@@ -31,6 +32,12 @@ class ScriptedActions : public AgentActions {
     waiting_ = false;
     return true;
   }
+
+  bool performFor(const std::string& request, Action action, Wait wait) override {
+    addressed.push_back(request);
+    return perform(action, wait);
+  }
+  std::vector<std::string> addressed;  ///< the request of each performFor
 
   int performStart(const SharedDictionary& properties) override {
     if (!loop_runs) return kRecordInvalidType;
@@ -47,9 +54,10 @@ class ScriptedActions : public AgentActions {
   void startPreview() override { note("startPreview"); }
   void stopPreview() override { note("stopPreview"); }
   void pauseCapture() override { note("pauseCapture"); }
-  void resumeCapture() override { note("resumeCapture"); }
+  void resumeCapture() override { note("resumeCapture", on_resume_capture); }
   void stopCapture() override { note("stopCapture", on_stop_capture); }
   void cancelCapture() override { note("cancelCapture"); }
+  void cancelRecording() override { note("cancelRecording"); }
   void stopRecording() override { note("stopRecording", on_stop_recording); }
   void setRecorderStatusToIdle() override { note("setRecorderStatusToIdle"); }
   void submitStoppedRecording() override { note("submitStoppedRecording"); }

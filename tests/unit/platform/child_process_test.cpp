@@ -3,6 +3,7 @@
 
 #include <fcntl.h>
 #include <gtest/gtest.h>
+#include <sys/eventfd.h>
 
 #include <cerrno>
 #include <csignal>
@@ -77,6 +78,42 @@ TEST(ChildProcess, ChildWithinTheLimitIsNotKilled) {
   ChildOptions options;
   options.limit = 60s;
   EXPECT_TRUE(shell("exit 0", options).succeeded());
+}
+
+TEST(ChildProcess, ACancelledChildIsKilledAtOnce) {
+  const UniqueFd cancel(eventfd(0, EFD_CLOEXEC));
+  ChildOptions options;
+  options.cancel = cancel.get();
+  options.limit = 60s;
+  ChildResult result;
+  const auto begin = Clock::now();
+  std::thread runner([&] { result = shell("echo begun; exec sleep 60", options); });
+  eventfd_write(cancel.get(), 1);
+  runner.join();
+  EXPECT_EQ(result.end, End::cancelled);
+  EXPECT_FALSE(result.succeeded());
+  EXPECT_LT(Clock::now() - begin, 20s);
+}
+
+TEST(ChildProcess, AChildIsCancelledWhileItRuns) {
+  int ends[2];
+  ASSERT_EQ(pipe2(ends, O_CLOEXEC), 0);
+  const UniqueFd cancel(ends[0]);
+  UniqueFd keep(ends[1]);
+  ChildOptions options;
+  options.cancel = cancel.get();
+  options.reportEvery = 50ms;  // by then it runs
+  options.stillRunning = [&keep](std::chrono::milliseconds) { keep.reset(); };
+  const ChildResult result = shell("echo begun; exec sleep 60", options);
+  EXPECT_EQ(result.end, End::cancelled);
+  EXPECT_EQ(result.output, "begun\n");
+}
+
+TEST(ChildProcess, AfterACancellationNoChildIsStarted) {
+  const UniqueFd cancel(eventfd(1, EFD_CLOEXEC));
+  ChildOptions options;
+  options.cancel = cancel.get();
+  EXPECT_EQ(run({"/no/such/program"}, options).end, End::cancelled);
 }
 
 TEST(ChildProcess, LargeOutputDoesNotStopTheChild) {

@@ -88,6 +88,15 @@ TEST(WriteFileAtomically, ReplacedFileKeepsItsMode) {
   EXPECT_EQ(modeOf(root.file("old")), 0600U);
 }
 
+TEST(WriteFileAtomically, AReplacedFilesAccessCanBeDiscarded) {
+  const TemporaryDirectory root;
+  writeFile(root.file("old"), "before");
+  fs::permissions(root.file("old"), fs::perms{0644});
+  EXPECT_EQ(writeFileAtomically(root.file("old"), "after", 0600, OldAccess::discard), 0);
+  EXPECT_EQ(readFile(root.file("old")), "after");
+  EXPECT_EQ(modeOf(root.file("old")), 0600U);
+}
+
 TEST(WriteFileAtomically, ReaderOfTheOldFileKeepsTheOldContent) {
   const TemporaryDirectory root;
   writeFile(root.file("f"), "old");

@@ -118,12 +118,14 @@ TEST_F(PropertiesDocument, IsWrittenUnderItsName) {
   job_.properties_file_path = inRepository("ABC.xml");
   EXPECT_EQ(job_.writeProperties(), 0);
   EXPECT_EQ(contentOf(inRepository("ABC.xml")), propertiesXml(job_.properties));
+  EXPECT_EQ(modeOf(inRepository("ABC.xml")), std::filesystem::perms{0600}) << "it may hold a password";
   EXPECT_EQ(filesInRepository(), 1U);
   EXPECT_THAT(log_.entries(), IsEmpty());
 }
 
 TEST_F(PropertiesDocument, ReplacesAnOlderDocumentAtomically) {
   write(inRepository("ABC.xml"), std::string(10000, 'x'));
+  std::filesystem::permissions(inRepository("ABC.xml"), std::filesystem::perms{0644});
   struct stat before {};
   ASSERT_EQ(stat(inRepository("ABC.xml").c_str(), &before), 0);
   job_.properties_file_path = inRepository("ABC.xml");
@@ -131,6 +133,7 @@ TEST_F(PropertiesDocument, ReplacesAnOlderDocumentAtomically) {
   struct stat after {};
   ASSERT_EQ(stat(inRepository("ABC.xml").c_str(), &after), 0);
   EXPECT_NE(before.st_ino, after.st_ino);
+  EXPECT_EQ(after.st_mode & 07777, 0600U);
   EXPECT_EQ(contentOf(inRepository("ABC.xml")), propertiesXml(job_.properties));
 }
 

@@ -241,6 +241,8 @@ TEST_F(FileRecording, IsCopiedIntoTheRepositoryBeforeTheToolRuns) {
   EXPECT_EQ(job_.addRecording(children_), 0);
   EXPECT_EQ(seen, movie_);
   EXPECT_EQ(contentOf(inRepository("NEW.xml")), "talk's document");
+  EXPECT_EQ(modeOf(inRepository("NEW.mov")), std::filesystem::perms{0644});
+  EXPECT_EQ(modeOf(inRepository("NEW.xml")), std::filesystem::perms{0600}) << "it may hold a password";
   EXPECT_EQ(contentOf(elsewhere() + "/talk.mov"), movie_);
   EXPECT_EQ(filesInRepository(), 4U);  // no temporary file left
 }

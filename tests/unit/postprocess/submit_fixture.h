@@ -74,6 +74,9 @@ class SubmitFixture : public ::testing::Test {
     content << file.rdbuf();
     return content.str();
   }
+  static std::filesystem::perms modeOf(const std::string& path) {
+    return std::filesystem::status(path).permissions();
+  }
   static std::size_t filesInRepository() {
     const std::filesystem::directory_iterator all(repository());
     return static_cast<std::size_t>(std::distance(begin(all), end(all)));

@@ -243,15 +243,41 @@ TEST_F(Settings, ASecretsFileWithoutTheKeyIsTwoErrorLines) {
   EXPECT_FALSE(log_.mentions(kSecret));
 }
 
-TEST_F(Settings, ASecretOfAnotherLengthOrNoBase64FailsSilently) {
-  const char* const kFifteen = "AAECAwQFBgcICQoLDA0O";
-  const char* const kSeventeen = "AAECAwQFBgcICQoLDA0ODxA=";
-  for (const char* secret : {kFifteen, kSeventeen, "not base64!", ""}) {
-    writeSecret(secret);
-    EXPECT_FALSE(read(bound())) << secret;
-    EXPECT_EQ(context_->server.shared_secret.get(), std::nullopt) << secret;
+TEST_F(Settings, WhiteSpaceAroundTheSecretIsIgnored) {
+  const std::string secret = kSecret;
+  for (const std::string& text :
+       {secret + "\n", secret + "\r\n", "  " + secret, "\t" + secret + " \n\n", "\n" + secret}) {
+    context_->server.shared_secret.set(std::nullopt);
+    writeSecret(text);
+    ASSERT_TRUE(read(bound())) << ::testing::PrintToString(text);
+    const auto stored = context_->server.shared_secret.get();
+    ASSERT_TRUE(stored) << ::testing::PrintToString(text);
+    for (unsigned char i = 0; i < 16; ++i) EXPECT_EQ((*stored)[i], i);
   }
-  for (const Entry& entry : messages()) EXPECT_EQ(entry, (Entry{kLogInfo, "Reading preferences..."}));
+}
+
+TEST_F(Settings, ASecretThatCannotBeUsedIsOneErrorLineWithFileAndReason) {
+  struct Case {
+    const char* secret;
+    const char* reason;
+  };
+  const Case cases[] = {{"AAECAwQFBgcICQoLDA0O", "\"lmx_secret\" has 15 bytes instead of 16"},
+                        {"AAECAwQFBgcICQoLDA0ODxA=", "\"lmx_secret\" has 17 bytes instead of 16"},
+                        {"", "\"lmx_secret\" has 0 bytes instead of 16"},
+                        {" \n", "\"lmx_secret\" has 0 bytes instead of 16"},
+                        {"not base64!", "\"lmx_secret\" is not Base64 text"},
+                        {"AAECAwQF\nBgcICQoLDA0ODw==", "\"lmx_secret\" is not Base64 text"}};
+  for (const Case& one : cases) {
+    const auto before = static_cast<std::ptrdiff_t>(messages().size());
+    writeSecret(one.secret);
+    EXPECT_FALSE(read(bound())) << one.secret;
+    EXPECT_EQ(context_->server.shared_secret.get(), std::nullopt) << one.secret;
+    auto lines = messages();
+    lines.erase(lines.begin(), lines.begin() + before);
+    EXPECT_THAT(lines, ElementsAre(Entry{kLogInfo, "Reading preferences..."},
+                                   Entry{kLogError, "The shared secret in \"" + secretFile() +
+                                                        "\" can't be used: " + one.reason}));
+  }
 }
 
 TEST_F(Settings, AdHocModeSkipsBindingSecretAndRepository) {

@@ -4,6 +4,7 @@
 #include <sys/stat.h>
 
 #include <chrono>
+#include <cstring>
 #include <filesystem>
 #include <fstream>
 #include <optional>
@@ -14,6 +15,7 @@
 #include "platform/paths.h"
 #include "platform/plist/property_list.h"
 #include "prefs/agent_preferences.h"
+#include "prefs/steady_reading.h"
 #include "tests/unit/doubles/log_capture.h"
 #include "tests/unit/doubles/test_root.h"
 
@@ -24,9 +26,15 @@ class PrefsFixture : public ::testing::Test {
  protected:
   PrefsFixture() {
     kTestRoot.clear();
+    failure_ = 0;
+    setSettingsReaderForTesting([](const std::string& path) -> PlistResult {
+      if (failure_ == 0 || path != failing_path_) return readPropertyList(path);
+      return Error{std::strerror(failure_), failure_};
+    });
     std::filesystem::create_directories(directoryOf(systemFile()));
     std::filesystem::create_directories(directoryOf(userFile()));
   }
+  ~PrefsFixture() override { setSettingsReaderForTesting({}); }
 
   static std::string systemFile() { return systemPath(kPreferencesFile); }
   static std::string userFile() { return kTestRoot.path() + "/home" + std::string(kPreferencesFile); }
@@ -44,6 +52,12 @@ class PrefsFixture : public ::testing::Test {
   static void writeText(const std::string& text) {
     std::ofstream(systemFile()) << text;
     makeOld(systemFile());
+  }
+
+  /// From now on reading `path` fails with `error`; 0: no longer.
+  static void failReading(const std::string& path, int error) {
+    failing_path_ = path;
+    failure_ = error;
   }
 
   /// Backdates the file. Timestamps tick slowly, and a later write must get a later one.
@@ -68,6 +82,10 @@ class PrefsFixture : public ::testing::Test {
   }
 
   LogCapture log_;
+
+ private:
+  static inline std::string failing_path_;
+  static inline int failure_ = 0;
 };
 
 inline void PrintTo(const LogCapture::Entry& entry, std::ostream* out) {

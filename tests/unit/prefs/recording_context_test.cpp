@@ -184,7 +184,7 @@ TEST_F(RecordingContext, SoundOnlyWithAutomaticAsksForTheDefaultDevice) {
   EXPECT_EQ(context->audioDeviceID, std::nullopt);
   catalog_->usable = {"microphone"};
   EXPECT_EQ(reasonOfRefusedBuild(CaptureType::audio),
-            "Unknown device ID:  for preference: RecordingAudioInput");
+            "Unknown device ID: (null) for preference: RecordingAudioInput");
 }
 
 // Refusals.

@@ -23,5 +23,11 @@ TEST(StringWithFormat, IsEmptyWhenFormattingFails) {
   EXPECT_EQ(string_with_format("%ls", text), "");
 }
 
+TEST(TextOrNull, AnAbsentTextHasASpellingOfItsOwn) {
+  EXPECT_EQ(textOrNull(std::nullopt), "(null)");
+  EXPECT_EQ(textOrNull(""), "");
+  EXPECT_EQ(textOrNull("Hall 3"), "Hall 3");
+}
+
 }  // namespace
 }  // namespace lmx

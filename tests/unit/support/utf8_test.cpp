@@ -17,11 +17,6 @@ TEST(Utf8, Utf8IsToldFromOtherBytes) {
   }
 }
 
-TEST(Utf8, CharactersAreCountedNotBytes) {
-  EXPECT_EQ(characterCount("Hall"), 4U);
-  EXPECT_EQ(characterCount("Hörsaal"), 7U);
-}
-
 TEST(Utf8, XmlHoldsLessThanUtf8) {
   for (const char* held : {"a", "\t", "\n", "\r", "\u0085", "\uFFFD", "\U0010FFFF"}) {
     EXPECT_EQ(xmlCharacterLength(held), std::string_view(held).size()) << held;

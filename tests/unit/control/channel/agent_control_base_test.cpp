@@ -7,12 +7,15 @@
 #include <array>
 #include <condition_variable>
 #include <deque>
+#include <functional>
+#include <latch>
 #include <thread>
 
 #include "tests/unit/control/channel/scripted_channel.h"
 #include "tests/unit/control/channel/turned_clock.h"
 #include "tests/unit/doubles/log_capture.h"
 #include "tests/unit/doubles/scripted_actions.h"
+#include "tests/unit/doubles/wait_until.h"
 
 namespace lmx {
 namespace {
@@ -348,6 +351,7 @@ TEST_F(Lifecycle, AskedToStopTheChannelFinishesTheCommandItExecutes) {
   }
   channel_.askToStop();
   EXPECT_FALSE(channel_.threadHasEnded());
+  EXPECT_EQ(log_.count(kLogNotice, "Control module is stopping..."), 1) << "when it is asked for";
   {
     const std::lock_guard lock(mutex);
     finish = true;
@@ -356,6 +360,98 @@ TEST_F(Lifecycle, AskedToStopTheChannelFinishesTheCommandItExecutes) {
   channel_.stop();
   EXPECT_TRUE(channel_.threadHasEnded());
   EXPECT_EQ(channel_.replies(), Lines{"cmdStatus=0"});
+  EXPECT_EQ(log_.count(kLogNotice, "Control module is stopping..."), 1);
+}
+
+/// A channel whose thread stands in the reply to a command until release().
+class BusyChannel : public Lifecycle {
+ protected:
+  BusyChannel() {
+    channel_.on_reply = [this](ScriptedChannel& channel) {
+      threads_.push_back(std::this_thread::get_id());
+      if (threads_.size() > 1) return;
+      busy_.count_down();
+      released_.wait();
+      if (behind_the_reply_) behind_the_reply_(channel);
+    };
+    start();
+    say(connections_.peer(0), "STOP\n");
+    busy_.wait();
+  }
+  ~BusyChannel() override {
+    release();
+    channel_.stop();  // before what its replies reach is gone
+  }
+  void release() {
+    if (!released_.try_wait()) released_.count_down();
+  }
+  bool waitForReplies(const Lines& expected) {
+    return testing::waitUntil([&] { return channel_.replies() == expected; });
+  }
+  std::vector<std::thread::id> threads_;                    // channel thread only, while there is one
+  std::function<void(ScriptedChannel&)> behind_the_reply_;  // set before release()
+
+ private:
+  std::latch busy_{1};
+  std::latch released_{1};
+};
+
+TEST_F(BusyChannel, ReplyOfAnotherThreadDoesNotWaitAndIsSentByTheChannels) {
+  channel_.sendReply("cmdStatus=38");
+  channel_.sendReply("cmdStatus=4");
+  EXPECT_EQ(channel_.replies(), Lines{"cmdStatus=0"}) << "the channel's thread is still busy";
+  release();
+  EXPECT_TRUE(waitForReplies({"cmdStatus=0", "cmdStatus=38", "cmdStatus=4"}));
+  channel_.stop();
+  EXPECT_EQ(threads_, std::vector(3, threads_.at(0)));
+  EXPECT_NE(threads_.at(0), std::this_thread::get_id());
+}
+
+TEST_F(BusyChannel, AReplyBelongsToTheConnectionAtWhichItWasGiven) {
+  std::array<int, 2> ends{};
+  ASSERT_EQ(::socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0, ends.data()), 0);
+  const UniqueFd peer(ends[1]);
+  behind_the_reply_ = [&](ScriptedChannel& channel) { channel.useSocket(ends[0]); };
+  channel_.sendReply("cmdStatus=38");
+  release();
+  EXPECT_TRUE(
+      log_.waitFor(kLogDebug, "Reply dropped because its peer has gone or does not read: cmdStatus=38"));
+  EXPECT_EQ(channel_.replies(), Lines{"cmdStatus=0"});
+}
+
+TEST_F(BusyChannel, APeerThatTakesNoMoreLosesWhatWaitsForIt) {
+  channel_.takes_replies = false;
+  channel_.sendReply("cmdStatus=1");
+  channel_.sendReply("cmdStatus=2");
+  release();
+  EXPECT_TRUE(
+      log_.waitFor(kLogDebug, "Reply dropped because its peer has gone or does not read: cmdStatus=2"));
+  EXPECT_EQ(channel_.replies(), (Lines{"cmdStatus=0", "cmdStatus=1"}));
+}
+
+TEST_F(BusyChannel, WhatWasAnsweredBeforeTheStopIsStillSent) {
+  channel_.sendReply("cmdStatus=38");
+  channel_.askToStop();
+  release();
+  channel_.stop();
+  EXPECT_EQ(channel_.replies(), (Lines{"cmdStatus=0", "cmdStatus=38"}));
+}
+
+TEST_F(BusyChannel, RepliesBeyondTheLimitAreDropped) {
+  for (std::size_t i = 0; i <= kOutboxLimit; ++i) channel_.sendReply("cmdStatus=38");
+  EXPECT_EQ(log_.count(kLogDebug, "Too many replies wait for the peer, one is dropped: cmdStatus=38"), 1);
+  release();
+  EXPECT_TRUE(testing::waitUntil([&] { return channel_.replies().size() == 1 + kOutboxLimit; }));
+}
+
+TEST_F(Lifecycle, AReplyWithNobodyThereIsADebugLine) {
+  clock_.real_sleep = true;  // it stays in its back-off
+  channel_.on_connect = [](ScriptedChannel&) { return 1; };
+  start();
+  channel_.sendReply("cmdStatus=38");
+  EXPECT_TRUE(log_.contains(kLogDebug, "Nobody to send the reply to: cmdStatus=38"));
+  channel_.stop();
+  EXPECT_TRUE(channel_.replies().empty());
 }
 
 TEST_F(Lifecycle, HandlerThatThrowsCostsNeitherThreadNorConnection) {

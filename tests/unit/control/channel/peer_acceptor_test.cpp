@@ -27,7 +27,8 @@ class Accepting : public ::testing::Test {
   UniqueFd listening_{::socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0)};
   ChannelContext context_{newAgentContext()};
   PeerSockets sockets_;
-  PeerAcceptor acceptor_{context_, sockets_, systemChannelClock(), -1};
+  LineAssembler line_;
+  PeerAcceptor acceptor_{{context_, sockets_, line_, systemChannelClock(), -1}, std::chrono::seconds(10)};
 };
 
 TEST_F(Accepting, KeepAliveIsSetOnTheListeningSocketNotOnThePeers) {
@@ -40,7 +41,8 @@ TEST_F(Accepting, KeepAliveIsSetOnTheListeningSocketNotOnThePeers) {
   ASSERT_EQ(::getsockname(listening_.get(), reinterpret_cast<sockaddr*>(&address), &size), 0);
   const UniqueFd peer(::socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0));
   ASSERT_EQ(::connect(peer.get(), reinterpret_cast<const sockaddr*>(&address), size), 0);
-  EXPECT_EQ(acceptor_.acceptPeer(listening_.get()), 0);
+  acceptor_.listenOn(listening_.get());
+  EXPECT_EQ(acceptor_.acceptPeer(), 0);
   EXPECT_GE(sockets_.current(), 0);
   EXPECT_TRUE(log_.contains(kLogInfo, lineFor(sockets_.current())));
   EXPECT_EQ(keepAliveOf(listening_.get()), 1);
@@ -49,7 +51,8 @@ TEST_F(Accepting, KeepAliveIsSetOnTheListeningSocketNotOnThePeers) {
 
 TEST_F(Accepting, AFailureIsLoggedWithMinusOneAndTriedAgainAtOnce) {
   const auto before = std::chrono::steady_clock::now();
-  EXPECT_EQ(acceptor_.acceptPeer(listening_.get()), -1);  // nobody has called listen
+  acceptor_.listenOn(listening_.get());
+  EXPECT_EQ(acceptor_.acceptPeer(), -1);  // nobody has called listen
   EXPECT_LT(std::chrono::steady_clock::now() - before, std::chrono::seconds(1));
   EXPECT_EQ(sockets_.current(), -1);
   EXPECT_TRUE(log_.contains(kLogInfo, lineFor(-1)));

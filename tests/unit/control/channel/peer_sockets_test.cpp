@@ -6,6 +6,7 @@
 #include <sys/socket.h>
 
 #include <array>
+#include <atomic>
 #include <thread>
 
 #include "support/unique_fd.h"
@@ -19,7 +20,7 @@ class PeerSocketsTest : public ::testing::Test {
   UniqueFd newPeer() {
     std::array<int, 2> ends{};
     EXPECT_EQ(::socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0, ends.data()), 0);
-    sockets_.setCurrent(ends[0]);
+    sockets_.setCurrent(UniqueFd(ends[0]));
     return UniqueFd(ends[1]);
   }
   /// Whether our end is closed.
@@ -44,13 +45,45 @@ TEST_F(PeerSocketsTest, PeerThatClosedItsSideIsNotConnected) {
   EXPECT_FALSE(sockets_.connected());
 }
 
-TEST_F(PeerSocketsTest, ClosingFromTwoThreadsClosesOnce) {
-  const UniqueFd peer = newPeer();
-  std::thread other([&] { sockets_.closeCurrent(); });
-  sockets_.closeCurrent();
+TEST_F(PeerSocketsTest, AskedByAnotherThreadItNeverLooksAtAClosedDescriptor) {
+  std::atomic<bool> done{false};
+  std::thread other([&] {
+    while (!done) static_cast<void>(sockets_.connected());
+  });
+  for (int i = 0; i < 2000; ++i) {
+    const UniqueFd peer = newPeer();
+    sockets_.closeCurrent();
+    ASSERT_TRUE(isClosed(peer));
+  }
+  done = true;
   other.join();
-  EXPECT_TRUE(isClosed(peer));
-  EXPECT_EQ(sockets_.current(), -1);
+  EXPECT_FALSE(sockets_.connected());
+}
+
+TEST_F(PeerSocketsTest, EachConnectionHasItsOwnNumber) {
+  EXPECT_EQ(sockets_.replyTarget(), 0U);
+  const UniqueFd first = newPeer();
+  const auto number = sockets_.replyTarget();
+  EXPECT_NE(number, 0U);
+  sockets_.retireCurrent();
+  EXPECT_EQ(sockets_.replyTarget(), 0U);
+  const UniqueFd second = newPeer();
+  EXPECT_NE(sockets_.replyTarget(), number);
+  sockets_.restorePrevious();
+  EXPECT_EQ(sockets_.replyTarget(), number) << "it is still the same connection";
+}
+
+TEST_F(PeerSocketsTest, APeerThatMustBeGreetedGetsNoReplyBefore) {
+  std::array<int, 2> ends{};
+  ASSERT_EQ(::socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0, ends.data()), 0);
+  const UniqueFd peer(ends[1]);
+  sockets_.setCurrent(UniqueFd(ends[0]), Greeting::comesFirst);
+  EXPECT_EQ(sockets_.replyTarget(), 0U);
+  sockets_.setGreeted();
+  EXPECT_NE(sockets_.replyTarget(), 0U);
+  sockets_.retireCurrent();
+  sockets_.restorePrevious();
+  EXPECT_NE(sockets_.replyTarget(), 0U);
 }
 
 TEST_F(PeerSocketsTest, ThePreviousPeerStaysUntilItIsClosed) {

@@ -169,13 +169,39 @@ TEST_F(RecordingCommandsTest, CancelCancelsTheRequestAndTheCaptureWithoutWaiting
   session_->request.set({.uuid = "Q1"});
   EXPECT_EQ(onlyMark("CANCEL").uuid, "Q1");
   EXPECT_EQ(replies_.all(), Lines{"cmdStatus=0"});
-  EXPECT_EQ(journal_.entries(), (Lines{"cancelRequest", "cancelCapture"}));
+  EXPECT_EQ(journal_.entries(), (Lines{"cancelRequest", "cancelRecording"}));
 }
 
 TEST_F(RecordingCommandsTest, CancelInContinuousModeOnlyCancelsTheRequest) {
   setContinuous(true);
   EXPECT_EQ(run("CANCEL"), Lines{"cmdStatus=0"});
   EXPECT_EQ(journal_.entries(), Lines{"cancelRequest"});
+}
+
+TEST_F(RecordingCommandsTest, CommandsAreAboutTheRequestOfTheirArrival) {
+  session_->request.set({.uuid = "Q1"});
+  for (const char* line : {"STOP", "PAUSE", "RESUME", "CANCEL"}) run(line);
+  EXPECT_EQ(actions_.addressed, Lines(4, "Q1"));
+}
+
+/// The START being prepared is what a technician who presses STOP has in mind.
+TEST_F(RecordingCommandsTest, AStopDuringAPreparationWaitsForItAndEndsThat) {
+  session_->request.set({.uuid = "Q1"});
+  session_->preparing_request.set("Q2");
+  auto made = std::make_shared<ScriptedCaptureController>(journal_);
+  actions_.on_stop_recording = [&] { session_->captureController.set(made); };
+  EXPECT_EQ(run("STOP"), Lines{"cmdStatus=0"});
+  EXPECT_EQ(actions_.addressed, Lines{"Q2"});
+  EXPECT_EQ(journal_.entries(), (Lines{"stopRecording, waiting", "submitRequest", "syncMarks"}));
+  EXPECT_TRUE(capture_->marks().empty()) << "the recording before is none of its business";
+  EXPECT_EQ(made->marks().at(0).uuid, "Q2");
+}
+
+TEST_F(RecordingCommandsTest, AResumeForAnEarlierRecordingMarksNothing) {
+  session_->request.set({.uuid = "Q1"});
+  actions_.on_resume_capture = [&] { session_->request.set({.uuid = "Q2"}); };
+  EXPECT_EQ(run("RESUME"), Lines{"cmdStatus=0"});
+  EXPECT_TRUE(capture_->marks().empty());
 }
 
 TEST_F(RecordingCommandsTest, WithoutSessionTheRecordingCommandsAnswerOne) {
@@ -192,7 +218,7 @@ TEST_F(RecordingCommandsTest, WithoutControllerTheyStillActAndReply) {
     EXPECT_EQ(run(line).back(), "cmdStatus=0") << line;
   }
   EXPECT_EQ(journal_.entries(),
-            (Lines{"stopRecording", "pauseCapture, waiting", "resumeCapture, waiting", "cancelCapture"}));
+            (Lines{"stopRecording", "pauseCapture, waiting", "resumeCapture, waiting", "cancelRecording"}));
 }
 
 TEST_F(RecordingCommandsTest, WithoutActionsTheyStillReply) {

@@ -19,6 +19,7 @@
 #include "platform/paths.h"
 #include "record/agent_record.h"
 #include "tests/unit/control/channel/turned_clock.h"
+#include "tests/unit/control/local/local_peer.h"
 #include "tests/unit/doubles/log_capture.h"
 #include "tests/unit/doubles/scripted_actions.h"
 #include "tests/unit/doubles/test_root.h"
@@ -28,71 +29,11 @@ namespace {
 
 using namespace std::chrono_literals;
 using testing::Journal;
+using testing::LocalPeer;
 using testing::LogCapture;
 using testing::ScriptedActions;
-
-std::string socketPath() { return systemPath(kLocalSocket); }
-
-/// A local tool.
-class Peer {
- public:
-  /// Connects, waiting for the listener.
-  Peer() {
-    sockaddr_un address{};
-    address.sun_family = AF_UNIX;
-    socketPath().copy(address.sun_path, sizeof address.sun_path - 1);
-    const auto deadline = std::chrono::steady_clock::now() + 30s;
-    do {
-      socket_.reset(::socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0));
-      connected_ = ::connect(socket_.get(), reinterpret_cast<const sockaddr*>(&address), sizeof address) == 0;
-      if (!connected_) std::this_thread::yield();
-    } while (!connected_ && std::chrono::steady_clock::now() < deadline);
-    EXPECT_TRUE(connected_);
-  }
-  void send(std::string_view text) {
-    while (!text.empty()) {
-      const ssize_t sent = ::send(socket_.get(), text.data(), text.size(), MSG_NOSIGNAL);
-      ASSERT_GT(sent, 0);
-      text.remove_prefix(static_cast<std::size_t>(sent));
-    }
-  }
-  /// Reads until what has come ends with `end`; what came, complete or not, after half a minute.
-  std::string receiveUpTo(const std::string& end) {
-    while (!received_.ends_with(end)) {
-      if (!receiveSome(30s)) break;
-    }
-    return std::exchange(received_, {});
-  }
-  /// Whether the channel closes the connection.
-  bool isClosed() {
-    while (receiveSome(30s)) {
-    }
-    return closed_;
-  }
-  bool hasReply(std::chrono::milliseconds limit) { return receiveSome(limit); }
-  void close() { socket_.reset(); }
-  /// Closes so that the other side finds data and the end at once.
-  void closeAbruptly() {
-    const linger now{1, 0};
-    ::setsockopt(socket_.get(), SOL_SOCKET, SO_LINGER, &now, sizeof now);
-    socket_.reset();
-  }
-
- private:
-  bool receiveSome(std::chrono::milliseconds limit) {
-    pollfd waited{socket_.get(), POLLIN, 0};
-    if (::poll(&waited, 1, static_cast<int>(limit.count())) != 1) return false;
-    std::array<char, 4096> buffer{};
-    const ssize_t length = ::recv(socket_.get(), buffer.data(), buffer.size(), 0);
-    closed_ = length <= 0;
-    if (!closed_) received_.append(buffer.data(), static_cast<std::size_t>(length));
-    return !closed_;
-  }
-  UniqueFd socket_;
-  std::string received_;
-  bool connected_ = false;
-  bool closed_ = false;
-};
+using testing::socketPath;
+using Peer = LocalPeer;
 
 class LocalSocket : public ::testing::Test {
  protected:
@@ -283,6 +224,36 @@ TEST_F(LocalSocket, ReplyLongerThanTheSocketBufferArrivesWhole) {
   std::string preview = reply.substr(found + size.size());
   while (preview.size() < 4194304 && peer.hasReply(30s)) preview += peer.receiveUpTo("eHh4");
   EXPECT_EQ(preview.size(), 4194304U);
+}
+
+TEST_F(LocalSocket, RepliesBeyondAsciiAreWhole) {
+  const std::string image = "/tmp/unit_control_image_" + std::to_string(::getpid());
+  std::ofstream(image, std::ios::binary) << "abcdef";
+  context_->server.machine_name.set("Hörsaal Süd");
+  context_->recording.preview_file.set(image);
+  Peer peer;
+  peer.send("STATUS include_profile=true,include_preview=true\n");
+  const std::string end = "preview-size=8,preview=YWJjZGVm";
+  EXPECT_NE(peer.receiveUpTo(end).find(",CameraName=Hörsaal Süd,TunnelHost="), std::string::npos);
+  ::unlink(image.c_str());
+  peer.send("TIMEDCMD command=STOP,time=2100-01-01 00:00:00 +0000,TITLE=Größe\n");
+  EXPECT_EQ(peer.receiveUpTo("cmdStatus=0"), "cmdStatus=0");
+  peer.send("TIMEDCMD command=TIMERLIST\n");
+  const std::string list = peer.receiveUpTo("</plist>\n");
+  EXPECT_TRUE(list.ends_with("</plist>\n"));
+  EXPECT_NE(list.find("<string>Größe</string>"), std::string::npos) << list;
+}
+
+TEST_F(LocalSocket, WhenTheLoopThrowsNobodyListensAnyMore) {
+  Peer peer;
+  peer.send("STOP\n");
+  peer.receiveUpTo("cmdStatus=0");
+  actions_.network_changed();
+  clock_.ahead_seconds += 2;
+  clock_.throws = true;
+  ASSERT_TRUE(log_.waitFor(kLogCritical, "Control channel has ended: the clock has stopped"));
+  EXPECT_TRUE(peer.isClosed());
+  EXPECT_FALSE(std::filesystem::exists(socketPath()));
 }
 
 TEST_F(LocalSocket, StopReturnsAtOnceWhileWaitingForAPeer) {

@@ -17,10 +17,5 @@ TEST(Reply, NamesTheCode) {
   EXPECT_EQ(replyText(-1), "cmdStatus=-1");
 }
 
-TEST(Reply, AsManyBytesAsCharactersGoOut) {
-  EXPECT_EQ(replyBytes("cmdStatus=0"), "cmdStatus=0");
-  EXPECT_EQ(replyBytes("CameraName=Hörsaal,x=12"), "CameraName=Hörsaal,x=1");
-}
-
 }  // namespace
 }  // namespace lmx

@@ -85,6 +85,13 @@ class Tunnel : public ::testing::Test {
     std::copy(bytes->begin(), bytes->end(), vector.begin());
     return agent_encrypt_message(vector, kSecret, std::string(kRandomPrefix, 'r') + text).value() + "\n";
   }
+  /// What the next line from the agent says.
+  std::string readReply(const UniqueFd& peer) const {
+    const auto bytes = lmp_decode_base64(hello_.substr(hello_.find("iv=") + 3, 24));
+    CipherBlock vector{};
+    std::copy(bytes->begin(), bytes->end(), vector.begin());
+    return messageIn(agent_decrypt_message(vector, kSecret, PlayedServer::readLine(peer)).value_or(""));
+  }
   static void send(const UniqueFd& peer, const std::string& bytes) {
     ASSERT_EQ(::send(peer.get(), bytes.data(), bytes.size(), MSG_NOSIGNAL),
               static_cast<ssize_t>(bytes.size()));
@@ -158,6 +165,46 @@ TEST_F(Tunnel, InItsBackOffItHearsThePreviousConnection) {
 TEST_F(Tunnel, AReplyBeforeTheHelloIsNotSent) {
   tunnel_.completeTimedCommand(std::make_shared<const Dictionary>(Dictionary{{"command", "STOP"}}));
   EXPECT_TRUE(log_.contains(kLogDebug, "No reply before the hello: cmdStatus=38"));
+}
+
+TEST_F(Tunnel, ATimedCommandsReplyGoesOverTheOpenTunnel) {
+  ASSERT_TRUE(tunnel_.initWithAgentContext());
+  const UniqueFd peer = acceptWithHello();
+  send(peer, encrypted("STOP"));  // its reply proves that the hello is done
+  EXPECT_EQ(readReply(peer), "cmdStatus=0");
+  tunnel_.completeTimedCommand(std::make_shared<const Dictionary>(Dictionary{{"command", "STOP"}}));
+  EXPECT_EQ(readReply(peer), "cmdStatus=38");
+}
+
+TEST_F(Tunnel, RepliesBeyondAsciiAreWhole) {
+  context_->server.machine_name.set("Hörsaal Süd");
+  context_->recording.capture_preset.set("Größe");
+  ASSERT_TRUE(tunnel_.initWithAgentContext());
+  const UniqueFd peer = acceptWithHello();
+  send(peer, encrypted("STATUS include_profile=true"));
+  EXPECT_TRUE(
+      readReply(peer).ends_with(",CameraName=Hörsaal Süd,TunnelHost=127.0.0.1,RecordingCapturePreset=Größe"));
+}
+
+TEST_F(Tunnel, AServerThatSpeaksAndHangsUpIsNotCalledAgainAtOnce) {
+  ASSERT_TRUE(tunnel_.initWithAgentContext());
+  for (int i = 0; i < 3; ++i) {
+    const UniqueFd peer = acceptWithHello();
+    send(peer, encrypted("STOP"));
+    EXPECT_EQ(readReply(peer), "cmdStatus=0");
+  }
+  const UniqueFd last = acceptWithHello();
+  EXPECT_EQ(clock_.sleeps.entries(), (std::vector<std::string>{"5000", "5000", "5000"}));
+}
+
+TEST_F(Tunnel, AServerThatHangsUpLaterIsCalledAgainAtOnce) {
+  ASSERT_TRUE(tunnel_.initWithAgentContext());
+  {
+    const UniqueFd peer = acceptWithHello();
+    clock_.ahead_seconds = 6;
+  }
+  const UniqueFd again = acceptWithHello();
+  EXPECT_TRUE(clock_.sleeps.entries().empty());
 }
 
 TEST_F(Tunnel, CommandsAreDecryptedAndAnswered) {
