@@ -104,6 +104,21 @@ def test_only_a_brief_recording_may_be_empty_and_the_log_must_say_so():
         assert (complaints(history, {"A": Left(empty=empty)}) == []) == good, (stop, empty)
 
 
+def test_a_start_may_fail_only_if_its_camera_goes():
+    refused = said("START", 100.0, reply="cmdStatus=3", title="A")
+    gone = Operation("GONE", "world", 99.0, 99.1)
+    assert complaints([gone, refused], {"A": Left()}) == []
+    assert complaints([refused], {"A": Left()})
+    assert complaints([gone, refused], {"A": kept(0.5, 0)})
+
+
+def test_a_start_that_may_not_have_come_leaves_nothing_or_a_recording_of_its_own():
+    history = [said("START", 100.0, reply="", title="A", optional=True), said("STOP", 102.0)]
+    assert complaints(history, {"A": Left()}) == []
+    assert complaints(history, {"A": kept(2.0, 0)}) == []
+    assert complaints([history[0], said("CANCEL", 102.0)], {"A": kept(2.0, 0)})
+
+
 def test_a_cancelled_recording_leaves_nothing():
     history = [said("START", 100.0, title="A"), said("CANCEL", 102.0)]
     assert complaints(history, {"A": Left()}) == []

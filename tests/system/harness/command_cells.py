@@ -7,10 +7,7 @@ STATES = ("idle", "preparing", "recording", "paused", "stopping", "finishing", "
 COMMANDS = ("START", "STOP", "PAUSE", "RESUME", "CANCEL")
 EVENTS = (*COMMANDS, *(f"timed {command}" for command in COMMANDS), "STATUS", "USR1", "USR2", "HUP", "INT", "TERM",
           "KILL", "loss", "shortage")
-IMPOSSIBLE = {  # by construction
-    **{("loss", state): "no device is open" for state in ("idle", "finishing")},
-    ("loss", "preparing"): "the START fails; a synthetic device can't go before its first picture",
-}
+IMPOSSIBLE = {("loss", state): "no device is open" for state in ("idle", "finishing")}  # by construction
 CANCELLED_FOR = 0.05  # seconds; the end of a cancelled capture has no line of its own
 
 COMMAND = re.compile(r"^Command is \[(START|STOP|PAUSE|RESUME|CANCEL|STATUS)\b(?:.*\bn=(\d+))?")

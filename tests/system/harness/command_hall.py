@@ -115,6 +115,8 @@ class Hall:
             self._change_room(event.verb)
         elif event.verb == "LOSS":
             self._change(RecordingVideoInput=SMALL_CAMERA + "&lost-after=1")
+        elif event.verb == "GONE":
+            self.note("GONE", "world", *self._change(RecordingVideoInput=SMALL_CAMERA + "&lost-after=0"))
         elif event.verb.startswith("TIMED "):
             self._schedule(event)
         else:

@@ -25,7 +25,8 @@ class Operation:
     """One thing that was done to the daemon. Times are wall-clock seconds."""
 
     verb: str  # a command, BAD for a malformed START, a signal (HUP, INT, TERM, KILL, USR1, USR2), or RESTART,
-    #            SHORTAGE, ROOM, GUARD (the check of the disk ends a recording), LOSS (the camera goes)
+    #            SHORTAGE, ROOM, GUARD (the check of the disk ends a recording), GONE (from now on the camera goes as
+    #            soon as it is opened), LOSS (a recording loses its camera), END (the daemon ends by itself)
     way: str  # local, tunnel, timed, signal, world
     sent: float
     done: float  # when its effect was certain, FOREVER when nobody knows
@@ -69,6 +70,7 @@ class State:
     recording: str = ""  # title of what is recorded
     paused: bool = False
     room: bool = True
+    gone: bool = False  # the camera goes as soon as it is opened
     ending: bool = False
     last: int = -1  # place of the latest submission
     least: float = 0.0  # seconds of media it must hold by now
@@ -128,7 +130,7 @@ class Model:
             return self._pause(state, op)
         if op.verb in RESUMES:
             return self._resume(state, op)
-        changes = {"RESTART": {"ending": False}, "END": {"ending": True}, "SHORTAGE": {"room": False}, "ROOM": {"room": True}}
+        changes = {"RESTART": {"ending": False}, "END": {"ending": True}, "SHORTAGE": {"room": False}, "ROOM": {"room": True}, "GONE": {"gone": True}}
         return replace(state, **changes.get(op.verb, {}))
 
     def without(self, state, op):
@@ -149,7 +151,9 @@ class Model:
             if not self.left[op.title].nothing():
                 raise Refused(f"START {op.title} was to be refused, but left {self.left[op.title]}")
             return state
-        self._expect(op, "0")
+        self._expect(op, "0", *["3"] * state.gone)
+        if op.replies and all(status_of(text) == "3" for text in op.replies):
+            return self.without(state, op)
         return replace(state, recording=op.title, paused=False, least=0.0, most=0.0, since=(op.sent, op.done))
 
     @staticmethod

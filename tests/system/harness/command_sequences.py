@@ -15,7 +15,8 @@ PASSING = ("preparing", "stopping", "finishing")  # states that last for millise
 TARGETS = ("idle", "recording", "paused", *PASSING)
 AIMED = ("START", "STOP", "PAUSE", "RESUME", "CANCEL", "STATUS", *SIGNALS, "SHORTAGE", "TIMED START", "TIMED STOP",
          "TIMED PAUSE", "TIMED RESUME", "TIMED CANCEL")
-CELLS = [*((verb, state) for verb in AIMED for state in TARGETS), ("LOSS", "paused"), ("LOSS", "stopping")]
+CELLS = [*((verb, state) for verb in AIMED for state in TARGETS), *(("LOSS", state) for state in
+         ("preparing", "recording", "paused", "stopping"))]
 THEME_NAMES = (*THEMES, "aimed")
 
 
@@ -61,7 +62,7 @@ class Sequence:
         return Sequence(self.seed, self.theme, lanes, self.last, self.tool_delay)
 
     def loses_camera(self):
-        return any(event.verb == "LOSS" for lane in self.lanes for event in lane)
+        return any(event.verb in ("LOSS", "GONE") for lane in self.lanes for event in lane)
 
     def length(self):
         return sum(len(lane) for lane in self.lanes)
@@ -167,7 +168,9 @@ def loss(dice):
 
 
 def losing(dice, lead, target):
-    """A camera that goes a second after its recording has begun."""
+    """A camera that goes at once, or a second after its recording has begun."""
+    if target == "preparing":
+        return [[Event("GONE", "world", 0.0), *lead]]
     lost = [Event("LOSS", "world", 0.0), *lead]
     if target == "stopping":
         lost.append(Event("STOP", "local", dice.uniform(0.945, 0.985)))  # its last frame is the one that does not come
