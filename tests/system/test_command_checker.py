@@ -151,7 +151,8 @@ def test_cells_are_read_from_the_log():
     lines = log_of(["lmxagentd (version 100) starting...", "Command is [STOP n=1]", "Command is [START n=2]",
                     "Process prepareCapture", "Command is [PAUSE n=3]", '"/A.mov" recording started',
                     '"/A.mov" recording paused (current duration: 0s)', "Command is [STATUS]", "Process stopCapture",
-                    "Command is [START n=4]", "Submitting Stopped Recording", '"/A.mov" recording stopped (duration: 0s)',
+                    "Command is [START n=4]", "Submitting Stopped Recording",
+                    '"/A.mov" recording stopped (duration: 0s)',
                     "Got Signal (SIGHUP)", "Command is [CANCEL n=5]"])
     hit = {("STOP", "idle"), ("START", "idle"), ("PAUSE", "preparing"), ("USR1", "recording"), ("STATUS", "paused"),
            ("START", "stopping"), ("shortage", "stopping"), ("timed CANCEL", "finishing"), ("KILL", "finishing"),

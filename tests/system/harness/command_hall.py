@@ -1,7 +1,6 @@
 """A hall under test: one daemon that sequences of commands are played to, by several at once."""
 import contextlib
 import itertools
-import re
 import signal
 import threading
 import time

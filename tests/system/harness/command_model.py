@@ -130,7 +130,8 @@ class Model:
             return self._pause(state, op)
         if op.verb in RESUMES:
             return self._resume(state, op)
-        changes = {"RESTART": {"ending": False}, "END": {"ending": True}, "SHORTAGE": {"room": False}, "ROOM": {"room": True}, "GONE": {"gone": True}}
+        changes = {"RESTART": {"ending": False}, "END": {"ending": True}, "SHORTAGE": {"room": False},
+                   "ROOM": {"room": True}, "GONE": {"gone": True}}
         return replace(state, **changes.get(op.verb, {}))
 
     def without(self, state, op):

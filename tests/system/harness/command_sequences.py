@@ -113,7 +113,8 @@ def timed(dice):
 
 def offline(dice):
     """Everything that may come while there is no tunnel."""
-    events = [*(Event(verb, "local", delay(dice)) for verb in (*COMMANDS, "START", "START", "STOP") if verb[:3] != "USR"),
+    commands = [verb for verb in (*COMMANDS, "START", "START", "STOP") if not verb.startswith("USR")]
+    events = [*(Event(verb, "local", delay(dice)) for verb in commands),
               *(Event(verb, "signal", delay(dice)) for verb in ("USR1", "USR2", "HUP")),
               *(Event("TIMED " + verb, "local", delay(dice), 1) for verb in dice.sample(tuple(TIMED), 2))]
     dice.shuffle(events)
