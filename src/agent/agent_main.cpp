@@ -109,6 +109,8 @@ AgentMain::Start AgentMain::startServices() {
                   "Internal error occurred creating post-process scheduler thread");
     return Start::fatal;
   }
+  // Before any channel: a TIMEDCMD writes the list, which would not hold the commands of the file yet.
+  timed_commands_.loadSchedule();
   if (!devices_.deviceIsOffline() && !channels_.tunnel().openTunnel()) return Start::fatal;
   startListeners();
   // On a worker, so that start-up isn't delayed and the first recording finds the plug-ins loaded.
@@ -147,7 +149,6 @@ void AgentMain::startTimers() {
     submission_.letOverduePass();
   });
   disk_space_guard_.checkDiskSpace();
-  timed_commands_.loadSchedule();
 }
 
 void AgentMain::shutdown() {
@@ -170,13 +171,13 @@ void AgentMain::signal(int number) {
       break;
     case SIGINT:
       context_->logDebug("Got Stop Signal (SIGINT)");
-      if (!context_->options.adhoc.get()) stopCapture();
       context_->state.running.set(false);
+      if (!context_->options.adhoc.get()) stopCapture();
       break;
     case SIGTERM:
       context_->logDebug("Got Termination Signal (SIGTERM)");
+      context_->state.running.set(false);  // first: nobody has asked for the submission of what runs
       stopCapture();
-      context_->state.running.set(false);
       break;
     case SIGUSR1:
       context_->logDebug("Got Pause Signal");

@@ -37,7 +37,7 @@ class AgentMain final : public AgentActions {
   /// @return false when no log can be opened (reported on standard error)
   bool setupLoggingContext();
   void setupSignalHandlers();
-  /// Starts the disk-space and cluster timers and the schedule, and runs each once immediately.
+  /// Starts the disk-space and cluster timers, and runs each once immediately.
   void startTimers();
   /// Handles a signal. Main thread.
   void signal(int number);

@@ -64,15 +64,25 @@ void CaptureActions::configure(AgentRecord& record, const Dictionary& properties
                 metadata_key::kAudioOnly);
 }
 
+/// The parameters that a restart needs. Who submits may have been named by an earlier START.
+SharedDictionary CaptureActions::withSubmitter(const RecordingRequest& request) {
+  if (!lookUp(request.properties, metadata_key::kAdHocWorkflowUUID)) return request.properties;
+  Dictionary all = *request.properties;
+  if (request.user) all[metadata_key::kJobUser] = *request.user;
+  if (request.password) all[metadata_key::kJobPassword] = *request.password;
+  return std::make_shared<const Dictionary>(std::move(all));
+}
+
 void CaptureActions::beginRequest(AgentRecord& record, const std::string& uuid,
                                   const SharedDictionary& properties) {
   const RecordingRequest request{.uuid = uuid,
                                  .properties = properties,
                                  .user = context_.options.user.get(),
                                  .password = context_.options.password.get()};
-  record.request.set(request);
+  // Marked before anybody can ask for it.
   if (const auto capture = record.captureController.get())
-    capture->setStartWithUUID(request.uuid, shiftedReferenceTime(), properties);
+    capture->setStartWithUUID(request.uuid, shiftedReferenceTime(), withSubmitter(request));
+  record.request.set(request);
 }
 
 void CaptureActions::startPreview() {

@@ -48,6 +48,7 @@ class CaptureActions {
 
  private:
   void configure(AgentRecord& record, const Dictionary& properties);
+  static SharedDictionary withSubmitter(const RecordingRequest& request);
   void beginRequest(AgentRecord& record, const std::string& uuid, const SharedDictionary& properties);
   void resumeCaptureAndRequest();
   void setPreviewRunning(bool run);

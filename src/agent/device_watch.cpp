@@ -27,6 +27,12 @@ constexpr const char* kOfflineMessage =
     "Unable to acquire the specified video device. The agent will remain offline until the device becomes "
     "available.";
 
+bool cameraRecords(const AgentRecord& session) {
+  const std::int32_t type = session.recordedType();
+  return session.status.get() != kRecorderIdle &&
+         (type == kRecordingTypeAudioVideo || type == kRecordingTypeVideo);
+}
+
 }  // namespace
 
 std::shared_ptr<LMRRecordingContext> DeviceWatch::recordingContext() const {
@@ -55,18 +61,21 @@ void DeviceWatch::probeDevice(const LMRRecordingContext& settings) {
 }
 
 void DeviceWatch::deviceFound() {
-  context_->state.last_device_check.set(0);
-  shouldDisplayOfflineMessage_ = false;
-  if (!device_is_back_()) context_->state.running.set(false);
+  if (device_is_back_()) {
+    context_->state.last_device_check.set(0);
+    shouldDisplayOfflineMessage_ = false;
+  } else if (!recordingInHand(*context_)) {
+    context_->state.running.set(false);
+  }
 }
 
 void DeviceWatch::retryDevice(std::int64_t now) {
   const std::int64_t last = context_->state.last_device_check.get();
   if (last < 1 || isAhead(now, last, kDeviceRetrySeconds + 1)) return;
-  // A retry that fails ends the agent, and a START may have found the camera meanwhile. What records has its
-  // devices open, so the server need not wait for the end of the recording either.
+  // A retry that fails ends the agent, and a START may have found the camera meanwhile. A recording with a
+  // picture has it open, so the server need not wait for the end of the recording either.
   if (recordingInHand(*context_)) {
-    if (context_->record_context()->status.get() != kRecorderIdle) deviceFound();
+    if (cameraRecords(*context_->record_context())) deviceFound();
     return;
   }
   context_->state.last_device_check.set(now);

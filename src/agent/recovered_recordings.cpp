@@ -21,13 +21,17 @@ TimeValue timeValueFrom(double secondsSinceReference) {
 JobMaker::Finished finishedFrom(const RecoveredRecording& recording) {
   auto record = std::make_shared<AgentRecord>();
   record->recordingType.set(recording.recordingType);
+  Dictionary given = recording.parameters ? *recording.parameters : Dictionary{};
+  RecordingRequest request{.uuid = recording.request,
+                           .user = lookUp(&given, metadata_key::kJobUser),
+                           .password = lookUp(&given, metadata_key::kJobPassword)};
+  given.erase(metadata_key::kJobUser);
+  given.erase(metadata_key::kJobPassword);
+  request.properties = std::make_shared<const Dictionary>(std::move(given));
   return {.record = std::move(record),
-          .request = {.uuid = recording.request,
-                      .properties = recording.parameters,
-                      .user = lookUp(recording.parameters, metadata_key::kAgentUsername),
-                      .password = lookUp(recording.parameters, metadata_key::kAgentPassword)},
+          .request = request,
           .movie = recording.path,
-          .metadata = recording.parameters,
+          .metadata = request.properties,
           .started = timeValueFrom(recording.startTime),
           .stopped = timeValueFrom(recording.stopTime),
           .seconds = static_cast<std::int64_t>(recording.duration)};
@@ -41,10 +45,12 @@ void RecoveredRecordings::takeUp(std::shared_ptr<CaptureFramework> framework) {
   if (!repository) return;
   // On a worker: a long recording may have to be copied, and the agent must accept commands meanwhile.
   dispatchAsync([this, repository, framework = std::move(framework), ticket = order_.enter()] {
-    auto recordings = framework->recoverUnfinished(*repository);
+    auto recordings = framework->recoverUnfinished(
+        *repository, [this](const std::string& request) { return jobs_.store().tookUp(request); });
     std::stable_sort(recordings.begin(), recordings.end(),
                      [](const auto& a, const auto& b) { return a.stopTime < b.stopTime; });
     HandOffOrder::deliver(*ticket, keep(recordings, *ticket));
+    jobs_.store().forgetBegun();
   });
 }
 
@@ -62,12 +68,6 @@ void RecoveredRecordings::takeUpJobs() {
   }
 }
 
-/// A job that has been stored already stands for the recording.
-bool RecoveredRecordings::isToBeSubmitted(const RecoveredRecording& recording) const {
-  return recording.submit && jobs_.wantsSubmission(recording.parameters) &&
-         !jobs_.store().tookUp(recording.request);
-}
-
 bool RecoveredRecordings::writeDocument(const JobMaker::Finished& finished) const {
   AgentSubmit document;
   document.recorded = finished.record;
@@ -76,30 +76,37 @@ bool RecoveredRecordings::writeDocument(const JobMaker::Finished& finished) cons
   return document.tryWriteProperties();
 }
 
+/// @return its job; null when it could not be made, or when the next start is to make it
+std::shared_ptr<AgentSubmit> RecoveredRecordings::makeJob(const RecoveredRecording& recording,
+                                                          const HandOffOrder::Ticket& ticket) {
+  auto job = jobs_.make(finishedFrom(recording), ticket);
+  if (!job) return nullptr;
+  if (job->documented()) {
+    recording.forget();
+  } else if (!recording.queued()) {
+    if (job->stored) job->stored->remove();  // otherwise the next start would submit it a second time
+    return nullptr;
+  }
+  LMPLogMessage(context_->log_context(), kLogNotice,
+                "Finished recording \"%s\" (duration: %ds), which had been stopped; it goes to the server",
+                recording.path.c_str(), static_cast<int>(recording.duration));
+  return job;
+}
+
 HandOffOrder::Jobs RecoveredRecordings::keep(const std::vector<RecoveredRecording>& recordings,
                                              const HandOffOrder::Ticket& ticket) {
   HandOffOrder::Jobs jobs;
   for (const RecoveredRecording& recording : recordings) {
-    const JobMaker::Finished finished = finishedFrom(recording);
-    const bool submit = isToBeSubmitted(recording);
-    bool documented = false;
-    if (submit) {
-      auto job = jobs_.make(finished, ticket);
-      if (!job) continue;
-      documented = job->documented();
-      if (!documented) recording.queued();
-      jobs.push_back(std::move(job));
-    } else {
-      documented = writeDocument(finished);
+    if (recording.submit && jobs_.wantsSubmission(recording.parameters)) {
+      if (auto job = makeJob(recording, ticket)) jobs.push_back(std::move(job));
+      continue;
     }
     // Without its document the movie stays in the journal. The next start tries again.
-    if (documented) recording.forget();
-    if ((!documented && !submit) || jobs_.store().tookUp(recording.request)) continue;
-    LMPLogMessage(
-        context_->log_context(), kLogNotice,
-        submit ? "Finished recording \"%s\" (duration: %ds), which had been stopped; it goes to the server"
-               : "Recovered unfinished recording \"%s\" (duration: %ds); it was not submitted",
-        recording.path.c_str(), static_cast<int>(recording.duration));
+    if (!writeDocument(finishedFrom(recording))) continue;
+    recording.forget();
+    LMPLogMessage(context_->log_context(), kLogNotice,
+                  "Recovered unfinished recording \"%s\" (duration: %ds); it was not submitted",
+                  recording.path.c_str(), static_cast<int>(recording.duration));
   }
   return jobs;
 }

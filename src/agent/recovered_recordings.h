@@ -28,7 +28,8 @@ class RecoveredRecordings {
  private:
   void takeUpJobs();
   [[nodiscard]] bool writeDocument(const JobMaker::Finished& finished) const;
-  [[nodiscard]] bool isToBeSubmitted(const RecoveredRecording& recording) const;
+  [[nodiscard]] std::shared_ptr<AgentSubmit> makeJob(const RecoveredRecording& recording,
+                                                     const HandOffOrder::Ticket& ticket);
 
   const std::shared_ptr<AgentContext> context_;
   JobMaker& jobs_;

@@ -199,13 +199,22 @@ void Submission::settle(const Stopped& stopped, LMRCaptureController& controller
   const std::string request = stopped.record->request.get().uuid;
   HandOffOrder::Jobs jobs;
   if (job && !job->documented()) {
-    controller.requestQueued(request);
+    if (!controller.requestQueued(request)) return leaveToTheNextStart(*job);
   } else {
     controller.requestHandedOver(request);
     jobs = recovered_.keep(controller.recoverAbandonedRequests(), *stopped.ticket);
   }
   if (job) jobs.insert(jobs.begin(), std::move(job));
   HandOffOrder::deliver(*stopped.ticket, std::move(jobs));
+}
+
+/// Otherwise the next start would submit it a second time.
+void Submission::leaveToTheNextStart(const AgentSubmit& job) const {
+  if (job.stored) job.stored->remove();
+  LMPLogMessage(
+      context_->log_context(), kLogError,
+      "\"%s\" is submitted by the next start: neither its document nor its journal could be written",
+      job.recording_file_path.value_or("").c_str());
 }
 
 std::shared_ptr<AgentSubmit> Submission::announce(const JobMaker::Finished& finished,

@@ -73,6 +73,7 @@ class Submission {
                                         const HandOffOrder::Ticket& ticket);
   void logEarlyEnd(LMRCaptureController& controller, const std::string& path);
   void settle(const Stopped& stopped, LMRCaptureController& controller, std::shared_ptr<AgentSubmit> job);
+  void leaveToTheNextStart(const AgentSubmit& job) const;
   void leaveError(const LMRCaptureController* controller);
   [[nodiscard]] std::shared_ptr<AgentRecord> sessionOf(const LMRCaptureController* controller) const;
 

@@ -117,9 +117,8 @@ void CaptureController::cancelRequestWithUUID(const std::string& uuid) {
 void CaptureController::submitRequestWithUUID(const std::string& uuid) {
   const auto recorder = this->recorder();
   if (!recorder) return;
-  recorder->marks().submit(uuid);
-  // The capture may have closed its marks just now: what comes after that is the closed capture's.
-  if (const auto finished = recorder->finished()) finished->submit(uuid);
+  // Marks that are closed belong to the closed capture, which is about to be there.
+  if (!recorder->marks().submit(uuid)) recorder->waitUntilFinished()->submit(uuid);
 }
 
 void CaptureController::syncMarks() {
@@ -180,9 +179,10 @@ CaptureError CaptureController::nothingFor(const std::string& outputPath) const 
   return refusal().value_or(nothing);
 }
 
-void CaptureController::requestQueued(const std::string& uuid) {
+bool CaptureController::requestQueued(const std::string& uuid) {
   const auto recorder = this->recorder();
-  if (const auto finished = recorder ? recorder->finished() : nullptr) finished->queued(uuid);
+  const auto finished = recorder ? recorder->finished() : nullptr;
+  return finished && finished->queued(uuid);
 }
 
 void CaptureController::requestHandedOver(const std::string& uuid) {

@@ -47,7 +47,7 @@ class CaptureController : public LMRCaptureController,
                                                      const std::string& outputPath) override;
   Result<std::string, CaptureError> processRequestBeside(const std::string& uuid,
                                                          const std::string& outputPath) override;
-  void requestQueued(const std::string& uuid) override;
+  [[nodiscard]] bool requestQueued(const std::string& uuid) override;
   void requestHandedOver(const std::string& uuid) override;
   std::vector<RecoveredRecording> recoverAbandonedRequests() override;
   std::optional<std::string> deleteEarliestSegment() override { return std::nullopt; }

@@ -115,12 +115,13 @@ void GstCaptureFramework::warmUp() {
   }
 }
 
-std::vector<RecoveredRecording> GstCaptureFramework::recoverUnfinished(const std::string& repository) {
+std::vector<RecoveredRecording> GstCaptureFramework::recoverUnfinished(
+    const std::string& repository, const std::function<bool(const std::string& request)>& known) {
   std::vector<RecoveredRecording> all;
   for (const std::string& folder : subfolders(captureFolderOf(repository))) {
     const std::shared_ptr<FinishedCapture> capture = openAbandonedCapture(folder);
     if (!capture) continue;  // still being recorded by another process, or nothing of ours
-    auto recordings = capture->recoverPending(repository);
+    auto recordings = capture->recoverPending(repository, known);
     std::move(recordings.begin(), recordings.end(), std::back_inserter(all));
   }
   return all;

@@ -28,7 +28,8 @@ class GstCaptureFramework : public CaptureFramework {
 
   void warmUp() override;
   std::string deviceInformation() override;
-  std::vector<RecoveredRecording> recoverUnfinished(const std::string& repository) override;
+  std::vector<RecoveredRecording> recoverUnfinished(
+      const std::string& repository, const std::function<bool(const std::string& request)>& known) override;
 };
 
 }  // namespace lmx

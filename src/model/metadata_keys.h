@@ -16,6 +16,10 @@ inline constexpr const char* kAdHocFilePath = "RecordingMetadata_ADHOC_FILE_PATH
 inline constexpr const char* kAdHocWorkflowUUID = "RecordingMetadata_ADHOC_WORKFLOW_UUID";
 inline constexpr const char* kAdHocSubmitDisabled = "RecordingMetadata_ADHOC_SUBMIT_DISABLED";
 
+// Not from START: who submits the recording, kept with its parameters in the journal of the capture.
+inline constexpr const char* kJobUser = "lmxagentd.user";
+inline constexpr const char* kJobPassword = "lmxagentd.password";
+
 inline constexpr const char* kMachineUUID = "RecordingMetadata_MACHINE_UUID";
 inline constexpr const char* kStartDate = "RecordingMetadata_START_DATE";
 inline constexpr const char* kEndDate = "RecordingMetadata_END_DATE";

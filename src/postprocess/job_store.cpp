@@ -27,6 +27,7 @@ namespace {
 
 constexpr const char* kWaiting = ".job";
 constexpr const char* kBegun = ".begun";
+constexpr const char* kNamed = ".named";  ///< begun, and named in the log
 
 bool exists(const std::string& path) { return access(path.c_str(), F_OK) == 0; }
 
@@ -39,7 +40,8 @@ std::string freeName(const std::string& folder, std::uint64_t number) {
   for (unsigned i = 0;; ++i) {
     std::string name =
         folder + "/" + string_with_format("%010llu-%04u", static_cast<unsigned long long>(number), i);
-    if (!exists(name + kWaiting) && !exists(name + kBegun)) return name + kWaiting;
+    const auto taken = [&name](const char* ending) { return exists(name + ending); };
+    if (!taken(kWaiting) && !taken(kBegun) && !taken(kNamed)) return name + kWaiting;
   }
 }
 
@@ -127,10 +129,9 @@ void JobStore::keep(AgentSubmit& job, std::uint64_t place) {
   const std::string path = freeName(folder_, taken_numbers_ + place);
   int error = makeFolder(folder_);
   if (error == 0) error = writePropertyList(path, written(job), 0600);
-  if (error == 0) {
-    job.stored = std::make_shared<StoredJob>(path);
-    return;
-  }
+  // It may be there although it could not be made to survive a power cut.
+  if (exists(path)) job.stored = std::make_shared<StoredJob>(path);
+  if (error == 0) return;
   LMPLogMessage(nullptr, kLogError,
                 "The submission of \"%s\" could not be stored: %s; a crash now would lose it",
                 job.recording_file_path.value_or("").c_str(), std::strerror(error));
@@ -151,10 +152,14 @@ JobStore::Left JobStore::takeUp(const std::shared_ptr<AgentContext>& context) {
                   error == EWOULDBLOCK ? "another process uses them" : std::strerror(error));
     return left;
   }
-  for (const std::string& path : filesEndingIn(kBegun, folder_)) {
-    const PlistResult file = readPropertyList(path);
-    left.begun.push_back(file ? textIn(file, "Movie").value_or(path) : path);
-    unlink(path.c_str());
+  for (const char* ending : {kBegun, kNamed}) {
+    for (const std::string& path : filesEndingIn(ending, folder_)) {
+      const PlistResult file = readPropertyList(path);
+      taken_numbers_ = std::max(taken_numbers_, numberOf(path));
+      taken_up_.push_back(file ? textIn(file, "Request").value_or("") : "");
+      if (ending == kBegun) left.begun.push_back(file ? textIn(file, "Movie").value_or(path) : path);
+      rename(path.c_str(), (path.substr(0, path.rfind('.')) + kNamed).c_str());
+    }
   }
   for (const std::string& path : filesEndingIn(kWaiting, folder_)) {
     taken_numbers_ = std::max(taken_numbers_, numberOf(path));
@@ -164,6 +169,12 @@ JobStore::Left JobStore::takeUp(const std::shared_ptr<AgentContext>& context) {
     left.waiting.push_back(std::move(job));
   }
   return left;
+}
+
+void JobStore::forgetBegun() {
+  const std::lock_guard lock(mutex_);
+  if (!lock_.valid()) return;
+  for (const std::string& path : filesEndingIn(kNamed, folder_)) unlink(path.c_str());
 }
 
 bool JobStore::tookUp(const std::string& request) const {

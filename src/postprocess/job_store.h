@@ -43,11 +43,13 @@ class JobStore {
     std::vector<std::shared_ptr<AgentSubmit>> waiting;  ///< oldest first
     std::vector<std::string> begun;                     ///< movies whose tool had been started
   };
-  /// Takes over the jobs in the folder; those that had begun are forgotten. Another process that uses it
-  /// keeps its own (logged). Call it once, before keep().
+  /// Takes over the jobs in the folder. Another process that uses it keeps its own (logged). Call it once,
+  /// before keep(). A job that had begun is named once, however often the agent is started.
   Left takeUp(const std::shared_ptr<AgentContext>& context);
-  /// Whether a job of that request was taken up.
+  /// Whether there was a job of that request when the others were taken up, begun or not.
   [[nodiscard]] bool tookUp(const std::string& request) const;
+  /// Forgets the jobs that had begun: no capture holds a request any more that one of them was made for.
+  void forgetBegun();
 
  private:
   int lockFolder();

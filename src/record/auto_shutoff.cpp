@@ -21,26 +21,28 @@ void forget(SharedValue<StopTimes::Time>& deadline, const StopTimes::Time& known
 }  // namespace
 
 void checkForAutoShutoffConditions(AgentRecord& session) {
+  // Before the check: the session may move on to the next recording at any time, which must not be stopped
+  // for this one's deadlines.
+  const Deadlines known{.request = session.addressedRequest(),
+                        .hard = session.stop_times.hardStopTime.get(),
+                        .soft = session.stop_times.softStopTime.get()};
   if (!session.stop_times.shouldStopRecording()) return;
   LMPLogMessage(nullptr, kLogNotice, "Doing Auto-Shutoff: Video");
-  doAutoShutoff(session);
+  doAutoShutoff(session, known);
 }
 
-int doAutoShutoff(AgentRecord& session) {
+int doAutoShutoff(AgentRecord& session, const Deadlines& known) {
   const EngineEnvironment environment = engineEnvironment();
   if (environment.context && environment.context->options.adhoc.get()) std::_Exit(0);
-  const auto hard = session.stop_times.hardStopTime.get();
-  const auto soft = session.stop_times.softStopTime.get();
-  const std::string request = session.request.get().uuid;
   if (const auto controller = session.captureController.get()) {
-    controller->setStopWithUUID(request, secondsSinceReferenceDate());
-    controller->submitRequestWithUUID(request);
+    controller->setStopWithUUID(known.request, secondsSinceReferenceDate());
+    controller->submitRequestWithUUID(known.request);
   }
   if (environment.actions != nullptr) {
-    environment.actions->performFor(request, &AgentActions::stopRecording, Wait::untilDone);
+    environment.actions->performFor(known.request, &AgentActions::stopRecording, Wait::untilDone);
   }
-  forget(session.stop_times.hardStopTime, hard);
-  forget(session.stop_times.softStopTime, soft);
+  forget(session.stop_times.hardStopTime, known.hard);
+  forget(session.stop_times.softStopTime, known.soft);
   return 0;
 }
 

@@ -1,6 +1,9 @@
 // Reads the session's status under its lock.
 #include "record/recording_status.h"
 
+#include <algorithm>
+#include <limits>
+
 #include "capture/api/capture_framework.h"
 #include "model/codes.h"
 #include "platform/log.h"
@@ -28,7 +31,8 @@ int LXAgentRecordGetStatus(const std::shared_ptr<AgentRecord>& session, RecordSt
   status->recordStatus = recorderStatusOf(state);
   status->elapsedSeconds = controller ? controller->elapsedTimeInMilliseconds() / 1000 : 0;
   const auto seconds = [](const AgentRecord::Time& time, std::int32_t& out) {
-    if (time) out = static_cast<std::int32_t>(time->tv_sec);
+    constexpr std::int64_t kMost = std::numeric_limits<std::int32_t>::max();  // a hard stop may lie beyond 2038
+    if (time) out = static_cast<std::int32_t>(std::min<std::int64_t>(time->tv_sec, kMost));
   };
   seconds(session->launchTime.get(), status->start);
   seconds(session->stopTime.get(), status->stop);

@@ -146,3 +146,20 @@ def test_replies_beyond_ascii_are_whole(agent, hall_server):
             reply = ask("TIMEDCMD command=TIMERLIST")
             assert reply.endswith("</plist>\n")
             assert set(timer_titles(reply)) == {"Größe – ein Maß"}
+
+
+@pytest.mark.slow
+def test_a_local_peer_that_never_reads_loses_its_connection(agent):
+    agent.path("/var/lmx/agent/big.jpg").write_bytes(bytes(1 << 20))
+    agent.preferences(PreviewPath="/var/lmx/agent/big.jpg")
+    agent.start()
+    with agent.connect(timeout=60) as mute:
+        begin = time.monotonic()
+        mute.sendall(b"STATUS include_preview=true\n")
+        agent.log.wait(r"^Command is \[STATUS include_preview=true\]$")
+        assert agent.command("STATUS", timeout=60).fields["cmdStatus"] == "0"
+        assert 25 < time.monotonic() - begin < 45
+        received = 0
+        while data := mute.recv(1 << 20):
+            received += len(data)
+        assert 0 < received < 1 << 20, "the rest of the reply is lost"

@@ -1,4 +1,5 @@
 """Timed commands and deadlines: what happens with nobody connected."""
+import contextlib
 import plistlib
 import time
 
@@ -24,6 +25,21 @@ def test_a_recording_with_nobody_connected(running):
     running.wait_tool_call("A")
     assert movie.streams(running.movie("A"))["video"].duration > 2.0
     assert running.timers() == []
+
+
+def test_a_command_right_behind_a_restart_keeps_the_schedule(agent):
+    agent.start()
+    for _ in range(3):
+        assert timed(agent, "STATUS", 3600) == "cmdStatus=0"
+        known = len(agent.timers())
+        agent.stop()
+        agent.start(wait=False)
+
+        def scheduled():
+            with contextlib.suppress(FileNotFoundError, ConnectionRefusedError):
+                return timed(agent, "PAUSE", 3600)
+        assert wait_until(scheduled, 20, "the local socket", interval=0.001) == "cmdStatus=0"
+        assert len(agent.timers()) == known + 1
 
 
 def test_a_restart_keeps_the_schedule(agent):

@@ -64,7 +64,7 @@ struct RecoveredRecording {
   double startTime = 0;         ///< seconds since 2001-01-01 UTC of its first frame
   double stopTime = 0;
   double duration = 0;           ///< seconds of media
-  std::function<void()> queued;  ///< call it once its job is kept elsewhere: a restart must not submit it
+  std::function<bool()> queued;  ///< call it once its job is kept elsewhere: a restart must not submit it
   std::function<void()> forget;  ///< call it once the document is written: what is left of the capture goes
 };
 
@@ -136,7 +136,8 @@ class LMRCaptureController {
                                                                  const std::string& outputPath) = 0;
   /// The request's job is kept elsewhere: a restart must not submit it any more. Blocks until that survives a
   /// power cut.
-  virtual void requestQueued(const std::string& uuid) = 0;
+  /// @return false when that could not be written (logged)
+  [[nodiscard]] virtual bool requestQueued(const std::string& uuid) = 0;
   /// The request's movie and document are in place: a restart need not care for it any more. Blocks likewise.
   virtual void requestHandedOver(const std::string& uuid) = 0;
   /// Makes movies of the requests that nobody stopped or cancelled, after the capture has shut down and the
@@ -187,7 +188,9 @@ class CaptureFramework : public CaptureCatalog {
   /// The capture devices in words, for the command line.
   virtual std::string deviceInformation() = 0;
   /// Makes movies of the recordings that an earlier process left unfinished in `repository`. Blocks.
-  virtual std::vector<RecoveredRecording> recoverUnfinished(const std::string& repository) = 0;
+  /// @param known  whether a job of that request has been stored: it is only marked as done
+  virtual std::vector<RecoveredRecording> recoverUnfinished(
+      const std::string& repository, const std::function<bool(const std::string& request)>& known) = 0;
 };
 
 }  // namespace lmx

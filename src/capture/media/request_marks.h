@@ -37,8 +37,9 @@ struct Request {
 /// All times are running time in seconds. Not thread-safe; its owner locks.
 class RequestMarks {
  public:
-  /// Opens a span. Does nothing while the request has an open span, or once it is to be submitted. A start before the end of the last span
-  /// counts from that end. `parameters` are kept with the first span only; null counts as empty.
+  /// Opens a span. Does nothing while the request has an open span, or once it is to be submitted. A start
+  /// before the end of the last span counts from that end. `parameters` are kept with the first span only;
+  /// null counts as empty.
   void start(const std::string& uuid, double t, SharedDictionary parameters);
   /// Closes the open span, or cuts the last one shorter; never before its start. An unknown request is
   /// ignored.

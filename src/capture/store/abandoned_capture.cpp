@@ -50,7 +50,10 @@ double writtenAt(const std::string& path) {
 
 /// All of the media as one recording, for a journal that can't be trusted. Which request wanted what is not
 /// known any more; too much is better than too little, since it can be cut away later.
-CaptureRecord wholeOf(const CaptureRecord& damaged, const MovieIndex& index, const std::string& folder) {
+/// @param mayGo  false: the folder stays, and is found again by each start, which must not submit it each
+/// time
+CaptureRecord wholeOf(const CaptureRecord& damaged, const MovieIndex& index, const std::string& folder,
+                      bool mayGo) {
   const TrackIndex& lead = index.tracks.front();
   CaptureRecord record;
   record.recordingType = recordingTypeOf(index.video() != nullptr, index.audio() != nullptr);
@@ -68,7 +71,7 @@ CaptureRecord wholeOf(const CaptureRecord& damaged, const MovieIndex& index, con
   const bool single = requests.size() == 1;
   const std::string uuid = single ? requests.front().uuid : "recovered";
   record.marks.start(uuid, 0, parameters);
-  if (single && requests.front().submit) record.marks.submit(uuid);
+  if (single && requests.front().submit && mayGo) record.marks.submit(uuid);
   if (single && requests.front().queued) record.marks.markQueued(uuid);
   return record;
 }
@@ -113,17 +116,22 @@ Result<std::shared_ptr<Journal>> openJournal(const std::string& path, bool hasMe
 }
 
 /// The record to make movies by: the journal's if it can be trusted.
-CaptureRecord trusted(CaptureRecord record, const MovieIndex& index, const std::string& folder) {
+CaptureRecord trusted(CaptureRecord record, const MovieIndex& index, const std::string& folder, bool mayGo) {
   if (record.intact && !record.runs.empty()) return record;
   LMPLogMessage(nullptr, kLogError,
                 "The journal of %s is damaged: all that was captured is kept as one recording",
                 folder.c_str());
-  return wholeOf(record, index, folder);
+  return wholeOf(record, index, folder, mayGo);
+}
+
+/// Whether more follows what can be read than a killed writer leaves.
+bool hidesMedia(std::uint64_t mediaSize, const MovieIndex& index) {
+  return mediaSize > index.mediaEnd + kTornTailLimit;
 }
 
 /// Makes the media one whole movie. @return whether they may go once they have been used
 MediaAfterUse finishMedia(const std::string& media, std::uint64_t mediaSize, const MovieIndex& index) {
-  if (mediaSize > index.mediaEnd + kTornTailLimit) {
+  if (hidesMedia(mediaSize, index)) {
     LMPLogMessage(nullptr, kLogError,
                   "%s can be read up to %.0f s only; the movie ends there, and the file stays as it is",
                   media.c_str(), index.seconds());
@@ -157,7 +165,7 @@ std::shared_ptr<FinishedCapture> openAbandonedCapture(const std::string& folder)
     const std::uint32_t frames = mediaSize == 0 ? framesOfTheMovie(record) : 0;
     return std::make_shared<FinishedCapture>(folder, *journal, std::move(record), frames);
   }
-  record = trusted(std::move(record), *index, folder);
+  record = trusted(std::move(record), *index, folder, !hidesMedia(mediaSize, *index));
   const std::uint32_t frames = framesIn(*index, record.frameSeconds);
   return std::make_shared<FinishedCapture>(folder, *journal, std::move(record), frames,
                                            finishMedia(media, mediaSize, *index));

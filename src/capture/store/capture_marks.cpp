@@ -29,12 +29,14 @@ void CaptureMarks::cancel(const std::string& uuid) {
   journal_->cancel(uuid);
 }
 
-void CaptureMarks::submit(const std::string& uuid) {
+bool CaptureMarks::submit(const std::string& uuid) {
   const std::lock_guard lock(mutex_);
+  if (closed_) return false;
   const Request* request = marks_.find(uuid);
-  if (closed_ || request == nullptr || request->submit || request->cancelled) return;
+  if (request == nullptr || request->submit || request->cancelled) return true;
   marks_.submit(uuid);
   journal_->submit(uuid);
+  return true;
 }
 
 void CaptureMarks::pause(double t) {

@@ -23,7 +23,8 @@ class CaptureMarks {
   void stop(const std::string& uuid, double t);
   /// Does nothing to a request that is to be submitted.
   void cancel(const std::string& uuid);
-  void submit(const std::string& uuid);
+  /// @return false once the capture has been closed
+  bool submit(const std::string& uuid);
   void pause(double t);
   void resume(double t);
   /// Names the whole capture, from `t` on. The tag is no request: it records nothing and is not journalled.

@@ -153,12 +153,18 @@ int FinishedCapture::copyOver(const MovieIndex& index, const std::vector<FrameRa
 
 // ---- all that is pending
 
-std::vector<RecoveredRecording> FinishedCapture::recoverPending(const std::string& repository) {
+std::vector<RecoveredRecording> FinishedCapture::recoverPending(
+    const std::string& repository, const std::function<bool(const std::string& request)>& known) {
   const std::lock_guard lock(mutex_);
   std::vector<RecoveredRecording> recovered;
   const std::vector<Request> requests = record_.marks.requests();
   for (const Request& request : requests) {
     if (!request.pending()) continue;
+    // The process was killed between the two. One that is queued lacks its document.
+    if (known && !request.queued && known(request.uuid)) {
+      markDoneLocked(request.uuid);
+      continue;
+    }
     if (auto recording = recover(request, repository)) recovered.push_back(std::move(*recording));
   }
   removeIfResolvedLocked();
@@ -199,7 +205,7 @@ RecoveredRecording FinishedCapture::describe(const Request& request, const std::
   recording.path = path;
   recording.parameters = request.parameters;
   recording.recordingType = record_.recordingType;
-  recording.queued = [self = shared_from_this(), uuid = request.uuid] { self->queued(uuid); };
+  recording.queued = [self = shared_from_this(), uuid = request.uuid] { return self->queued(uuid); };
   recording.forget = [self = shared_from_this(), uuid = request.uuid] { self->handedOver(uuid); };
   const std::vector<FrameRange> ranges = framesFor(request);
   if (ranges.empty()) return recording;
@@ -235,19 +241,24 @@ void FinishedCapture::submit(const std::string& uuid) {
   journal_->submit(uuid);
 }
 
-void FinishedCapture::queued(const std::string& uuid) {
+bool FinishedCapture::queued(const std::string& uuid) {
   const std::lock_guard lock(mutex_);
   record_.marks.markQueued(uuid);
-  journal_->queued(uuid);
+  if (!journal_->queued(uuid)) return false;
   syncJournal();
+  return true;
 }
 
 void FinishedCapture::handedOver(const std::string& uuid) {
   const std::lock_guard lock(mutex_);
+  markDoneLocked(uuid);
+  removeIfResolvedLocked();
+}
+
+void FinishedCapture::markDoneLocked(const std::string& uuid) {
   record_.marks.markDone(uuid);
   journal_->done(uuid);
   syncJournal();  // the removal may not survive a power cut, and nothing is to be submitted twice
-  removeIfResolvedLocked();
 }
 
 void FinishedCapture::syncJournal() const {

@@ -1,5 +1,6 @@
 // A closed capture on the disk, and the movies made from it.
 #pragma once
+#include <functional>
 #include <memory>
 #include <mutex>
 #include <optional>
@@ -37,11 +38,15 @@ class FinishedCapture : public std::enable_shared_from_this<FinishedCapture> {
   Result<std::string, CaptureError> makeMovieBeside(const std::string& uuid, const std::string& path);
   /// Makes movies of all requests that are neither cancelled nor handed over. Those that can't be made for
   /// now (logged) stay pending.
-  std::vector<RecoveredRecording> recoverPending(const std::string& repository);
+  /// @param known  whether a job of that request has been stored, so that only this mark is missing; null:
+  /// none
+  std::vector<RecoveredRecording> recoverPending(
+      const std::string& repository, const std::function<bool(const std::string& request)>& known = nullptr);
   /// `uuid` is to be submitted.
   void submit(const std::string& uuid);
   /// The submission of `uuid` is kept elsewhere from now on.
-  void queued(const std::string& uuid);
+  /// @return false when that could not be written (logged)
+  [[nodiscard]] bool queued(const std::string& uuid);
   /// The movie of `uuid` and its document are in place. The folder goes when nothing in it is needed any
   /// more.
   void handedOver(const std::string& uuid);
@@ -63,6 +68,7 @@ class FinishedCapture : public std::enable_shared_from_this<FinishedCapture> {
   RecoveredRecording describe(const Request& request, const std::string& path);
   [[nodiscard]] double wallTimeOf(std::uint32_t frame) const;
   [[nodiscard]] std::vector<FrameRange> framesFor(const Request& request) const;
+  void markDoneLocked(const std::string& uuid);
   void removeIfResolvedLocked();
   void syncJournal() const;
 

@@ -39,11 +39,11 @@ Result<std::shared_ptr<Journal>> Journal::create(const std::string& path) {
   return std::shared_ptr<Journal>(new Journal(std::move(file)));
 }
 
-void Journal::append(const JournalWords& words) {
+bool Journal::append(const JournalWords& words) {
   const std::string line = journalLine(words);
   const std::lock_guard lock(mutex_);
   const ssize_t written = write(file_.get(), line.data(), line.size());
-  if (written == static_cast<ssize_t>(line.size())) return;
+  if (written == static_cast<ssize_t>(line.size())) return true;
   const int error = written < 0 ? errno : ENOSPC;
   // Half a line must not run into the next one. Truncating the file needs no space.
   struct stat status {};
@@ -53,6 +53,7 @@ void Journal::append(const JournalWords& words) {
   LMPLogMessage(nullptr, kLogError,
                 "The capture journal could not be written%s: %s; a crash now would lose marks",
                 whole ? "" : " and is damaged", std::strerror(error));
+  return false;
 }
 
 void Journal::capture(int recordingType, double frameSeconds, double wallOffset) {
@@ -78,7 +79,7 @@ void Journal::start(const std::string& uuid, double t, const SharedDictionary& p
 void Journal::stop(const std::string& uuid, double t) { append({"stop", uuid, number(t)}); }
 void Journal::cancel(const std::string& uuid) { append({"cancel", uuid}); }
 void Journal::submit(const std::string& uuid) { append({"submit", uuid}); }
-void Journal::queued(const std::string& uuid) { append({"queued", uuid}); }
+bool Journal::queued(const std::string& uuid) { return append({"queued", uuid}); }
 void Journal::pause(double t) { append({"pause", number(t)}); }
 void Journal::resume(double t) { append({"resume", number(t)}); }
 void Journal::movie(const std::string& uuid, const std::string& path) { append({"movie", uuid, path}); }

@@ -36,7 +36,8 @@ class Journal {
   /// The request has been stopped for good and is to be submitted.
   void submit(const std::string& uuid);
   /// The submission of the request is kept elsewhere from now on.
-  void queued(const std::string& uuid);
+  /// @return false when it could not be written
+  [[nodiscard]] bool queued(const std::string& uuid);
   void pause(double t);
   void resume(double t);
   /// The request is about to get its movie at `path`.
@@ -48,7 +49,7 @@ class Journal {
 
  private:
   explicit Journal(UniqueFd file) : file_(std::move(file)) {}
-  void append(const JournalWords& words);
+  bool append(const JournalWords& words);
   std::mutex mutex_;  ///< one line at a time, with the repair of one that could be written in part only
   const UniqueFd file_;
 };

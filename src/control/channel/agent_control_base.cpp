@@ -196,7 +196,8 @@ void AgentControlBase::flushReplies() {
     if (taken && connection == sockets_.replyTarget()) {
       runGuarded(context_, [&, &text = reply] { taken = deliver(text); });
     } else {
-      context_.logDebug("Reply dropped because its peer has gone or does not read: " + reply);
+      context_.logDebug("Reply dropped because its peer has gone, has lost its place or does not read: " +
+                        reply);
     }
   }
 }

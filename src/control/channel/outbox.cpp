@@ -11,7 +11,8 @@ Outbox::Outbox(std::size_t limit) : limit_(limit), ready_(::eventfd(0, EFD_CLOEX
 
 bool Outbox::push(Entry entry) {
   const std::lock_guard lock(mutex_);
-  if (waiting_.size() >= limit_) return false;
+  if (waiting_.size() >= limit_ || bytes_ + entry.reply.size() > kOutboxBytes) return false;
+  bytes_ += entry.reply.size();
   waiting_.push_back(std::move(entry));
   ::eventfd_write(ready_.get(), 1);  // can only fail when it is readable already
   return true;
@@ -21,6 +22,7 @@ std::deque<Outbox::Entry> Outbox::takeAll() {
   const std::lock_guard lock(mutex_);
   eventfd_t count = 0;
   ::eventfd_read(ready_.get(), &count);
+  bytes_ = 0;
   return std::exchange(waiting_, {});
 }
 

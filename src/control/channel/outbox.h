@@ -10,8 +10,10 @@
 
 namespace lmx {
 
-/// Most replies that wait: a peer that doesn't read must not own the machine's memory.
+/// Most replies that wait, and their bytes: a peer that doesn't read must not own the machine's memory. One
+/// reply with a preview may have more than twenty million bytes.
 inline constexpr std::size_t kOutboxLimit = 1000;
+inline constexpr std::size_t kOutboxBytes = std::size_t{64} << 20;
 
 /// A queue whose reader can wait for it together with its sockets. Thread-safe.
 class Outbox {
@@ -38,6 +40,7 @@ class Outbox {
   const UniqueFd ready_;  // eventfd
   std::mutex mutex_;      // guards waiting_ and its agreement with ready_
   std::deque<Entry> waiting_;
+  std::size_t bytes_ = 0;  // of the replies in waiting_
 };
 
 }  // namespace lmx

@@ -84,7 +84,9 @@ bool PeerAcceptor::takeSpeaking() {
 /// nobody come in between: a timed command may have something to say to it. Its silence has lasted already:
 /// whoever comes is served at once.
 bool PeerAcceptor::takeBackSilent() {
-  if (isReadable(listening_) || channel_.sockets.previousIfAlive() != -1) return false;
+  // The previous peer may have left its last words before it hung up.
+  if (isReadable(listening_) || channel_.sockets.previousSpeaks() || channel_.sockets.previousIfAlive() != -1)
+    return false;
   auto last = parked_.takeLast();
   if (!last) return false;
   putInPlace(std::move(*last));

@@ -33,7 +33,9 @@ void RecordingCommands::handleSTOP(const Dictionary*) {
     capture->setStopWithUUID(request, shiftedReferenceTime());
     capture->submitRequestWithUUID(request);
   }
-  performFor(request, &AgentActions::stopRecording, preparing ? Wait::untilDone : Wait::no);
+  // A recording without a capture has no journal: the main thread itself stores its job.
+  const bool waits = preparing || session->recordedType() == kRecordingTypeFile;
+  performFor(request, &AgentActions::stopRecording, waits ? Wait::untilDone : Wait::no);
   if (preparing) {
     capture = session->captureController.get();
     if (capture) capture->submitRequestWithUUID(request);

@@ -117,6 +117,17 @@ TEST_F(MainLoopTest, NoDeviceIsLookedForDuringARecording) {
   session_->status.set(kRecorderIdle);
 }
 
+TEST_F(MainLoopTest, ARecordingOfSoundSaysNothingOfTheCamera) {
+  framework_->cameras_attach = false;
+  session_->status.set(kRecorderRecording);
+  session_->setRecordedType(kRecordingTypeAudio);
+  checkedDevice(1000);
+  EXPECT_TRUE(turn());
+  EXPECT_GT(context_->state.last_device_check.get(), 0) << "put off, not given up";
+  session_->status.set(kRecorderIdle);
+  EXPECT_FALSE(turn());
+}
+
 TEST_F(MainLoopTest, NoDeviceIsLookedForWhileAStoppedRecordingIsBeingClosed) {
   const Controller controller = start("A");
   agent_.stopCapture();

@@ -3,6 +3,7 @@
 #include <ctime>
 
 #include "model/codes.h"
+#include "model/metadata_keys.h"
 #include "tests/unit/agent/agent_fixture.h"
 
 namespace lmx {
@@ -79,6 +80,18 @@ TEST_F(StartRecording, WithEmptyNamesIsSubmittedByWhomTheAgentKnows) {
   context_->options.user.set("bob");
   ASSERT_EQ(agent_.performStart(parameters("R1", {{"RecordingMetadata_AGENT_USERNAME", ""}})), 0);
   EXPECT_EQ(session_->request.get().user, "bob");
+}
+
+/// A restart must submit to the workflow as well.
+TEST_F(StartRecording, TheJournalLearnsWhoSubmitsToAWorkflow) {
+  context_->options.user.set("bob");
+  ASSERT_EQ(agent_.performStart(parameters("R1")), 0);
+  EXPECT_FALSE(lookUp(lastController()->marks()[1].parameters, metadata_key::kJobUser)) << "nobody needs it";
+  lastController()->shut_down = true;
+  session_->status.set(kRecorderIdle);
+  ASSERT_EQ(agent_.performStart(parameters("R2", {{"RecordingMetadata_ADHOC_WORKFLOW_UUID", "W"}})), 0);
+  EXPECT_EQ(lookUp(lastController()->marks()[1].parameters, metadata_key::kJobUser), "bob");
+  EXPECT_FALSE(lookUp(session_->request.get().properties, metadata_key::kJobUser)) << "nor does the document";
 }
 
 TEST_F(StartRecording, OnlyTheExactTextTrueMakesAudioOnly) {

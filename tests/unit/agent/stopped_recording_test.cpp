@@ -1,6 +1,7 @@
 // How a stopped recording becomes a job: movie, document, queue.
 #include "capture/api/capture_framework.h"
 #include "model/codes.h"
+#include "model/metadata_keys.h"
 #include "postprocess/properties_document.h"
 #include "postprocess/property_gatherer.h"
 #include "tests/unit/agent/agent_fixture.h"
@@ -350,7 +351,10 @@ class LeftOver : public StoppedRecording {
     recording.recordingType = kRecordingTypeAudioVideo;
     recording.stopTime = stopTime;
     recording.forget = [this, uuid] { journal_.add("forget " + uuid); };
-    recording.queued = [this, uuid] { journal_.add("queued " + uuid); };
+    recording.queued = [this, uuid] {
+      journal_.add("queued " + uuid);
+      return true;
+    };
     return recording;
   }
   /// @return the recordings of the jobs in the list, in order
@@ -402,7 +406,8 @@ TEST_F(LeftOver, OneThatHasItsJobAlreadyGetsNoSecond) {
   framework_->unfinished = {stopped("A", 100)};
   EXPECT_EQ(takeUp(), Entries{"A"});
   EXPECT_TRUE(testing::waitUntil([&] { return agent_.submission().isIdle(); }));
-  EXPECT_EQ(journalCount("forget A"), 1);
+  EXPECT_FALSE(log_.mentions("Finished recording") || log_.mentions("Recovered unfinished"));
+  EXPECT_FALSE(std::filesystem::exists(movie("A.xml"))) << "the tool may have taken it with the movie";
 }
 
 TEST_F(LeftOver, OneWhoseSubmissionIsDisabledGetsItsDocumentOnly) {
@@ -422,6 +427,43 @@ TEST_F(LeftOver, OneWithoutItsDocumentIsSubmittedOnceAndKept) {
   EXPECT_EQ(takeUp(), Entries{"A"});
   EXPECT_EQ(journalCount("queued A"), 1);
   EXPECT_EQ(journalCount("forget A"), 0);
+}
+
+TEST_F(LeftOver, OneThatCouldNotBeMarkedWaitsForTheNextStart) {
+  auto homeless = stopped("A", 100);
+  homeless.path = movie("missing-folder/A.mov");
+  homeless.queued = [] { return false; };
+  framework_->unfinished = {homeless};
+  agent_.submission().takeUpUnfinished(framework_);
+  EXPECT_TRUE(testing::waitUntil([&] { return agent_.submission().isIdle(); }));
+  EXPECT_TRUE(std::filesystem::is_empty(systemPath(kJobsDirectory))) << "or it would be submitted twice";
+}
+
+/// A START before it had named who submits.
+TEST_F(LeftOver, IsSubmittedByWhomItsStartHad) {
+  auto mine = stopped("A", 100);
+  mine.parameters =
+      std::make_shared<const Dictionary>(Dictionary{{"RecordingMetadata_RECORDING_UUID", "A"},
+                                                    {"RecordingMetadata_AGENT_USERNAME", ""},
+                                                    {"RecordingMetadata_ADHOC_WORKFLOW_UUID", "W"},
+                                                    {metadata_key::kJobUser, "bob"},
+                                                    {metadata_key::kJobPassword, "sesame"}});
+  framework_->unfinished = {mine};
+  EXPECT_EQ(takeUp(), Entries{"A"});
+  EXPECT_EQ(jobs_.at(0)->user, "bob");
+  EXPECT_EQ(jobs_.at(0)->password, "sesame");
+  EXPECT_FALSE(jobs_.at(0)->properties.contains(metadata_key::kJobUser))
+      << "the document holds what START gave";
+}
+
+TEST_F(StoppedRecording, ThatCouldNotBeDocumentedNorMarkedWaitsForTheNextStart) {
+  const auto controller = start("R1");
+  controller->journal_can_be_written = false;
+  std::filesystem::create_directory(movie("R1.xml"));  // the document can't be written
+  stopAndReport(controller);
+  EXPECT_TRUE(log_.waitForPart("is submitted by the next start"));
+  EXPECT_TRUE(testing::waitUntil([&] { return agent_.submission().isIdle(); }));
+  EXPECT_TRUE(std::filesystem::is_empty(systemPath(kJobsDirectory)));
 }
 
 TEST_F(LeftOver, ACancelledCaptureSubmitsWhatHadBeenStopped) {

@@ -123,7 +123,11 @@ class ScriptedCaptureController : public LMRCaptureController {
     if (failure) return *failure;
     return outputPath;
   }
-  void requestQueued(const std::string& uuid) override { journal_.add("requestQueued " + uuid); }
+  bool journal_can_be_written = true;
+  bool requestQueued(const std::string& uuid) override {
+    journal_.add("requestQueued " + uuid);
+    return journal_can_be_written;
+  }
   void requestHandedOver(const std::string& uuid) override { journal_.add("requestHandedOver " + uuid); }
   std::function<std::vector<RecoveredRecording>()> on_recover;
   std::vector<RecoveredRecording> recoverAbandonedRequests() override {

@@ -55,7 +55,14 @@ class ScriptedFramework : public CaptureFramework {
   void warmUp() override { journal_.add("warmUp"); }
   std::string deviceInformation() override { return "camera, microphone\n"; }
   std::vector<RecoveredRecording> unfinished;
-  std::vector<RecoveredRecording> recoverUnfinished(const std::string&) override { return unfinished; }
+  std::vector<RecoveredRecording> recoverUnfinished(
+      const std::string&, const std::function<bool(const std::string&)>& known) override {
+    std::vector<RecoveredRecording> unknown;
+    for (const auto& recording : unfinished) {
+      if (!known(recording.request)) unknown.push_back(recording);
+    }
+    return unknown;
+  }
 
   std::optional<std::string> defaultVideoDevice() override { return "camera"; }
   std::optional<std::string> defaultMuxedDevice() override { return std::nullopt; }

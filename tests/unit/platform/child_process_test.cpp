@@ -8,9 +8,11 @@
 #include <cerrno>
 #include <csignal>
 #include <cstdio>
+#include <filesystem>
 #include <thread>
 
 #include "support/unique_fd.h"
+#include "tests/unit/doubles/temporary_directory.h"
 
 namespace lmx {
 namespace {
@@ -100,13 +102,16 @@ TEST(ChildProcess, AChildIsCancelledWhileItRuns) {
   ASSERT_EQ(pipe2(ends, O_CLOEXEC), 0);
   const UniqueFd cancel(ends[0]);
   UniqueFd keep(ends[1]);
+  const testing::TemporaryDirectory folder;
   ChildOptions options;
   options.cancel = cancel.get();
-  options.reportEvery = 50ms;  // by then it runs
-  options.stillRunning = [&keep](std::chrono::milliseconds) { keep.reset(); };
-  const ChildResult result = shell("echo begun; exec sleep 60", options);
+  options.reportEvery = 20ms;
+  options.stillRunning = [&](std::chrono::milliseconds) {
+    if (std::filesystem::exists(folder.file("begun"))) keep.reset();
+  };
+  const ChildResult result = shell("echo output; touch " + folder.file("begun") + "; exec sleep 60", options);
   EXPECT_EQ(result.end, End::cancelled);
-  EXPECT_EQ(result.output, "begun\n");
+  EXPECT_EQ(result.output, "output\n");
 }
 
 TEST(ChildProcess, AfterACancellationNoChildIsStarted) {

@@ -2,11 +2,33 @@
 #include "postprocess/job_store.h"
 
 #include <sys/stat.h>
+#include <sys/syscall.h>
+#include <unistd.h>
 
+#include <cerrno>
 #include <filesystem>
 
 #include "model/metadata_keys.h"
 #include "tests/unit/postprocess/submit_fixture.h"
+
+namespace {
+
+bool directory_syncs_fail = false;
+std::string synced;  ///< what has been synced: "f" for a file, "d" for a directory
+
+}  // namespace
+
+/// Stands for the system's in this program.
+extern "C" int fsync(int descriptor) {
+  struct stat status {};
+  const bool directory = fstat(descriptor, &status) == 0 && S_ISDIR(status.st_mode);
+  if (directory && directory_syncs_fail) {
+    errno = EIO;
+    return -1;
+  }
+  synced += directory ? 'd' : 'f';
+  return static_cast<int>(syscall(SYS_fsync, descriptor));
+}
 
 namespace lmx {
 namespace {
@@ -120,9 +142,49 @@ TEST_F(Jobs, WhoseToolHadBeenStartedAreOnlyNamed) {
   };
   kept->addRecordingWithCommentary(children_);
   EXPECT_TRUE(checked);
+}
+
+/// A start that is itself cut short must neither name it again nor forget it.
+TEST_F(Jobs, ThatHadBegunAreNamedOnceAndKnownUntilTheCapturesHaveBeenSeen) {
+  const auto kept = job("R1");
+  JobStore(folder()).keep(*kept, 1);
+  kept->stored->begin();
+  for (const bool first : {true, false}) {
+    JobStore next(folder());
+    EXPECT_EQ(takenUp(next), Names{});
+    EXPECT_EQ(left_.begun, first ? Names{inRepository("R1.mov")} : Names{});
+    EXPECT_TRUE(next.tookUp("request of R1"));
+    if (!first) next.forgetBegun();
+  }
+  EXPECT_EQ(filesLeft(), 0U);
   JobStore last(folder());
   takenUp(last);
-  EXPECT_EQ(left_.begun, Names{}) << "named once";
+  EXPECT_FALSE(last.tookUp("request of R1"));
+}
+
+TEST_F(Jobs, SurviveAPowerCutInEachState) {
+  const auto kept = job("R1");
+  JobStore store(folder());
+  takenUp(store);  // makes the folder
+  synced.clear();
+  store.keep(*kept, 1);
+  EXPECT_EQ(synced, "fd") << "the file, then its name";
+  synced.clear();
+  kept->stored->begin();
+  EXPECT_EQ(synced, "d") << "its new name";
+}
+
+/// The file is there: a job that did not know it would be submitted again by the next start.
+TEST_F(Jobs, WhoseFileMayNotSurviveAPowerCutAreRemovedAllTheSame) {
+  const auto kept = job("R1");
+  JobStore(folder()).keep(*job("other"), 1);  // makes the folder
+  directory_syncs_fail = true;
+  JobStore(folder()).keep(*kept, 2);
+  directory_syncs_fail = false;
+  EXPECT_TRUE(log_.mentions("could not be stored"));
+  EXPECT_EQ(filesLeft(), 2U);
+  kept->addRecordingWithCommentary(children_);
+  EXPECT_EQ(filesLeft(), 1U);
 }
 
 TEST_F(Jobs, ThatFailBeforeTheToolAreGoneToo) {

@@ -83,7 +83,8 @@ TEST_F(StopTimesOfStart, AnEndlessUnattendedLimitDoesNotEndTheRecording) {
     stop_times_.updateSoftStopTime();
     const auto stop = stop_times_.softStopTime.get();
     ASSERT_TRUE(stop) << minutes;
-    EXPECT_NEAR(static_cast<double>(stop->tv_sec - lmp_gettimeofday()->tv_sec), static_cast<double>(seconds), 1.0)
+    EXPECT_NEAR(static_cast<double>(stop->tv_sec - lmp_gettimeofday()->tv_sec), static_cast<double>(seconds),
+                1.0)
         << minutes;
     EXPECT_FALSE(stop_times_.shouldStopRecording()) << minutes;
   }

@@ -136,6 +136,13 @@ TEST_F(Stop, StatusComesFromTheControllersState) {
   }
 }
 
+TEST_F(Stop, StatusHasTheLastSecondThatFitsForAHardStopBeyondThat) {
+  session_->stop_times.hardStopTime.set(TimeValue{4000000000, 0});
+  RecordStatus status;
+  EXPECT_EQ(LXAgentRecordGetStatus(session_, &status), 0);
+  EXPECT_EQ(status.hardStop, 2147483647);
+}
+
 TEST_F(Stop, StatusKeepsOutputsOfUnsetTimes) {
   RecordStatus status{.start = 11, .stop = 12, .hardStop = 13};
   EXPECT_EQ(LXAgentRecordGetStatus(session_, &status), 0);

@@ -163,9 +163,21 @@ TEST_F(StopTimes, DeadlinesFollowAClockThatIsSet) {
 TEST_F(StopTimes, AutoShutoffLeavesTheDeadlinesOfTheNextRecording) {
   session_->stop_times.hardStopTime.set(TimeValue{1000, 0});
   actions_.on_stop_recording = [this] { session_->stop_times.hardStopTime.set(TimeValue{2000, 0}); };
-  doAutoShutoff(*session_);
+  doAutoShutoff(*session_, {.request = "request", .hard = TimeValue{1000, 0}, .soft = {}});
   ASSERT_TRUE(session_->stop_times.hardStopTime.get());
   EXPECT_EQ(session_->stop_times.hardStopTime.get()->tv_sec, 2000);
+}
+
+/// The thread of one recording may be held up while the main thread stops that and starts the next.
+TEST_F(StopTimes, AutoShutoffIsAboutTheRecordingItHasLookedAt) {
+  session_->stop_times.hardStopTime.set(TimeValue{1000, 0});
+  session_->request.set({.uuid = "looked at"});
+  checkForAutoShutoffConditions(*session_);
+  EXPECT_EQ(actions_.addressed, std::vector<std::string>{"looked at"});
+  session_->stop_times.hardStopTime.set(TimeValue{1000, 0});
+  session_->preparing_request.set("being prepared");
+  checkForAutoShutoffConditions(*session_);
+  EXPECT_EQ(actions_.addressed.back(), "being prepared") << "its deadline may pass while the camera opens";
 }
 
 TEST_F(StopTimes, BeginningIsTheStartOrElseThePreparation) {

@@ -67,6 +67,31 @@ TEST(Recovery, TellsWhatHadBeenStopped) {
   }
 }
 
+/// The process was killed after its job had been stored.
+TEST(Recovery, OfWhatHasItsJobAlreadyMakesNothing) {
+  const Folder repository;
+  const auto folder = crashedCapture(repository, std::string(kJournal) + "stop R 2\nsubmit R\n", 4);
+  const auto capture = openAbandonedCapture(folder);
+  ASSERT_TRUE(capture);
+  const auto known = [](const std::string& request) { return request == "R"; };
+  EXPECT_TRUE(capture->recoverPending(repository.path(), known).empty());
+  EXPECT_FALSE(std::filesystem::exists(repository.file("LECTURE.mov")));
+  EXPECT_FALSE(std::filesystem::exists(folder));
+}
+
+/// Such a folder stays, and each start finds it again.
+TEST(Recovery, OfADamagedCaptureThatStaysIsNotToBeSubmitted) {
+  const Folder repository;
+  const std::string lines = std::string(kJournal) + "stop R 1\nsubmit R\nrun x\n";
+  const auto folder = crashedCapture(repository, lines, 4);
+  std::filesystem::resize_file(folder + "/media.mov", std::uintmax_t{20} << 20);
+  const auto capture = openAbandonedCapture(folder);
+  ASSERT_TRUE(capture);
+  const auto recovered = capture->recoverPending(repository.path());
+  ASSERT_EQ(recovered.size(), 1U);
+  EXPECT_FALSE(recovered[0].submit);
+}
+
 /// The tool finds a recording by its name.
 TEST(Recovery, OfWhatIsToBeSubmittedGetsItsNameEvenIfThatIsTaken) {
   const Folder repository;

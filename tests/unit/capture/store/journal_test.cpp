@@ -26,7 +26,7 @@ TEST(Journal, WritesALineForEachEvent) {
   (*journal)->stop("R", 3);
   (*journal)->submit("R");
   (*journal)->movie("R", "/r/My Talk.mov");
-  (*journal)->queued("R");
+  EXPECT_TRUE((*journal)->queued("R"));
   std::ifstream file(folder.file("journal"));
   EXPECT_EQ(std::string((std::istreambuf_iterator<char>(file)), {}),
             "capture 2 0.040000000000 1000.5000000\n"

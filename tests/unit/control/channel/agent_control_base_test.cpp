@@ -414,8 +414,9 @@ TEST_F(BusyChannel, AReplyBelongsToTheConnectionAtWhichItWasGiven) {
   behind_the_reply_ = [&](ScriptedChannel& channel) { channel.useSocket(ends[0]); };
   channel_.sendReply("cmdStatus=38");
   release();
-  EXPECT_TRUE(
-      log_.waitFor(kLogDebug, "Reply dropped because its peer has gone or does not read: cmdStatus=38"));
+  EXPECT_TRUE(log_.waitFor(
+      kLogDebug,
+      "Reply dropped because its peer has gone, has lost its place or does not read: cmdStatus=38"));
   EXPECT_EQ(channel_.replies(), Lines{"cmdStatus=0"});
 }
 
@@ -424,8 +425,9 @@ TEST_F(BusyChannel, APeerThatTakesNoMoreLosesWhatWaitsForIt) {
   channel_.sendReply("cmdStatus=1");
   channel_.sendReply("cmdStatus=2");
   release();
-  EXPECT_TRUE(
-      log_.waitFor(kLogDebug, "Reply dropped because its peer has gone or does not read: cmdStatus=2"));
+  EXPECT_TRUE(log_.waitFor(
+      kLogDebug,
+      "Reply dropped because its peer has gone, has lost its place or does not read: cmdStatus=2"));
   EXPECT_EQ(channel_.replies(), (Lines{"cmdStatus=0", "cmdStatus=1"}));
 }
 

@@ -32,5 +32,15 @@ TEST(Outbox, AFullOneTakesNoMoreUntilItIsEmptied) {
   EXPECT_TRUE(outbox.push({"4", 1}));
 }
 
+TEST(Outbox, OneFullOfBytesTakesNoMoreEither) {
+  Outbox outbox;
+  const std::string half(kOutboxBytes / 2, 'x');
+  EXPECT_TRUE(outbox.push({half, 1}));
+  EXPECT_TRUE(outbox.push({half, 1}));
+  EXPECT_FALSE(outbox.push({"x", 1}));
+  EXPECT_EQ(outbox.takeAll().size(), 2U);
+  EXPECT_TRUE(outbox.push({half, 1}));
+}
+
 }  // namespace
 }  // namespace lmx

@@ -197,6 +197,14 @@ TEST_F(RecordingCommandsTest, AStopDuringAPreparationWaitsForItAndEndsThat) {
   EXPECT_EQ(made->marks().at(0).uuid, "Q2");
 }
 
+/// Only the job keeps it.
+TEST_F(RecordingCommandsTest, AStopOfAFileWaitsForItsJob) {
+  session_->captureController.set(nullptr);
+  session_->setRecordedType(kRecordingTypeFile);
+  EXPECT_EQ(run("STOP"), Lines{"cmdStatus=0"});
+  EXPECT_EQ(journal_.entries(), Lines{"stopRecording, waiting"});
+}
+
 TEST_F(RecordingCommandsTest, AResumeForAnEarlierRecordingMarksNothing) {
   session_->request.set({.uuid = "Q1"});
   actions_.on_resume_capture = [&] { session_->request.set({.uuid = "Q2"}); };

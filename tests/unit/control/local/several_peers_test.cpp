@@ -312,8 +312,10 @@ TEST_P(Interleaving, EveryLineIsExecutedOnceAndNoneIsMixed) {
     return ended.empty() || log_.contains(kLogError, "Unknown command [" + ended + "]");
   };
   while (!std::all_of(speeches.begin(), speeches.end(), [](const Speech& one) { return one.done(); })) {
-    const std::size_t who = random() % peers.size();
-    if (may_go_on(who)) peers[who].send(speeches[who].nextPiece(random));
+    std::size_t who = 0;
+    ASSERT_TRUE(testing::waitUntil([&] { return may_go_on(who = random() % peers.size()); }))
+        << "a line is lost";
+    peers[who].send(speeches[who].nextPiece(random));
   }
   ASSERT_TRUE(testing::waitUntil(all_read));
   channel_->stop();
