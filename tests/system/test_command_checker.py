@@ -98,6 +98,15 @@ def test_after_a_kill_a_recording_is_kept_and_not_submitted():
     assert complaints(stopped, {"A": kept(2.0, -1, submissions=0, named=True)}) == []
 
 
+def test_a_kill_right_behind_a_stop_may_cost_a_second():
+    def history(kill):
+        return [said("START", 100.0, title="A"), said("STOP", 100.6), Operation("KILL", "signal", kill, kill + 0.1),
+                Operation("RESTART", "world", kill + 0.2, kill + 0.5)]
+    assert complaints(history(100.7), {"A": Left(empty=True)}) == []
+    assert complaints(history(103.0), {"A": Left(empty=True)})
+    assert complaints(history(100.7), {"A": Left()})
+
+
 def test_only_a_brief_recording_may_be_empty_and_the_log_must_say_so():
     for stop, empty, good in ((100.1, True, True), (100.1, False, False), (102.0, True, False)):
         history = [said("START", 100.0, title="A"), said("STOP", stop)]
@@ -180,6 +189,12 @@ def test_timed_commands_are_followed_through_the_log():
     assert [op.verb for op, _ in ran.ran] == ["STOP", "START"] and not ran.complaints
     swapped = follow(SENT, story_of(*STOP_AND_START, "Running deferred command: START"))
     assert "but a START ran" in swapped.complaints[0] and swapped.waiting
+
+
+def test_what_is_scheduled_at_its_date_may_come_too_late_for_its_turn():
+    lines = story_of(*STOP_AND_START, "Running deferred command: START", "Running deferred command: STOP")
+    lines[1], lines[2] = (LogLine(Level.DEBUG, 3, 1, line.text, at, "") for line, at in zip(lines[1:3], (2.0, 2.004)))
+    assert [op.verb for op, _ in follow(SENT, lines).ran] == ["START", "STOP"]
 
 
 def test_timed_commands_are_followed_over_a_restart():

@@ -31,7 +31,7 @@ ENOUGH = int(os.environ.get("LMX_ENOUGH", "5"))  # failures, and no more sequenc
 
 def play(hall, script):
     """Plays one sequence. @return its record"""
-    if script.theme == "aimed":
+    if script.theme == "aimed" or script.kills():  # a kill is not to meet what the sequence before has stopped
         hall.wait_still()
     hall.begin_sequence(str(script.seed))
     hall.agent.set_tool({"when": "--submit", "delay": script.tool_delay})

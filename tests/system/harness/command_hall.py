@@ -16,6 +16,7 @@ from .waiting import let_pass, wait_until
 
 CLOCK = time.time() - time.monotonic()  # from the log's clock to the wall clock
 SMALL_CAMERA = "test://video?size=320x180&fps=30"
+JOBS = "/var/lmx/agent/jobs"
 ROOM, NO_ROOM = "1", "2000000000"  # megabytes that must be free
 SIGNAL_LINES = {"USR1": r"^Got Pause Signal$", "USR2": r"^Got Resume Signal$", "HUP": r"^Got Signal \(SIGHUP\)$",
                 "INT": r"^Got Stop Signal", "TERM": r"^Got Termination Signal"}
@@ -219,7 +220,7 @@ class Hall:
     def wait_timed(self):
         """Waits until all timed commands have run, or have expired while there was no daemon, and notes them."""
         if not self._timed:
-            return
+            return self.wait_main() if self._unasked else None
         if self._lives != self._first_life:
             self.wait_main()  # until then the timers file may not have been read
         with contextlib.suppress(AssertionError):
@@ -338,10 +339,5 @@ class Hall:
             return False
 
     def _is_quiet(self):
-        begun, ended = self.agent.submitted(), self.agent.submitted("end")
-        movies = len(self.agent.log.lines(r"recording stopped \(duration: "))
-        return self._is_still() and len(begun) >= movies and len(ended) >= len(begun) - self.kills()
-
-    def kills(self):
-        """How many tools may have been killed with the daemon."""
-        return len(self.agent.log.lines(r"lmxagentd \(version .*starting"))
+        jobs = self.agent.path(JOBS)
+        return self._is_still() and not (jobs.exists() and list(jobs.iterdir()))

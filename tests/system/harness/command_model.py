@@ -35,10 +35,11 @@ class Operation:
     optional: bool = False  # it may never have reached the daemon
     number: int = 0
     due: int = 0  # of a timed command
+    rank: int = 0  # of a timed command, among those that ran, when that is known
 
     def turn(self):
         """Where it comes among the timed commands: in one second what ends a recording runs before what begins one."""
-        return self.due, self.verb not in ("STOP", "CANCEL"), self.number
+        return self.rank, self.due, self.verb not in ("STOP", "CANCEL"), self.number
 
     def __str__(self):
         reply = " or ".join(text.strip() for text in self.replies) or "no reply known"
@@ -114,8 +115,9 @@ class Refused(Exception):
 class Model:
     """The transitions. `left` holds what was found of each recording, by title."""
 
-    def __init__(self, left):
+    def __init__(self, left, kills=()):
         self.left = left
+        self.kills = kills  # when
 
     def after(self, state, op):
         """The state that follows. Raises Refused with the reason if the reply, or what was left, contradicts."""
@@ -188,7 +190,7 @@ class Model:
             state = self._close_span(state, op)
         found = self.left[state.recording]
         ending = ENDS[op.verb]
-        brief = state.least < (KILL_LOSS if op.verb == "KILL" else SHORT_LIFE)
+        brief = state.least < (KILL_LOSS if self._cut(op) else SHORT_LIFE)
         reason = contradiction(ending, found, brief)
         if reason:
             raise Refused(f"{op.verb} {state.recording}: {reason}")
@@ -201,9 +203,12 @@ class Model:
             self._check_length(state, op, found)
         return replace(state, recording="", paused=False, last=last)
 
-    @staticmethod
-    def _check_length(state, op, found):
-        loss = KILL_LOSS if op.verb == "KILL" else FOREVER if op.verb in ("GUARD", "LOSS") else 0.0
+    def _cut(self, op):
+        """Whether a kill may have come before what ended the recording had done its work."""
+        return op.verb == "KILL" or any(op.sent <= kill <= op.done + SETTLE for kill in self.kills)
+
+    def _check_length(self, state, op, found):
+        loss = KILL_LOSS if self._cut(op) else FOREVER if op.verb in ("GUARD", "LOSS") else 0.0
         if not state.least - LENGTH_SLACK - loss <= found.seconds <= state.most + LENGTH_SLACK:
             raise Refused(f"{op.verb} {state.recording}: its movie has {found.seconds:.2f} s, the commands allow "
                           f"{state.least:.2f} to {state.most:.2f}")
@@ -234,7 +239,8 @@ def explain(operations, left, initial=State()):
     `left` holds a Left for each START's title. @return the Explanation; its last state is where the next one begins
     """
     operations = sorted(operations, key=lambda op: op.sent)
-    return _Search(operations, Model(left)).run(initial)
+    kills = [op.done for op in operations if op.verb == "KILL"]
+    return _Search(operations, Model(left, kills)).run(initial)
 
 
 class _Search:

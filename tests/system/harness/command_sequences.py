@@ -61,6 +61,9 @@ class Sequence:
         lanes = [[self.lanes[l][i] for i, l in kept if l == lane] for lane in range(len(self.lanes))]
         return Sequence(self.seed, self.theme, lanes, self.last, self.tool_delay)
 
+    def kills(self):
+        return any(event.verb == "KILL" for lane in self.lanes for event in lane)
+
     def loses_camera(self):
         return any(event.verb in ("LOSS", "GONE") for lane in self.lanes for event in lane)
 

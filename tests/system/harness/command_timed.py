@@ -5,6 +5,7 @@ from dataclasses import dataclass, field, replace
 
 from .command_model import FOREVER, Operation
 
+LATE = 0.1  # seconds; what is scheduled so shortly before a timed command runs may have come too late for its turn
 RAN_WITHIN = 0.3  # seconds after its line within which a timed command has taken effect
 SCHEDULING = re.compile(r"^(Scheduling|Not scheduling) (\w+) command.*: (\d{4}-\d\d-\d\d \d\d:\d\d:\d\d [+-]\d{4})$")
 RUNNING = re.compile(r"^Running deferred command: (\w+)$")
@@ -18,6 +19,7 @@ class Fate:
     ran: list = field(default_factory=list)  # (operation, when on the log's clock)
     waiting: list = field(default_factory=list)
     expired: list = field(default_factory=list)  # their time had come while there was no daemon
+    scheduled: dict = field(default_factory=dict)  # when, by number
     lost: list = field(default_factory=list)  # waited when the daemon ended and were not heard of again
     complaints: list = field(default_factory=list)
 
@@ -31,18 +33,19 @@ def follow(sent, lines):
             fate.lost += fate.waiting
             fate.waiting = []
         elif scheduling:
-            _schedule(fate, coming, *scheduling.groups())
+            _schedule(fate, coming, line.at, *scheduling.groups())
         elif running:
             _run(fate, running[1], line.at)
     return fate
 
 
-def _schedule(fate, coming, what, verb, date):
+def _schedule(fate, coming, at, what, verb, date):
     due = int(datetime.datetime.strptime(date, "%Y-%m-%d %H:%M:%S %z").timestamp())
     for source in (fate.lost, coming):
         found = next((op for op in source if (op.verb, op.due) == (verb, due)), None)
         if found:
             source.remove(found)
+            fate.scheduled[found.number] = at
             (fate.waiting if what == "Scheduling" else fate.expired).append(found)
             return
     if what == "Scheduling":
@@ -51,7 +54,8 @@ def _schedule(fate, coming, what, verb, date):
 
 def _run(fate, verb, at):
     """In one second what ends a recording comes first, then the order of sending counts."""
-    first = min(fate.waiting, key=Operation.turn, default=None)
+    in_time = [op for op in fate.waiting if op.verb == verb or fate.scheduled[op.number] < at - LATE]
+    first = min(in_time, key=Operation.turn, default=None)
     if first is None or first.verb != verb:
         fate.complaints.append(f"this timed command was due: {first}, but a {verb} ran")
         return
@@ -88,10 +92,10 @@ class TimedList:
         the log's clock to the wall clock."""
         fate = follow([op for op, _ in self._sent], lines)
         operations = []
-        for op, at in fate.ran:
+        for rank, (op, at) in enumerate(fate.ran, 1):
             done = at + clock + RAN_WITHIN
             cut = any(end.sent <= done and at + clock <= end.done for end in ends)
-            operations.append(replace(op, done=done, optional=cut))
+            operations.append(replace(op, done=done, optional=cut, rank=rank))
         answers = {op.number: answered for op, answered in self._sent}
         lost = [op for op in fate.lost if not any(end.sent <= answers[op.number] for end in ends)]
         complaints = [f"the timed {op.verb} {op.title} was scheduled and is lost" for op in lost]
