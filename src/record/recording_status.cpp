@@ -31,7 +31,8 @@ int LXAgentRecordGetStatus(const std::shared_ptr<AgentRecord>& session, RecordSt
   status->recordStatus = recorderStatusOf(state);
   status->elapsedSeconds = controller ? controller->elapsedTimeInMilliseconds() / 1000 : 0;
   const auto seconds = [](const AgentRecord::Time& time, std::int32_t& out) {
-    constexpr std::int64_t kMost = std::numeric_limits<std::int32_t>::max();  // a hard stop may lie beyond 2038
+    constexpr std::int64_t kMost =
+        std::numeric_limits<std::int32_t>::max();  // a hard stop may lie beyond 2038
     if (time) out = static_cast<std::int32_t>(std::min<std::int64_t>(time->tv_sec, kMost));
   };
   seconds(session->launchTime.get(), status->start);
