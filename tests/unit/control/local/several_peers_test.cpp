@@ -59,6 +59,12 @@ class SeveralPeers : public ::testing::Test {
     peer.send("STOP\n");
     return peer.receiveUpTo("cmdStatus=0") == "cmdStatus=0";
   }
+  /// The present peer is set aside for one that does not stay.
+  bool anotherComesAndLeaves() {
+    LocalPeer next;
+    letSilencePass();
+    return isServed(next);
+  }
   void letSilencePass() { clock_.passed_seconds += 11; }
 
   testing::LogCapture log_;
@@ -153,22 +159,14 @@ TEST_F(SeveralPeers, HeldPlacesGoWithTheChannel) {
 TEST_F(SeveralPeers, WhenThePresentOneLeavesThoseSetAsideAreStillHeard) {
   LocalPeer silent;
   ASSERT_TRUE(isServed(silent));
-  {
-    LocalPeer next;
-    letSilencePass();
-    ASSERT_TRUE(isServed(next));
-  }
+  ASSERT_TRUE(anotherComesAndLeaves());
   EXPECT_TRUE(isServed(silent));
 }
 
 TEST_F(SeveralPeers, WhenThePresentOneLeavesATimedCommandAnswersTheOneSetAside) {
   LocalPeer silent;
   ASSERT_TRUE(isServed(silent));
-  {
-    LocalPeer next;
-    letSilencePass();
-    ASSERT_TRUE(isServed(next));
-  }
+  ASSERT_TRUE(anotherComesAndLeaves());
   ASSERT_TRUE(log_.waitFor(kLogDebug, kTakenBack));
   channel_->completeTimedCommand(std::make_shared<const Dictionary>(Dictionary{{"command", "STOP"}}));
   EXPECT_EQ(silent.receiveUpTo("cmdStatus=38"), "cmdStatus=38");
@@ -177,11 +175,7 @@ TEST_F(SeveralPeers, WhenThePresentOneLeavesATimedCommandAnswersTheOneSetAside) 
 TEST_F(SeveralPeers, OneThatIsSilentForLongDoesNotMakeLaterOnesWait) {
   LocalPeer silent;
   ASSERT_TRUE(isServed(silent));
-  {
-    LocalPeer next;
-    letSilencePass();
-    ASSERT_TRUE(isServed(next));
-  }
+  ASSERT_TRUE(anotherComesAndLeaves());
   for (int i = 0; i < 3; ++i) {
     LocalPeer later;
     EXPECT_TRUE(isServed(later));
