@@ -17,7 +17,7 @@ from harness import command_outcome
 from harness.agent import Agent
 from harness.command_cells import arrivals, cells_hit, cells_impossible, cells_missed, refused_for_room
 from harness.command_hall import CLOCK, Hall
-from harness.command_model import State, direct_complaints, explain
+from harness.command_model import PROCESS_ENDS, State, direct_complaints, explain
 from harness.command_sequences import sequence
 
 COUNT = int(os.environ.get("LMX_SEQUENCES", "24"))
@@ -116,8 +116,8 @@ def check_batch(hall, records, state):
         state = record.check(hall.agent, left, state)
         if record.wrong():
             failures.append(record.report(hall.agent, left))
-    killed = any(op.verb == "KILL" for record in records for op in record.operations)
-    found = command_outcome.strays(hall.agent, titles, killed)
+    ended = any(op.verb in PROCESS_ENDS for record in records for op in record.operations)
+    found = command_outcome.strays(hall.agent, titles, ended)
     if found:
         failures.append(f"files that belong to no recording: {found}")
     if not quiet and not failures:

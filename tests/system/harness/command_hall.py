@@ -15,6 +15,7 @@ from .commands import command_line, start_parameters, timed_line
 from .waiting import let_pass, wait_until
 
 CLOCK = time.time() - time.monotonic()  # from the log's clock to the wall clock
+TUNNEL_AWAY = 13.0  # seconds after a SIGHUP; when it comes back the timers file is read again
 SMALL_CAMERA = "test://video?size=320x180&fps=30"
 JOBS = "/var/lmx/agent/jobs"
 ROOM, NO_ROOM = "1", "2000000000"  # megabytes that must be free
@@ -30,6 +31,7 @@ class Hall:
         self._numbers = itertools.count(1)
         self._up = threading.Event()  # the daemon may be talked to
         self._lives = 1  # of the daemon
+        self._hang_up = 0.0  # when the last SIGHUP was sent
         self._turn = {"local": threading.Lock(), "tunnel": threading.Lock(), "signal": threading.Lock()}
         self.tunnel = None
         self.short = False
@@ -43,7 +45,8 @@ class Hall:
         self.name, self.operations, self.complaints = name, [], []
         self._titles, self._guard = itertools.count(1), threading.Lock()
         self._timed = TimedList()  # their replies may come in between, on the tunnel when their channel has gone
-        self._unasked = False  # timed commands from before the sequence answer in it
+        # Timed commands from before the sequence answer in it.
+        self._unasked = time.time() < self._hang_up + TUNNEL_AWAY
         self._frozen = threading.Event()
         self._first_life = self._lives
         self.mark = self.agent.log.mark()
@@ -268,6 +271,7 @@ class Hall:
             mark, sent = self.agent.log.mark(), time.time()
             if not self.agent.alive():
                 return
+            self._hang_up = sent if verb == "HUP" else self._hang_up
             try:
                 self.agent.sandbox.signal(getattr(signal, "SIG" + verb))
                 line = self.agent.log.wait(SIGNAL_LINES[verb], 5, after=mark)

@@ -12,6 +12,7 @@ TEMPORARY = re.compile(r"^\.lmx-.*\.xml\.\w{6}$")
 ACCEPTED = (  # lines at critical and above that the events explain, by the events; each sequence ends with a STOP
     (r"^Recording canceled, missing RecordingMetadata_RECORDING_UUID\.$", set()),
     (r"^The recording could not be finished: nothing was captured for ", set()),
+    (r"^The recording could not be finished: no recording of request ", {"GONE"}),  # lost before START had marked it
     (r"^The capture device has been disconnected\.$", {"END"}),
     (r"^Internal error caused application to stop$", {"END"}),
 )
@@ -42,7 +43,8 @@ def left_of(agent, op, submitted):
     places = [i for i, uuid in enumerate(submitted) if uuid == op.title]
     name = re.escape(op.title)
     left = {"submissions": len(places), "place": places[0] if places else -1,
-            "empty": bool(agent.log.lines(rf"nothing was captured for .*/{name}\.mov$")),
+            "empty": bool(agent.log.lines(rf"nothing was captured for .*/{name}\.mov$"
+                                          rf'|^The capture of ".*/{name}\.mov" ended early: ')),
             "named": bool(agent.log.lines(rf'^The agent ended while ".*/{name}\.mov" was being submitted'))}
     if not path.exists():
         orphan = path.with_suffix(".xml").exists()
@@ -63,11 +65,12 @@ def collect(agent, operations):
         return dict(zip((op.title for op in starts), readers.map(lambda op: left_of(agent, op, submitted), starts)))
 
 
-def strays(agent, titles, killed):
-    """Files in the repository that belong to none of the recordings. A kill may leave a temporary beside a document."""
+def strays(agent, titles, ended):
+    """Files in the repository that belong to none of the recordings. A process that `ended` while it was writing a
+    document leaves a temporary beside it."""
     known = {f"{title}.{kind}" for title in titles for kind in ("mov", "xml")} | {".lmxagentd"}
     unknown = [name for name in agent.repository() if name not in known]
-    return [name for name in unknown if not (killed and TEMPORARY.match(name))]
+    return [name for name in unknown if not (ended and TEMPORARY.match(name))]
 
 
 def bad_lines(lines, verbs):
