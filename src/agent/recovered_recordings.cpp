@@ -49,8 +49,9 @@ void RecoveredRecordings::takeUp(std::shared_ptr<CaptureFramework> framework) {
         *repository, [this](const std::string& request) { return jobs_.store().tookUp(request); });
     std::stable_sort(recordings.begin(), recordings.end(),
                      [](const auto& a, const auto& b) { return a.stopTime < b.stopTime; });
-    HandOffOrder::deliver(*ticket, keep(recordings, *ticket));
+    HandOffOrder::Jobs jobs = keep(recordings, *ticket);
     jobs_.store().forgetBegun();
+    HandOffOrder::deliver(*ticket, std::move(jobs));  // last: it tells the others that this has ended
   });
 }
 

@@ -8,6 +8,7 @@
 #include "control/protocol/command_parser.h"
 #include "control/protocol/command_text.h"
 #include "control/protocol/line_assembler.h"
+#include "support/scan.h"
 #include "support/utf8.h"
 
 namespace {
