@@ -121,7 +121,7 @@ def check_batch(hall, records, state):
     if found:
         failures.append(f"files that belong to no recording: {found}")
     if not quiet and not failures:
-        failures.append("after the last sequence there was no quiet: " + hall.agent.log.tail(40))
+        failures.append(f"after the last sequence there was no quiet: {hall.unrest()}\n{hall.agent.log.tail(40)}")
     if hall.complaints:
         failures.append(f"at the end of a batch: {hall.complaints}")
     command_outcome.sweep(hall.agent)

@@ -187,7 +187,7 @@ class Hall:
         if line.startswith("STATUS"):
             while "recordStatus" not in text:
                 text, at = peer.next()
-            return at, replies_in(text)[-1:]
+            return at, tuple(reply for reply in replies_in(text) if "recordStatus" in reply)[-1:]
         if not (self._timed or self._unasked):
             return at, replies_in(text)
         self._wait_read(rf"^Command is \[{line.split(' ')[0]} .*\bn={number}\b")
@@ -329,7 +329,8 @@ class Hall:
 
     def _is_still(self):
         try:
-            captures = [name for name in self.agent.repository() if name.startswith(".lmxagentd/")]
+            # An empty folder may be left by a kill; one that records holds its journal.
+            captures = [name for name in self.agent.repository() if name.startswith(".lmxagentd/") and "/" in name[11:]]
         except FileNotFoundError:  # one is just being removed
             return False
         return not captures and self.agent.command("STATUS").fields["recordStatus"] == "0"
@@ -341,6 +342,12 @@ class Hall:
             return True
         except AssertionError:
             return False
+
+    def unrest(self):
+        """What keeps it from being quiet."""
+        jobs = self.agent.path(JOBS)
+        hidden = [name for name in self.agent.repository() if name.startswith(".")]
+        return hidden, sorted(job.name for job in jobs.iterdir()), self.agent.command("STATUS").text
 
     def _is_quiet(self):
         jobs = self.agent.path(JOBS)
