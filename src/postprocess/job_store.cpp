@@ -56,6 +56,16 @@ std::vector<std::string> filesEndingIn(const char* ending, const std::string& fo
   return files;
 }
 
+/// A process that was killed while it wrote a job has left its temporary file. Nobody writes there now.
+void removeTemporaries(const std::string& folder) {
+  std::error_code error;
+  std::vector<std::string> left;
+  for (const auto& entry : std::filesystem::directory_iterator(folder, error)) {
+    if (entry.path().filename().string().starts_with(".lmx-")) left.push_back(entry.path());
+  }
+  for (const std::string& path : left) unlink(path.c_str());
+}
+
 int makeFolder(const std::string& folder) {
   if (exists(folder)) return 0;
   if (const int error = mkdir_p(folder.c_str(), 0700)) return error;
@@ -152,6 +162,7 @@ JobStore::Left JobStore::takeUp(const std::shared_ptr<AgentContext>& context) {
                   error == EWOULDBLOCK ? "another process uses them" : std::strerror(error));
     return left;
   }
+  removeTemporaries(folder_);
   for (const char* ending : {kBegun, kNamed}) {
     for (const std::string& path : filesEndingIn(ending, folder_)) {
       const PlistResult file = readPropertyList(path);

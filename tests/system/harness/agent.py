@@ -72,10 +72,13 @@ class Agent:
     def set_tool(self, *rules, present=True):
         """Puts the stand-in tool in place with `rules` (see lumex_stand_in.py), or takes it away."""
         tool = self.path("/usr/bin/lumex")
-        tool.unlink(missing_ok=True)
-        if present:
-            tool.write_bytes((HARNESS / "lumex_stand_in.py").read_bytes())
-            tool.chmod(0o755)
+        if present:  # never absent meanwhile: a job may be about to start it
+            new = tool.with_suffix(".new")
+            new.write_bytes((HARNESS / "lumex_stand_in.py").read_bytes())
+            new.chmod(0o755)
+            new.rename(tool)
+        else:
+            tool.unlink(missing_ok=True)
         script = self.path("/var/tool/script.json")
         script.with_suffix(".tmp").write_text(json.dumps(rules))
         script.with_suffix(".tmp").rename(script)

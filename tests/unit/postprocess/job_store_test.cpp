@@ -204,6 +204,14 @@ TEST_F(Jobs, OfAnotherProcessThatRunsAreLeftToIt) {
   EXPECT_TRUE(log_.mentions("The jobs in " + folder() + " can't be taken up: another process uses them"));
 }
 
+TEST_F(Jobs, ThatWereBeingWrittenLeaveNothing) {
+  JobStore(folder()).keep(*job("R1"), 1);
+  write(folder() + "/.lmx-0000000002-0000.job.aBcDeF", "half a fi");
+  JobStore next(folder());
+  EXPECT_EQ(takenUp(next), Names{"R1"});
+  EXPECT_EQ(filesLeft(), 1U);
+}
+
 TEST_F(Jobs, ThatCanNotBeReadAreLeftAloneAndNamed) {
   JobStore(folder()).keep(*job("R1"), 2);
   write(folder() + "/0000000001-0000.job", "half a fi");
