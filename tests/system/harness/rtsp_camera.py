@@ -56,6 +56,10 @@ class RtspCamera(Guest):
         self.process.stdin.write(f"set {element} {name} {value}\n".encode())
         self.process.stdin.flush()
 
+    def viewers(self):
+        """How many have watched at once, each time that it changed."""
+        return [int(line.split()[1]) for line in self.errors().splitlines() if line.startswith("viewers ")]
+
     def stall(self):
         """Stops the camera without closing its connections, as one that hangs."""
         self.process.send_signal(signal.SIGSTOP)

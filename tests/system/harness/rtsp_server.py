@@ -2,7 +2,7 @@
 """The program behind RtspCamera: serves one launch line on a loopback port, for all viewers together.
 
 Says "ready" once it listens. Each line on its standard input is an order: "set ELEMENT PROPERTY VALUE" changes an
-element of the running picture, as gst-launch-1.0 would set it.
+element of the running picture, as gst-launch-1.0 would set it. Standard error tells "viewers N" at each change.
 """
 import argparse
 import sys
@@ -27,6 +27,8 @@ class Camera:
         self.server = GstRtspServer.RTSPServer(address="127.0.0.1", service=str(options.port))
         if options.user:
             self._demand_password()
+        self.viewers = set()
+        self.server.connect("client-connected", self._greet)
         self.server.get_mount_points().add_factory("/" + options.mount, self._factory())
 
     def _factory(self):
@@ -38,6 +40,17 @@ class Camera:
             self._only_for_the_user(factory)
         factory.connect("media-configure", self._configure)
         return factory
+
+    def _greet(self, _server, client):
+        client.connect("play-request", lambda *_: self._count(self.viewers.add, client))
+        client.connect("teardown-request", lambda *_: self._count(self.viewers.discard, client))
+        client.connect("closed", lambda *_: self._count(self.viewers.discard, client))
+
+    def _count(self, change, client):
+        before = len(self.viewers)
+        change(client)
+        if len(self.viewers) != before:
+            print("viewers", len(self.viewers), file=sys.stderr, flush=True)
 
     @staticmethod
     def _only_for_the_user(factory):
