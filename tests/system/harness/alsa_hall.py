@@ -28,6 +28,10 @@ class AlsaHall:
         self._pcms[name] = definition
         self._write()
 
+    def definition(self, name):
+        """What stands between the braces of a PCM."""
+        return self._pcms[name]
+
     def remove(self, name):
         """Takes a PCM away: opening it fails as with a microphone that is unplugged."""
         del self._pcms[name]
