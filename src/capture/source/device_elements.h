@@ -1,0 +1,29 @@
+// The elements that a device's pipeline is built of.
+#pragma once
+#include <string>
+
+#include "capture/gst/gst_handles.h"
+#include "capture/source/device_id.h"
+
+namespace lmx {
+
+/// What follows a decoded picture or sound: an appsink named "vsink" or "asink". A bin with one sink pad; null, with a
+/// log line, when an element is missing. Pictures pass as they were decoded, but for interlaced ones.
+GstHandle<GstElement> branchFor(bool picture);
+
+/// The launch line of a synthetic camera or microphone, with its appsink.
+std::string syntheticDevice(const DeviceID& device, bool picture, FrameRate rate);
+
+/// Decodes whatever stands under the device's address; pads come and go. Null when the element is missing.
+GstHandle<GstElement> uriDecoder(const DeviceID& device);
+
+/// Whether the identifier says itself what to open ("alsa:device=NAME"): lists don't show it.
+bool namesItsElement(const DeviceID& device);
+/// The source element that such an identifier names; null when it is missing.
+GstHandle<GstElement> namedSource(const DeviceID& device);
+
+/// Sets what the device's source element offers for low latency and true times: no clock of its own, no correction of
+/// times by leaping, no buffers that the device waits for.
+void tuneSource(GstElement* source);
+
+}  // namespace lmx
