@@ -231,7 +231,7 @@ std::uint32_t CaptureRecorder::closeMovie() {
     return 0;
   }
   cutter_.close();
-  movie_->close(cutter_.samples());
+  movie_->close(cutter_.frames().frames(), cutter_.samples());
   return movie_->framesWritten(cutter_.frames().frames());
 }
 

@@ -32,13 +32,7 @@ FrameDecision MediaCutter::decide(double t) {
 void MediaCutter::feedFrame(const RawMedium& frame) {
   const FrameDecision decision = decide(frame.time);
   if (!decision.take || !startMovie()) return;
-  // Where a frame is missing the next one is shown in its place, too: the frame rate stays constant.
-  if (decision.beginsRun) next_place_ = decision.place;
-  bool forceKey = decision.forceKey;
-  for (; next_place_ <= decision.place; ++next_place_) {
-    around_.movie.pushFrame(frame.buffer.get(), next_place_, forceKey);
-    forceKey = false;
-  }
+  around_.movie.pushFrame(frame.buffer.get(), decision.place, decision.forceKey);
   recorded_frames_ = frames_.frames();
 }
 

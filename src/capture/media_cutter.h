@@ -58,7 +58,6 @@ class MediaCutter {
   std::optional<SoundCutter> sound_;
   RawMedia pending_sound_;
   double last_frame_time_ = -1e300;
-  std::uint32_t next_place_ = 0;  ///< in the movie, of the next frame to be encoded
   std::optional<double> next_virtual_;
   std::uint32_t recorded_frames_ = 0;
 };

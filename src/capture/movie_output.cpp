@@ -28,7 +28,10 @@ MovieOutput::MovieOutput(const MovieEncoding& encoding, GrowingMovie movie, Jour
 bool MovieOutput::start(PictureSize size) {
   if (tried_) return encoder_ != nullptr;
   tried_ = true;  // the movie is handed on: a second try would have none
-  if (encoding_.video) encoding_.video->size = size;
+  if (encoding_.video) {
+    encoding_.video->size = size;
+    hold_.emplace(frameDuration(encoding_.video->frameRate));
+  }
   const std::size_t tracks = (encoding_.video ? 1 : 0) + (encoding_.audio ? 1 : 0);
   writer_ = std::make_unique<MovieWriter>(std::move(movie_), tracks, journal_,
                                           [this](int error) { reportWriteError(error); });
@@ -46,7 +49,10 @@ EncoderOutput MovieOutput::encoderOutput() {
   output.onFormat = [this](std::uint32_t track, TrackFormat format) {
     writer_->setFormat(track, std::move(format));
   };
-  output.onSample = [this](EncodedSample sample) { writer_->add(std::move(sample)); };
+  output.onFrame = [this](EncodedSample frame, std::uint32_t place) {
+    addFrame(hold_->next(std::move(frame), place));
+  };
+  output.onSound = [this](EncodedSample packet) { writer_->add(std::move(packet)); };
   output.onError = [this](const std::string& problem) {
     on_error_({CaptureError::kDomain, kEncoderFailed, problem});
   };
@@ -61,16 +67,27 @@ void MovieOutput::pushSound(const float* samples, std::uint32_t count) {
   encoder_->pushAudio(samples, count);
 }
 
+void MovieOutput::addFrame(std::optional<EncodedSample> frame) {
+  if (frame) writer_->add(*std::move(frame));
+}
+
 void MovieOutput::reportWriteError(int error) {
   on_error_(writeError(error, "the movie can't be written any further: "));
 }
 
-void MovieOutput::close(std::int64_t totalSamples) {
-  if (encoder_ && !encoder_->finish(totalSamples, kEncoderPatience)) {
+void MovieOutput::close(std::uint32_t totalFrames, std::int64_t totalSamples) {
+  if (encoder_) endStreams(totalFrames, totalSamples);
+  if (writer_) finishWriting();
+}
+
+void MovieOutput::endStreams(std::uint32_t totalFrames, std::int64_t totalSamples) {
+  const bool ended = encoder_->finish(totalSamples, kEncoderPatience);
+  encoder_.reset();
+  if (!ended) {
     LMPLogMessage(nullptr, kLogError, "The encoder did not come to its end; the movie holds what it gave");
   }
-  encoder_.reset();
-  if (writer_) finishWriting();
+  // Frames may be missing behind the last one that a failed encoder gave: it must not stand for all of them.
+  if (hold_) addFrame(hold_->last(ended ? std::optional(totalFrames) : std::nullopt));
 }
 
 void MovieOutput::finishWriting() {
@@ -89,7 +106,9 @@ std::uint32_t MovieOutput::framesWritten(std::uint32_t frames) const {
   if (!writer_ || writer_->index().mediaEnd == 0) return 0;
   const TrackIndex* video = writer_->index().video();
   // What a full disk or a failing encoder left out is not there to be copied.
-  return video == nullptr ? frames : std::min(frames, static_cast<std::uint32_t>(video->sizes.size()));
+  if (video == nullptr) return frames;
+  const std::uint64_t written = video->totalDuration / frameDuration(encoding_.video->frameRate);
+  return static_cast<std::uint32_t>(std::min<std::uint64_t>(frames, written));
 }
 
 }  // namespace lmx

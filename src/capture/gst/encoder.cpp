@@ -15,6 +15,8 @@ namespace lmx {
 namespace {
 
 constexpr int kSamplesPerPacket = 1024;  // AAC
+/// The encoder counts frames, not time: a slow camera's key frames would be far apart.
+constexpr double kKeyFrameSeconds = 2.0;
 
 /// A broken driver must not end the recording: the encoder refuses NaN, and turns samples far beyond full
 /// scale into packets that players can't read.
@@ -92,7 +94,8 @@ Encoder::~Encoder() {
 
 void Encoder::pushVideo(GstBuffer* buffer, std::uint32_t place, bool forceKey) {
   if (failed()) return;
-  if (forceKey) {
+  if (forceKey || keyFrameIsDue(place)) {
+    last_key_ = place;
     // Sent into the stream behind the frames already queued: appsrc serialises events with its buffers.
     gst_element_send_event(video_source_.get(),
                            gst_video_event_new_downstream_force_key_unit(
@@ -104,6 +107,10 @@ void Encoder::pushVideo(GstBuffer* buffer, std::uint32_t place, bool forceKey) {
   GST_BUFFER_DTS(frame) = GST_CLOCK_TIME_NONE;
   GST_BUFFER_DURATION(frame) = static_cast<GstClockTime>(std::llround(seconds * 1e9));
   gst_app_src_push_buffer(GST_APP_SRC(video_source_.get()), frame);
+}
+
+bool Encoder::keyFrameIsDue(std::uint32_t place) const {
+  return (place - last_key_) * video_->frameRate.frameSeconds() >= kKeyFrameSeconds;
 }
 
 void Encoder::pushAudio(const float* samples, std::uint32_t count) {
@@ -188,11 +195,19 @@ void Encoder::takeVideo(GstSample* sample) {
     output_.onFormat(0, std::move(format));
   }
   GstBuffer* buffer = gst_sample_get_buffer(sample);
-  // Every frame that goes in comes out, in order: its place needs no time stamp.
-  output_.onSample({.track = 0,
-                    .data = contents(buffer),
-                    .duration = frameDuration(video_->frameRate),
-                    .sync = GST_BUFFER_FLAG_IS_SET(buffer, GST_BUFFER_FLAG_DELTA_UNIT) == FALSE});
+  output_.onFrame({.track = 0,
+                   .data = contents(buffer),
+                   .sync = GST_BUFFER_FLAG_IS_SET(buffer, GST_BUFFER_FLAG_DELTA_UNIT) == FALSE},
+                  placeOf(sample));
+}
+
+/// The encoder shifts time stamps and segment by the same amount.
+std::uint32_t Encoder::placeOf(GstSample* sample) const {
+  const GstClockTime time = gst_segment_to_running_time(gst_sample_get_segment(sample), GST_FORMAT_TIME,
+                                                        GST_BUFFER_PTS(gst_sample_get_buffer(sample)));
+  if (!GST_CLOCK_TIME_IS_VALID(time)) return 0;
+  return static_cast<std::uint32_t>(
+      std::llround(static_cast<double>(time) / 1e9 / video_->frameRate.frameSeconds()));
 }
 
 void Encoder::takeAudio(GstSample* sample) {
@@ -208,10 +223,10 @@ void Encoder::takeAudio(GstSample* sample) {
   // where it belongs, with no edit list that a player might ignore.
   const std::int64_t start = (audio_packets_++ - 1) * kSamplesPerPacket;
   if (start < 0 || start >= total_samples_) return;
-  output_.onSample({.track = track,
-                    .data = contents(gst_sample_get_buffer(sample)),
-                    .duration = kSamplesPerPacket,
-                    .sync = true});
+  output_.onSound({.track = track,
+                   .data = contents(gst_sample_get_buffer(sample)),
+                   .duration = kSamplesPerPacket,
+                   .sync = true});
 }
 
 }  // namespace lmx

@@ -20,7 +20,9 @@ namespace lmx {
 struct EncoderOutput {
   /// Once a track, before its samples.
   std::function<void(std::uint32_t track, TrackFormat format)> onFormat;
-  std::function<void(EncodedSample sample)> onSample;
+  /// A frame with the place it was pushed with. It has no duration yet: that depends on the next one.
+  std::function<void(EncodedSample frame, std::uint32_t place)> onFrame;
+  std::function<void(EncodedSample packet)> onSound;
   /// Once at most: nothing more is encoded then. On any thread.
   std::function<void(std::string problem)> onError;
 };
@@ -35,8 +37,8 @@ class Encoder {
   Encoder(const Encoder&) = delete;
   Encoder& operator=(const Encoder&) = delete;
 
-  /// Encodes `buffer` as frame number `place`; blocks while the encoder is more than a few frames behind.
-  /// Does nothing once it has failed.
+  /// Encodes `buffer` as frame number `place`; places ascend, possibly with holes. Blocks while the encoder
+  /// is more than a few frames behind. Does nothing once it has failed.
   void pushVideo(GstBuffer* buffer, std::uint32_t place, bool forceKey);
   /// Encodes `count` samples of each channel, interleaved, from `samples` on; null for silence. Blocks and
   /// fails like pushVideo.
@@ -58,6 +60,8 @@ class Encoder {
   [[nodiscard]] bool failed();
   void takeVideo(GstSample* sample);
   void takeAudio(GstSample* sample);
+  [[nodiscard]] bool keyFrameIsDue(std::uint32_t place) const;
+  [[nodiscard]] std::uint32_t placeOf(GstSample* sample) const;
 
   const std::optional<VideoEncoding> video_;
   const std::optional<AudioEncoding> audio_;
@@ -65,6 +69,7 @@ class Encoder {
   GstHandle<GstElement> pipeline_;
   GstHandle<GstElement> video_source_;
   GstHandle<GstElement> audio_source_;
+  std::uint32_t last_key_ = 0;       // feeding thread: place of the newest key frame that was asked for
   std::int64_t audio_pushed_ = 0;    // feeding thread
   bool video_format_known_ = false;  // video thread
   bool audio_format_known_ = false;  // audio thread

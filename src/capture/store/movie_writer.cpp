@@ -19,7 +19,11 @@ constexpr auto kSyncInterval = 1s;
 
 MovieWriter::MovieWriter(GrowingMovie movie, std::size_t trackCount, Journal& journal,
                          std::function<void(int)> onError)
-    : movie_(std::move(movie)), journal_(journal), on_error_(std::move(onError)), formats_(trackCount) {
+    : movie_(std::move(movie)),
+      journal_(journal),
+      on_error_(std::move(onError)),
+      formats_(trackCount),
+      queued_duration_(trackCount) {
   thread_ = std::thread([this] { run(); });
 }
 
@@ -36,7 +40,7 @@ void MovieWriter::add(EncodedSample sample) {
   changed_.wait(lock, [this] { return queued_bytes_ < kQueueLimit || ending_ || error_ != 0; });
   if (error_ != 0) return;
   queued_bytes_ += sample.data.size();
-  if (sample.track == 0) lead_duration_ += sample.duration;
+  queued_duration_[sample.track] += sample.duration;
   queue_.push_back(std::move(sample));
   if (fragmentDue()) changed_.notify_all();
 }
@@ -44,7 +48,12 @@ void MovieWriter::add(EncodedSample sample) {
 bool MovieWriter::fragmentDue() const {
   if (!std::all_of(formats_.begin(), formats_.end(), [](const auto& f) { return f.has_value(); }))
     return false;
-  return lead_duration_ * 2 >= formats_.front()->timescale;  // half a second
+  // Half a second of the leading track. If that stands still the others must not wait for it.
+  if (queued_duration_.front() * 2 >= formats_.front()->timescale) return true;
+  for (std::size_t t = 1; t < formats_.size(); ++t) {
+    if (queued_duration_[t] >= formats_[t]->timescale) return true;
+  }
+  return false;
 }
 
 void MovieWriter::run() {
@@ -68,7 +77,7 @@ MovieWriter::Fragment MovieWriter::takeFragment() {
   fragment.last = ending_;
   fragment.samples.swap(queue_);
   queued_bytes_ = 0;
-  lead_duration_ = 0;
+  queued_duration_.assign(formats_.size(), 0);
   changed_.notify_all();
   return fragment;
 }

@@ -60,7 +60,7 @@ class MovieWriter {
   std::vector<std::optional<TrackFormat>> formats_;  // guarded by mutex_
   std::vector<EncodedSample> queue_;                 // guarded by mutex_
   std::size_t queued_bytes_ = 0;                     // guarded by mutex_
-  std::uint64_t lead_duration_ = 0;                  // guarded by mutex_: of track 0 in the queue
+  std::vector<std::uint64_t> queued_duration_;       // guarded by mutex_: timescale units of each track
   bool ending_ = false;                              // guarded by mutex_
   std::atomic<int> error_{0};
   std::atomic<int> sync_error_{0};

@@ -23,7 +23,7 @@ TEST(Encoder, AFailureIsToldOnceAndDoesNotHoldUpItsFeeder) {
   testing::Journal problems;
   EncoderOutput output;
   output.onFormat = [](std::uint32_t, TrackFormat) {};
-  output.onSample = [](EncodedSample) {};
+  output.onFrame = [](EncodedSample, std::uint32_t) {};
   output.onError = [&](const std::string& what) { problems.add(what); };
   auto created = Encoder::create({VideoEncoding{{160, 90}, frameRateFrom(30)}, std::nullopt}, output);
   ASSERT_TRUE(created) << created.error().message;
@@ -52,7 +52,7 @@ TEST(Encoder, SoundThatIsNoSoundDoesNotEndIt) {
   std::atomic<int> packets{0};
   EncoderOutput output;
   output.onFormat = [](std::uint32_t, TrackFormat) {};
-  output.onSample = [&](const EncodedSample&) { ++packets; };
+  output.onSound = [&](const EncodedSample&) { ++packets; };
   output.onError = [&](const std::string& what) { problems.add(what); };
   const auto created = Encoder::create({std::nullopt, AudioEncoding{}}, output);
   ASSERT_TRUE(created) << created.error().message;
