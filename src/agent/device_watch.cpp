@@ -48,7 +48,15 @@ std::shared_ptr<LMRRecordingContext> DeviceWatch::recordingContext() const {
   return nullptr;
 }
 
+void DeviceWatch::tellOfMissingMicrophone(const LMRRecordingContext& settings) const {
+  if (!settings.audioEnabled || framework_->hasMicrophone(settings.audioDeviceID)) return;
+  const std::string name = settings.audioDeviceID ? "\"" + *settings.audioDeviceID + "\"" : "(Automatic)";
+  LMPLogMessage(context_->log_context(), kLogError,
+                "The microphone %s is not there: recordings are silent until it is", name.c_str());
+}
+
 void DeviceWatch::probeDevice(const LMRRecordingContext& settings) {
+  tellOfMissingMicrophone(settings);
   if (!settings.videoDeviceID) return;
   if (LXAgentRecordCreatePreviewController(settings.videoDeviceID, settings.audioDeviceID,
                                            settings.audioEnabled, settings.previewIntervalInMilliseconds,

@@ -25,7 +25,8 @@ class DeviceWatch {
   /// The capture settings from the current preferences; null when they can't be used (logged).
   [[nodiscard]] std::shared_ptr<LMRRecordingContext> recordingContext() const;
 
-  /// Checks whether the camera of `settings` can be opened. Without it the agent stays offline for now.
+  /// Checks whether the camera of `settings` can be opened. Without it the agent stays offline for now. A missing
+  /// microphone is only told.
   void probeDevice(const LMRRecordingContext& settings);
   [[nodiscard]] bool deviceIsOffline() const { return device_offline_; }
   /// Looks for a missing camera every eleven seconds, but not during a recording: then as soon as that has
@@ -42,6 +43,7 @@ class DeviceWatch {
   void announceLostDevice() const;
 
  private:
+  void tellOfMissingMicrophone(const LMRRecordingContext& settings) const;
   void deviceFound();
   void giveUp();
   [[nodiscard]] bool openAgain(const LMRRecordingContext& settings);

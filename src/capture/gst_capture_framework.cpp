@@ -83,8 +83,14 @@ CaptureCatalog::PreferredAudio GstCaptureFramework::preferredAudioDevice(const s
   return microphoneFor(listHardware(), videoDevice);
 }
 
-bool GstCaptureFramework::audioDeviceUsable(const std::optional<std::string>& audioDevice) {
-  return audioDevice ? hasDevice(*audioDevice) : identifierOfFirst(false).has_value();
+bool GstCaptureFramework::canBeMicrophone(const std::string& audioDevice) {
+  return parseDeviceID(audioDevice).canBeMicrophone();
+}
+
+bool GstCaptureFramework::hasMicrophone(const std::optional<std::string>& audioDevice) {
+  if (!audioDevice) return identifierOfFirst(false).has_value();
+  // A name of ALSA's configuration is in no list; whether it opens shows at the recording.
+  return parseDeviceID(*audioDevice).alsaName() || hasDevice(*audioDevice);
 }
 
 std::optional<LMRCompressionOptions> GstCaptureFramework::compressionOptions(MediaType media,

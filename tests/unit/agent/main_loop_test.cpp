@@ -166,7 +166,7 @@ TEST_F(MainLoopTest, AReturningDeviceClearsTheWarning) {
 }
 
 TEST_F(MainLoopTest, MissingPreferencesAtTheRetryEndTheDaemon) {
-  framework_->audio_device_usable = false;
+  framework_->microphone_well_formed = false;
   checkedDevice(11);
   EXPECT_FALSE(turn());
   EXPECT_TRUE(log_.contains(kLogCritical,

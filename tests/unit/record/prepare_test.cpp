@@ -184,7 +184,7 @@ TEST_F(Prepare, ARefusingFrameworkReturnsThree) {
 }
 
 TEST_F(Prepare, UnusablePreferencesReturnThree) {
-  framework_->audio_device_usable = false;
+  framework_->microphone_well_formed = false;
   EXPECT_EQ(prepare(), 3);
   EXPECT_TRUE(log_.contains(kLogCritical,
                             "Unable to load the recording context, exception = Unknown device ID: microphone "
