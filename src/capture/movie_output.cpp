@@ -25,7 +25,7 @@ CaptureError writeError(int error, const std::string& what) {
 MovieOutput::MovieOutput(const MovieEncoding& encoding, GrowingMovie movie, Journal& journal, OnError onError)
     : encoding_(encoding), movie_(std::move(movie)), journal_(journal), on_error_(std::move(onError)) {}
 
-bool MovieOutput::start(PictureSize size) {
+bool MovieOutput::start() {
   if (tried_) return encoder_ != nullptr;
   tried_ = true;  // the movie is handed on: a second try would have none
   if (encoding_.video) {

@@ -9,7 +9,6 @@ namespace lmx {
 namespace {
 
 constexpr const char* kSink = "sync=false async=false enable-last-sample=false qos=false max-buffers=4 ";
-constexpr const char* kAlsaByName = "alsa:device=";
 constexpr unsigned kNetworkLatencyMs = 300;         // packets that come later than that are lost
 constexpr std::uint64_t kNetworkTimeoutUs = 5000000;  // of a connection
 
@@ -71,13 +70,11 @@ GstHandle<GstElement> uriDecoder(const DeviceID& device) {
   return GstHandle<GstElement>(decoder);
 }
 
-bool namesItsElement(const DeviceID& device) { return device.text.rfind(kAlsaByName, 0) == 0; }
-
-GstHandle<GstElement> namedSource(const DeviceID& device) {
+GstHandle<GstElement> alsaSource(const std::string& pcm) {
   GstElement* source = gst_element_factory_make("alsasrc", nullptr);
   if (source == nullptr) return nullptr;
   gst_object_ref_sink(source);
-  g_object_set(source, "device", device.text.substr(std::string(kAlsaByName).size()).c_str(), nullptr);
+  g_object_set(source, "device", pcm.c_str(), nullptr);
   return GstHandle<GstElement>(source);
 }
 

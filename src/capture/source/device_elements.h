@@ -17,10 +17,8 @@ std::string syntheticDevice(const DeviceID& device, bool picture, FrameRate rate
 /// Decodes whatever stands under the device's address; pads come and go. Null when the element is missing.
 GstHandle<GstElement> uriDecoder(const DeviceID& device);
 
-/// Whether the identifier says itself what to open ("alsa:device=NAME"): lists don't show it.
-bool namesItsElement(const DeviceID& device);
-/// The source element that such an identifier names; null when it is missing.
-GstHandle<GstElement> namedSource(const DeviceID& device);
+/// A microphone of ALSA's own configuration, which no list shows. Null when the element is missing.
+GstHandle<GstElement> alsaSource(const std::string& pcm);
 
 /// Sets what the device's source element offers for low latency and true times: no clock of its own, no correction of
 /// times by leaping, no buffers that the device waits for.

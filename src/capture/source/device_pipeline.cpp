@@ -108,8 +108,8 @@ std::optional<CaptureError> DevicePipeline::addUri() {
 }
 
 std::optional<CaptureError> DevicePipeline::addHardware(const Wish& wish) {
-  const auto source = namesItsElement(device_)
-                          ? namedSource(device_)
+  const auto source = device_.alsaName()
+                          ? alsaSource(*device_.alsaName())
                           : owned(gst_device_create_element(wish.hardware->device.get(), nullptr));
   if (!source) return error(kDeviceFailed, "can't be set up");
   tuneSource(source.get());

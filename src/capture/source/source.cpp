@@ -5,7 +5,6 @@
 #include <thread>
 
 #include "capture/gst/picture_converter.h"
-#include "capture/source/device_elements.h"
 #include "capture/source/device_list.h"
 #include "platform/log.h"
 #include "support/format.h"
@@ -206,7 +205,7 @@ bool Source::findHardwareFor(DevicePipeline::Wish& wish) {
     if (first == nullptr) return false;
     wish.device = parseDeviceID(first->uniqueID);
     found_ = lookUpHardware(first->uniqueID);
-  } else if (device_.kind == DeviceKind::hardware && !namesItsElement(device_)) {
+  } else if (device_.kind == DeviceKind::hardware && !device_.alsaName()) {
     found_ = lookUpHardware(device_.text);
   } else {
     return true;
@@ -240,7 +239,7 @@ std::optional<CaptureError> Source::silence() const {
 // ---- away and back
 
 bool Source::triesAgain() const {
-  if (!wish_.picture) return device_.kind != DeviceKind::unknown;
+  if (!wish_.picture) return true;
   if (device_.kind != DeviceKind::network || !ever_ran_) return false;
   return away_since_ms_ == 0 || since(away_since_ms_) + kRetryInterval < kNetworkLimit;
 }
