@@ -10,6 +10,7 @@
 #include "platform/log.h"
 #include "prefs/recording_types.h"
 #include "record/agent_record.h"
+#include "record/capture_delegate.h"
 #include "record/capture_set_up.h"
 #include "record/capture_thread.h"
 #include "record/disk_space.h"
@@ -108,7 +109,8 @@ int beginCapture(AgentRecord& session, SharedDictionary metadata) {
   if (AgentActions* actions = engineEnvironment().actions) {
     actions->recordDidStartWithFile(session.filename.get().value_or(""), metadata, session.startTime.get());
   }
-  session.error.set(kRecordSuccess);
+  const auto delegate = controller ? session.captureControllerDelegate.get() : nullptr;
+  delegate ? delegate->startHasSucceeded(session) : session.error.set(kRecordSuccess);
   return kRecordSuccess;
 }
 
