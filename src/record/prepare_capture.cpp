@@ -79,14 +79,15 @@ int refuseSecondRecording(AgentRecord& session) {
   return kRecordNotIdle;
 }
 
-int prepareByType(AgentContext& context, AgentRecord& session, std::int32_t type) {
+int prepareByType(AgentContext& context, AgentRecord& session, std::int32_t type,
+                  const SharedDictionary& metadata) {
   session.setRecordedType(type);
   if (type == kRecordingTypeFile) return kRecordSuccess;
   if (type < kRecordingTypeAudio || type > kRecordingTypeFile) {
     reportRuntimeError(kRecordInvalidType);
     return kRecordInvalidType;
   }
-  const int result = LXAgentRecordPrepareCaptureController(context);
+  const int result = LXAgentRecordPrepareCaptureController(context, metadata);
   if (result != kRecordSuccess) logPrepareFailure(session, result);
   return result;
 }
@@ -161,7 +162,8 @@ int LXAgentRecordPrepareCaptureSync(AgentContext& context, const std::optional<s
     return kRecordNoDiskSpace;
   }
   session->recording_uuid.set(newUUIDString());
-  int result = prepareByType(context, *session, wantedType(*session, metadata, context.options.adhoc.get()));
+  const std::int32_t type = wantedType(*session, metadata, context.options.adhoc.get());
+  int result = prepareByType(context, *session, type, metadata);
   if (result == kRecordSuccess) result = beginCapture(*session, std::move(metadata));
   if (result != kRecordSuccess) {
     session->metadata.set(nullptr);
