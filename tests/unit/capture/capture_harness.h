@@ -37,6 +37,8 @@ class Folder {
 class Reports : public CaptureControllerDelegate {
  public:
   enum class Kind { none, complete, cancel };
+  void lmrCaptureSoundLost(const CaptureError& /*error*/) override { ++sound_lost; }
+  void lmrCaptureSoundBack() override { ++sound_back; }
   void lmrCaptureDidComplete(const std::optional<CaptureError>& error) override {
     set(Kind::complete, error);
   }
@@ -54,6 +56,8 @@ class Reports : public CaptureControllerDelegate {
     const std::lock_guard lock(mutex_);
     return count_;
   }
+  std::atomic<int> sound_lost{0};
+  std::atomic<int> sound_back{0};
 
  private:
   void set(Kind kind, const std::optional<CaptureError>& error) {
