@@ -184,7 +184,7 @@ void CaptureRecorder::onSourceAway(SourceUse use, const CaptureError& error) {
 }
 
 void CaptureRecorder::onSourceBack(SourceUse use, double seconds) {
-  ledger_.deviceBack(use.picture, CaptureClock::now(), seconds);
+  (void)seconds;
   if (use.picture) return;
   sound_away_ = false;
   SoundReport report;
@@ -304,6 +304,13 @@ BufferHandle CaptureRecorder::convert(const RawMedium& frame) {
                   change->c_str());
   }
   return picture;
+}
+
+void CaptureRecorder::sayWhatIsNotReal() {
+  if (const std::uint64_t dropped = queue_.dropped()) {
+    LMPLogMessage(nullptr, kLogWarning, "%llu pictures of the recording were lost: the machine could not keep up",
+                  static_cast<unsigned long long>(dropped));
+  }
 }
 
 void CaptureRecorder::publish(std::uint32_t totalFrames) {

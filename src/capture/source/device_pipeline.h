@@ -66,7 +66,7 @@ class DevicePipeline {
   [[nodiscard]] std::optional<CaptureError> build(const Wish& wish);
   [[nodiscard]] std::optional<CaptureError> addHardware(const Wish& wish);
   [[nodiscard]] std::optional<CaptureError> addDecoder(GstElement* source, const GstCaps* caps);
-  void addUri();
+  [[nodiscard]] std::optional<CaptureError> addUri();
   GstElement* addBranch(bool picture);
   void take(GstElement* branch, const char* name, bool picture);
   [[nodiscard]] CaptureError error(CaptureErrorCode code, const std::string& problem) const;

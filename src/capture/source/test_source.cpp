@@ -42,7 +42,7 @@ GstPadProbeReturn playFault(GstPad* pad, const Probe& probe, double seconds) {
   return after("silent-after") ? GST_PAD_PROBE_DROP : GST_PAD_PROBE_OK;
 }
 
-void draw(GstBuffer* buffer, const Probe& probe, std::uint64_t frame, double frameSeconds) {
+void draw(GstBuffer* buffer, const Probe& probe, std::uint64_t count, double frameSeconds) {
   const PictureSize size = pictureSize(probe.id);
   GstVideoInfo info;
   gst_video_info_set_format(&info, GST_VIDEO_FORMAT_I420, static_cast<guint>(size.width),
@@ -55,9 +55,9 @@ void draw(GstBuffer* buffer, const Probe& probe, std::uint64_t frame, double fra
                         size.width,
                         size.height,
                         stride};
-  const auto number = static_cast<std::uint32_t>(frame);
+  const auto number = static_cast<std::uint32_t>(count);
   drawFrameNumber(plane, number);
-  drawClock(plane, clockText(static_cast<double>(frame) * frameSeconds));
+  drawClock(plane, clockText(static_cast<double>(count) * frameSeconds));
   for (const guint component : {1U, 2U}) {
     // No colour behind the bit row and the clock, so that people can read them, too.
     const int width = size.width / 2;

@@ -43,7 +43,7 @@ class Output {
     output_ =
         std::make_unique<MovieOutput>(encoding, std::move(movie), *journal_,
                                       [this](const CaptureError& error) { ADD_FAILURE() << error.message; });
-    EXPECT_TRUE(output_->start(kSize));
+    EXPECT_TRUE(output_->start());
   }
   void frames(const Numbers& places, const Numbers& keys = {}) {
     for (const std::uint32_t place : places) {
