@@ -20,6 +20,13 @@ namespace lmx {
 
 using namespace std::chrono_literals;
 
+namespace {
+
+/// How long a recording that ends waits for a disk that takes nothing.
+constexpr auto kDiskPatience = 10s;
+
+}  // namespace
+
 // ---- opening
 
 Result<std::shared_ptr<CaptureRecorder>, CaptureError> CaptureRecorder::open(const RecordingPlan& plan) {
@@ -38,7 +45,7 @@ CaptureRecorder::CaptureRecorder(const RecordingPlan& plan, PipelineLease pipeli
       marks_(journal_),
       queue_(plan.encoding.video.has_value(), pipeline->realTime()),
       pipeline_(std::move(pipeline)),
-      movie_(std::make_unique<MovieOutput>(plan.encoding, std::move(files.movie), *journal_,
+      movie_(std::make_unique<MovieOutput>(plan.encoding, std::move(files.movie), *journal_, patience_,
                                            [this](const CaptureError& error) { fail(error); })),
       cutter_(plan.encoding, {marks_, *journal_, *movie_, [this] { return this->pipeline()->size(); }}) {
   journal_->capture(plan_.type, frame_seconds_, pipeline_->wallOffset());
@@ -84,6 +91,7 @@ void CaptureRecorder::end(Ending how) {
   // has not delivered any picture yet gets longer: a recording that is stopped at once still holds one.
   const auto patience = recorded_frames_ > 0 ? 1s : 3s;
   queue_.hurry(realTime ? MediaQueue::Clock::now() + patience : MediaQueue::Clock::time_point::max());
+  if (realTime) patience_.set(Deadline::Clock::now() + kDiskPatience);
 }
 
 void CaptureRecorder::syncMarks() const {
@@ -159,6 +167,7 @@ void CaptureRecorder::fail(const CaptureError& error) {
   }
   marks_.end(Ending::stop, now);
   queue_.hurry(MediaQueue::Clock::now());  // nothing more will come
+  patience_.set(Deadline::Clock::now() + kDiskPatience);
 }
 
 // ---- the recording thread

@@ -92,6 +92,7 @@ class CaptureRecorder : public CaptureConsumer, public std::enable_shared_from_t
   const std::shared_ptr<Journal> journal_;
   CaptureMarks marks_;
   MediaQueue queue_;
+  Deadline patience_;           // of all that the movie's threads wait for
   bool limit_reached_ = false;  // recording thread
   std::atomic<std::uint32_t> recorded_frames_{0};
 
