@@ -24,6 +24,8 @@ namespace {
 
 constexpr auto kIdle = 250ms;  // where there is only sound, silence goes on when none comes
 constexpr auto kForEver = 24h;
+/// How long a recording that ends waits for a disk that takes nothing.
+constexpr auto kDiskPatience = 10s;
 
 }  // namespace
 
@@ -48,7 +50,7 @@ CaptureRecorder::CaptureRecorder(const RecordingPlan& plan, RecordingSources sou
       marks_(journal_),
       queue_(encoding_.video.has_value(), clock_.realTime()),
       sources_(std::move(sources)),
-      movie_(std::make_unique<MovieOutput>(encoding_, std::move(files.movie), *journal_,
+      movie_(std::make_unique<MovieOutput>(encoding_, std::move(files.movie), *journal_, patience_,
                                            [this](const CaptureError& error) { fail(error); })),
       cutter_(encoding_, CaptureClock::now(),
               {.marks = marks_,
@@ -106,6 +108,7 @@ void CaptureRecorder::end(Ending how) {
   // has not delivered any picture yet gets longer: a recording that is stopped at once still holds one.
   const auto patience = recorded_frames_ > 0 ? 1s : 3s;
   queue_.hurry(realTime ? MediaQueue::Clock::now() + patience : MediaQueue::Clock::time_point::max());
+  if (realTime) patience_.set(Deadline::Clock::now() + kDiskPatience);
 }
 
 void CaptureRecorder::syncMarks() const {
@@ -217,6 +220,7 @@ void CaptureRecorder::fail(const CaptureError& error) {
   }
   marks_.end(Ending::stop, now);
   queue_.hurry(MediaQueue::Clock::now());  // nothing more will come
+  patience_.set(Deadline::Clock::now() + kDiskPatience);
 }
 
 // ---- the recording thread

@@ -104,6 +104,7 @@ class CaptureRecorder : public CaptureConsumer, public std::enable_shared_from_t
   const std::shared_ptr<Journal> journal_;
   CaptureMarks marks_;
   MediaQueue queue_;
+  Deadline patience_;                          // of all that the movie's threads wait for
   std::optional<PictureConverter> converter_;  // recording thread
   bool limit_reached_ = false;                 // recording thread
   std::atomic<bool> heard_{false};             ///< some sound has come

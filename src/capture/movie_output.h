@@ -1,5 +1,7 @@
 // Encodes the raw frames and samples of a capture and writes the movie to the disk.
 #pragma once
+#include <array>
+#include <atomic>
 #include <cstdint>
 #include <functional>
 #include <memory>
@@ -21,7 +23,10 @@ class MovieOutput {
 
   /// @param movie  created, not begun
   /// @param journal  must outlive the output
-  MovieOutput(const MovieEncoding& encoding, GrowingMovie movie, Journal& journal, OnError onError);
+  /// @param patience  when nothing waits any more for a disk or an encoder that is too slow: what does not
+  /// fit then is dropped, and told as an error. Must outlive the output
+  MovieOutput(const MovieEncoding& encoding, GrowingMovie movie, Journal& journal, Deadline& patience,
+              OnError onError);
 
   /// Starts the encoder, once.
   /// @return false when it could not be started, now or before
@@ -44,16 +49,18 @@ class MovieOutput {
 
  private:
   [[nodiscard]] EncoderOutput encoderOutput();
+  void setFormat(std::uint32_t track, TrackFormat format);
   void addFrame(std::optional<EncodedSample> frame);
-  void reportWriteError(int error);
   void endStreams(std::uint32_t totalFrames, std::int64_t totalSamples);
   void finishWriting();
 
   MovieEncoding encoding_;
   GrowingMovie movie_;  ///< until the writer has it
   Journal& journal_;
+  Deadline& patience_;
   const OnError on_error_;
   bool tried_ = false;
+  std::array<std::atomic<bool>, 2> has_format_{};  ///< of each track
   std::unique_ptr<MovieWriter> writer_;
   std::optional<FrameHold> hold_;     // the encoder's picture thread while there is an encoder
   std::unique_ptr<Encoder> encoder_;  // declared behind the writer, which its threads call

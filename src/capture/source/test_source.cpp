@@ -8,6 +8,7 @@
 #include <cstring>
 #include <memory>
 #include <numbers>
+#include <optional>
 
 #include "capture/gst/gst_handles.h"
 #include "capture/source/capture_clock.h"
@@ -81,10 +82,13 @@ double runningTimeOf(GstPad* pad, GstBuffer* buffer, const Probe& probe) {
   return CaptureClock::at(gst_element_get_base_time(source.get())) + sinceOpening;
 }
 
-/// The number of the grain of `grainSeconds` that begins at or behind `time`. The buffer's time is moved there.
-std::uint64_t alignToGrain(GstBuffer* buffer, double time, double grainSeconds) {
-  const double number = std::ceil(time / grainSeconds - 1e-3);
-  GST_BUFFER_PTS(buffer) += static_cast<GstClockTime>(std::max(0.0, (number * grainSeconds - time) * 1e9));
+/// The number of the grain of `grainSeconds` that has begun last at `time`. The buffer's time is moved back to its
+/// beginning; nothing comes from the future. @return nothing for a buffer that would be older than the device
+std::optional<std::uint64_t> alignToGrain(GstBuffer* buffer, double time, double grainSeconds) {
+  const double number = std::floor(time / grainSeconds + 1e-3);
+  const double earlier = std::max(0.0, (time - number * grainSeconds) * 1e9);
+  if (earlier > static_cast<double>(GST_BUFFER_PTS(buffer))) return std::nullopt;
+  GST_BUFFER_PTS(buffer) -= static_cast<GstClockTime>(earlier);
   return static_cast<std::uint64_t>(number);
 }
 
@@ -113,12 +117,10 @@ GstPadProbeReturn onBuffer(GstPad* pad, GstPadProbeInfo* info, gpointer user) no
   buffer = gst_buffer_make_writable(buffer);
   GST_PAD_PROBE_INFO_DATA(info) = buffer;
   const double time = runningTimeOf(pad, buffer, probe);
-  if (probe.video) {
-    const double frameSeconds = static_cast<double>(GST_BUFFER_DURATION(buffer)) / 1e9;
-    draw(buffer, probe, alignToGrain(buffer, time, frameSeconds), frameSeconds);
-  } else {
-    fillSound(buffer, alignToGrain(buffer, time, 1.0 / kSoundRate));
-  }
+  const double frameSeconds = static_cast<double>(GST_BUFFER_DURATION(buffer)) / 1e9;
+  const auto number = alignToGrain(buffer, time, probe.video ? frameSeconds : 1.0 / kSoundRate);
+  if (!number) return GST_PAD_PROBE_DROP;
+  probe.video ? draw(buffer, probe, *number, frameSeconds) : fillSound(buffer, *number);
   return GST_PAD_PROBE_OK;
 }
 

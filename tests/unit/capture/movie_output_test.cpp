@@ -8,6 +8,7 @@
 #include "capture/source/test_picture.h"
 #include "tests/unit/capture/capture_harness.h"
 #include "tests/unit/capture/movie/movie_check.h"
+#include "tests/unit/doubles/wait_until.h"
 
 namespace lmx {
 namespace {
@@ -41,7 +42,7 @@ class Output {
     GrowingMovie movie;
     EXPECT_EQ(movie.create(path()), 0);
     output_ =
-        std::make_unique<MovieOutput>(encoding, std::move(movie), *journal_,
+        std::make_unique<MovieOutput>(encoding, std::move(movie), *journal_, patience_,
                                       [this](const CaptureError& error) { ADD_FAILURE() << error.message; });
     EXPECT_TRUE(output_->start());
   }
@@ -69,6 +70,7 @@ class Output {
   Folder folder_;
   MovieEncoding encoding_;
   std::shared_ptr<Journal> journal_;
+  Deadline patience_;
   std::unique_ptr<MovieOutput> output_;
 };
 
@@ -105,6 +107,28 @@ TEST(MovieOutput, AFrameBeforeAHoleIsShownForLonger) {
   places.front() = 0;
   EXPECT_EQ(shown.times, places);
   EXPECT_EQ(shown.end, 100U);
+}
+
+TEST(MovieOutput, APictureDoesNotWaitForItsSound) {
+  for (const bool withSound : {false, true}) {
+    MovieEncoding encoding = pictureOnly();
+    encoding.audio = AudioEncoding{};
+    Output output(encoding);
+    Numbers places;
+    for (std::uint32_t place = 0; place < 60; ++place) places.push_back(place);
+    output.frames(places);
+    const auto onDisk = [&] {
+      const auto index = readMovieIndex(output.path());
+      return index && index->video()->sizes.size() >= 30;
+    };
+    EXPECT_TRUE(testing::waitUntil(onDisk)) << "a crash now would lose more than half a second";
+    if (withSound) (*output).pushSound(nullptr, 96000);
+    output.close(60, 96000);
+    const auto movie = decodeMovie(output.path(), withSound ? Streams::both : Streams::picture);
+    EXPECT_EQ(movie.problem, "");
+    EXPECT_EQ(movie.frameNumbers, places);
+    EXPECT_NEAR(movie.duration, 2.0, 0.03);
+  }
 }
 
 TEST(MovieOutput, ASlowCamerasKeyFramesAreTwoSecondsApartAtMost) {
