@@ -7,7 +7,7 @@
 #include <iterator>
 
 #include "capture/capture_controller.h"
-#include "capture/gst/gst_handles.h"
+#include "capture/gst/plugin_packages.h"
 #include "capture/preview_controller.h"
 #include "capture/source/device_id.h"
 #include "capture/source/device_list.h"
@@ -15,7 +15,6 @@
 #include "capture/source/sources.h"
 #include "capture/store/abandoned_capture.h"
 #include "capture/store/capture_files.h"
-#include "platform/log.h"
 #include "platform/paths.h"
 
 namespace lmx {
@@ -36,21 +35,6 @@ std::optional<std::string> identifierOfFirst(bool video) {
   const auto devices = Sources::instance().hardware();
   const HardwareDevice* device = firstDevice(devices, video);
   return device == nullptr ? std::nullopt : std::optional(device->uniqueID);
-}
-
-/// Uses an element once, so that a recording need not wait until its library is loaded.
-void loadPlugin(const char* name) {
-  const GstHandle<GstElementFactory> factory(gst_element_factory_find(name));
-  if (!factory) {
-    LMPLogMessage(nullptr, kLogError,
-                  "The GStreamer element %s is missing: recordings will fail; install its package", name);
-    return;
-  }
-  const GstHandle<GstElement> element(gst_element_factory_create(factory.get(), nullptr));
-  if (!element) return;
-  gst_object_ref_sink(element.get());
-  gst_element_set_state(element.get(), GST_STATE_READY);
-  gst_element_set_state(element.get(), GST_STATE_NULL);
 }
 
 }  // namespace
@@ -114,13 +98,7 @@ std::unique_ptr<LMRPreviewController> GstCaptureFramework::newPreviewController(
 
 // ---- start of the agent
 
-void GstCaptureFramework::warmUp() {
-  ensureGStreamer();
-  for (const char* name : {"x264enc", "avenc_aac", "appsrc", "appsink", "videoconvert", "videoscale",
-                           "deinterlace", "audioconvert", "audioresample", "decodebin", "uridecodebin"}) {
-    loadPlugin(name);
-  }
-}
+void GstCaptureFramework::warmUp() { loadPlugins(); }
 
 std::vector<RecoveredRecording> GstCaptureFramework::recoverUnfinished(
     const std::string& repository, const std::function<bool(const std::string& request)>& known) {

@@ -61,8 +61,6 @@ class Reports : public CaptureControllerDelegate {
     const std::lock_guard lock(mutex_);
     return count_;
   }
-  std::atomic<int> sound_lost{0};
-  std::atomic<int> sound_back{0};
 
  private:
   void set(Kind kind, const std::optional<CaptureError>& error) {
