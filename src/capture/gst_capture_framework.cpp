@@ -67,7 +67,7 @@ bool GstCaptureFramework::hasDevice(const std::string& uniqueID) {
     case DeviceKind::file:
       return access(id.name.c_str(), R_OK) == 0;
     case DeviceKind::hardware:
-      return findHardware(uniqueID).has_value();
+      return isHardwareThere(uniqueID);
     case DeviceKind::unknown:
       break;
   }
@@ -92,7 +92,7 @@ std::optional<LMRCompressionOptions> GstCaptureFramework::compressionOptions(Med
   return LMRCompressionOptions{.media = media, .quality = quality};
 }
 
-std::string GstCaptureFramework::deviceInformation() { return deviceListText(listHardware()); }
+std::string GstCaptureFramework::deviceInformation() { return deviceListText(listHardware(), demandHere()); }
 
 // ---- controllers
 
