@@ -12,6 +12,7 @@
 #include "capture/source/device_id.h"
 #include "capture/source/device_list.h"
 #include "capture/source/devices.h"
+#include "capture/source/sources.h"
 #include "capture/store/abandoned_capture.h"
 #include "capture/store/capture_files.h"
 #include "platform/paths.h"
@@ -31,7 +32,7 @@ std::vector<std::string> subfolders(const std::string& folder) {
 }
 
 std::optional<std::string> identifierOfFirst(bool video) {
-  const auto devices = listHardware();
+  const auto devices = Sources::instance().hardware();
   const HardwareDevice* device = firstDevice(devices, video);
   return device == nullptr ? std::nullopt : std::optional(device->uniqueID);
 }
@@ -51,7 +52,7 @@ bool GstCaptureFramework::hasDevice(const std::string& uniqueID) {
     case DeviceKind::file:
       return access(id.name.c_str(), R_OK) == 0;
     case DeviceKind::hardware:
-      return findHardware(uniqueID).has_value();
+      return Sources::instance().delivers(uniqueID) || findHardware(uniqueID).has_value();
     case DeviceKind::unknown:
       break;
   }
@@ -64,7 +65,7 @@ CaptureCatalog::PreferredAudio GstCaptureFramework::preferredAudioDevice(const s
     return {id.asFastAsPossible() ? "test://audio?speed=max" : "test://audio", false};
   }
   if (id.kind == DeviceKind::file || id.kind == DeviceKind::network) return {videoDevice, true};
-  return microphoneFor(listHardware(), videoDevice);
+  return microphoneFor(Sources::instance().hardware(), videoDevice);
 }
 
 bool GstCaptureFramework::canBeMicrophone(const std::string& audioDevice) {
@@ -87,7 +88,7 @@ std::string GstCaptureFramework::deviceInformation() { return deviceListText(lis
 // ---- controllers
 
 std::shared_ptr<LMRCaptureController> GstCaptureFramework::newCaptureController() {
-  return std::make_shared<CaptureController>([] { return identifierOfFirst(false); });
+  return std::make_shared<CaptureController>();
 }
 
 std::unique_ptr<LMRPreviewController> GstCaptureFramework::newPreviewController(

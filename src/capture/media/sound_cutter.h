@@ -31,6 +31,8 @@ class SoundCutter {
   std::vector<SoundPiece> cut(double t, std::uint32_t count);
   /// Samples of silence that are missing at the end of the last closed run. They count as placed afterwards.
   std::uint32_t missingAtEnd();
+  std::uint32_t missingBefore(double) { return 0; }  // STUB
+  [[nodiscard]] std::int64_t silenced() const { return 0; }  // STUB
   /// Samples placed so far.
   [[nodiscard]] std::int64_t position() const { return position_; }
   /// Samples inserted or left out to stay with the picture.

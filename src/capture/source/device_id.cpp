@@ -76,6 +76,12 @@ bool DeviceID::asFastAsPossible() const {
   return kind == DeviceKind::test && found != options.end() && found->second == "max";
 }
 
+std::optional<FrameRate> syntheticRate(const DeviceID& id) {
+  const auto rate = id.seconds("rate");
+  if (!rate || !(*rate >= 1 && *rate <= 240)) return std::nullopt;
+  return frameRateFrom(*rate);
+}
+
 PictureSize pictureSize(const DeviceID& id) {
   PictureSize size;
   const auto found = id.options.find("size");

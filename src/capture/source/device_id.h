@@ -31,6 +31,9 @@ struct DeviceID {
 /// such a device is there is another question.
 DeviceID parseDeviceID(const std::string& text);
 
+/// The "rate" option of a synthetic camera, frames a second; nothing without one.
+std::optional<FrameRate> syntheticRate(const DeviceID& id);
+
 /// The "size" option of a synthetic camera, forced to even numbers between 64 and 4096; 1280x720 without one.
 PictureSize pictureSize(const DeviceID& id);
 

@@ -94,13 +94,13 @@ struct Capture {
   bool prepare() { return controller->prepareRecording(settings, nullptr); }
   /// Wall-clock time of running time 0, once prepared.
   [[nodiscard]] double zero() const {
-    return std::dynamic_pointer_cast<CapturePipeline>(controller->session())->wallOffset();
+    return std::dynamic_pointer_cast<Source>(controller->session())->clock().wallOffset();
   }
 
   LMRRecordingContext settings;
   std::shared_ptr<Reports> reports = std::make_shared<Reports>();
   std::shared_ptr<CaptureController> controller =
-      std::make_shared<CaptureController>([] { return std::optional<std::string>(); });
+      std::make_shared<CaptureController>();
 };
 
 inline SharedDictionary parametersFor(const std::string& uuid) {
