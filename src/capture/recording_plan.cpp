@@ -49,7 +49,7 @@ Result<RecordingPlan, CaptureError> planRecording(const LMRRecordingContext& set
                      .demand = {},
                      .encoding = encodingOf(settings),
                      .maxDuration = {}};
-  plan.demand.rate = frameRateFrom(settings.maximumFrameRate);
+  plan.demand.maximumRate = settings.maximumFrameRate;
   if (settings.videoEnabled) plan.camera = settings.videoDeviceID;
   if (settings.audioEnabled) plan.microphone = settings.audioDeviceID.value_or(kAnyMicrophone);
   if (settings.videoEnabled && !plan.camera) return missing("no camera is there");
@@ -66,7 +66,7 @@ MovieEncoding completeEncoding(const RecordingPlan& plan, const CameraFormat& ca
   MovieEncoding encoding = plan.encoding;
   if (!encoding.video) return encoding;
   encoding.video->size = camera.size;
-  const FrameRate wanted = plan.demand.rate;
+  const FrameRate wanted = encoding.video->frameRate;
   if (!camera.rate) return encoding;
   const double seconds = camera.rate->frameSeconds();
   if (seconds <= 1 / kLowestRate && seconds >= wanted.frameSeconds() - 1e-6) encoding.video->frameRate = *camera.rate;

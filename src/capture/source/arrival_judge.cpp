@@ -22,7 +22,7 @@ ArrivalJudge::Finding ArrivalJudge::judge(const SoundStamp& stamp) {
   if (!running_ && !wait_) beginWait(stamp, true);
   if (!wait_) {
     const double late = clock_.lateness(stamp);
-    if (late < kEarly) return jumpTo(stamp);
+    if (late < kEarly) return startAgain(stamp);
     if (late <= kLate) {
       clock_.observe(stamp);
       return Finding::inTime;
@@ -42,16 +42,16 @@ ArrivalJudge::Finding ArrivalJudge::keepWaiting(const SoundStamp& stamp) {
   if (gained > kCatchingUp) wait_->last_fall = stamp.arrival;
   if (gained > 0) wait_->earliest = stamp;
   const double waited = stamp.arrival - wait_->since;
-  if (wait_->starting) return waited < kStart ? Finding::undecided : jumpTo(wait_->earliest);
+  if (wait_->starting) return waited < kStart ? Finding::undecided : startAgain(wait_->earliest);
   if (clock_.lateness(stamp) <= kLate) {
     wait_.reset();
     return judge(stamp);
   }
   if (waited < kLongestWait && stamp.arrival - wait_->last_fall < kSteadilyLate) return Finding::undecided;
-  return jumpTo(wait_->earliest);
+  return startAgain(wait_->earliest);
 }
 
-ArrivalJudge::Finding ArrivalJudge::jumpTo(const SoundStamp& stamp) {
+ArrivalJudge::Finding ArrivalJudge::startAgain(const SoundStamp& stamp) {
   clock_.restart(stamp);
   wait_.reset();
   running_ = true;

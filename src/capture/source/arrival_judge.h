@@ -19,6 +19,8 @@ class ArrivalJudge {
   };
   /// Stamps ascend in `heard`.
   Finding judge(const SoundStamp& stamp);
+  /// Begins anew with what is held back; `stamp` is taken for punctual.
+  Finding startAgain(const SoundStamp& stamp);
   [[nodiscard]] const ClockFilter& clock() const { return clock_; }
 
  private:
@@ -30,7 +32,6 @@ class ArrivalJudge {
   };
   void beginWait(const SoundStamp& stamp, bool starting);
   Finding keepWaiting(const SoundStamp& stamp);
-  Finding jumpTo(const SoundStamp& stamp);
 
   ClockFilter clock_;
   std::optional<Wait> wait_;

@@ -80,7 +80,7 @@ DevicePipeline::~DevicePipeline() {
 
 std::optional<CaptureError> DevicePipeline::build(const Wish& wish) {
   if (device_.kind == DeviceKind::test) {
-    auto synthetic = newPipeline(syntheticDevice(device_, wish.picture, wish.demand.rate));
+    auto synthetic = newPipeline(syntheticDevice(device_, wish.picture, frameRateFrom(wish.demand.maximumRate)));
     if (!synthetic) return error(kDeviceFailed, synthetic.error().message);
     pipeline_ = *std::move(synthetic);
     wish.picture ? attachTestPicture(pipeline_.get(), device_) : attachTestSound(pipeline_.get(), device_);

@@ -42,7 +42,7 @@ bool hasOwnClock(const DeviceID& device) {
 }
 
 CameraFormat syntheticFormat(const DeviceID& device, const CameraDemand& demand) {
-  return {pictureSize(device), syntheticRate(device).value_or(demand.rate)};
+  return {pictureSize(device), syntheticRate(device).value_or(frameRateFrom(demand.maximumRate))};
 }
 
 }  // namespace
@@ -273,7 +273,7 @@ void Source::takePicture(GstSample* picture, double time) {
     if (!delivering_) {
       const GstCaps* caps = gst_sample_get_caps(picture);
       const std::lock_guard lock(mutex_);
-      if (!format_) format_ = CameraFormat{recordedSize(caps, wish_.demand.greatest), nominalRate(caps)};
+      if (!format_) format_ = CameraFormat{recordedSize(caps, wish_.demand.size), nominalRate(caps)};
     }
     firstSample();
   }

@@ -3,6 +3,8 @@
 
 #include <algorithm>
 #include <cmath>
+#include <span>
+#include <utility>
 
 #include "platform/log.h"
 
@@ -11,10 +13,16 @@ namespace {
 
 /// Seconds of sound that are held at most.
 constexpr double kMostHeld = 4;
+/// Seconds of sound for which the speed is set at once.
+constexpr double kPieceSeconds = 0.050;
 /// Seconds in which an error of place would be made up for, were it not for the limit.
 constexpr double kCorrectionSeconds = 2;
+/// The change of speed sets in over this time: pitch glides, it does not step.
+constexpr double kGlideSeconds = 1;
 /// Greatest change of speed, which is a twelfth of a semitone.
 constexpr double kGreatestCorrection = 5000e-6;
+/// Seconds of error that are made up for without a jump.
+constexpr double kMostBehind = 0.1;
 /// More jumps than these within a minute are no accident.
 constexpr std::uint32_t kJumpsAMinute = 10;
 
@@ -30,19 +38,18 @@ std::vector<SteadySound::Chunk> SteadySound::feed(BufferHandle buffer, double ar
   const std::int64_t frames = copySamples(buffer.get());
   if (frames == 0) return chunks;
   heard_ += frames;
-  arrival = plausible(arrival);
   boundHeld();
-  switch (judge_.judge({.heard = seconds(heard_), .arrival = arrival})) {
-    case ArrivalJudge::Finding::undecided:
-      break;
-    case ArrivalJudge::Finding::jump:
-      jump(arrival, chunks);
-      [[fallthrough]];
-    case ArrivalJudge::Finding::inTime:
-      release(chunks);
-      break;
-  }
+  if (!plausible(arrival)) return chunks;
+  const ArrivalJudge::Finding finding = judge({.heard = seconds(heard_), .arrival = arrival});
+  if (finding == ArrivalJudge::Finding::jump) jump(arrival, chunks);
+  if (finding != ArrivalJudge::Finding::undecided) release(chunks);
   return chunks;
+}
+
+ArrivalJudge::Finding SteadySound::judge(const SoundStamp& stamp) {
+  const ArrivalJudge::Finding finding = judge_.judge(stamp);
+  const bool astray = part_open_ && std::abs(behind()) > kMostBehind;
+  return finding == ArrivalJudge::Finding::inTime && astray ? judge_.startAgain(stamp) : finding;
 }
 
 std::int64_t SteadySound::heldFrames() const { return static_cast<std::int64_t>(held_.size() / channels_); }
@@ -57,10 +64,9 @@ std::int64_t SteadySound::copySamples(GstBuffer* buffer) {
   return static_cast<std::int64_t>(frames);
 }
 
-/// A single stamp that goes back, or is none at all, is taken for the one before it.
-double SteadySound::plausible(double arrival) {
-  if (!std::isfinite(arrival)) arrival = std::max(last_arrival_, 0.0);
-  return std::max(arrival, std::exchange(last_arrival_, arrival));
+/// Sound whose stamp goes back waits for the next one: a clock can be wrong once.
+bool SteadySound::plausible(double arrival) {
+  return std::isfinite(arrival) && arrival >= std::exchange(last_arrival_, arrival);
 }
 
 void SteadySound::boundHeld() {
@@ -84,8 +90,13 @@ void SteadySound::jump(double arrival, std::vector<Chunk>& chunks) {
 
 void SteadySound::release(std::vector<Chunk>& chunks) {
   if (!part_open_ && !beginPart()) return;
-  adjustRatio();
-  give(resampler_.push(held_), chunks);
+  const std::span<const float> held(held_);
+  const std::size_t most = static_cast<std::size_t>(kPieceSeconds * sample_rate_ + 1) * channels_;
+  for (std::size_t at = 0; at < held.size(); at += most) {
+    const auto piece = held.subspan(at, std::min(most, held.size() - at));
+    adjustRatio(piece.size() / channels_);
+    give(resampler_.push(piece), chunks);
+  }
   held_.clear();
 }
 
@@ -99,16 +110,23 @@ bool SteadySound::beginPart() {
   part_begin_ = heard_ - heldFrames();
   part_time_ = std::max(given, clock().timeAt(seconds(part_begin_)));
   part_frames_ = 0;
+  ratio_ = 1 / clock().secondsPerSecond();
   part_open_ = true;
   return true;
 }
 
-void SteadySound::adjustRatio() {
+double SteadySound::behind() const {
   const double heard = seconds(part_begin_) + resampler_.position() / sample_rate_;
-  const double behind = clock().timeAt(heard) - (part_time_ + seconds(part_frames_));
+  return clock().timeAt(heard) - (part_time_ + seconds(part_frames_));
+}
+
+/// Sets the ratio for the next `frames`.
+void SteadySound::adjustRatio(std::size_t frames) {
   const double correction =
-      std::clamp(behind / kCorrectionSeconds, -kGreatestCorrection, kGreatestCorrection);
-  resampler_.setRatio(1 / clock().secondsPerSecond() - correction);
+      std::clamp(behind() / kCorrectionSeconds, -kGreatestCorrection, kGreatestCorrection);
+  const double wanted = 1 / clock().secondsPerSecond() - correction;
+  ratio_ += (wanted - ratio_) * std::min(1.0, static_cast<double>(frames) / sample_rate_ / kGlideSeconds);
+  resampler_.setRatio(ratio_);
 }
 
 void SteadySound::give(BufferHandle buffer, std::vector<Chunk>& chunks) {

@@ -49,13 +49,16 @@ class SteadySound {
   }
   [[nodiscard]] std::int64_t heldFrames() const;
   [[nodiscard]] std::int64_t copySamples(GstBuffer* buffer);
-  [[nodiscard]] double plausible(double arrival);
+  [[nodiscard]] bool plausible(double arrival);
+  [[nodiscard]] ArrivalJudge::Finding judge(const SoundStamp& stamp);
+  /// Seconds by which the next sound would be given out before its time.
+  [[nodiscard]] double behind() const;
   void boundHeld();
   void jump(double arrival, std::vector<Chunk>& chunks);
   void release(std::vector<Chunk>& chunks);
   [[nodiscard]] bool beginPart();
   void dropHeld(std::int64_t frames);
-  void adjustRatio();
+  void adjustRatio(std::size_t frames);
   void give(BufferHandle buffer, std::vector<Chunk>& chunks);
   void countJump(double arrival);
 
@@ -69,6 +72,7 @@ class SteadySound {
   bool part_open_ = false;        ///< the next sound follows what was given out
   std::int64_t part_begin_ = 0;   ///< number, among those that came, of the part's first frame
   double part_time_ = -1e300;     ///< running time of the part's first frame
+  double ratio_ = 1;              ///< frames read for one that is given out
   std::int64_t part_frames_ = 0;  ///< given out of the part
   std::uint32_t jumps_ = 0;
   std::uint32_t recent_jumps_ = 0;

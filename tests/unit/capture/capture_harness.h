@@ -37,8 +37,13 @@ class Folder {
 class Reports : public CaptureControllerDelegate {
  public:
   enum class Kind { none, complete, cancel };
-  void lmrCaptureSoundLost(const CaptureError& /*error*/) override { ++sound_lost; }
-  void lmrCaptureSoundBack() override { ++sound_back; }
+  enum class Sound { there, lost, back };
+  void lmrCaptureSoundLost(const CaptureError& /*error*/) override { setSound(Sound::lost); }
+  void lmrCaptureSoundBack() override { setSound(Sound::back); }
+  bool waitForSound(Sound wanted, std::chrono::seconds limit = std::chrono::seconds(30)) {
+    std::unique_lock lock(mutex_);
+    return changed_.wait_for(lock, limit, [&] { return sound_ == wanted; });
+  }
   void lmrCaptureDidComplete(const std::optional<CaptureError>& error) override {
     set(Kind::complete, error);
   }
@@ -56,8 +61,6 @@ class Reports : public CaptureControllerDelegate {
     const std::lock_guard lock(mutex_);
     return count_;
   }
-  std::atomic<int> sound_lost{0};
-  std::atomic<int> sound_back{0};
 
  private:
   void set(Kind kind, const std::optional<CaptureError>& error) {
@@ -67,8 +70,14 @@ class Reports : public CaptureControllerDelegate {
     ++count_;
     changed_.notify_all();
   }
+  void setSound(Sound sound) {
+    const std::lock_guard lock(mutex_);
+    sound_ = sound;
+    changed_.notify_all();
+  }
   std::mutex mutex_;
   std::condition_variable changed_;
+  Sound sound_ = Sound::there;
   Kind kind_ = Kind::none;
   std::optional<CaptureError> error_;
   int count_ = 0;

@@ -73,7 +73,7 @@ class Counter : public CaptureConsumer {
 TEST(Sources, ADeviceIsOpenedOnceWhateverIsWantedOfIt) {
   const std::string device = "test://video?size=160x90";
   SourceWish other = camera(device);
-  other.demand.rate = {15, 1};
+  other.demand.maximumRate = 15;
   const auto first = Sources::instance().lease(camera(device));
   const auto second = Sources::instance().lease(other);
   ASSERT_TRUE(first && second);

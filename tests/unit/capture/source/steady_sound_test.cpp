@@ -3,118 +3,22 @@
 
 #include <gtest/gtest.h>
 
-#include <algorithm>
 #include <array>
 #include <cmath>
-#include <functional>
-#include <limits>
-#include <numbers>
+#include <complex>
+#include <numeric>
 #include <random>
 #include <string>
 #include <vector>
 
+#include "tests/unit/capture/source/microphone.h"
+
 namespace lmx {
 namespace {
 
-using Chunk = SteadySound::Chunk;
-
-BufferHandle bufferOf(const std::vector<float>& samples) {
-  ensureGStreamer();
-  const std::size_t bytes = samples.size() * sizeof(float);
-  BufferHandle buffer(gst_buffer_new_allocate(nullptr, bytes, nullptr));
-  gst_buffer_fill(buffer.get(), 0, samples.data(), bytes);
-  return buffer;
-}
-
-std::vector<float> samplesOf(const Chunk& chunk) {
-  std::vector<float> samples(gst_buffer_get_size(chunk.buffer.get()) / sizeof(float));
-  gst_buffer_extract(chunk.buffer.get(), 0, samples.data(), samples.size() * sizeof(float));
-  return samples;
-}
-
-/// A microphone in front of a loudspeaker that plays a tone: sine left, cosine right. Any two samples tell
-/// when they were heard.
-class Microphone {
- public:
-  Microphone(int rate, double ppm, double frequency)
-      : rate_(rate * (1 + ppm * 1e-6)), turn_(2 * std::numbers::pi * frequency) {}
-
-  std::vector<float> hear(int frames) {
-    std::vector<float> samples;
-    samples.reserve(static_cast<std::size_t>(frames) * 2);
-    for (int i = 0; i < frames; ++i, ++heard_) {
-      const double angle = turn_ * timeOf(heard_);
-      samples.push_back(static_cast<float>(0.5 * std::sin(angle)));
-      samples.push_back(static_cast<float>(0.5 * std::cos(angle)));
-    }
-    return samples;
-  }
-  /// Sound that is lost on the way.
-  void miss(int frames) { heard_ += frames; }
-  /// Running time now.
-  [[nodiscard]] double now() const { return timeOf(heard_); }
-
- private:
-  [[nodiscard]] double timeOf(std::int64_t n) const { return 3.7 + static_cast<double>(n) / rate_; }
-  double rate_;
-  double turn_;
-  std::int64_t heard_ = 0;
-};
-
-/// Compares what was given out with the tone.
-class Listener {
- public:
-  Listener(int rate, double frequency) : rate_(rate), turn_(2 * std::numbers::pi * frequency) {}
-
-  void listen(const std::vector<Chunk>& chunks) {
-    for (const Chunk& chunk : chunks) {
-      if (frames_ > 0) gaps_.push_back(chunk.time - end_);
-      const std::vector<float> samples = samplesOf(chunk);
-      for (std::size_t i = 0; i < samples.size(); i += 2) {
-        hearFrame(chunk.time + static_cast<double>(i / 2) / rate_, samples[i], samples[i + 1]);
-      }
-      end_ = chunk.time + static_cast<double>(samples.size() / 2) / rate_;
-    }
-  }
-
-  /// Greatest error of place, seconds, more than a second after the beginning.
-  [[nodiscard]] double worst() const { return worst_; }
-  /// Greatest step of the place from one sample to the next, seconds.
-  [[nodiscard]] double roughest() const { return roughest_; }
-  /// Greatest jump of the times.
-  [[nodiscard]] double gap() const {
-    return gaps_.empty() ? 0 : *std::max_element(gaps_.begin(), gaps_.end());
-  }
-  [[nodiscard]] double overlap() const {
-    return gaps_.empty() ? 0 : -*std::min_element(gaps_.begin(), gaps_.end());
-  }
-  [[nodiscard]] auto gaps(double longerThan) const {
-    return std::count_if(gaps_.begin(), gaps_.end(), [&](double gap) { return gap > longerThan; });
-  }
-  [[nodiscard]] std::int64_t frames() const { return frames_; }
-  [[nodiscard]] double end() const { return end_; }
-
- private:
-  void hearFrame(double t, float sine, float cosine) {
-    const double error = std::remainder(turn_ * t - std::atan2(sine, cosine), 2 * std::numbers::pi) / turn_;
-    if (frames_ == 0) begin_ = t;
-    if (t > begin_ + 1) {
-      worst_ = std::max(worst_, std::abs(error));
-      roughest_ = std::max(roughest_, std::abs(error - last_error_));
-    }
-    last_error_ = error;
-    ++frames_;
-  }
-  int rate_;
-  double turn_;
-  double begin_ = 0;
-  double end_ = 0;
-  double worst_ = 0;
-  double roughest_ = 0;
-  double last_error_ = 0;
-  std::int64_t frames_ = 0;
-  std::vector<double> gaps_;
-};
+using testing::bufferOf;
+using testing::Listener;
+using testing::Microphone;
 
 enum class Jitter { none, uniform, bursts, hiccups };
 /// Frames of a chunk, for 48,000 a second; 0: irregular.
@@ -179,7 +83,7 @@ struct Case {
   Weather weather;
 };
 
-class SteadySoundForHours : public testing::TestWithParam<Case> {};
+class SteadySoundForHours : public ::testing::TestWithParam<Case> {};
 
 TEST_P(SteadySoundForHours, StaysWithinFiveMilliseconds) {
   const auto [ppm, weather] = GetParam();
@@ -202,14 +106,155 @@ constexpr std::array kCases{
     Case{200, {0, Jitter::uniform}},  Case{200, {480, Jitter::hiccups}},
 };
 
-std::string nameOf(const testing::TestParamInfo<Case>& info) {
+std::string nameOf(const ::testing::TestParamInfo<Case>& info) {
   static const std::array<std::string, 4> kJitter{"Punctual", "Uniform", "Bursts", "Hiccups"};
   const auto& [ppm, weather] = info.param;
   return (ppm < 0 ? "Minus" : "Plus") + std::to_string(std::abs(static_cast<int>(ppm))) + "Chunks" +
          std::to_string(weather.chunk) + kJitter.at(static_cast<std::size_t>(weather.jitter));
 }
 
-INSTANTIATE_TEST_SUITE_P(, SteadySoundForHours, testing::ValuesIn(kCases), nameOf);
+INSTANTIATE_TEST_SUITE_P(, SteadySoundForHours, ::testing::ValuesIn(kCases), nameOf);
+
+// ---- how it sounds
+
+/// Greatest deviation from a pure tone within `samples`, in decibels of the tone: a click, a step, hiss. The
+/// tone's pitch, loudness and place are those of the window itself.
+double deviation(const std::vector<std::complex<double>>& window) {
+  const auto mean = [&](double pitch) {
+    std::complex<double> sum;
+    for (std::size_t n = 0; n < window.size(); ++n) {
+      sum += window[n] * std::polar(1.0, -pitch * static_cast<double>(n));
+    }
+    return sum / static_cast<double>(window.size());
+  };
+  // The pitch: how far the tone turns from the window's first to its second half.
+  double pitch =
+      std::arg(std::inner_product(window.begin() + 1, window.end(), window.begin(), std::complex<double>(),
+                                  std::plus<>(), [](auto a, auto b) { return a * std::conj(b); }));
+  const std::size_t half = window.size() / 2;
+  for (int round = 0; round < 3; ++round) {
+    std::complex<double> turn;
+    for (std::size_t n = 0; n < half; ++n) {
+      turn += window[n + half] * std::conj(window[n]) * std::polar(1.0, -pitch * static_cast<double>(half));
+    }
+    pitch += std::arg(turn) / static_cast<double>(half);
+  }
+  const std::complex<double> tone = mean(pitch);
+  double worst = 0;
+  for (std::size_t n = 0; n < window.size(); ++n) {
+    worst = std::max(worst, std::abs(window[n] - tone * std::polar(1.0, pitch * static_cast<double>(n))));
+  }
+  return 20 * std::log10(worst / std::abs(tone));
+}
+
+std::vector<std::complex<double>> toneOf(double ppm, double frequency, Weather weather, double until) {
+  SteadySound sound(48000, 2);
+  Microphone microphone(48000, ppm, frequency);
+  Delivery delivery(48000, weather);
+  std::vector<std::complex<double>> tone;
+  while (microphone.now() < until) {
+    auto buffer = bufferOf(microphone.hear(delivery.nextSize()));
+    for (const auto& chunk : sound.feed(std::move(buffer), delivery.arrivalOf(microphone.now()))) {
+      const std::vector<float> samples = testing::samplesOf(chunk);
+      for (std::size_t i = 0; i < samples.size(); i += 2) tone.emplace_back(samples[i + 1], samples[i]);
+    }
+  }
+  return tone;
+}
+
+double worstDeviation(const std::vector<std::complex<double>>& tone, double from, double until) {
+  double worst = -300;
+  const auto last = static_cast<std::size_t>(until * 48000) - 960;
+  for (auto i = static_cast<std::size_t>(from * 48000); i < last; i += 480) {
+    worst = std::max(worst, deviation({&tone[i], &tone[i + 960]}));
+  }
+  return worst;
+}
+
+// In the first seconds the speed is found, and the pitch glides: within 20 ms that shows more, the higher the
+// tone. A step of the sound by a hundredth of a sample would show above -45 dB in the tone of 9973 Hz.
+TEST(SteadySound, AToneStaysPure) {
+  struct Tone {
+    double frequency, first, settled;  // Hz, dB, dB
+  };
+  for (const auto& [frequency, first, settled] : {Tone{997, -60, -85}, Tone{9973, -40, -65}}) {
+    for (const double ppm : {-200.0, 50.0}) {
+      const auto tone = toneOf(ppm, frequency, {0, Jitter::uniform}, 45);
+      EXPECT_LT(worstDeviation(tone, 0.01, 30), first) << ppm << " ppm, " << frequency << " Hz";
+      EXPECT_LT(worstDeviation(tone, 30, 40), settled) << ppm << " ppm, " << frequency << " Hz";
+    }
+  }
+}
+
+TEST(SteadySound, AllThatIsHeardPasses) {
+  for (const double frequency : {40.0, 5000.0, 12000.0, 16000.0, 18000.0}) {
+    const auto tone = toneOf(100, frequency, {480, Jitter::none}, 6);
+    double power = 0;
+    for (std::size_t i = 4800; i < tone.size(); ++i) power += std::norm(tone[i]);
+    const double level = 10 * std::log10(power / static_cast<double>(tone.size() - 4800) / 0.25);
+    EXPECT_NEAR(level, 0, 0.5) << frequency;
+  }
+}
+
+// ---- what is missing
+
+struct Gap {
+  double seconds;
+  Jitter jitter;
+};
+
+TEST(SteadySound, MissingSoundIsOneJump) {
+  for (const auto& [seconds, jitter] :
+       {Gap{0.05, Jitter::none}, Gap{0.05, Jitter::uniform}, Gap{0.3, Jitter::uniform}, Gap{1, Jitter::none},
+        Gap{1, Jitter::uniform}, Gap{1, Jitter::bursts}, Gap{30, Jitter::uniform}}) {
+    SteadySound sound(8000, 2);
+    Microphone microphone(8000, 100, 25);
+    Delivery delivery(8000, {480, jitter});
+    Listener listener(8000, 25);
+    record(sound, microphone, delivery, listener, 60);
+    microphone.miss(static_cast<int>(seconds * 8000));
+    record(sound, microphone, delivery, listener, 120);
+    EXPECT_EQ(listener.gaps(0.0001), 1) << seconds;
+    EXPECT_NEAR(listener.gap(), seconds, 0.005);
+    EXPECT_LT(listener.worst(), 0.005) << seconds;
+    EXPECT_LT(listener.overlap(), 1e-6);
+    EXPECT_EQ(sound.jumps(), 1U);
+    EXPECT_NEAR(sound.partsPerMillion(), 100, 10);
+  }
+}
+
+TEST(SteadySound, AFewMissingSamplesAreMadeUpForWithoutAJump) {
+  SteadySound sound(8000, 2);
+  Microphone microphone(8000, 0, 25);
+  Delivery delivery(8000, {480, Jitter::uniform});
+  Listener before(8000, 25);
+  record(sound, microphone, delivery, before, 60);
+  microphone.miss(80);
+  record(sound, microphone, delivery, before, 72);
+  Listener after(8000, 25);
+  record(sound, microphone, delivery, after, 100);
+  EXPECT_LT(before.gap(), 1e-6);
+  EXPECT_LT(before.worst(), 0.011);
+  EXPECT_LT(after.worst(), 0.005);
+}
+
+// What is in the device's memory while nobody reads comes late, but it comes.
+TEST(SteadySound, LateSoundThatCatchesUpIsNoGap) {
+  for (const double stall : {0.1, 0.3, 0.7, 3.0}) {
+    SteadySound sound(8000, 2);
+    Microphone microphone(8000, 100, 25);
+    Listener listener(8000, 25);
+    while (microphone.now() < 60) {
+      auto buffer = bufferOf(microphone.hear(80));
+      const double there = microphone.now();
+      const bool stalled = there > 30 && there <= 30 + stall;
+      listener.listen(sound.feed(std::move(buffer), stalled ? 30 + stall : there));
+    }
+    EXPECT_LT(listener.worst(), 0.005) << stall;
+    EXPECT_LT(listener.gap(), 1e-6) << stall;
+    EXPECT_EQ(sound.jumps(), 0U) << stall;
+  }
+}
 
 }  // namespace
 }  // namespace lmx
