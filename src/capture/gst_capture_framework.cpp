@@ -52,7 +52,7 @@ bool GstCaptureFramework::hasDevice(const std::string& uniqueID) {
     case DeviceKind::file:
       return access(id.name.c_str(), R_OK) == 0;
     case DeviceKind::hardware:
-      return Sources::instance().delivers(uniqueID) || findHardware(uniqueID).has_value();
+      return Sources::instance().delivers(uniqueID) || isHardwareThere(uniqueID);
     case DeviceKind::unknown:
       break;
   }
@@ -83,7 +83,7 @@ std::optional<LMRCompressionOptions> GstCaptureFramework::compressionOptions(Med
   return LMRCompressionOptions{.media = media, .quality = quality};
 }
 
-std::string GstCaptureFramework::deviceInformation() { return deviceListText(listHardware()); }
+std::string GstCaptureFramework::deviceInformation() { return deviceListText(listHardware(), demandHere()); }
 
 // ---- controllers
 

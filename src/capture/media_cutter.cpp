@@ -91,8 +91,9 @@ void MediaCutter::feedNothing(double now) {
 
 /// Gives up waiting for sound before `until`.
 void MediaCutter::fillSilence(double until) {
-  const std::uint32_t missing = sound_->missingBefore(until);
-  if (missing > 0 && startMovie()) pushSilence(missing);
+  while (const std::uint32_t missing = sound_->missingBefore(until)) {
+    if (startMovie()) pushSilence(missing);
+  }
 }
 
 /// In pieces: an hour of it must not be an hour of memory.

@@ -48,7 +48,7 @@ class MediaCutter {
   /// Samples of each channel that have been given to the movie.
   [[nodiscard]] std::int64_t samples() const { return sound_ ? sound_->position() : 0; }
   /// Those of them that are silence in the place of missing sound.
-  [[nodiscard]] std::int64_t silentSamples() const { return sound_ ? sound_->silenced() : 0; }
+  [[nodiscard]] std::uint64_t silentSamples() const { return sound_ ? sound_->silence() : 0; }
 
  private:
   FrameDecision decide(double t);

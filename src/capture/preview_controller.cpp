@@ -22,7 +22,7 @@ std::string nameOf(const std::string& device) {
 }  // namespace
 
 bool PreviewController::attachIOWithDevice(const std::string& device, CaptureError* error) {
-  const SourceWish wish{.device = device, .picture = true, .demand = {}};
+  const SourceWish wish{.device = device, .picture = true, .demand = demandHere()};
   std::optional<CaptureError> problem;
   if (parseDeviceID(device).kind == DeviceKind::unknown) {
     problem = CaptureError{CaptureError::kDomain, kDeviceNotFound,

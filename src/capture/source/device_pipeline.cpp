@@ -115,8 +115,7 @@ std::optional<CaptureError> DevicePipeline::addHardware(const Wish& wish) {
   tuneSource(source.get());
   gst_bin_add(GST_BIN(pipeline_.get()), source.get());
   if (wish.picture && wish.hardware) {
-    const CapsHandle offered(gst_device_get_caps(wish.hardware->device.get()));
-    const auto mode = chooseMode(offeredModes(offered.get()), wish.demand);
+    const auto mode = chooseMode(wish.hardware->modes, wish.demand);
     if (mode) mode_ = describe(*mode);
     return addDecoder(source.get(), mode ? capsOf(*mode).get() : nullptr);
   }
@@ -131,7 +130,9 @@ std::optional<CaptureError> DevicePipeline::addDecoder(GstElement* source, const
   const auto filter = owned(gst_element_factory_make("capsfilter", nullptr));
   const auto decoder = owned(gst_element_factory_make("decodebin", nullptr));
   if (!filter || !decoder) return error(kDeviceFailed, "can't be set up: a GStreamer plug-in is missing");
-  if (caps != nullptr) g_object_set(filter.get(), "caps", caps, nullptr);
+  // A sound and picture server links nobody who takes anything.
+  const CapsHandle anyPicture(gst_caps_from_string("video/x-raw; image/jpeg; video/x-h264"));
+  g_object_set(filter.get(), "caps", caps != nullptr ? caps : anyPicture.get(), nullptr);
   g_signal_connect(decoder.get(), "pad-added", G_CALLBACK(&onPad), this);
   for (const auto& element : {&filter, &decoder})
     gst_bin_add(GST_BIN(pipeline_.get()), element->get());

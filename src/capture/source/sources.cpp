@@ -28,7 +28,10 @@ HardwareDevice copyOf(const HardwareDevice& device) {
   copy.name = device.name;
   copy.parent = device.parent;
   copy.formats = device.formats;
+  copy.modes = device.modes;
   copy.isVideo = device.isVideo;
+  copy.isReal = device.isReal;
+  copy.isDefault = device.isDefault;
   copy.device.reset(GST_DEVICE(gst_object_ref(device.device.get())));
   return copy;
 }

@@ -82,13 +82,15 @@ double runningTimeOf(GstPad* pad, GstBuffer* buffer, const Probe& probe) {
   return CaptureClock::at(gst_element_get_base_time(source.get())) + sinceOpening;
 }
 
-/// The number of the grain of `grainSeconds` that has begun last at `time`. The buffer's time is moved back to its
-/// beginning; nothing comes from the future. @return nothing for a buffer that would be older than the device
-std::optional<std::uint64_t> alignToGrain(GstBuffer* buffer, double time, double grainSeconds) {
-  const double number = std::floor(time / grainSeconds + 1e-3);
-  const double earlier = std::max(0.0, (time - number * grainSeconds) * 1e9);
-  if (earlier > static_cast<double>(GST_BUFFER_PTS(buffer))) return std::nullopt;
-  GST_BUFFER_PTS(buffer) -= static_cast<GstClockTime>(earlier);
+/// The number of the grain, of those that last 1/`rate` each, that has begun last at `time`. A live buffer's time is moved
+/// back to its beginning; nothing comes from the future. @return nothing for a buffer that would be older than the device
+std::optional<std::uint64_t> alignToGrain(GstBuffer* buffer, double time, FrameRate rate, bool live) {
+  const double number = std::floor(time / rate.frameSeconds() + 1e-3);
+  const double earlier = std::max(0.0, (time - number * rate.frameSeconds()) * 1e9);
+  if (live) {
+    if (earlier > static_cast<double>(GST_BUFFER_PTS(buffer))) return std::nullopt;
+    GST_BUFFER_PTS(buffer) -= static_cast<GstClockTime>(earlier);
+  }
   return static_cast<std::uint64_t>(number);
 }
 
@@ -117,10 +119,11 @@ GstPadProbeReturn onBuffer(GstPad* pad, GstPadProbeInfo* info, gpointer user) no
   buffer = gst_buffer_make_writable(buffer);
   GST_PAD_PROBE_INFO_DATA(info) = buffer;
   const double time = runningTimeOf(pad, buffer, probe);
-  const double frameSeconds = static_cast<double>(GST_BUFFER_DURATION(buffer)) / 1e9;
-  const auto number = alignToGrain(buffer, time, probe.video ? frameSeconds : 1.0 / kSoundRate);
+  const FrameRate rate = probe.video ? frameRateFrom(1e9 / static_cast<double>(GST_BUFFER_DURATION(buffer)))
+                                     : FrameRate{kSoundRate, 1};
+  const auto number = alignToGrain(buffer, time, rate, !probe.id.asFastAsPossible());
   if (!number) return GST_PAD_PROBE_DROP;
-  probe.video ? draw(buffer, probe, *number, frameSeconds) : fillSound(buffer, *number);
+  probe.video ? draw(buffer, probe, *number, rate.frameSeconds()) : fillSound(buffer, *number);
   return GST_PAD_PROBE_OK;
 }
 
