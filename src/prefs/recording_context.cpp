@@ -7,6 +7,7 @@
 #include "platform/paths.h"
 #include "prefs/continuous_settings.h"
 #include "prefs/recording_types.h"
+#include "prefs/signal_settings.h"
 #include "support/format.h"
 #include "support/redacted.h"
 
@@ -82,6 +83,7 @@ std::shared_ptr<LMRRecordingContext> RecordingContextBuilder::newRecordingContex
   context->captureTempDir = *repository;
   context->diskSpaceCutoffInMB = integerOf(text("RecordingDiskSpaceCutoffInMB"));
   context->previewIntervalInMilliseconds = integerOf(text("PreviewIntervalInMilliseconds"));
+  context->signal = signalThresholds([this](const char* key) { return text(key); });
   context->previewImagePath = systemPath(kPreviewImage);
   const auto continuous = (prefs_.*read_)("ContinuousRecording");
   if (continuous && continuous->dictionary() != nullptr) {

@@ -5,6 +5,7 @@
 #include <optional>
 #include <string>
 
+#include "capture/api/signal_thresholds.h"
 #include "model/continuous_recording.h"
 #include "support/dictionary.h"
 
@@ -42,6 +43,7 @@ struct LMRRecordingContext {
   std::int64_t previewIntervalInMilliseconds = 0;
   std::string previewImagePath;
   LMRContinuousRecordingInfo continuous;
+  SignalThresholds signal;
   // Set by the engine:
   std::string outputPath;                ///< final name of the movie
   std::uint32_t maxDurationMinutes = 0;  ///< 0: no limit

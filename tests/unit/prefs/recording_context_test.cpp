@@ -52,6 +52,15 @@ class RecordingContext : public testing::PrefsFixture {
   std::shared_ptr<ScriptedCatalog> catalog_ = std::make_shared<ScriptedCatalog>();
 };
 
+TEST_F(RecordingContext, HoldsTheThresholdsOfSignalTrouble) {
+  replace(complete());
+  EXPECT_EQ(build()->signal, SignalThresholds{});
+  PlistDictionary changed = complete();
+  changed["SignalBlackLevel"] = "40";
+  replace(changed);
+  EXPECT_EQ(build()->signal, SignalThresholds{.blackLevel = 40});
+}
+
 TEST_F(RecordingContext, HoldsWhatThePreferencesSay) {
   replace(complete());
   const auto context = build();
