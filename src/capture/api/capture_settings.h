@@ -5,6 +5,7 @@
 #include <optional>
 #include <string>
 
+#include "capture/api/picture.h"
 #include "model/continuous_recording.h"
 #include "support/dictionary.h"
 
@@ -33,6 +34,7 @@ struct LMRRecordingContext {
   bool previewEnabled = false;
   std::optional<std::string> videoDeviceID;
   std::optional<std::string> audioDeviceID;  ///< absent: the framework's default device
+  PictureSize maximumSize = kFullHD;         ///< of the picture; a camera is asked for no more
   std::optional<LMRCompressionOptions> videoCompressionOptions;
   std::optional<LMRCompressionOptions> audioCompressionOptions;
   std::string captureTempDir;  ///< the recording repository
