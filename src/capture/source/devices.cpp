@@ -104,9 +104,13 @@ std::vector<GstHandle<GstDevice>> devicesOf(std::initializer_list<const char*> c
   const GstHandle<GstDeviceMonitor> monitor(gst_device_monitor_new());
   for (const char* name : classes) gst_device_monitor_add_filter(monitor.get(), name, nullptr);
   std::vector<GstHandle<GstDevice>> devices;
+  // Started: otherwise the sound and picture server's provider tells of devices, in use through the same connection,
+  // after they have gone.
+  const bool started = gst_device_monitor_start(monitor.get()) != FALSE;
   GList* found = gst_device_monitor_get_devices(monitor.get());
   for (GList* item = found; item != nullptr; item = item->next) devices.emplace_back(GST_DEVICE(item->data));
   g_list_free(found);
+  if (started) gst_device_monitor_stop(monitor.get());
   return devices;
 }
 
