@@ -1,6 +1,9 @@
 // From the settings of a recording to its plan.
 #include "capture/recording_plan.h"
 
+#include <algorithm>
+#include <cmath>
+
 namespace lmx {
 namespace {
 
@@ -26,6 +29,15 @@ CaptureError noIdentifier(const std::string& device, const char* what) {
   return missing("\"" + device + "\" is no " + what + " identifier; list them with lmxagentd -i zq-device-list");
 }
 
+int evenShare(int side, double scale) { return std::max(16, static_cast<int>(std::lround(side * scale / 2)) * 2); }
+
+/// `size`, no larger than `limit`, with the aspect ratio kept; even numbers.
+PictureSize fitted(PictureSize size, PictureSize limit) {
+  const double scale = std::min({1.0, static_cast<double>(limit.width) / size.width,
+                                 static_cast<double>(limit.height) / size.height});
+  return {evenShare(size.width, scale), evenShare(size.height, scale)};
+}
+
 MovieEncoding encodingOf(const LMRRecordingContext& settings) {
   MovieEncoding encoding;
   if (settings.videoEnabled) {
@@ -46,10 +58,10 @@ Result<RecordingPlan, CaptureError> planRecording(const LMRRecordingContext& set
                      .type = recordingTypeOf(settings.captureType),
                      .camera = {},
                      .microphone = {},
-                     .demand = {},
+                     .demand = {.size = settings.maximumSize, .maximumRate = settings.maximumFrameRate},
+                     .signal = settings.signal,
                      .encoding = encodingOf(settings),
                      .maxDuration = {}};
-  plan.demand.maximumRate = settings.maximumFrameRate;
   if (settings.videoEnabled) plan.camera = settings.videoDeviceID;
   if (settings.audioEnabled) plan.microphone = settings.audioDeviceID.value_or(kAnyMicrophone);
   if (settings.videoEnabled && !plan.camera) return missing("no camera is there");
@@ -65,7 +77,7 @@ Result<RecordingPlan, CaptureError> planRecording(const LMRRecordingContext& set
 MovieEncoding completeEncoding(const RecordingPlan& plan, const CameraFormat& camera) {
   MovieEncoding encoding = plan.encoding;
   if (!encoding.video) return encoding;
-  encoding.video->size = camera.size;
+  encoding.video->size = fitted(camera.size, plan.demand.size);
   const FrameRate wanted = encoding.video->frameRate;
   if (!camera.rate) return encoding;
   const double seconds = camera.rate->frameSeconds();

@@ -17,8 +17,8 @@ constexpr double kJoinSeconds = 10;
 constexpr std::uint32_t kMostLines = 200;
 /// So many entries of a kind are named in the summary.
 constexpr std::size_t kMostNamed = 3;
-/// Less can't be heard, and each beginning has some.
-constexpr double kLeastSilence = 0.010;
+/// Less is how recordings begin and end: devices open and close one after the other.
+constexpr double kLeastSilence = 0.1;
 
 std::string number(double value) { return string_with_format("%.3f", value); }
 

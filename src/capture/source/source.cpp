@@ -273,7 +273,7 @@ void Source::takePicture(GstSample* picture, double time) {
     if (!delivering_) {
       const GstCaps* caps = gst_sample_get_caps(picture);
       const std::lock_guard lock(mutex_);
-      if (!format_) format_ = CameraFormat{recordedSize(caps, wish_.demand.size), nominalRate(caps)};
+      if (!format_) format_ = CameraFormat{recordedSize(caps), nominalRate(caps)};
     }
     firstSample();
   }
