@@ -35,13 +35,10 @@ MovieOutput::MovieOutput(const MovieEncoding& encoding, GrowingMovie movie, Jour
       patience_(patience),
       on_error_(std::move(onError)) {}
 
-bool MovieOutput::start(PictureSize size) {
+bool MovieOutput::start() {
   if (tried_) return encoder_ != nullptr;
   tried_ = true;  // the movie is handed on: a second try would have none
-  if (encoding_.video) {
-    encoding_.video->size = size;
-    hold_.emplace(frameDuration(encoding_.video->frameRate));
-  }
+  if (encoding_.video) hold_.emplace(frameDuration(encoding_.video->frameRate));
   const std::size_t tracks = (encoding_.video ? 1 : 0) + (encoding_.audio ? 1 : 0);
   writer_ = std::make_unique<MovieWriter>(std::move(movie_), tracks, journal_, patience_,
                                           [this](int error) { on_error_(writeError(error)); });

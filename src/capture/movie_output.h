@@ -28,9 +28,9 @@ class MovieOutput {
   MovieOutput(const MovieEncoding& encoding, GrowingMovie movie, Journal& journal, Deadline& patience,
               OnError onError);
 
-  /// Starts the encoder, once. @param size  of the frames
+  /// Starts the encoder, once.
   /// @return false when it could not be started, now or before
-  bool start(PictureSize size);
+  bool start();
 
   // Once started. These wait while the encoder is behind.
   /// Encodes `buffer` as frame number `place` of the movie's clock. Places ascend; before a hole the frame

@@ -5,6 +5,8 @@
 #include <optional>
 #include <string>
 
+#include "capture/api/picture.h"
+#include "capture/api/signal_thresholds.h"
 #include "model/continuous_recording.h"
 #include "support/dictionary.h"
 
@@ -32,7 +34,10 @@ struct LMRRecordingContext {
   bool videoEnabled = false;
   bool previewEnabled = false;
   std::optional<std::string> videoDeviceID;
-  std::optional<std::string> audioDeviceID;  ///< absent: the framework's default device
+  /// Absent: the first microphone there is when the capture begins. With a microphone that isn't there, or
+  /// none at all, the recording is silent until one is.
+  std::optional<std::string> audioDeviceID;
+  PictureSize maximumSize = kFullHD;  ///< of the picture; a camera is asked for no more
   std::optional<LMRCompressionOptions> videoCompressionOptions;
   std::optional<LMRCompressionOptions> audioCompressionOptions;
   std::string captureTempDir;  ///< the recording repository
@@ -40,6 +45,7 @@ struct LMRRecordingContext {
   std::int64_t previewIntervalInMilliseconds = 0;
   std::string previewImagePath;
   LMRContinuousRecordingInfo continuous;
+  SignalThresholds signal;
   // Set by the engine:
   std::string outputPath;                ///< final name of the movie
   std::uint32_t maxDurationMinutes = 0;  ///< 0: no limit
@@ -64,8 +70,10 @@ class CaptureCatalog {
   };
   /// The microphone that belongs to `videoDevice`.
   virtual PreferredAudio preferredAudioDevice(const std::string& videoDevice) = 0;
-  /// Whether `audioDevice` names a usable device; absent asks for the default one.
-  virtual bool audioDeviceUsable(const std::optional<std::string>& audioDevice) = 0;
+  /// Whether `audioDevice` can be a microphone's identifier, whether or not that microphone is there. Pure.
+  virtual bool canBeMicrophone(const std::string& audioDevice) = 0;
+  /// Whether that microphone is there; absent asks for any. May block for some milliseconds.
+  virtual bool hasMicrophone(const std::optional<std::string>& audioDevice) = 0;
   virtual std::optional<LMRCompressionOptions> compressionOptions(MediaType media,
                                                                   RecordingQuality quality) = 0;
 };

@@ -3,6 +3,7 @@
 
 #include <algorithm>
 #include <cmath>
+#include <limits>
 
 namespace lmx {
 
@@ -36,7 +37,7 @@ void SoundCutter::cutRun(std::size_t number, double t, std::uint32_t count, std:
   if (!run.closed || !past || number != run_) return;
   if (position_ < extent.end) {
     pieces.push_back({.silence = static_cast<std::uint32_t>(extent.end - position_)});
-    position_ = extent.end;
+    fill(extent.end - position_);
   }
   ++run_;
 }
@@ -46,10 +47,12 @@ SoundPiece SoundCutter::place(const Extent& run, std::int64_t target, std::int64
   SoundPiece piece;
   std::int64_t from = first;
   const std::int64_t ahead = target - position_;
-  if (ahead > tolerance_ || (ahead > 0 && position_ <= run.start)) {
+  // Only sound that follows sound may be off a little: then it goes on without a seam.
+  const std::int64_t tolerance = filled_ || position_ <= run.start ? 0 : tolerance_;
+  if (ahead > tolerance) {
     piece.silence = static_cast<std::uint32_t>(ahead);
     if (position_ > run.start) corrected_ += piece.silence;
-  } else if (-ahead > tolerance_) {
+  } else if (-ahead > tolerance) {
     from = std::min(last, from - ahead);
     corrected_ += static_cast<std::uint64_t>(from - first);
   }
@@ -57,15 +60,40 @@ SoundPiece SoundCutter::place(const Extent& run, std::int64_t target, std::int64
   const std::int64_t room = std::max<std::int64_t>(0, run.end - position_ - piece.silence);
   piece.offset = static_cast<std::uint32_t>(from);
   piece.count = static_cast<std::uint32_t>(std::max<std::int64_t>(0, std::min(last - from, room)));
-  position_ += piece.silence + piece.count;
+  fill(piece.silence);
+  position_ += piece.count;
+  if (piece.count > 0) filled_ = false;
   return piece;
 }
 
-std::uint32_t SoundCutter::missingAtEnd() {
-  if (frames_.runs().empty()) return 0;
-  const std::int64_t missing = std::max<std::int64_t>(0, extentOf(frames_.runs().back()).end - position_);
-  position_ += missing;
+void SoundCutter::fill(std::int64_t samples) {
+  position_ += samples;
+  silence_ += static_cast<std::uint64_t>(samples);
+  filled_ = filled_ || samples > 0;
+}
+
+/// Position in the movie of running time `t`, or the end of the run's frames if that is earlier.
+std::int64_t SoundCutter::reachable(const MovieRun& run, double t) const {
+  const Extent extent = extentOf(run);
+  const double samples = std::round((t - run.sessionTime) * static_cast<double>(rate_));
+  const auto length = static_cast<double>(extent.end - extent.start);
+  return extent.start + static_cast<std::int64_t>(std::min(samples, length));
+}
+
+std::uint32_t SoundCutter::missingBefore(double t) {
+  std::int64_t target = position_;
+  for (std::size_t i = run_; i < frames_.runs().size() && frames_.runs()[i].sessionTime < t; ++i) {
+    target = std::max(target, reachable(frames_.runs()[i], t));
+  }
+  const std::int64_t missing = std::min<std::int64_t>(target - position_, rate_);
+  fill(missing);
   return static_cast<std::uint32_t>(missing);
+}
+
+std::uint32_t SoundCutter::missingAtEnd() {
+  std::uint32_t missing = 0;
+  while (const std::uint32_t more = missingBefore(std::numeric_limits<double>::infinity())) missing += more;
+  return missing;
 }
 
 }  // namespace lmx

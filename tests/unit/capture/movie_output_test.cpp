@@ -37,14 +37,15 @@ BufferHandle pictureOf(std::uint32_t number) {
 class Output {
  public:
   explicit Output(const MovieEncoding& encoding) : encoding_(encoding) {
+    if (encoding_.video) encoding_.video->size = kSize;
     ensureGStreamer();
     journal_ = *Journal::create(folder_.file("journal"));
     GrowingMovie movie;
     EXPECT_EQ(movie.create(path()), 0);
     output_ =
-        std::make_unique<MovieOutput>(encoding, std::move(movie), *journal_, patience_,
+        std::make_unique<MovieOutput>(encoding_, std::move(movie), *journal_, patience_,
                                       [this](const CaptureError& error) { ADD_FAILURE() << error.message; });
-    EXPECT_TRUE(output_->start(kSize));
+    EXPECT_TRUE(output_->start());
   }
   void frames(const Numbers& places, const Numbers& keys = {}) {
     for (const std::uint32_t place : places) {
