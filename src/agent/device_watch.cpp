@@ -16,6 +16,7 @@
 #include "prefs/recording_context.h"
 #include "record/capture_delegate.h"
 #include "record/create_preview.h"
+#include "record/preview_controller.h"
 
 namespace lmx {
 namespace {
@@ -48,7 +49,15 @@ std::shared_ptr<LMRRecordingContext> DeviceWatch::recordingContext() const {
   return nullptr;
 }
 
+void DeviceWatch::tellOfMissingMicrophone(const LMRRecordingContext& settings) const {
+  if (!settings.audioEnabled || framework_->hasMicrophone(settings.audioDeviceID)) return;
+  const std::string name = settings.audioDeviceID ? "\"" + *settings.audioDeviceID + "\"" : "(Automatic)";
+  LMPLogMessage(context_->log_context(), kLogError,
+                "The microphone %s is not there: recordings are silent until it is", name.c_str());
+}
+
 void DeviceWatch::probeDevice(const LMRRecordingContext& settings) {
+  tellOfMissingMicrophone(settings);
   if (!settings.videoDeviceID) return;
   if (LXAgentRecordCreatePreviewController(settings.videoDeviceID, settings.audioDeviceID,
                                            settings.audioEnabled, settings.previewIntervalInMilliseconds,
@@ -95,12 +104,20 @@ void DeviceWatch::giveUp() {
 /// @return whether nothing is missing. An agent that doesn't record video has no camera to wait for.
 bool DeviceWatch::openAgain(const LMRRecordingContext& settings) {
   const auto record = context_->record_context();
-  record->previewController.set(nullptr);
-  if (!settings.videoEnabled) return true;
+  const auto before = record->previewController.get();
+  if (!settings.videoEnabled) {
+    record->previewController.set(nullptr);
+    return true;
+  }
   const auto controller = record->captureController.get();
   const auto preview = LXAgentRecordCreatePreviewController(
       settings.videoDeviceID, settings.audioDeviceID, settings.audioEnabled,
       settings.previewIntervalInMilliseconds, controller ? controller->session() : nullptr);
+  // A preview that somebody looks at goes on; the camera stays open from one to the other.
+  if (preview && before && before->controller().isPreviewRunning()) {
+    preview->mLastPreviewRequestTime.set(before->mLastPreviewRequestTime.get());
+    preview->controller().startPreview();
+  }
   record->previewController.set(preview);
   return preview != nullptr;
 }
@@ -108,8 +125,11 @@ bool DeviceWatch::openAgain(const LMRRecordingContext& settings) {
 bool DeviceWatch::deviceDisconnected() const {
   const auto record = context_->record_context();
   const auto delegate = record ? record->captureControllerDelegate.get() : nullptr;
-  return delegate && delegate->deviceDisconnected() &&
-         (context_->options.adhoc.get() || submission_.isIdle());
+  if (!delegate || !delegate->deviceDisconnected()) return false;
+  if (context_->options.adhoc.get()) return true;
+  // A recording of an existing file has no capture, so that the report may still be the one of the capture
+  // before.
+  return submission_.isIdle() && !recordingInHand(*context_);
 }
 
 void DeviceWatch::announceLostDevice() const {

@@ -25,7 +25,8 @@ class DeviceWatch {
   /// The capture settings from the current preferences; null when they can't be used (logged).
   [[nodiscard]] std::shared_ptr<LMRRecordingContext> recordingContext() const;
 
-  /// Checks whether the camera of `settings` can be opened. Without it the agent stays offline for now.
+  /// Checks whether the camera of `settings` can be opened. Without it the agent stays offline for now. A
+  /// missing microphone is only told.
   void probeDevice(const LMRRecordingContext& settings);
   [[nodiscard]] bool deviceIsOffline() const { return device_offline_; }
   /// Looks for a missing camera every eleven seconds, but not during a recording: then as soon as that has
@@ -35,13 +36,14 @@ class DeviceWatch {
   /// The camera failed in use, so its absence is worth a warning.
   void deviceFailed() { shouldDisplayOfflineMessage_ = true; }
 
-  /// Whether the capture has lost its device and the agent may end because of it. Recordings that are queued,
-  /// or about to be, are submitted first. An ad-hoc client does not wait.
+  /// Whether the capture has lost its device and the agent may end because of it. Recordings that run, are
+  /// queued or about to be are submitted first. An ad-hoc client does not wait.
   [[nodiscard]] bool deviceDisconnected() const;
   /// Logs the loss. Then ends the process (69) in ad-hoc mode, else waits two seconds.
   void announceLostDevice() const;
 
  private:
+  void tellOfMissingMicrophone(const LMRRecordingContext& settings) const;
   void deviceFound();
   void giveUp();
   [[nodiscard]] bool openAgain(const LMRRecordingContext& settings);

@@ -14,7 +14,7 @@ void CaptureController::setDelegate(std::weak_ptr<CaptureControllerDelegate> del
 
 bool CaptureController::prepareRecording(const LMRRecordingContext& settings,
                                          std::shared_ptr<CaptureSession> /*session*/) {
-  const auto plan = planRecording(settings, default_microphone_);
+  const auto plan = planRecording(settings);
   if (!plan) return refuse(plan.error());
   const auto opened = CaptureRecorder::open(*plan);
   if (!opened) return refuse(opened.error());
@@ -23,13 +23,27 @@ bool CaptureController::prepareRecording(const LMRRecordingContext& settings,
     recorder_ = *opened;
     repository_ = plan->repository;
   }
-  if (const auto error = (*opened)->run([self = shared_from_this()] { return self->reportOfTheEnd(); })) {
+  const auto self = shared_from_this();
+  const auto problem = (*opened)->run([self] { return self->reportOfTheEnd(); },
+                                      [self](const CaptureError* error) { self->reportSound(error); });
+  if (problem) {
     const std::lock_guard lock(mutex_);
     recorder_ = nullptr;
-    refusal_ = *error;
+    refusal_ = *problem;
     return false;
   }
   return true;
+}
+
+std::shared_ptr<CaptureControllerDelegate> CaptureController::delegate() const {
+  const std::lock_guard lock(mutex_);
+  return delegate_.lock();
+}
+
+void CaptureController::reportSound(const CaptureError* error) {
+  const auto delegate = this->delegate();
+  if (!delegate) return;
+  error != nullptr ? delegate->lmrCaptureSoundLost(*error) : delegate->lmrCaptureSoundBack();
 }
 
 bool CaptureController::refuse(const CaptureError& reason) {
@@ -39,11 +53,7 @@ bool CaptureController::refuse(const CaptureError& reason) {
 }
 
 CaptureRecorder::Report CaptureController::reportOfTheEnd() {
-  std::shared_ptr<CaptureControllerDelegate> delegate;
-  {
-    const std::lock_guard lock(mutex_);
-    delegate = delegate_.lock();
-  }
+  const auto delegate = this->delegate();
   // The report keeps the controller alive as well: the delegate identifies the capture by it.
   return [self = shared_from_this(), delegate](const CaptureRecorder::Outcome& outcome) {
     if (!delegate) return;
@@ -155,7 +165,7 @@ std::optional<CaptureError> CaptureController::lastError() {
 
 std::shared_ptr<CaptureSession> CaptureController::session() {
   const auto recorder = this->recorder();
-  return recorder ? recorder->pipeline() : nullptr;
+  return recorder ? recorder->session() : nullptr;
 }
 
 // ---- after the capture

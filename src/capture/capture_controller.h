@@ -17,10 +17,6 @@ namespace lmx {
 class CaptureController : public LMRCaptureController,
                           public std::enable_shared_from_this<CaptureController> {
  public:
-  /// @param defaultMicrophone  asked when the settings name no microphone
-  explicit CaptureController(std::function<std::optional<std::string>()> defaultMicrophone)
-      : default_microphone_(std::move(defaultMicrophone)) {}
-
   void setDelegate(std::weak_ptr<CaptureControllerDelegate> delegate) override;
   bool prepareRecording(const LMRRecordingContext& settings,
                         std::shared_ptr<CaptureSession> session) override;
@@ -55,12 +51,13 @@ class CaptureController : public LMRCaptureController,
  private:
   [[nodiscard]] CaptureError nothingFor(const std::string& outputPath) const;
   bool refuse(const CaptureError& reason);
+  void reportSound(const CaptureError* error);
+  [[nodiscard]] std::shared_ptr<CaptureControllerDelegate> delegate() const;
   /// How the end of the capture is reported; holds the delegate.
   [[nodiscard]] CaptureRecorder::Report reportOfTheEnd();
   [[nodiscard]] std::shared_ptr<CaptureRecorder> recorder() const;
   [[nodiscard]] std::optional<CaptureError> refusal() const;
 
-  const std::function<std::optional<std::string>()> default_microphone_;
   std::atomic<bool> armed_{false};  ///< startRecording has been called, or the capture has been tagged
   mutable std::mutex mutex_;
   std::weak_ptr<CaptureControllerDelegate> delegate_;  // guarded by mutex_

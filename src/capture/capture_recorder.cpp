@@ -20,33 +20,57 @@ namespace lmx {
 
 using namespace std::chrono_literals;
 
+namespace {
+
+constexpr auto kIdle = 250ms;  // where there is only sound, silence goes on when none comes
+constexpr auto kForEver = 24h;
+/// How long a recording that ends waits for a disk that takes nothing.
+constexpr auto kDiskPatience = 10s;
+
+}  // namespace
+
 // ---- opening
 
 Result<std::shared_ptr<CaptureRecorder>, CaptureError> CaptureRecorder::open(const RecordingPlan& plan) {
-  auto pipeline = PipelineRegistry::instance().acquire(plan.source);
-  if (!pipeline) return std::move(pipeline).error();
+  auto sources = RecordingSources::open(plan);
+  if (!sources) return std::move(sources).error();
   auto files = CaptureFiles::create(plan.repository, plan.uuid);
   if (!files) return std::move(files).error();
-  return std::shared_ptr<CaptureRecorder>(new CaptureRecorder(plan, *std::move(pipeline), *std::move(files)));
+  return std::shared_ptr<CaptureRecorder>(new CaptureRecorder(plan, *std::move(sources), *std::move(files)));
 }
 
-CaptureRecorder::CaptureRecorder(const RecordingPlan& plan, PipelineLease pipeline, CaptureFiles files)
+CaptureRecorder::CaptureRecorder(const RecordingPlan& plan, RecordingSources sources, CaptureFiles files)
     : plan_(plan),
-      frame_seconds_(plan.encoding.frameSeconds()),
+      encoding_(completeEncoding(plan, sources.format())),
+      clock_(sources.clock()),
+      frame_seconds_(encoding_.frameSeconds()),
+      wall_offset_(clock_.wallOffset()),
       folder_(std::move(files.folder)),
       journal_(std::move(files.journal)),
       marks_(journal_),
-      queue_(plan.encoding.video.has_value(), pipeline->realTime()),
-      pipeline_(std::move(pipeline)),
-      movie_(std::make_unique<MovieOutput>(plan.encoding, std::move(files.movie), *journal_,
+      queue_(encoding_.video.has_value(), clock_.realTime()),
+      sources_(std::move(sources)),
+      movie_(std::make_unique<MovieOutput>(encoding_, std::move(files.movie), *journal_, patience_,
                                            [this](const CaptureError& error) { fail(error); })),
-      cutter_(plan.encoding, {marks_, *journal_, *movie_, [this] { return this->pipeline()->size(); }}) {
-  journal_->capture(plan_.type, frame_seconds_, pipeline_->wallOffset());
+      cutter_(encoding_, CaptureClock::now(),
+              {.marks = marks_,
+               .journal = *journal_,
+               .movie = *movie_,
+               .convert = [this](const RawMedium& frame) { return convert(frame); },
+               .live = clock_.realTime()}) {
+  if (encoding_.video) converter_.emplace(encoding_.video->size);
+  journal_->capture(plan_.type, frame_seconds_, wall_offset_);
 }
 
-std::optional<CaptureError> CaptureRecorder::run(Reporter reporter) {
-  const PipelineLease pipeline = this->pipeline();
-  pipeline->consumers().add(shared_from_this());
+std::optional<CaptureError> CaptureRecorder::run(Reporter reporter, SoundReport soundReport) {
+  RecordingSources sources = *sources_;
+  {
+    const std::lock_guard lock(mutex_);
+    sound_report_ = std::move(soundReport);
+  }
+  sources.add(shared_from_this());
+  if (encoding_.audio && sources.hasNoSound())
+    soundLost({CaptureError::kDomain, kAudioSilent, sources.name() + ": has no sound"});
   try {
     // Detached: this thread may hold the last reference to the recorder, and a thread cannot join itself.
     std::thread([self = shared_from_this(), reporter = std::move(reporter)] {
@@ -55,9 +79,9 @@ std::optional<CaptureError> CaptureRecorder::run(Reporter reporter) {
       malloc_trim(0);
     }).detach();
   } catch (const std::system_error& problem) {
-    pipeline->consumers().remove(this);
+    sources.remove(this);
     const std::lock_guard lock(mutex_);
-    pipeline_ = nullptr;
+    sources_.reset();
     return CaptureError{CaptureError::kDomain, kEncoderFailed,
                         std::string("the recording thread could not be started: ") + problem.what()};
   }
@@ -67,23 +91,24 @@ std::optional<CaptureError> CaptureRecorder::run(Reporter reporter) {
 // ---- commands
 
 void CaptureRecorder::startFlow() {
-  if (const PipelineLease pipeline = this->pipeline()) pipeline->start();
+  const std::lock_guard lock(mutex_);
+  if (sources_) sources_->start();
 }
 
 void CaptureRecorder::end(Ending how) {
   std::optional<double> now;  // absent for devices of "speed=max": their capture ends with the last mark
-  bool realTime = false;
+  const bool realTime = clock_.realTime();
   {
     const std::lock_guard lock(mutex_);
-    if (!pipeline_) return;
-    realTime = pipeline_->realTime();
-    if (realTime) now = pipeline_->runningTime();
+    if (!sources_) return;
+    if (realTime) now = CaptureClock::now();
   }
   if (!marks_.end(how, now)) return;
   // The recording ends with the first frame behind the end, which is due within a frame's time. A camera that
   // has not delivered any picture yet gets longer: a recording that is stopped at once still holds one.
   const auto patience = recorded_frames_ > 0 ? 1s : 3s;
   queue_.hurry(realTime ? MediaQueue::Clock::now() + patience : MediaQueue::Clock::time_point::max());
+  if (realTime) patience_.set(Deadline::Clock::now() + kDiskPatience);
 }
 
 void CaptureRecorder::syncMarks() const {
@@ -104,12 +129,12 @@ void CaptureRecorder::syncMarks() const {
 
 double CaptureRecorder::runningTime() const {
   const std::lock_guard lock(mutex_);
-  return pipeline_ ? pipeline_->runningTime() : closed_at_;
+  return sources_ ? CaptureClock::now() : closed_at_;
 }
 
 double CaptureRecorder::runningTimeAt(double wallTime) const {
   const std::lock_guard lock(mutex_);
-  return pipeline_ ? pipeline_->runningTimeAt(wallTime) : closed_at_;
+  return sources_ ? clock_.runningTimeAt(wallTime) : closed_at_;
 }
 
 std::int64_t CaptureRecorder::recordedMilliseconds() const {
@@ -121,9 +146,9 @@ std::optional<CaptureError> CaptureRecorder::error() const {
   return error_;
 }
 
-PipelineLease CaptureRecorder::pipeline() const {
+std::shared_ptr<CaptureSession> CaptureRecorder::session() const {
   const std::lock_guard lock(mutex_);
-  return pipeline_;
+  return sources_ ? sources_->session() : nullptr;
 }
 
 std::shared_ptr<FinishedCapture> CaptureRecorder::finished() const {
@@ -139,43 +164,81 @@ std::shared_ptr<FinishedCapture> CaptureRecorder::waitUntilFinished() const {
 
 // ---- streaming threads, encoder, writer
 
-void CaptureRecorder::onVideo(BufferHandle buffer, double runningTime) {
-  queue_.pushVideo({std::move(buffer), runningTime});
+void CaptureRecorder::onPicture(SampleHandle picture, double time) {
+  GstBuffer* buffer = gst_sample_get_buffer(picture.get());
+  GstCaps* caps = gst_sample_get_caps(picture.get());
+  if (buffer == nullptr || caps == nullptr) return;
+  queue_.pushVideo({BufferHandle(gst_buffer_ref(buffer)), time, CapsHandle(gst_caps_ref(caps))});
 }
 
-void CaptureRecorder::onAudio(BufferHandle buffer, double runningTime) {
-  queue_.pushAudio({std::move(buffer), runningTime});
+void CaptureRecorder::onSound(BufferHandle sound, double time) {
+  heard_ = true;
+  queue_.pushAudio({std::move(sound), time});
 }
 
-void CaptureRecorder::onCaptureError(const CaptureError& error) { fail(error); }
+void CaptureRecorder::onSourceLost(SourceUse use, const CaptureError& error) {
+  use.picture || !encoding_.video ? fail(error) : soundLost(error);
+}
+
+void CaptureRecorder::onSourceAway(SourceUse use, const CaptureError& error) {
+  if (use.picture) return;  // the frame before stays until the camera is back
+  // Where there is only sound its loss is the end; but a microphone that has never been there is waited for.
+  !encoding_.video && heard_ ? fail(error) : soundLost(error);
+}
+
+void CaptureRecorder::onSourceBack(SourceUse use, double seconds) {
+  (void)seconds;
+  if (use.picture) return;
+  sound_away_ = false;
+  SoundReport report;
+  {
+    const std::lock_guard lock(mutex_);
+    report = sound_report_;
+  }
+  if (report) report(nullptr);
+}
+
+void CaptureRecorder::soundLost(const CaptureError& error) {
+  if (sound_away_.exchange(true)) return;
+  SoundReport report;
+  {
+    const std::lock_guard lock(mutex_);
+    report = sound_report_;
+  }
+  if (report) report(&error);
+}
+
+bool CaptureRecorder::soundComes() const { return !sound_away_; }
 
 void CaptureRecorder::fail(const CaptureError& error) {
   double now = 0;
   {
     const std::lock_guard lock(mutex_);
     if (!error_) error_ = error;
-    if (!pipeline_) return;
-    now = pipeline_->runningTime();
+    if (!sources_) return;
+    now = CaptureClock::now();
   }
   marks_.end(Ending::stop, now);
   queue_.hurry(MediaQueue::Clock::now());  // nothing more will come
+  patience_.set(Deadline::Clock::now() + kDiskPatience);
 }
 
 // ---- the recording thread
 
 void CaptureRecorder::record(const Reporter& reporter) {
   guarded([this] { recordUntilTheEnd(); });
-  PipelineLease pipeline = this->pipeline();
-  pipeline->consumers().remove(this);
+  RecordingSources sources = *sources_;  // only this thread resets them
+  sources.remove(this);
   queue_.close();
   std::uint32_t frames = 0;
   guarded([this, &frames] { frames = closeMovie(); });
   // Whoever is to be told is held from before anybody can see that the capture has ended.
   const Report report = reporter();
   const std::optional<CaptureError> problem = error();
-  publish(*pipeline, frames);
+  sayWhatIsNotReal();
+  publish(frames);
   movie_.reset();
-  pipeline = nullptr;  // closes the devices unless somebody else has them
+  sources.release();  // closes the devices unless somebody else has them
   finished()->removeIfResolved();
   report({marks_.cancelled(), problem});
 }
@@ -191,9 +254,11 @@ void CaptureRecorder::guarded(const std::function<void()>& step) {
 
 void CaptureRecorder::recordUntilTheEnd() {
   for (bool more = true; more;) {
-    MediaQueue::Batch batch = queue_.take();
+    MediaQueue::Batch batch = queue_.take(encoding_.video ? kForEver : kIdle);
     const bool inTime = batch.inTime;
+    const bool nothing = batch.audio.empty() && batch.video.empty();
     feed(std::move(batch));
+    if (nothing) cutter_.feedNothing(CaptureClock::now());
     checkLimits();
     more = inTime && !reachedEnd();
   }
@@ -213,7 +278,7 @@ void CaptureRecorder::feed(MediaQueue::Batch batch) {
 bool CaptureRecorder::reachedEnd() const {
   const auto end = marks_.endTime();
   if (!end) return false;
-  return marks_.worthless() || queue_.expired() || cutter_.reaches(*end);
+  return marks_.worthless() || queue_.expired() || cutter_.reaches(*end, soundComes());
 }
 
 void CaptureRecorder::checkLimits() {
@@ -231,30 +296,48 @@ std::uint32_t CaptureRecorder::closeMovie() {
     return 0;
   }
   cutter_.close();
-  movie_->close(cutter_.samples());
+  movie_->close(cutter_.frames().frames(), cutter_.samples());
   return movie_->framesWritten(cutter_.frames().frames());
 }
 
-void CaptureRecorder::publish(CapturePipeline& pipeline, std::uint32_t totalFrames) {
+/// The frame as it is encoded.
+BufferHandle CaptureRecorder::convert(const RawMedium& frame) {
+  BufferHandle picture = converter_->convert(frame.buffer.get(), frame.caps.get());
+  if (const auto change = converter_->formatChange()) {
+    LMPLogMessage(nullptr, kLogNotice, "The camera's picture has changed: %s; it is fitted into the recording's",
+                  change->c_str());
+  }
+  return picture;
+}
+
+void CaptureRecorder::sayWhatIsNotReal() {
+  if (const std::uint64_t dropped = queue_.dropped()) {
+    LMPLogMessage(nullptr, kLogWarning, "%llu pictures of the recording were lost: the machine could not keep up",
+                  static_cast<unsigned long long>(dropped));
+  }
+}
+
+void CaptureRecorder::publish(std::uint32_t totalFrames) {
   CaptureRecord record{
       .intact = true,
-      .recordingType = recordingTypeOf(plan_.encoding.video.has_value(), plan_.encoding.audio.has_value()),
+      .recordingType = recordingTypeOf(encoding_.video.has_value(), encoding_.audio.has_value()),
       .frameSeconds = frame_seconds_,
-      .wallOffset = pipeline.wallOffset(),
+      .wallOffset = clock_.wallOffset(),
       .runs = cutter_.frames().runs(),
       .marks = marks_.close(),
       .movies = {}};
-  const double closedAt = endOfMedia(pipeline);
+  const double closedAt = endOfMedia();
   const std::lock_guard lock(mutex_);
   closed_at_ = closedAt;
   finished_ = std::make_shared<FinishedCapture>(folder_, journal_, std::move(record), totalFrames);
-  pipeline_ = nullptr;
+  sources_.reset();
+  sound_report_ = nullptr;
   finished_set_.notify_all();
 }
 
-double CaptureRecorder::endOfMedia(const CapturePipeline& pipeline) const {
+double CaptureRecorder::endOfMedia() const {
   const double end = marks_.endTime().value_or(0);
-  return pipeline.realTime() ? std::min(end, pipeline.runningTime()) : end;
+  return clock_.realTime() ? std::min(end, CaptureClock::now()) : end;
 }
 
 }  // namespace lmx

@@ -14,7 +14,8 @@
 #include "capture/media_queue.h"
 #include "capture/movie_output.h"
 #include "capture/recording_plan.h"
-#include "capture/source/pipeline_registry.h"
+#include "capture/gst/picture_converter.h"
+#include "capture/recording_sources.h"
 #include "capture/store/capture_files.h"
 #include "capture/store/capture_marks.h"
 #include "capture/store/finished_capture.h"
@@ -33,6 +34,8 @@ class CaptureRecorder : public CaptureConsumer, public std::enable_shared_from_t
   };
   /// Told on the recording thread when the file is closed and the devices are given back.
   using Report = std::function<void(const Outcome&)>;
+  /// Told on a source's thread when the microphone is lost while the recording goes on, and when it is back (null).
+  using SoundReport = std::function<void(const CaptureError* error)>;
   /// Asked for the report on the recording thread, just before the end of the capture can be seen.
   using Reporter = std::function<Report()>;
 
@@ -40,7 +43,7 @@ class CaptureRecorder : public CaptureConsumer, public std::enable_shared_from_t
   static Result<std::shared_ptr<CaptureRecorder>, CaptureError> open(const RecordingPlan& plan);
   /// Starts the recording thread; once. What `reporter` holds stays alive until the thread has ended.
   /// @return why the thread could not be started; nothing is recorded then, and the devices are given back
-  [[nodiscard]] std::optional<CaptureError> run(Reporter reporter);
+  [[nodiscard]] std::optional<CaptureError> run(Reporter reporter, SoundReport soundReport);
 
   /// Starts devices that wait for it ("speed=max"). All others deliver already.
   void startFlow();
@@ -59,18 +62,20 @@ class CaptureRecorder : public CaptureConsumer, public std::enable_shared_from_t
   [[nodiscard]] std::int64_t recordedMilliseconds() const;
   [[nodiscard]] std::optional<CaptureError> error() const;
   /// The open devices; null once they have been given back.
-  [[nodiscard]] PipelineLease pipeline() const;
+  [[nodiscard]] std::shared_ptr<CaptureSession> session() const;
   /// The closed capture; null while it records.
   [[nodiscard]] std::shared_ptr<FinishedCapture> finished() const;
   /// Waits until the capture is closed.
   [[nodiscard]] std::shared_ptr<FinishedCapture> waitUntilFinished() const;
 
-  void onVideo(BufferHandle buffer, double runningTime) override;
-  void onAudio(BufferHandle buffer, double runningTime) override;
-  void onCaptureError(const CaptureError& error) override;
+  void onPicture(SampleHandle picture, double time) override;
+  void onSound(BufferHandle sound, double time) override;
+  void onSourceLost(SourceUse use, const CaptureError& error) override;
+  void onSourceAway(SourceUse use, const CaptureError& error) override;
+  void onSourceBack(SourceUse use, double seconds) override;
 
  private:
-  CaptureRecorder(const RecordingPlan& plan, PipelineLease pipeline, CaptureFiles files);
+  CaptureRecorder(const RecordingPlan& plan, RecordingSources sources, CaptureFiles files);
 
   // The recording thread.
   void record(const Reporter& reporter);
@@ -80,24 +85,36 @@ class CaptureRecorder : public CaptureConsumer, public std::enable_shared_from_t
   [[nodiscard]] bool reachedEnd() const;
   void checkLimits();
   std::uint32_t closeMovie();
-  void publish(CapturePipeline& pipeline, std::uint32_t totalFrames);
-  [[nodiscard]] double endOfMedia(const CapturePipeline& pipeline) const;
+  void publish(std::uint32_t totalFrames);
+  [[nodiscard]] double endOfMedia() const;
+  [[nodiscard]] BufferHandle convert(const RawMedium& frame);
+  void sayWhatIsNotReal();
+  [[nodiscard]] bool soundComes() const;
 
   // Any thread.
   void fail(const CaptureError& error);
+  void soundLost(const CaptureError& error);
 
   const RecordingPlan plan_;
+  const MovieEncoding encoding_;
+  const CaptureClock clock_;
   const double frame_seconds_;  ///< of the movie's clock
+  const double wall_offset_;    ///< at the beginning
   const std::string folder_;
   const std::shared_ptr<Journal> journal_;
   CaptureMarks marks_;
   MediaQueue queue_;
-  bool limit_reached_ = false;  // recording thread
+  Deadline patience_;                          // of all that the movie's threads wait for
+  std::optional<PictureConverter> converter_;  // recording thread
+  bool limit_reached_ = false;                 // recording thread
+  std::atomic<bool> heard_{false};             ///< some sound has come
+  std::atomic<bool> sound_away_{false};
   std::atomic<std::uint32_t> recorded_frames_{0};
 
   mutable std::mutex mutex_;
   mutable std::condition_variable finished_set_;
-  PipelineLease pipeline_;                     // guarded by mutex_: null once the capture is closed
+  std::optional<RecordingSources> sources_;    // guarded by mutex_: nothing once the capture is closed
+  SoundReport sound_report_;                   // guarded by mutex_: null once the capture is closed
   double closed_at_ = 0;                       // guarded by mutex_: running time when the capture ended
   std::optional<CaptureError> error_;          // guarded by mutex_: the first one
   std::shared_ptr<FinishedCapture> finished_;  // guarded by mutex_

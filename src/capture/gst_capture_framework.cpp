@@ -7,14 +7,14 @@
 #include <iterator>
 
 #include "capture/capture_controller.h"
-#include "capture/gst/gst_handles.h"
+#include "capture/gst/plugin_packages.h"
 #include "capture/preview_controller.h"
 #include "capture/source/device_id.h"
 #include "capture/source/device_list.h"
 #include "capture/source/devices.h"
+#include "capture/source/sources.h"
 #include "capture/store/abandoned_capture.h"
 #include "capture/store/capture_files.h"
-#include "platform/log.h"
 #include "platform/paths.h"
 
 namespace lmx {
@@ -32,24 +32,9 @@ std::vector<std::string> subfolders(const std::string& folder) {
 }
 
 std::optional<std::string> identifierOfFirst(bool video) {
-  const auto devices = listHardware();
+  const auto devices = Sources::instance().hardware();
   const HardwareDevice* device = firstDevice(devices, video);
   return device == nullptr ? std::nullopt : std::optional(device->uniqueID);
-}
-
-/// Uses an element once, so that a recording need not wait until its library is loaded.
-void loadPlugin(const char* name) {
-  const GstHandle<GstElementFactory> factory(gst_element_factory_find(name));
-  if (!factory) {
-    LMPLogMessage(nullptr, kLogError,
-                  "The GStreamer element %s is missing: recordings will fail; install its package", name);
-    return;
-  }
-  const GstHandle<GstElement> element(gst_element_factory_create(factory.get(), nullptr));
-  if (!element) return;
-  gst_object_ref_sink(element.get());
-  gst_element_set_state(element.get(), GST_STATE_READY);
-  gst_element_set_state(element.get(), GST_STATE_NULL);
 }
 
 }  // namespace
@@ -67,7 +52,7 @@ bool GstCaptureFramework::hasDevice(const std::string& uniqueID) {
     case DeviceKind::file:
       return access(id.name.c_str(), R_OK) == 0;
     case DeviceKind::hardware:
-      return findHardware(uniqueID).has_value();
+      return Sources::instance().delivers(uniqueID) || isHardwareThere(uniqueID);
     case DeviceKind::unknown:
       break;
   }
@@ -80,11 +65,17 @@ CaptureCatalog::PreferredAudio GstCaptureFramework::preferredAudioDevice(const s
     return {id.asFastAsPossible() ? "test://audio?speed=max" : "test://audio", false};
   }
   if (id.kind == DeviceKind::file || id.kind == DeviceKind::network) return {videoDevice, true};
-  return microphoneFor(listHardware(), videoDevice);
+  return microphoneFor(Sources::instance().hardware(), videoDevice);
 }
 
-bool GstCaptureFramework::audioDeviceUsable(const std::optional<std::string>& audioDevice) {
-  return audioDevice ? hasDevice(*audioDevice) : identifierOfFirst(false).has_value();
+bool GstCaptureFramework::canBeMicrophone(const std::string& audioDevice) {
+  return parseDeviceID(audioDevice).canBeMicrophone();
+}
+
+bool GstCaptureFramework::hasMicrophone(const std::optional<std::string>& audioDevice) {
+  if (!audioDevice) return identifierOfFirst(false).has_value();
+  // A name of ALSA's configuration is in no list; whether it opens shows at the recording.
+  return parseDeviceID(*audioDevice).alsaName() || hasDevice(*audioDevice);
 }
 
 std::optional<LMRCompressionOptions> GstCaptureFramework::compressionOptions(MediaType media,
@@ -92,12 +83,12 @@ std::optional<LMRCompressionOptions> GstCaptureFramework::compressionOptions(Med
   return LMRCompressionOptions{.media = media, .quality = quality};
 }
 
-std::string GstCaptureFramework::deviceInformation() { return deviceListText(listHardware()); }
+std::string GstCaptureFramework::deviceInformation() { return deviceListText(listHardware(), demandHere()); }
 
 // ---- controllers
 
 std::shared_ptr<LMRCaptureController> GstCaptureFramework::newCaptureController() {
-  return std::make_shared<CaptureController>([] { return identifierOfFirst(false); });
+  return std::make_shared<CaptureController>();
 }
 
 std::unique_ptr<LMRPreviewController> GstCaptureFramework::newPreviewController(
@@ -107,13 +98,7 @@ std::unique_ptr<LMRPreviewController> GstCaptureFramework::newPreviewController(
 
 // ---- start of the agent
 
-void GstCaptureFramework::warmUp() {
-  ensureGStreamer();
-  for (const char* name : {"x264enc", "avenc_aac", "appsrc", "appsink", "videoconvert", "videoscale",
-                           "videorate", "audioconvert", "audioresample", "decodebin"}) {
-    loadPlugin(name);
-  }
-}
+void GstCaptureFramework::warmUp() { loadPlugins(); }
 
 std::vector<RecoveredRecording> GstCaptureFramework::recoverUnfinished(
     const std::string& repository, const std::function<bool(const std::string& request)>& known) {

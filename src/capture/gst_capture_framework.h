@@ -19,7 +19,8 @@ class GstCaptureFramework : public CaptureFramework {
   std::optional<std::string> defaultMuxedDevice() override { return std::nullopt; }
   bool hasDevice(const std::string& uniqueID) override;
   PreferredAudio preferredAudioDevice(const std::string& videoDevice) override;
-  bool audioDeviceUsable(const std::optional<std::string>& audioDevice) override;
+  bool canBeMicrophone(const std::string& audioDevice) override;
+  bool hasMicrophone(const std::optional<std::string>& audioDevice) override;
   std::optional<LMRCompressionOptions> compressionOptions(MediaType media, RecordingQuality quality) override;
 
   std::shared_ptr<LMRCaptureController> newCaptureController() override;

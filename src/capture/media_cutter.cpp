@@ -3,13 +3,22 @@
 
 #include <algorithm>
 #include <cmath>
+#include <utility>
 
 #include "platform/log.h"
 
 namespace lmx {
 
-MediaCutter::MediaCutter(const MovieEncoding& encoding, Surroundings surroundings)
+namespace {
+
+constexpr double kSoundPatience = 1.0;  // seconds that sound may lag behind the picture
+constexpr double kSilencePiece = 1.0;   // seconds
+
+}  // namespace
+
+MediaCutter::MediaCutter(const MovieEncoding& encoding, double begin, Surroundings surroundings)
     : has_video_(encoding.video.has_value()),
+      begin_(begin),
       audio_(encoding.audio),
       around_(std::move(surroundings)),
       frames_(encoding.frameSeconds()) {
@@ -32,14 +41,11 @@ FrameDecision MediaCutter::decide(double t) {
 void MediaCutter::feedFrame(const RawMedium& frame) {
   const FrameDecision decision = decide(frame.time);
   if (!decision.take || !startMovie()) return;
-  // Where a frame is missing the next one is shown in its place, too: the frame rate stays constant.
-  if (decision.beginsRun) next_place_ = decision.place;
-  bool forceKey = decision.forceKey;
-  for (; next_place_ <= decision.place; ++next_place_) {
-    around_.movie.pushFrame(frame.buffer.get(), next_place_, forceKey);
-    forceKey = false;
-  }
   recorded_frames_ = frames_.frames();
+  const BufferHandle picture = around_.convert(frame);
+  // One that can't be read is a hole: the frame before it stays.
+  if (picture) around_.movie.pushFrame(picture.get(), decision.place, decision.forceKey || std::exchange(key_owed_, false));
+  else key_owed_ = key_owed_ || decision.forceKey;
 }
 
 void MediaCutter::feedVirtualFrames(double until) {
@@ -50,7 +56,7 @@ void MediaCutter::feedVirtualFrames(double until) {
 }
 
 bool MediaCutter::startMovie() {
-  return around_.movie.started() || around_.movie.start(around_.pictureSize());
+  return around_.movie.started() || around_.movie.start();
 }
 
 // ---- sound
@@ -73,6 +79,31 @@ void MediaCutter::feedSound(RawMedia chunks) {
     cutChunk(pending_sound_.front());
     pending_sound_.pop_front();
   }
+  if (around_.live) fillSilence(frames_.horizon() - kSoundPatience);
+}
+
+void MediaCutter::feedNothing(double now) {
+  if (has_video_ || !sound_ || !around_.live) return;
+  if (!next_virtual_) next_virtual_ = begin_;
+  feedVirtualFrames(now - kSoundPatience);
+  fillSilence(frames_.horizon());
+}
+
+/// Gives up waiting for sound before `until`.
+void MediaCutter::fillSilence(double until) {
+  while (const std::uint32_t missing = sound_->missingBefore(until)) {
+    if (startMovie()) pushSilence(missing);
+  }
+}
+
+/// In pieces: an hour of it must not be an hour of memory.
+void MediaCutter::pushSilence(std::uint32_t samples) {
+  const auto most = static_cast<std::uint32_t>(kSilencePiece * audio_->sampleRate);
+  while (samples > 0) {
+    const std::uint32_t piece = std::min(samples, most);
+    around_.movie.pushSound(nullptr, piece);
+    samples -= piece;
+  }
 }
 
 void MediaCutter::cutChunk(const RawMedium& chunk) {
@@ -87,7 +118,7 @@ void MediaCutter::pushPieces(const RawMedium& chunk, const std::vector<SoundPiec
   const auto* samples = reinterpret_cast<const float*>(map.data);
   const auto channels = static_cast<std::size_t>(audio_->channels);
   for (const SoundPiece& piece : pieces) {
-    if (piece.silence > 0) around_.movie.pushSound(nullptr, piece.silence);
+    pushSilence(piece.silence);
     if (piece.count > 0) around_.movie.pushSound(samples + piece.offset * channels, piece.count);
   }
   gst_buffer_unmap(chunk.buffer.get(), &map);
@@ -95,9 +126,9 @@ void MediaCutter::pushPieces(const RawMedium& chunk, const std::vector<SoundPiec
 
 // ---- the end
 
-bool MediaCutter::reaches(double end) const {
+bool MediaCutter::reaches(double end, bool soundComes) const {
   if (last_frame_time_ < end) return false;
-  if (!sound_ || frames_.runs().empty()) return true;
+  if (!sound_ || !soundComes || frames_.runs().empty()) return true;
   const MovieRun& last = frames_.runs().back();
   const double needed = last.sessionTime + last.frames * frames_.frameSeconds();
   if (!pending_sound_.empty() && endOf(pending_sound_.back()) >= needed) return true;
@@ -110,7 +141,7 @@ void MediaCutter::close() {
   for (const RawMedium& chunk : pending_sound_) cutChunk(chunk);
   pending_sound_.clear();
   const std::uint32_t missing = sound_->missingAtEnd();
-  if (missing > 0 && around_.movie.started()) around_.movie.pushSound(nullptr, missing);
+  if (around_.movie.started()) pushSilence(missing);
   if (sound_->corrected() == 0) return;
   LMPLogMessage(nullptr, kLogInfo, "Sound was moved by %llu samples altogether to stay with the picture",
                 static_cast<unsigned long long>(sound_->corrected()));

@@ -23,16 +23,22 @@ class MediaCutter {
     const CaptureMarks& marks;
     Journal& journal;
     MovieOutput& movie;
-    std::function<PictureSize()> pictureSize;  ///< asked once the first frame is here
+    /// A frame in the movie's size and colours; null when it can't be read.
+    std::function<BufferHandle(const RawMedium& frame)> convert;
+    bool live = true;  ///< sound that is not there in time is silence
   };
-  MediaCutter(const MovieEncoding& encoding, Surroundings surroundings);
+  /// @param begin  running time at which the capture begins, seconds
+  MediaCutter(const MovieEncoding& encoding, double begin, Surroundings surroundings);
 
   /// Frames ascend in time.
   void feedFrame(const RawMedium& frame);
   /// Chunks ascend in time. They are kept until the frames beside them have been decided.
   void feedSound(RawMedia chunks);
+  /// Nothing has come for a while; `now` is the running time. Where there is only sound, silence goes on.
+  void feedNothing(double now);
   /// Whether all frames before `end`, and the sound of those that were taken, have been fed.
-  [[nodiscard]] bool reaches(double end) const;
+  /// @param soundComes  false while the microphone is away: nobody waits for it then
+  [[nodiscard]] bool reaches(double end, bool soundComes) const;
   /// Gives the movie the sound that is left, and silence for what is missing. Nothing may be fed afterwards.
   void close();
 
@@ -41,6 +47,8 @@ class MediaCutter {
   [[nodiscard]] std::uint32_t recordedFrames() const { return recorded_frames_; }
   /// Samples of each channel that have been given to the movie.
   [[nodiscard]] std::int64_t samples() const { return sound_ ? sound_->position() : 0; }
+  /// Those of them that are silence in the place of missing sound.
+  [[nodiscard]] std::uint64_t silentSamples() const { return sound_ ? sound_->silence() : 0; }
 
  private:
   FrameDecision decide(double t);
@@ -48,19 +56,22 @@ class MediaCutter {
   void cutChunk(const RawMedium& chunk);
   void pushPieces(const RawMedium& chunk, const std::vector<SoundPiece>& pieces);
   bool startMovie();
+  void fillSilence(double until);
+  void pushSilence(std::uint32_t samples);
   [[nodiscard]] double chunkSeconds(const RawMedium& chunk) const;
   [[nodiscard]] double endOf(const RawMedium& chunk) const { return chunk.time + chunkSeconds(chunk); }
 
   const bool has_video_;
+  const double begin_;
   const std::optional<AudioEncoding> audio_;
   const Surroundings around_;
   FrameCutter frames_;
   std::optional<SoundCutter> sound_;
   RawMedia pending_sound_;
   double last_frame_time_ = -1e300;
-  std::uint32_t next_place_ = 0;  ///< in the movie, of the next frame to be encoded
   std::optional<double> next_virtual_;
   std::uint32_t recorded_frames_ = 0;
+  bool key_owed_ = false;  ///< the frame that should have been a key frame could not be read
 };
 
 }  // namespace lmx

@@ -9,6 +9,7 @@ namespace lmx {
 namespace {
 
 constexpr std::size_t kMaxFrames = 90;    // three seconds: an encoder this far behind will not catch up
+constexpr std::size_t kMaxFrameBytes = 256U << 20;
 constexpr std::size_t kMaxChunks = 1000;  // ten seconds
 constexpr std::size_t kFastQueue = 16;    // not live: the source waits
 constexpr double kFastLead = 1.0;         // seconds that sound may be ahead of the picture then
@@ -26,13 +27,14 @@ void MediaQueue::pushVideo(RawMedium frame) {
   std::unique_lock lock(mutex_);
   if (!real_time_) {
     changed_.wait(lock, [this] { return closed_ || video_.size() < kFastQueue; });
-  } else if (!closed_ && video_.size() >= kMaxFrames) {
+  } else if (!closed_ && (video_.size() >= kMaxFrames || video_bytes_ >= kMaxFrameBytes)) {
     const std::uint64_t dropped = ++dropped_;
     lock.unlock();
     reportDrop(dropped);
     return;
   }
   if (closed_) return;
+  video_bytes_ += gst_buffer_get_size(frame.buffer.get());
   video_.push_back(std::move(frame));
   changed_.notify_all();
 }
@@ -52,19 +54,20 @@ void MediaQueue::pushAudio(RawMedium chunk) {
   if (!has_video_ || deadline_) changed_.notify_all();
 }
 
-MediaQueue::Batch MediaQueue::take() {
+MediaQueue::Batch MediaQueue::take(Clock::duration idle) {
   Batch batch;
+  const auto wake = Clock::now() + idle;
   std::unique_lock lock(mutex_);
   const auto ready = [this] {
     return !video_.empty() || (!audio_.empty() && (!has_video_ || deadline_.has_value()));
   };
   while (batch.inTime && !ready()) {
-    if (!deadline_ || *deadline_ == Clock::time_point::max()) {
-      changed_.wait(lock);
-    } else {
-      batch.inTime = changed_.wait_until(lock, *deadline_) == std::cv_status::no_timeout;
-    }
+    const auto until = std::min(wake, deadline_.value_or(wake));
+    if (changed_.wait_until(lock, until) == std::cv_status::no_timeout) continue;
+    if (until == wake) break;
+    batch.inTime = false;
   }
+  video_bytes_ = 0;
   batch.video.swap(video_);
   batch.audio.swap(audio_);
   changed_.notify_all();
@@ -77,6 +80,11 @@ void MediaQueue::hurry(Clock::time_point deadline) {
   changed_.notify_all();
 }
 
+std::uint64_t MediaQueue::dropped() const {
+  const std::lock_guard lock(mutex_);
+  return dropped_;
+}
+
 bool MediaQueue::expired() const {
   const std::lock_guard lock(mutex_);
   return deadline_ && Clock::now() >= *deadline_;
@@ -86,6 +94,7 @@ void MediaQueue::close() {
   const std::lock_guard lock(mutex_);
   closed_ = true;
   video_.clear();
+  video_bytes_ = 0;
   audio_.clear();
   changed_.notify_all();
 }

@@ -15,7 +15,8 @@ namespace lmx {
 /// A frame or a chunk of sound.
 struct RawMedium {
   BufferHandle buffer;
-  double time = 0;  ///< running time of its start, seconds
+  double time = 0;       ///< running time of its start, seconds
+  CapsHandle caps = {};  ///< of a frame
 };
 using RawMedia = std::deque<RawMedium>;
 
@@ -38,8 +39,8 @@ class MediaQueue {
     RawMedia audio;
     bool inTime = true;  ///< false: the deadline has passed
   };
-  /// Waits until there are media to work on and takes all of them.
-  [[nodiscard]] Batch take();
+  /// Waits until there are media to work on, `idle` at most, and takes all of them.
+  [[nodiscard]] Batch take(Clock::duration idle = std::chrono::hours(24));
   /// Running time that the picture has reached. Sound that is not live waits when it is far ahead of it.
   void setPictureHorizon(double time) { picture_horizon_ = time; }
 
@@ -48,6 +49,8 @@ class MediaQueue {
   void hurry(Clock::time_point deadline);
   /// Whether the deadline has passed.
   [[nodiscard]] bool expired() const;
+  /// Frames that were dropped because the recording thread was too far behind.
+  [[nodiscard]] std::uint64_t dropped() const;
   /// Discards what is queued and what is pushed later. No push waits any more.
   void close();
 
@@ -57,6 +60,7 @@ class MediaQueue {
   mutable std::mutex mutex_;
   std::condition_variable changed_;
   RawMedia video_;                             // guarded by mutex_
+  std::size_t video_bytes_ = 0;                // guarded by mutex_
   RawMedia audio_;                             // guarded by mutex_
   std::uint64_t dropped_ = 0;                  // guarded by mutex_: frames
   std::optional<Clock::time_point> deadline_;  // guarded by mutex_: absent until the capture is ending

@@ -6,27 +6,44 @@
 
 namespace lmx {
 
-bool PreviewController::attachIOWithDevice(const std::string& device, CaptureError* error) {
-  CaptureSource source;
-  source.videoDevice = device;
-  const auto lease = PipelineRegistry::instance().acquire(source);
-  if (!lease) {
-    *error = lease.error();
-    return false;
-  }
-  // Listing the hardware takes a while, and other devices have no name there.
+using namespace std::chrono_literals;
+
+namespace {
+
+constexpr auto kPatience = 12s;  // the source itself gives up after ten
+
+/// Listing the hardware takes a while, and other devices have no name there.
+std::string nameOf(const std::string& device) {
   const bool isHardware = parseDeviceID(device).kind == DeviceKind::hardware;
   const auto hardware = isHardware ? findHardware(device) : std::nullopt;
+  return hardware ? hardware->name : device;
+}
+
+}  // namespace
+
+bool PreviewController::attachIOWithDevice(const std::string& device, CaptureError* error) {
+  const SourceWish wish{.device = device, .picture = true, .demand = demandHere()};
+  std::optional<CaptureError> problem;
+  if (parseDeviceID(device).kind == DeviceKind::unknown) {
+    problem = CaptureError{CaptureError::kDomain, kDeviceNotFound,
+                           "\"" + device + "\" is no camera identifier; list them with lmxagentd -i zq-device-list"};
+  } else if (const auto lease = Sources::instance().lease(wish)) {
+    problem = (*lease)->waitUntilRunning(kPatience);  // a picture is the only proof
+  } else {
+    problem = lease.error();
+  }
+  if (problem) {
+    *error = *problem;
+    return false;
+  }
   const std::lock_guard lock(mutex_);
-  source_ = source;
-  name_ = hardware ? hardware->name : device;
+  wish_ = wish;
+  name_ = nameOf(device);
   return true;
 }
 
-void PreviewController::addAudioDeviceWithID(const std::optional<std::string>& device) {
-  const std::lock_guard lock(mutex_);
-  source_.audioDevice = device;
-}
+/// Nothing is heard of a preview yet; its pictures need no microphone.
+void PreviewController::addAudioDeviceWithID(const std::optional<std::string>& /*device*/) {}
 
 std::string PreviewController::videoDeviceLocalizedDisplayName() const {
   const std::lock_guard lock(mutex_);
@@ -40,24 +57,31 @@ std::shared_ptr<CaptureSession> PreviewController::session() const {
 }
 
 void PreviewController::startPreview() {
-  const std::lock_guard lock(mutex_);
-  if (lease_) return;
-  auto lease = PipelineRegistry::instance().acquire(source_);
-  if (lease) {
-    lease_ = *std::move(lease);
-  } else {
-    LMPLogMessage(nullptr, kLogError, "The preview could not be started: %s", lease.error().message.c_str());
+  SourceWish wish;
+  {
+    const std::lock_guard lock(mutex_);
+    if (lease_) return;
+    wish = wish_;
   }
+  auto lease = Sources::instance().lease(wish);
+  auto problem = lease ? (*lease)->waitUntilRunning(kPatience) : std::optional(lease.error());
+  if (problem) {
+    LMPLogMessage(nullptr, kLogError, "The preview could not be started: %s", problem->message.c_str());
+    return;
+  }
+  const std::lock_guard lock(mutex_);
+  if (!lease_) lease_ = *std::move(lease);
 }
 
 void PreviewController::stopPreview() {
+  SourceLease lease;  // given back without the lock: a driver may take its time
   const std::lock_guard lock(mutex_);
-  lease_ = nullptr;
+  lease.swap(lease_);
 }
 
 bool PreviewController::isPreviewRunning() const {
   const std::lock_guard lock(mutex_);
-  return lease_ != nullptr;
+  return lease_ && lease_->isRunning();
 }
 
 }  // namespace lmx

@@ -3,7 +3,7 @@
 #include <mutex>
 #include <string>
 
-#include "capture/source/pipeline_registry.h"
+#include "capture/source/sources.h"
 
 namespace lmx {
 
@@ -24,9 +24,9 @@ class PreviewController : public LMRPreviewController {
  private:
   mutable std::mutex mutex_;
   const std::shared_ptr<CaptureSession> session_;
-  CaptureSource source_;  // guarded by mutex_
-  std::string name_;      // guarded by mutex_
-  PipelineLease lease_;   // guarded by mutex_: null unless it runs
+  SourceWish wish_;     // guarded by mutex_
+  std::string name_;    // guarded by mutex_
+  SourceLease lease_;   // guarded by mutex_: null unless it runs
 };
 
 }  // namespace lmx

@@ -18,50 +18,59 @@ RecordingTypeCode recordingTypeOf(CaptureType type) {
   return kRecordingTypeAudioVideo;
 }
 
-CaptureError missing(const char* problem) { return {CaptureError::kDomain, kDeviceNotFound, problem}; }
+constexpr double kLowestRate = 5;  // frames a second: below, cuts would be coarse
 
-CaptureSource sourceOf(const LMRRecordingContext& settings,
-                       const std::function<std::optional<std::string>()>& defaultMicrophone) {
-  CaptureSource source;
-  if (settings.videoEnabled) source.videoDevice = settings.videoDeviceID;
-  if (settings.audioEnabled)
-    source.audioDevice = settings.audioDeviceID ? settings.audioDeviceID : defaultMicrophone();
-  source.frameRate = frameRateFrom(settings.maximumFrameRate);
-  if (settings.audioCompressionOptions) {
-    source.sampleRate = settings.audioCompressionOptions->sampleRate;
-    source.channels = settings.audioCompressionOptions->channels;
-  }
-  return source;
+CaptureError missing(const std::string& problem) { return {CaptureError::kDomain, kDeviceNotFound, problem}; }
+
+CaptureError noIdentifier(const std::string& device, const char* what) {
+  return missing("\"" + device + "\" is no " + what + " identifier; list them with lmxagentd -i zq-device-list");
 }
 
-MovieEncoding encodingOf(const LMRRecordingContext& settings, const CaptureSource& source) {
+MovieEncoding encodingOf(const LMRRecordingContext& settings) {
   MovieEncoding encoding;
   if (settings.videoEnabled) {
     const auto& options = settings.videoCompressionOptions;
     encoding.video = {.size = {},
-                      .frameRate = source.frameRate,
+                      .frameRate = frameRateFrom(settings.maximumFrameRate),
                       .quality = options ? options->quality : RecordingQuality::better};
   }
-  if (settings.audioEnabled) encoding.audio = {.sampleRate = source.sampleRate, .channels = source.channels};
+  if (settings.audioEnabled) encoding.audio = {.sampleRate = kSoundRate, .channels = kSoundChannels};
   return encoding;
 }
 
 }  // namespace
 
-Result<RecordingPlan, CaptureError> planRecording(
-    const LMRRecordingContext& settings,
-    const std::function<std::optional<std::string>()>& defaultMicrophone) {
+Result<RecordingPlan, CaptureError> planRecording(const LMRRecordingContext& settings) {
   RecordingPlan plan{.uuid = settings.uuid,
                      .repository = settings.captureTempDir,
                      .type = recordingTypeOf(settings.captureType),
-                     .source = sourceOf(settings, defaultMicrophone),
-                     .encoding = {},
+                     .camera = {},
+                     .microphone = {},
+                     .demand = {},
+                     .encoding = encodingOf(settings),
                      .maxDuration = {}};
-  if (settings.videoEnabled && !plan.source.videoDevice) return missing("no camera is there");
-  if (settings.audioEnabled && !plan.source.audioDevice) return missing("no microphone is there");
-  plan.encoding = encodingOf(settings, plan.source);
+  plan.demand.maximumRate = settings.maximumFrameRate;
+  if (settings.videoEnabled) plan.camera = settings.videoDeviceID;
+  if (settings.audioEnabled) plan.microphone = settings.audioDeviceID.value_or(kAnyMicrophone);
+  if (settings.videoEnabled && !plan.camera) return missing("no camera is there");
+  if (plan.camera && parseDeviceID(*plan.camera).kind == DeviceKind::unknown)
+    return noIdentifier(*plan.camera, "camera");
+  const bool known = !plan.microphone || *plan.microphone == kAnyMicrophone ||
+                     parseDeviceID(*plan.microphone).kind != DeviceKind::unknown;
+  if (!known) return noIdentifier(*plan.microphone, "microphone");
   if (settings.maxDurationMinutes > 0) plan.maxDuration = std::chrono::minutes(settings.maxDurationMinutes);
   return plan;
+}
+
+MovieEncoding completeEncoding(const RecordingPlan& plan, const CameraFormat& camera) {
+  MovieEncoding encoding = plan.encoding;
+  if (!encoding.video) return encoding;
+  encoding.video->size = camera.size;
+  const FrameRate wanted = encoding.video->frameRate;
+  if (!camera.rate) return encoding;
+  const double seconds = camera.rate->frameSeconds();
+  if (seconds <= 1 / kLowestRate && seconds >= wanted.frameSeconds() - 1e-6) encoding.video->frameRate = *camera.rate;
+  return encoding;
 }
 
 }  // namespace lmx

@@ -9,6 +9,7 @@
 #include "platform/log.h"
 #include "prefs/preference_dump.h"
 #include "prefs/recording_context.h"
+#include "support/redacted.h"
 
 namespace lmx {
 namespace {
@@ -32,7 +33,7 @@ ProcessEnd printInformation(const std::string& kind, CaptureFramework& framework
       printContext("daemon-prefs", newRecordingContextForDaemon(framework));
       dumpDaemon();
     } else if (kind == "zq-device-list") {
-      std::fputs(framework.deviceInformation().c_str(), stdout);
+      std::fputs(redacted(framework.deviceInformation()).c_str(), stdout);
     }
   } catch (const std::exception& error) {
     LMPLogMessage(nullptr, kLogCritical, "Exception caught: %s", error.what());

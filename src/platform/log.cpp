@@ -19,6 +19,7 @@
 
 #include "platform/log_socket.h"
 #include "platform/log_text.h"
+#include "support/redacted.h"
 
 namespace lmx {
 
@@ -145,7 +146,9 @@ void LMPLogMessage(LMPLogContext context, int level, const char* format, ...) {
   va_list arguments;
   va_start(arguments, format);
   try {
-    const std::string text = escapeControls(formatMessage(format, arguments));
+    // Here and not by the callers: error texts of libraries quote addresses too. Before the escapes, which
+    // would join an address to the next line.
+    const std::string text = escapeControls(redacted(formatMessage(format, arguments)));
     writeMessage(target, std::clamp(level, 0, static_cast<int>(kLogDebug)), text);
   } catch (const std::exception&) {
     // Out of memory: the message can't be reported anywhere.

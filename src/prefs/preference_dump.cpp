@@ -4,6 +4,7 @@
 #include <cstdio>
 
 #include "prefs/agent_preferences.h"
+#include "support/redacted.h"
 
 namespace lmx {
 namespace {
@@ -26,7 +27,10 @@ void dumpWithSelector(AgentPreferences::Selector read) {
                                           "TunnelPort",
                                           "LumexURL"};
   for (const char* key : kKeys) {
-    if (const auto value = textOf((prefs.*read)(key))) std::printf("'%s' == '%s'\n", key, value->c_str());
+    if (const auto value = textOf((prefs.*read)(key))) {
+      // What -i prints ends up in tickets and mails.
+      std::printf("'%s' == '%s'\n", key, redacted(*value).c_str());
+    }
   }
 }
 

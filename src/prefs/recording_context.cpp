@@ -9,6 +9,7 @@
 #include "prefs/recording_types.h"
 #include "prefs/signal_settings.h"
 #include "support/format.h"
+#include "support/redacted.h"
 
 namespace lmx {
 namespace {
@@ -46,7 +47,7 @@ Text chooseAudioDevice(const Text& wanted, const Text& videoDevice, CaptureCatal
 
 void RecordingContextBuilder::fail(const std::string& reason) {
   prefs_.resetPrefsCache();
-  throw PreferenceError(reason);
+  throw PreferenceError(redacted(reason));
 }
 void RecordingContextBuilder::failInvalidCompression(const std::string& key, const std::string& value) {
   fail("Unknown compression type: \"" + value + "\" for preference: " + key);
@@ -101,8 +102,9 @@ void RecordingContextBuilder::chooseVideo(LMRRecordingContext& context, const Te
 
 void RecordingContextBuilder::chooseAudio(LMRRecordingContext& context, const Text& preset) {
   context.audioDeviceID = chooseAudioDevice(text("RecordingAudioInput"), context.videoDeviceID, catalog_);
-  if (!catalog_.audioDeviceUsable(context.audioDeviceID)) {
-    failInvalidDevice("RecordingAudioInput", textOrNull(context.audioDeviceID));
+  // A microphone that is away is no reason to refuse: the picture is still a lecture, and it may come back.
+  if (context.audioDeviceID && !catalog_.canBeMicrophone(*context.audioDeviceID)) {
+    failInvalidDevice("RecordingAudioInput", *context.audioDeviceID);
   }
   context.audioCompressionOptions = catalog_.compressionOptions(MediaType::audio, qualityOf(preset));
   if (!context.audioCompressionOptions) failInvalidCompression("RecordingCapturePreset", textOrNull(preset));

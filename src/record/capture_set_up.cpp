@@ -4,12 +4,14 @@
 #include <cstdlib>
 
 #include "model/codes.h"
+#include "model/metadata_keys.h"
 #include "platform/log.h"
 #include "prefs/recording_context.h"
 #include "record/agent_record.h"
 #include "record/capture_delegate.h"
 #include "record/engine_environment.h"
 #include "record/preview_controller.h"
+#include "record/recording_limits.h"
 
 namespace lmx {
 namespace {
@@ -35,9 +37,20 @@ double frameRateSetting(const AgentContext& context) {
   return rate >= 1 && rate <= 240 ? rate : 30.0;
 }
 
+/// A conference day that was asked for must not end after the usual four hours. An ad-hoc recording ends when
+/// its operator said.
+std::uint32_t lengthLimit(const AgentContext& context, const LMRRecordingContext& settings,
+                          const SharedDictionary& metadata) {
+  if (settings.continuous.segmentLength != 0)
+    return static_cast<std::uint32_t>(settings.continuous.segmentLength);
+  const bool daemon = !context.options.adhoc.get();
+  const auto asked = daemon ? lookUp(metadata, metadata_key::kMaxRecordingMinutes) : std::nullopt;
+  return greatestLengthInMinutes(context.options.duration.get(), asked.value_or(""));
+}
+
 }  // namespace
 
-int LXAgentRecordPrepareCaptureController(AgentContext& context) {
+int LXAgentRecordPrepareCaptureController(AgentContext& context, const SharedDictionary& metadata) {
   const auto session = context.record_context();
   const auto framework = engineEnvironment().framework;
   if (!session || !framework) return kRecordNotRunning;
@@ -45,11 +58,7 @@ int LXAgentRecordPrepareCaptureController(AgentContext& context) {
   if (!settings) return kRecordNotRunning;
   settings->outputPath = session->filename.get().value_or("");
   settings->maximumFrameRate = frameRateSetting(context);
-  if (settings->continuous.segmentLength != 0) {
-    settings->maxDurationMinutes = static_cast<std::uint32_t>(settings->continuous.segmentLength);
-  } else if (context.options.duration.get() >= 1) {
-    settings->maxDurationMinutes = static_cast<std::uint32_t>(context.options.duration.get());
-  }
+  settings->maxDurationMinutes = lengthLimit(context, *settings, metadata);
   const auto controller = framework->newCaptureController();
   const auto delegate = std::make_shared<LMRCaptureDelegate>(controller.get());
   session->captureController.set(controller);

@@ -10,6 +10,7 @@
 #include "platform/log.h"
 #include "prefs/recording_types.h"
 #include "record/agent_record.h"
+#include "record/capture_delegate.h"
 #include "record/capture_set_up.h"
 #include "record/capture_thread.h"
 #include "record/disk_space.h"
@@ -78,14 +79,15 @@ int refuseSecondRecording(AgentRecord& session) {
   return kRecordNotIdle;
 }
 
-int prepareByType(AgentContext& context, AgentRecord& session, std::int32_t type) {
+int prepareByType(AgentContext& context, AgentRecord& session, std::int32_t type,
+                  const SharedDictionary& metadata) {
   session.setRecordedType(type);
   if (type == kRecordingTypeFile) return kRecordSuccess;
   if (type < kRecordingTypeAudio || type > kRecordingTypeFile) {
     reportRuntimeError(kRecordInvalidType);
     return kRecordInvalidType;
   }
-  const int result = LXAgentRecordPrepareCaptureController(context);
+  const int result = LXAgentRecordPrepareCaptureController(context, metadata);
   if (result != kRecordSuccess) logPrepareFailure(session, result);
   return result;
 }
@@ -108,7 +110,8 @@ int beginCapture(AgentRecord& session, SharedDictionary metadata) {
   if (AgentActions* actions = engineEnvironment().actions) {
     actions->recordDidStartWithFile(session.filename.get().value_or(""), metadata, session.startTime.get());
   }
-  session.error.set(kRecordSuccess);
+  const auto delegate = controller ? session.captureControllerDelegate.get() : nullptr;
+  delegate ? delegate->startHasSucceeded(session) : session.error.set(kRecordSuccess);
   return kRecordSuccess;
 }
 
@@ -159,7 +162,8 @@ int LXAgentRecordPrepareCaptureSync(AgentContext& context, const std::optional<s
     return kRecordNoDiskSpace;
   }
   session->recording_uuid.set(newUUIDString());
-  int result = prepareByType(context, *session, wantedType(*session, metadata, context.options.adhoc.get()));
+  const std::int32_t type = wantedType(*session, metadata, context.options.adhoc.get());
+  int result = prepareByType(context, *session, type, metadata);
   if (result == kRecordSuccess) result = beginCapture(*session, std::move(metadata));
   if (result != kRecordSuccess) {
     session->metadata.set(nullptr);

@@ -49,6 +49,8 @@ requires(std::is_arithmetic_v<T> || std::is_enum_v<T> || std::is_pointer_v<T>) c
   [[nodiscard]] T get() const { return value_; }
   void set(T value) { value_ = value; }
   T exchange(T value) { return value_.exchange(value); }
+  /// Stores `value` unless something other than `expected` is stored by now.
+  void replace(T expected, T value) { value_.compare_exchange_strong(expected, value); }
 
  private:
   std::atomic<T> value_{};

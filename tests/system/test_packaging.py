@@ -72,3 +72,38 @@ def test_installation(tmp_path):
                          "share/doc/lmxagentd/com.zandor.lmxagentd.sample.plist"}
     program = shutil.which("lmxagentd", path=str(tmp_path / "sbin"))
     assert "(version 100)" in subprocess.run([program, "-v"], capture_output=True, text=True, check=True).stderr
+
+
+def unit_settings():
+    """Each setting of the unit with all its values."""
+    settings = {}
+    for line in (ROOT / "packaging/lmxagentd.service").read_text().splitlines():
+        if "=" in line and not line.startswith("#"):
+            key, value = line.split("=", 1)
+            settings.setdefault(key, []).extend(value.split())
+    return settings
+
+
+def test_the_unit_lets_cameras_and_microphones_in():
+    settings = unit_settings()
+    assert {"char-video4linux", "char-alsa"} <= set(settings["DeviceAllow"])
+    assert {"video", "audio"} <= set(settings["SupplementaryGroups"])
+    assert settings.get("PrivateDevices", ["no"]) == ["no"]
+    # udev's news of devices, the server, and sound servers
+    assert {"AF_NETLINK", "AF_INET", "AF_INET6", "AF_UNIX"} <= set(settings["RestrictAddressFamilies"])
+
+
+@pytest.mark.skipif(shutil.which("systemd-analyze") is None, reason="needs systemd")
+def test_systemd_understands_the_unit():
+    result = subprocess.run(["systemd-analyze", "verify", "--man=no", str(ROOT / "packaging/lmxagentd.service")],
+                            capture_output=True, text=True)
+    lines = [line for line in result.stderr.splitlines() if "/usr/sbin/lmxagentd is not executable" not in line]
+    assert not [line for line in lines if "lmxagentd.service" in line]
+
+
+def test_the_packages_that_the_daemon_names_are_installed_with_it():
+    """A missing package's log line must not name one that the installation knows nothing of."""
+    named = set(re.findall(r"gstreamer1\.0-[a-z-]+", (ROOT / "src/capture/gst/plugin_packages.cpp").read_text()))
+    assert len(named) >= 7
+    known = (ROOT / "scripts/install-dependencies").read_text() + (ROOT / "README.md").read_text()
+    assert named <= set(re.findall(r"gstreamer1\.0-[a-z-]+", known))

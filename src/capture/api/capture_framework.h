@@ -39,10 +39,15 @@ enum CaptureErrorCode : int {
   kNoMedia = 2003,  ///< nothing was captured for the request
 };
 
-/// Reports of a capture controller, on a thread of the framework.
+/// Reports of a capture controller, on a thread of the framework, which logs what it reports.
 class CaptureControllerDelegate {
  public:
   virtual ~CaptureControllerDelegate() = default;
+  /// The microphone is not there at the beginning, or has been lost. The capture goes on with silence. Loss
+  /// and return alternate, from a capture's preparation to its end.
+  virtual void lmrCaptureSoundLost(const CaptureError& error) = 0;
+  /// The microphone is heard again.
+  virtual void lmrCaptureSoundBack() = 0;
   virtual void lmrCaptureDidComplete(const std::optional<CaptureError>& error) = 0;
   virtual void lmrCaptureDidCancel(const std::optional<CaptureError>& error) = 0;
 };
@@ -76,7 +81,8 @@ class LMRCaptureController {
  public:
   virtual ~LMRCaptureController() = default;
 
-  /// Gets one report, when the capture has ended. Held weakly: a delegate that has gone by then gets none.
+  /// Gets one report of the end, when the capture has ended, and before that those of the microphone. Held
+  /// weakly: a delegate that has gone by then gets none.
   virtual void setDelegate(std::weak_ptr<CaptureControllerDelegate> delegate) = 0;
   /// Opens the devices that the settings name and sets up the writing; once. Main thread, blocks while a
   /// device opens.

@@ -2,12 +2,13 @@
 #include "capture/api/capture_settings.h"
 
 #include "support/format.h"
+#include "support/redacted.h"
 
 namespace lmx {
 
 std::string describe(const LMRRecordingContext& context) {
   static constexpr const char* kTypes[] = {"Audio+Video", "Audio", "Video", "File"};
-  return string_with_format(
+  return redacted(string_with_format(
       "type %s, video %s, audio %s, repository %s, disk cut-off %lld MB, preview every %lld ms, continuous "
       "%s",
       kTypes[static_cast<int>(context.captureType)],
@@ -15,7 +16,7 @@ std::string describe(const LMRRecordingContext& context) {
       context.audioEnabled ? context.audioDeviceID.value_or("default").c_str() : "off",
       context.captureTempDir.c_str(), static_cast<long long>(context.diskSpaceCutoffInMB),
       static_cast<long long>(context.previewIntervalInMilliseconds),
-      context.continuous.enabled ? "on" : "off");
+      context.continuous.enabled ? "on" : "off"));
 }
 
 }  // namespace lmx

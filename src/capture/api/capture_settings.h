@@ -33,7 +33,9 @@ struct LMRRecordingContext {
   bool videoEnabled = false;
   bool previewEnabled = false;
   std::optional<std::string> videoDeviceID;
-  std::optional<std::string> audioDeviceID;  ///< absent: the framework's default device
+  /// Absent: the first microphone there is when the capture begins. With a microphone that isn't there, or
+  /// none at all, the recording is silent until one is.
+  std::optional<std::string> audioDeviceID;
   std::optional<LMRCompressionOptions> videoCompressionOptions;
   std::optional<LMRCompressionOptions> audioCompressionOptions;
   std::string captureTempDir;  ///< the recording repository
@@ -66,8 +68,10 @@ class CaptureCatalog {
   };
   /// The microphone that belongs to `videoDevice`.
   virtual PreferredAudio preferredAudioDevice(const std::string& videoDevice) = 0;
-  /// Whether `audioDevice` names a usable device; absent asks for the default one.
-  virtual bool audioDeviceUsable(const std::optional<std::string>& audioDevice) = 0;
+  /// Whether `audioDevice` can be a microphone's identifier, whether or not that microphone is there. Pure.
+  virtual bool canBeMicrophone(const std::string& audioDevice) = 0;
+  /// Whether that microphone is there; absent asks for any. May block for some milliseconds.
+  virtual bool hasMicrophone(const std::optional<std::string>& audioDevice) = 0;
   virtual std::optional<LMRCompressionOptions> compressionOptions(MediaType media,
                                                                   RecordingQuality quality) = 0;
 };

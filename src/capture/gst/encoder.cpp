@@ -15,6 +15,13 @@ namespace lmx {
 namespace {
 
 constexpr int kSamplesPerPacket = 1024;  // AAC
+/// The encoder counts frames, not time: a slow camera's key frames would be far apart.
+constexpr double kKeyFrameSeconds = 2.0;
+/// How far the encoder may be behind its feeder.
+constexpr std::size_t kFramesInside = 10;
+constexpr std::int64_t kSamplesInside = 48000;
+/// Long silence is fed in pieces: an hour of it would take a gigabyte.
+constexpr std::uint32_t kSoundPiece = 4800;
 
 /// A broken driver must not end the recording: the encoder refuses NaN, and turns samples far beyond full
 /// scale into packets that players can't read.
@@ -48,14 +55,22 @@ BufferHandle soundBuffer(const float* samples, std::size_t count) {
 
 }  // namespace
 
-Encoder::Encoder(const MovieEncoding& movie, EncoderOutput output)
-    : video_(movie.video), audio_(movie.audio), output_(std::move(output)) {}
+Encoder::Encoder(const MovieEncoding& movie, const Deadline& patience, EncoderOutput output)
+    : video_(movie.video), audio_(movie.audio), patience_(patience), output_(std::move(output)) {
+  if (audio_) {
+    sound_config_ = audioSpecificConfig(static_cast<std::uint32_t>(audio_->sampleRate),
+                                        static_cast<unsigned>(audio_->channels));
+  }
+}
 
-Result<std::unique_ptr<Encoder>> Encoder::create(const MovieEncoding& movie, EncoderOutput output) {
+Result<std::unique_ptr<Encoder>> Encoder::create(const MovieEncoding& movie, const Deadline& patience,
+                                                 EncoderOutput output) {
   auto pipeline = newPipeline(encoderDescription(movie));
   if (!pipeline) return std::move(pipeline).error();
-  std::unique_ptr<Encoder> encoder(new Encoder(movie, std::move(output)));
+  std::unique_ptr<Encoder> encoder(new Encoder(movie, patience, std::move(output)));
   encoder->attach(*std::move(pipeline));
+  if (movie.audio)
+    encoder->output_.onFormat(encoder->soundTrack(), encoder->soundFormat(encoder->sound_config_));
   if (gst_element_set_state(encoder->pipeline_.get(), GST_STATE_PLAYING) == GST_STATE_CHANGE_FAILURE)
     return Error{"the encoder could not be started"};
   return encoder;
@@ -91,8 +106,13 @@ Encoder::~Encoder() {
 }
 
 void Encoder::pushVideo(GstBuffer* buffer, std::uint32_t place, bool forceKey) {
-  if (failed()) return;
-  if (forceKey) {
+  if (!waitForRoom([this] { return places_inside_.size() < kFramesInside; })) return;
+  {
+    const std::lock_guard lock(mutex_);
+    places_inside_.push_back(place);
+  }
+  if (forceKey || keyFrameIsDue(place)) {
+    last_key_ = place;
     // Sent into the stream behind the frames already queued: appsrc serialises events with its buffers.
     gst_element_send_event(video_source_.get(),
                            gst_video_event_new_downstream_force_key_unit(
@@ -106,8 +126,29 @@ void Encoder::pushVideo(GstBuffer* buffer, std::uint32_t place, bool forceKey) {
   gst_app_src_push_buffer(GST_APP_SRC(video_source_.get()), frame);
 }
 
+bool Encoder::keyFrameIsDue(std::uint32_t place) const {
+  return (place - last_key_) * video_->frameRate.frameSeconds() >= kKeyFrameSeconds;
+}
+
+/// @return false when the frame or sound is to be dropped
+template <class HasRoom>
+bool Encoder::waitForRoom(HasRoom hasRoom) {
+  std::unique_lock lock(mutex_);
+  while (!failed_ && !hasRoom() && !patience_.passed()) changed_.wait_for(lock, kDeadlineCheck);
+  return !failed_ && hasRoom();
+}
+
 void Encoder::pushAudio(const float* samples, std::uint32_t count) {
-  if (failed()) return;
+  while (count > 0) {
+    const std::uint32_t piece = std::min(count, kSoundPiece);
+    if (!waitForRoom([this] { return audio_pushed_ - audio_out_ < kSamplesInside; })) return;
+    pushSound(samples, piece);
+    if (samples != nullptr) samples += std::size_t{piece} * static_cast<std::size_t>(audio_->channels);
+    count -= piece;
+  }
+}
+
+void Encoder::pushSound(const float* samples, std::uint32_t count) {
   BufferHandle buffer = soundBuffer(samples, std::size_t{count} * static_cast<std::size_t>(audio_->channels));
   if (!buffer) return;
   const auto time = [this](std::int64_t position) {
@@ -164,16 +205,7 @@ void Encoder::fail(const std::string& problem) {
     if (std::exchange(failed_, true)) return;
     changed_.notify_all();
   }
-  // Nothing empties their queues any more: a feeder that waits for room would wait for ever.
-  for (const auto& source : {&video_source_, &audio_source_}) {
-    if (*source) gst_app_src_set_max_buffers(GST_APP_SRC(source->get()), 0);
-  }
   output_.onError(problem);
-}
-
-bool Encoder::failed() {
-  const std::lock_guard lock(mutex_);
-  return failed_;
 }
 
 void Encoder::takeVideo(GstSample* sample) {
@@ -188,30 +220,49 @@ void Encoder::takeVideo(GstSample* sample) {
     output_.onFormat(0, std::move(format));
   }
   GstBuffer* buffer = gst_sample_get_buffer(sample);
-  // Every frame that goes in comes out, in order: its place needs no time stamp.
-  output_.onSample({.track = 0,
-                    .data = contents(buffer),
-                    .duration = frameDuration(video_->frameRate),
-                    .sync = GST_BUFFER_FLAG_IS_SET(buffer, GST_BUFFER_FLAG_DELTA_UNIT) == FALSE});
+  const std::uint32_t place = placeOf(sample);
+  output_.onFrame({.track = 0,
+                   .data = contents(buffer),
+                   .sync = GST_BUFFER_FLAG_IS_SET(buffer, GST_BUFFER_FLAG_DELTA_UNIT) == FALSE},
+                  place);
+  const std::lock_guard lock(mutex_);
+  while (!places_inside_.empty() && places_inside_.front() <= place) places_inside_.pop_front();
+  changed_.notify_all();
+}
+
+/// The encoder shifts time stamps and segment by the same amount.
+std::uint32_t Encoder::placeOf(GstSample* sample) const {
+  const GstClockTime time = gst_segment_to_running_time(gst_sample_get_segment(sample), GST_FORMAT_TIME,
+                                                        GST_BUFFER_PTS(gst_sample_get_buffer(sample)));
+  if (!GST_CLOCK_TIME_IS_VALID(time)) return 0;
+  return static_cast<std::uint32_t>(
+      std::llround(static_cast<double>(time) / 1e9 / video_->frameRate.frameSeconds()));
+}
+
+TrackFormat Encoder::soundFormat(const Bytes& config) const {
+  TrackFormat format{.timescale = static_cast<std::uint32_t>(audio_->sampleRate), .sampleDescription = {}};
+  format.sampleDescription =
+      audioSampleDescription(format.timescale, static_cast<std::uint16_t>(audio_->channels), config);
+  return format;
 }
 
 void Encoder::takeAudio(GstSample* sample) {
-  const std::uint32_t track = video_ ? 1 : 0;
-  if (!audio_format_known_) {
-    audio_format_known_ = true;
-    TrackFormat format{.timescale = static_cast<std::uint32_t>(audio_->sampleRate), .sampleDescription = {}};
-    format.sampleDescription = audioSampleDescription(
-        format.timescale, static_cast<std::uint16_t>(audio_->channels), codecData(sample));
-    output_.onFormat(track, std::move(format));
+  if (audio_packets_ == 0) {
+    const Bytes config = codecData(sample);
+    if (!config.empty() && config != sound_config_) output_.onFormat(soundTrack(), soundFormat(config));
   }
   // The first packet holds nothing but the encoder's 1,024 samples of delay; without it the sound stands
   // where it belongs, with no edit list that a player might ignore.
   const std::int64_t start = (audio_packets_++ - 1) * kSamplesPerPacket;
-  if (start < 0 || start >= total_samples_) return;
-  output_.onSample({.track = track,
-                    .data = contents(gst_sample_get_buffer(sample)),
-                    .duration = kSamplesPerPacket,
-                    .sync = true});
+  if (start >= 0 && start < total_samples_) {
+    output_.onSound({.track = soundTrack(),
+                     .data = contents(gst_sample_get_buffer(sample)),
+                     .duration = kSamplesPerPacket,
+                     .sync = true});
+  }
+  const std::lock_guard lock(mutex_);
+  audio_out_ = audio_packets_ * kSamplesPerPacket;
+  changed_.notify_all();
 }
 
 }  // namespace lmx

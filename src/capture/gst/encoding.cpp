@@ -15,7 +15,7 @@ std::string videoDescription(const VideoEncoding& video) {
   const FrameRate rate = video.frameRate;
   const int keyInterval = std::max(1, static_cast<int>(std::lround(1.0 / rate.frameSeconds())));
   return string_with_format(
-      "appsrc name=vsrc format=time block=true max-buffers=8 max-bytes=0 max-time=0 stream-type=stream "
+      "appsrc name=vsrc format=time max-buffers=0 max-bytes=0 max-time=0 stream-type=stream "
       "caps=video/x-raw,format=I420,width=%d,height=%d,framerate=%d/%d,pixel-aspect-ratio=1/1 ! "
       "x264enc tune=zerolatency speed-preset=%s bitrate=%d key-int-max=%d byte-stream=false aud=false "
       "option-string=scenecut=0 ! video/x-h264,stream-format=avc,alignment=au ! "
@@ -26,7 +26,7 @@ std::string videoDescription(const VideoEncoding& video) {
 
 std::string audioDescription(const AudioEncoding& audio) {
   return string_with_format(
-      "appsrc name=asrc format=time block=true max-buffers=64 max-bytes=0 max-time=0 stream-type=stream "
+      "appsrc name=asrc format=time max-buffers=0 max-bytes=0 max-time=0 stream-type=stream "
       "caps=audio/x-raw,format=F32LE,layout=interleaved,rate=%d,channels=%d%s ! "
       "avenc_aac bitrate=%d ! appsink name=aout sync=false async=false max-buffers=0 "
       "enable-last-sample=false ",

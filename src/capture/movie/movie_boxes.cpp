@@ -232,6 +232,7 @@ Bytes movieHeader(const MovieIndex& index) {
                    static_cast<std::uint32_t>(index.tracks.size() + 1));
     std::uint32_t number = 0;
     for (const TrackIndex& track : index.tracks) {
+      if (track.sizes.empty()) continue;  // some players refuse a movie with an empty track
       trackBox(w, track.format, ++number, track.totalDuration, [&] { fullSampleTables(w, track); });
     }
   });

@@ -19,7 +19,7 @@ Bytes fragmentedHeader(const std::vector<TrackFormat>& tracks);
 /// The head of the "mdat" that takes the placeholder's place.
 /// @param mediaEnd  file offset behind the media, which begin behind "ftyp"
 Bytes mediaHead(std::uint64_t mediaEnd);
-/// "moov" of a whole movie.
+/// "moov" of a whole movie. Tracks without samples are left out.
 Bytes movieHeader(const MovieIndex& index);
 
 }  // namespace lmx

@@ -7,6 +7,7 @@
 #include <algorithm>
 #include <cerrno>
 #include <cmath>
+#include <iterator>
 
 #include "capture/movie/file_io.h"
 #include "capture/movie/movie_boxes.h"
@@ -18,30 +19,41 @@ namespace {
 /// Chunks of a second or so are small enough for players.
 constexpr std::size_t kSamplesPerChunk = 48;
 
-/// A half-open range of a track's samples.
-struct SampleRange {
+/// What is copied of a track: samples, and the time they cover, which may begin or end inside a sample.
+struct Piece {
   std::size_t first = 0;
   std::size_t end = 0;
+  std::uint64_t start = 0;  ///< timescale units
+  std::uint64_t stop = 0;
+  [[nodiscard]] bool empty() const { return first >= end || start >= stop; }
 };
 
-/// A track to copy from: its index, and where each of its samples lies and how long it is.
+/// A track to copy from: its index, and where each of its samples lies and when it begins.
 struct SourceTrack {
   explicit SourceTrack(const TrackIndex& track);
-  /// Seconds from the start of the movie to the sample.
-  [[nodiscard]] double secondsBefore(std::size_t sample) const;
+  [[nodiscard]] std::size_t size() const { return offsets.size(); }
+  [[nodiscard]] std::uint64_t total() const { return starts.back(); }
+  [[nodiscard]] double seconds(std::uint64_t units) const {
+    return static_cast<double>(units) / index.format.timescale;
+  }
+  /// Timescale units up to a frame of the movie's clock; the end of the track if that is earlier.
+  [[nodiscard]] std::uint64_t unitsTo(std::uint32_t frame, double frameSeconds) const;
+  /// The sample that is shown at `units`.
+  [[nodiscard]] std::size_t sampleAt(std::uint64_t units) const;
+  /// The sample whose start is nearest to `units`; may be the one behind the last.
+  [[nodiscard]] std::size_t sampleNear(std::uint64_t units) const;
+  [[nodiscard]] bool isKey(std::size_t sample) const;
   /// Length of a sample of a track whose samples are all equally long.
   [[nodiscard]] double sampleSeconds() const;
-  /// A picture can only be decoded from a key frame on.
-  [[nodiscard]] std::size_t keyFrameAtOrBefore(std::size_t sample) const;
 
   const TrackIndex& index;
   std::vector<std::uint64_t> offsets;
-  std::vector<std::uint32_t> durations;
+  std::vector<std::uint64_t> starts;  ///< and the end of the last sample: one more than there are samples
 };
 
-SourceTrack::SourceTrack(const TrackIndex& track) : index(track) {
+SourceTrack::SourceTrack(const TrackIndex& track) : index(track), starts{0} {
   offsets.reserve(track.sizes.size());
-  durations.reserve(track.sizes.size());
+  starts.reserve(track.sizes.size() + 1);
   for (const Chunk& chunk : track.chunks) {
     std::uint64_t offset = chunk.offset;
     for (std::uint32_t i = 0; i < chunk.samples; ++i) {
@@ -50,24 +62,62 @@ SourceTrack::SourceTrack(const TrackIndex& track) : index(track) {
       offset += size;
     }
   }
-  for (const DurationRun& run : track.durations) durations.insert(durations.end(), run.count, run.duration);
+  for (const DurationRun& run : track.durations) {
+    for (std::uint32_t i = 0; i < run.count; ++i) starts.push_back(starts.back() + run.duration);
+  }
 }
 
-double SourceTrack::secondsBefore(std::size_t sample) const {
-  std::uint64_t units = 0;
-  for (std::size_t i = 0; i < sample && i < durations.size(); ++i) units += durations[i];
-  return static_cast<double>(units) / index.format.timescale;
+std::uint64_t SourceTrack::unitsTo(std::uint32_t frame, double frameSeconds) const {
+  const double units = std::round(frame * frameSeconds * index.format.timescale);
+  return std::min(total(), static_cast<std::uint64_t>(units));
+}
+
+std::size_t SourceTrack::sampleAt(std::uint64_t units) const {
+  const auto after = std::upper_bound(starts.begin(), std::prev(starts.end()), units);
+  return static_cast<std::size_t>(std::max<std::ptrdiff_t>(0, after - starts.begin() - 1));
+}
+
+std::size_t SourceTrack::sampleNear(std::uint64_t units) const {
+  const auto after = std::lower_bound(starts.begin(), starts.end(), units);
+  if (after == starts.end()) return size();
+  const auto sample = static_cast<std::size_t>(after - starts.begin());
+  return sample > 0 && units - starts[sample - 1] < starts[sample] - units ? sample - 1 : sample;
+}
+
+bool SourceTrack::isKey(std::size_t sample) const {
+  return !index.format.isVideo ||
+         std::binary_search(index.syncSamples.begin(), index.syncSamples.end(), sample);
 }
 
 double SourceTrack::sampleSeconds() const {
-  const std::uint32_t units = durations.empty() ? 0 : durations.front();
-  return units == 0 ? 1.0 : static_cast<double>(units) / index.format.timescale;
+  const std::uint32_t units = index.durations.empty() ? 0 : index.durations.front().duration;
+  return units == 0 ? 1.0 : seconds(units);
 }
 
-std::size_t SourceTrack::keyFrameAtOrBefore(std::size_t sample) const {
-  if (!index.format.isVideo) return sample;
-  const auto after = std::upper_bound(index.syncSamples.begin(), index.syncSamples.end(), sample);
-  return after == index.syncSamples.begin() ? sample : *std::prev(after);
+/// The frames that are shown from `start` to `stop`. A picture can only be decoded from a key frame on.
+Piece framesBetween(const SourceTrack& track, std::uint64_t start, std::uint64_t stop) {
+  Piece piece{.start = start, .stop = stop};
+  const auto end = std::lower_bound(track.starts.begin(), std::prev(track.starts.end()), stop);
+  piece.end = static_cast<std::size_t>(end - track.starts.begin());
+  piece.first = track.sampleAt(start);
+  if (piece.empty() || track.isKey(piece.first)) return piece;
+  // A mark in a hole has made the frame behind the hole a key frame: it stands for the rest of the hole.
+  const std::size_t next = piece.first + 1;
+  if (track.starts[piece.first] < start && next < piece.end && track.isKey(next)) {
+    piece.first = next;
+    return piece;
+  }
+  while (piece.first > 0 && !track.isKey(piece.first)) --piece.first;
+  piece.start = track.starts[piece.first];
+  return piece;
+}
+
+/// Whole packets, as near to the wanted time as they come.
+Piece packetsBetween(const SourceTrack& track, std::uint64_t start, std::uint64_t stop) {
+  Piece piece{.first = track.sampleNear(start), .end = track.sampleNear(stop)};
+  piece.start = track.starts[piece.first];
+  piece.stop = track.starts[piece.end];
+  return piece;
 }
 
 /// Appends ranges to the new file and to its index. The first track leads: ranges are counted in its time.
@@ -79,9 +129,8 @@ class RangeCopier {
   int copy(const FrameRange& frames, double frameSeconds);
 
  private:
-  [[nodiscard]] SampleRange leadSamples(const FrameRange& frames, double frameSeconds) const;
-  [[nodiscard]] SampleRange samplesFrom(std::size_t track, double seconds) const;
-  int copySamples(std::size_t track, SampleRange range);
+  [[nodiscard]] Piece samplesFrom(std::size_t track, double seconds) const;
+  int copySamples(std::size_t track, const Piece& piece);
   int copyBytes(std::uint64_t from, std::uint64_t count);
 
   int source_;
@@ -99,53 +148,50 @@ RangeCopier::RangeCopier(int source, int target, const MovieIndex& index, MovieI
       copied_(index.tracks.size()) {}
 
 int RangeCopier::copy(const FrameRange& frames, double frameSeconds) {
-  const SampleRange range = leadSamples(frames, frameSeconds);
-  if (const int error = copySamples(0, range)) return error;
-  const double from = tracks_[0].secondsBefore(range.first);
-  copied_[0] += tracks_[0].secondsBefore(range.end) - from;
+  const SourceTrack& lead = tracks_[0];
+  const std::uint64_t start = lead.unitsTo(frames.first, frameSeconds);
+  const std::uint64_t stop = lead.unitsTo(frames.end, frameSeconds);
+  const Piece piece =
+      lead.index.format.isVideo ? framesBetween(lead, start, stop) : packetsBetween(lead, start, stop);
+  if (piece.empty()) return 0;
+  if (const int error = copySamples(0, piece)) return error;
+  copied_[0] += lead.seconds(piece.stop - piece.start);
   for (std::size_t t = 1; t < tracks_.size(); ++t) {
-    const SampleRange samples = samplesFrom(t, from);
-    if (samples.first >= samples.end) continue;
-    if (const int error = copySamples(t, samples)) return error;
-    copied_[t] += static_cast<double>(samples.end - samples.first) * tracks_[t].sampleSeconds();
+    const Piece sound = samplesFrom(t, lead.seconds(piece.start));
+    if (sound.empty()) continue;
+    if (const int error = copySamples(t, sound)) return error;
+    copied_[t] += tracks_[t].seconds(sound.stop - sound.start);
   }
   return 0;
 }
 
-/// The samples of the leading track for a range of frames. A frame is one sample of the picture, or a stretch
-/// of the sound where there is no picture.
-SampleRange RangeCopier::leadSamples(const FrameRange& frames, double frameSeconds) const {
-  const SourceTrack& lead = tracks_[0];
-  const std::uint32_t sampleUnits = std::max(1U, lead.durations.front());
-  const double perFrame = frameSeconds * lead.index.format.timescale / sampleUnits;
-  const auto sampleOf = [&](std::uint32_t frame) {
-    const double sample = std::min(frame * perFrame, static_cast<double>(lead.offsets.size()));
-    return static_cast<std::size_t>(std::lround(sample));
-  };
-  return {lead.keyFrameAtOrBefore(sampleOf(frames.first)), sampleOf(frames.end)};
-}
-
 /// As many samples of `track`, from `seconds` on, as it takes to be as long as the leading track. This evens
 /// out the rounding of earlier ranges: sound never drifts away from the picture.
-SampleRange RangeCopier::samplesFrom(std::size_t track, double seconds) const {
-  const double sample = tracks_[track].sampleSeconds();
+Piece RangeCopier::samplesFrom(std::size_t track, double seconds) const {
+  const SourceTrack& from = tracks_[track];
+  const double sample = from.sampleSeconds();
   const auto first = static_cast<std::size_t>(std::lround(seconds / sample));
   const auto count =
       static_cast<std::size_t>(std::max(0L, std::lround((copied_[0] - copied_[track]) / sample)));
-  return {first, std::min(first + count, tracks_[track].offsets.size())};
+  Piece piece{.first = std::min(first, from.size()), .end = std::min(first + count, from.size())};
+  piece.start = from.starts[piece.first];
+  piece.stop = from.starts[piece.end];
+  return piece;
 }
 
-int RangeCopier::copySamples(std::size_t track, SampleRange range) {
+int RangeCopier::copySamples(std::size_t track, const Piece& piece) {
   const SourceTrack& from = tracks_[track];
   TrackIndex& to = out_.tracks[track];
-  for (std::size_t i = range.first; i < range.end;) {
+  std::uint64_t at = piece.start;
+  for (std::size_t i = piece.first; i < piece.end;) {
     const std::size_t start = i;
     std::uint64_t bytes = 0;
     to.chunks.push_back({out_.mediaEnd, 0});
-    while (i < range.end && i - start < kSamplesPerChunk && from.offsets[i] == from.offsets[start] + bytes) {
-      const auto& keys = from.index.syncSamples;
-      to.addSample(from.index.sizes[i], from.durations[i], std::binary_search(keys.begin(), keys.end(), i));
+    while (i < piece.end && i - start < kSamplesPerChunk && from.offsets[i] == from.offsets[start] + bytes) {
+      const std::uint64_t until = std::min(from.starts[i + 1], piece.stop);
+      to.addSample(from.index.sizes[i], static_cast<std::uint32_t>(until - at), from.isKey(i));
       bytes += from.index.sizes[i++];
+      at = until;
     }
     if (const int error = copyBytes(from.offsets[start], bytes)) return error;
   }

@@ -17,7 +17,9 @@ struct FrameRange {
 
 /// Copies `ranges` of `source` to the new movie `target`. The copy is synced but bears its name from the
 /// start, so give a temporary one. A range that does not begin with a key frame begins with the one before
-/// it. Sound is copied in whole AAC frames; the rounding error is carried from range to range.
+/// it; one that begins while a frame is shown for longer begins with that frame shortened, or, if that is
+/// none, with a key frame that follows it. Sound is copied in whole AAC frames; the rounding error is carried
+/// from range to range.
 /// @param index  of `source`
 /// @param frameSeconds  length of a frame of `ranges`
 /// @return 0 or the errno; half a copy may be left then

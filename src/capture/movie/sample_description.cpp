@@ -1,6 +1,9 @@
 // "stsd" boxes of H.264 and AAC.
 #include "capture/movie/sample_description.h"
 
+#include <algorithm>
+#include <array>
+
 #include "capture/movie/box_writer.h"
 
 namespace lmx {
@@ -32,7 +35,45 @@ void elementaryStreamBox(BoxWriter& w, std::span<const std::uint8_t> config) {
   });
 }
 
+/// Collects bits to bytes, most significant first.
+class BitWriter {
+ public:
+  void put(std::uint32_t value, unsigned bits) {
+    for (; bits > 0; --bits, ++used_) {
+      if (used_ % 8 == 0) bytes_.push_back(0);
+      if ((value >> (bits - 1) & 1U) != 0) bytes_.back() |= static_cast<std::uint8_t>(0x80U >> used_ % 8);
+    }
+  }
+  [[nodiscard]] Bytes bytes() const { return bytes_; }
+
+ private:
+  Bytes bytes_;
+  std::size_t used_ = 0;
+};
+
 }  // namespace
+
+Bytes audioSpecificConfig(std::uint32_t sampleRate, unsigned channels) {
+  static constexpr std::array<std::uint32_t, 13> kRates{96000, 88200, 64000, 48000, 44100, 32000, 24000,
+                                                        22050, 16000, 12000, 11025, 8000,  7350};
+  constexpr std::uint32_t kOtherRate = 15;
+  BitWriter w;
+  w.put(2, 5);  // AAC-LC
+  const auto known = std::find(kRates.begin(), kRates.end(), sampleRate);
+  if (known != kRates.end()) {
+    w.put(static_cast<std::uint32_t>(known - kRates.begin()), 4);
+  } else {
+    w.put(kOtherRate, 4);
+    w.put(sampleRate, 24);
+  }
+  w.put(channels, 4);
+  w.put(0, 3);  // packets of 1,024 samples, nothing else
+  // Players need not look for band replication in the stream: there is none.
+  w.put(0x2B7, 11);
+  w.put(5, 5);
+  w.put(0, 1);
+  return w.bytes();
+}
 
 Bytes videoSampleDescription(std::uint16_t width, std::uint16_t height, std::span<const std::uint8_t> avcC) {
   Bytes out;

@@ -1,59 +1,88 @@
-// Delivers media and errors to every consumer.
+// Delivers media and news to every consumer.
 #include "capture/source/capture_consumers.h"
-
-#include "platform/log.h"
 
 namespace lmx {
 
-void CaptureConsumers::add(const std::shared_ptr<CaptureConsumer>& consumer) {
+void CaptureConsumers::add(const std::shared_ptr<CaptureConsumer>& consumer, SourceUse use) {
   std::optional<CaptureError> failure;
+  std::optional<CaptureError> away;
   {
     const std::lock_guard lock(mutex_);
-    consumers_.push_back(consumer);
+    users_.push_back({consumer, use});
     failure = failure_;
+    away = away_;
   }
-  if (failure) consumer->onCaptureError(*failure);
+  if (failure) {
+    consumer->onSourceLost(use, *failure);
+  } else if (away) {
+    consumer->onSourceAway(use, *away);
+  }
 }
 
 void CaptureConsumers::remove(const CaptureConsumer* consumer) {
   const std::lock_guard lock(mutex_);
-  std::erase_if(consumers_, [&](const auto& weak) {
-    const auto held = weak.lock();
+  std::erase_if(users_, [&](const User& user) {
+    const auto held = user.consumer.lock();
     return !held || held.get() == consumer;
   });
 }
 
-CaptureConsumers::Held CaptureConsumers::heldLocked() const {
-  Held held;
-  for (const auto& weak : consumers_) {
-    if (auto consumer = weak.lock()) held.push_back(std::move(consumer));
+std::vector<CaptureConsumers::Held> CaptureConsumers::heldLocked() const {
+  std::vector<Held> held;
+  for (const User& user : users_) {
+    if (auto consumer = user.consumer.lock()) held.push_back({std::move(consumer), user.use});
   }
   return held;
 }
 
-void CaptureConsumers::deliver(Medium medium, GstBuffer* buffer, double runningTime) const {
-  Held consumers;
-  {
-    const std::lock_guard lock(mutex_);
-    consumers = heldLocked();
-  }
-  for (const auto& consumer : consumers) {
-    BufferHandle reference(gst_buffer_ref(buffer));
-    medium == Medium::video ? consumer->onVideo(std::move(reference), runningTime)
-                            : consumer->onAudio(std::move(reference), runningTime);
+std::vector<CaptureConsumers::Held> CaptureConsumers::held() const {
+  const std::lock_guard lock(mutex_);
+  return heldLocked();
+}
+
+void CaptureConsumers::deliverPicture(GstSample* picture, double time) const {
+  for (const Held& user : held()) {
+    if (user.use.picture) user.consumer->onPicture(SampleHandle(gst_sample_ref(picture)), time);
   }
 }
 
-void CaptureConsumers::fail(const CaptureError& error) {
-  Held consumers;
+void CaptureConsumers::deliverSound(GstBuffer* sound, double time) const {
+  for (const Held& user : held()) {
+    if (user.use.sound) user.consumer->onSound(BufferHandle(gst_buffer_ref(sound)), time);
+  }
+}
+
+void CaptureConsumers::lost(const CaptureError& error) {
+  std::vector<Held> users;
   {
     const std::lock_guard lock(mutex_);
     if (failure_) return;
     failure_ = error;
-    consumers = heldLocked();
+    users = heldLocked();
   }
-  LMPLogMessage(nullptr, kLogError, "Capture device lost: %s (code %d)", error.message.c_str(), error.code);
-  for (const auto& consumer : consumers) consumer->onCaptureError(error);
+  for (const Held& user : users) user.consumer->onSourceLost(user.use, error);
+}
+
+void CaptureConsumers::away(const CaptureError& error) {
+  std::vector<Held> users;
+  {
+    const std::lock_guard lock(mutex_);
+    if (failure_ || away_) return;
+    away_ = error;
+    users = heldLocked();
+  }
+  for (const Held& user : users) user.consumer->onSourceAway(user.use, error);
+}
+
+void CaptureConsumers::back(double seconds) {
+  std::vector<Held> users;
+  {
+    const std::lock_guard lock(mutex_);
+    if (!away_) return;
+    away_ = std::nullopt;
+    users = heldLocked();
+  }
+  for (const Held& user : users) user.consumer->onSourceBack(user.use, seconds);
 }
 
 std::optional<CaptureError> CaptureConsumers::failure() const {

@@ -1,4 +1,4 @@
-// The consumers of a capture pipeline.
+// The users of a source.
 #pragma once
 #include <memory>
 #include <mutex>
@@ -10,41 +10,61 @@
 
 namespace lmx {
 
-/// Receives captured media on streaming threads. Must return quickly: queue and return.
+/// Which media of a source somebody uses.
+struct SourceUse {
+  bool picture = false;
+  bool sound = false;
+};
+
+/// Receives captured media on streaming threads, and news of the source on its own thread or inside
+/// CaptureConsumers::add. Must return quickly: queue and return. Times are running time in seconds.
 class CaptureConsumer {
  public:
   virtual ~CaptureConsumer() = default;
-  /// @param buffer  an I420 frame of the pipeline's size (a reference for the consumer)
-  /// @param runningTime  seconds
-  virtual void onVideo(BufferHandle buffer, double runningTime) = 0;
-  /// @param buffer  interleaved 32-bit float samples
-  virtual void onAudio(BufferHandle buffer, double runningTime) = 0;
-  /// Once at most; on the pipeline's bus thread, or inside CaptureConsumers::add.
-  virtual void onCaptureError(const CaptureError& error) = 0;
+  /// @param picture  decoded, of any raw format and size
+  virtual void onPicture(SampleHandle picture, double time) = 0;
+  /// @param sound  interleaved 32-bit float samples, kSoundRate, kSoundChannels
+  virtual void onSound(BufferHandle sound, double time) = 0;
+  /// The source is lost for good. Once at most.
+  virtual void onSourceLost(SourceUse use, const CaptureError& error) = 0;
+  /// Nothing comes at the moment; it is being opened again.
+  virtual void onSourceAway(SourceUse use, const CaptureError& error) = 0;
+  /// It delivers again, after `seconds`.
+  virtual void onSourceBack(SourceUse use, double seconds) = 0;
 };
 
-/// The consumers of a pipeline, and the error that stopped it. Consumers are called without the lock held.
-/// Thread-safe.
+/// The users of a source, and what they have to know of it. Users are called without the lock held. Thread-safe.
 class CaptureConsumers {
  public:
-  /// A consumer that is added after the pipeline has failed gets the error at once.
-  void add(const std::shared_ptr<CaptureConsumer>& consumer);
+  /// One that is added while the source is away, or after it was lost, is told at once.
+  void add(const std::shared_ptr<CaptureConsumer>& consumer, SourceUse use);
   /// A call that is already on its way may still reach the consumer afterwards.
   void remove(const CaptureConsumer* consumer);
 
-  enum class Medium { video, audio };
-  void deliver(Medium medium, GstBuffer* buffer, double runningTime) const;
-  /// Logs the error and reports it to the consumers. Only the first one counts: others are consequences of
-  /// it.
-  void fail(const CaptureError& error);
+  void deliverPicture(GstSample* picture, double time) const;
+  void deliverSound(GstBuffer* sound, double time) const;
+
+  /// Only the first loss counts: others are consequences of it.
+  void lost(const CaptureError& error);
+  void away(const CaptureError& error);
+  void back(double seconds);
   [[nodiscard]] std::optional<CaptureError> failure() const;
 
  private:
-  using Held = std::vector<std::shared_ptr<CaptureConsumer>>;
-  [[nodiscard]] Held heldLocked() const;
+  struct User {
+    std::weak_ptr<CaptureConsumer> consumer;
+    SourceUse use;
+  };
+  struct Held {
+    std::shared_ptr<CaptureConsumer> consumer;
+    SourceUse use;
+  };
+  [[nodiscard]] std::vector<Held> heldLocked() const;
+  [[nodiscard]] std::vector<Held> held() const;
   mutable std::mutex mutex_;
-  std::vector<std::weak_ptr<CaptureConsumer>> consumers_;  // guarded by mutex_
-  std::optional<CaptureError> failure_;                    // guarded by mutex_
+  std::vector<User> users_;              // guarded by mutex_
+  std::optional<CaptureError> failure_;  // guarded by mutex_
+  std::optional<CaptureError> away_;     // guarded by mutex_
 };
 
 }  // namespace lmx

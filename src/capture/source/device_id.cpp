@@ -2,41 +2,68 @@
 #include "capture/source/device_id.h"
 
 #include <algorithm>
+#include <array>
 #include <cmath>
 #include <cstdio>
 #include <cstdlib>
+#include <sstream>
+#include <string_view>
 
 namespace lmx {
 namespace {
 
-bool startsWith(const std::string& text, const char* prefix) { return text.rfind(prefix, 0) == 0; }
+constexpr std::string_view kNamedPcm = "device=";
+
+struct Scheme {
+  std::string_view prefix;
+  DeviceKind kind;
+};
+constexpr std::array<Scheme, 6> kSchemes{{{"v4l2:", DeviceKind::hardware},
+                                          {"alsa:", DeviceKind::hardware},
+                                          {"pipewire:", DeviceKind::hardware},
+                                          {"file://", DeviceKind::file},
+                                          {"rtsp://", DeviceKind::network},
+                                          {"test://", DeviceKind::test}}};
+
+/// Cuts "name?key=value&key=value" in two.
+void takeOptions(DeviceID& id) {
+  const std::size_t question = id.name.find('?');
+  if (question == std::string::npos) return;
+  std::istringstream options(id.name.substr(question + 1));
+  id.name.resize(question);
+  for (std::string option; std::getline(options, option, '&');) {
+    const std::size_t equals = option.find('=');
+    if (equals != std::string::npos) id.options[option.substr(0, equals)] = option.substr(equals + 1);
+  }
+}
+
+bool nameIsWhole(const DeviceID& id) {
+  if (id.name.empty() || id.name == kNamedPcm) return false;
+  if (id.kind == DeviceKind::file) return id.name.size() > 1 && id.name.front() == '/';
+  return id.kind != DeviceKind::network || (id.name.front() != '/' && id.name.back() != '@');
+}
 
 }  // namespace
 
 DeviceID parseDeviceID(const std::string& text) {
   DeviceID id{.text = text, .name = text};
-  if (startsWith(text, "v4l2:") || startsWith(text, "alsa:") || startsWith(text, "pipewire:")) {
-    id.kind = DeviceKind::hardware;
-  } else if (startsWith(text, "file://")) {
-    id.kind = DeviceKind::file;
-    id.name = text.substr(7);
-  } else if (startsWith(text, "rtsp://")) {
-    id.kind = DeviceKind::network;
-  } else if (startsWith(text, "test://")) {
-    id.kind = DeviceKind::test;
-    const std::size_t question = text.find('?');
-    id.name = text.substr(7, question == std::string::npos ? question : question - 7);
-    std::size_t at = question;
-    while (at != std::string::npos) {
-      const std::size_t next = text.find('&', at + 1);
-      const std::string option = text.substr(at + 1, next == std::string::npos ? next : next - at - 1);
-      const std::size_t equals = option.find('=');
-      if (equals != std::string::npos) id.options[option.substr(0, equals)] = option.substr(equals + 1);
-      at = next;
-    }
-  }
+  const auto scheme = std::find_if(kSchemes.begin(), kSchemes.end(),
+                                   [&](const Scheme& s) { return text.starts_with(s.prefix); });
+  if (scheme == kSchemes.end()) return id;
+  id.kind = scheme->kind;
+  id.name = text.substr(scheme->prefix.size());
+  if (id.kind == DeviceKind::test) takeOptions(id);
+  if (!nameIsWhole(id)) id.kind = DeviceKind::unknown;
   return id;
 }
+
+std::optional<std::string> DeviceID::alsaName() const {
+  if (kind != DeviceKind::hardware || !text.starts_with("alsa:") || !name.starts_with(kNamedPcm))
+    return std::nullopt;
+  return name.substr(kNamedPcm.size());
+}
+
+bool DeviceID::canBeMicrophone() const { return kind != DeviceKind::unknown && !text.starts_with("v4l2:"); }
 
 std::optional<double> DeviceID::seconds(const std::string& option) const {
   const auto found = options.find(option);
@@ -47,6 +74,12 @@ std::optional<double> DeviceID::seconds(const std::string& option) const {
 bool DeviceID::asFastAsPossible() const {
   const auto found = options.find("speed");
   return kind == DeviceKind::test && found != options.end() && found->second == "max";
+}
+
+std::optional<FrameRate> syntheticRate(const DeviceID& id) {
+  const auto rate = id.seconds("rate");
+  if (!rate || !(*rate >= 1 && *rate <= 240)) return std::nullopt;
+  return frameRateFrom(*rate);
 }
 
 PictureSize pictureSize(const DeviceID& id) {

@@ -50,9 +50,35 @@ std::string joined(const Numbers& numbers) {
   return text;
 }
 
-std::string nameOf(const HardwareDevice& device, bool isDefault) {
+std::string entryOf(const HardwareDevice& device, bool isDefault) {
   return "  " + device.uniqueID + (isDefault ? "   <- Automatic" : "") + "\n    name:       " + device.name +
-         "\n" + (device.formats.empty() ? "" : "    formats:    " + device.formats + "\n");
+         (device.isReal ? "" : " (made up by a program, never Automatic)") + "\n" +
+         (device.formats.empty() ? "" : "    formats:    " + device.formats + "\n");
+}
+
+std::string modeLine(const HardwareDevice& camera, const CameraDemand& demand) {
+  if (camera.modes.empty()) return "    mode:       left to the camera, which tells none\n";
+  const auto mode = chooseMode(camera.modes, demand);
+  if (!mode) return "    mode:       none that this machine can decode\n";
+  return "    mode:       " + describe(*mode) + " (" + reasonFor(*mode, camera.modes, demand) + ")\n";
+}
+
+std::string microphoneLine(const std::vector<HardwareDevice>& devices, const HardwareDevice& camera) {
+  const auto microphone = microphoneFor(devices, camera.uniqueID);
+  if (!microphone.uniqueID) return {};
+  return "    microphone: " + *microphone.uniqueID +
+         (microphone.isMuxedAudioOfVideoDevice ? " (its own)" : "") + "\n";
+}
+
+/// What "Automatic" takes, and why.
+std::string automaticLine(const std::vector<HardwareDevice>& devices, bool video) {
+  const HardwareDevice* first = firstDevice(devices, video);
+  if (first == nullptr) return "  Automatic finds no hardware to choose\n";
+  const auto rivals = std::count_if(devices.begin(), devices.end(),
+                                    [video](const auto& d) { return d.isVideo == video && d.isReal; });
+  const char* reason = "the only one that is hardware";
+  if (rivals > 1) reason = first->isDefault ? "the sound server's default" : "the first that is hardware";
+  return "  Automatic takes " + first->uniqueID + ": " + reason + "\n";
 }
 
 }  // namespace
@@ -80,8 +106,8 @@ std::string formatsText(const GstCaps* caps, bool video) {
 }
 
 const HardwareDevice* firstDevice(const std::vector<HardwareDevice>& devices, bool video) {
-  const auto found =
-      std::find_if(devices.begin(), devices.end(), [video](const auto& d) { return d.isVideo == video; });
+  const auto found = std::find_if(devices.begin(), devices.end(),
+                                  [video](const auto& d) { return d.isVideo == video && d.isReal; });
   return found == devices.end() ? nullptr : &*found;
 }
 
@@ -99,26 +125,26 @@ CaptureCatalog::PreferredAudio microphoneFor(const std::vector<HardwareDevice>& 
   return {first->uniqueID, false};
 }
 
-std::string deviceListText(const std::vector<HardwareDevice>& devices) {
-  std::string text = "Cameras (video; for RecordingVideoInput)\n";
-  for (const HardwareDevice& device : devices) {
-    if (!device.isVideo) continue;
-    text += nameOf(device, &device == firstDevice(devices, true));
-    const auto microphone = microphoneFor(devices, device.uniqueID);
-    if (!microphone.uniqueID) continue;
-    text += "    microphone: " + *microphone.uniqueID +
-            (microphone.isMuxedAudioOfVideoDevice ? " (its own)" : "") + "\n";
-  }
-  if (firstDevice(devices, true) == nullptr) text += "  none found: Automatic has nothing to choose\n";
-  text +=
-      "  test://video             synthetic, never Automatic; test://video?size=640x360 for another size\n"
-      "  file:///PATH/MOVIE       a movie played in real time, with its sound, over and over\n"
-      "\nMicrophones (audio; for RecordingAudioInput)\n";
-  for (const HardwareDevice& device : devices) {
-    if (!device.isVideo) text += nameOf(device, &device == firstDevice(devices, false));
-  }
-  if (firstDevice(devices, false) == nullptr) text += "  none found: Automatic has nothing to choose\n";
-  return text + "  test://audio             synthetic, never Automatic\n";
+std::string deviceListText(const std::vector<HardwareDevice>& devices, const CameraDemand& demand) {
+  const auto entries = [&](bool video) {
+    std::string text;
+    for (const HardwareDevice& device : devices) {
+      if (device.isVideo != video) continue;
+      text += entryOf(device, &device == firstDevice(devices, video));
+      if (video) text += modeLine(device, demand) + microphoneLine(devices, device);
+    }
+    return text + automaticLine(devices, video);
+  };
+  return "Cameras (video; for RecordingVideoInput)\n" + entries(true) +
+         "  test://video             synthetic, never Automatic; test://video?size=640x360 for another size\n"
+         "  file:///PATH/MOVIE       a movie played in real time, with its sound, over and over\n"
+         "  rtsp://HOST/PATH         a network camera, with its sound\n"
+         "  pipewire:NODE            any output of PipeWire, by its node.name\n"
+         "\nMicrophones (audio; for RecordingAudioInput)\n" +
+         entries(false) +
+         "  test://audio             synthetic, never Automatic\n"
+         "  alsa:device=NAME         a PCM of ALSA's own configuration\n"
+         "  pipewire:NODE            any output of PipeWire, by its node.name\n";
 }
 
 }  // namespace lmx

@@ -5,24 +5,38 @@
 #include <vector>
 
 #include "capture/gst/gst_handles.h"
+#include "capture/source/camera_mode.h"
 
 namespace lmx {
 
-/// A camera or a microphone that is plugged in.
+/// A camera or a microphone that is there.
 struct HardwareDevice {
   std::string uniqueID;  ///< "v4l2:…", "alsa:…", "pipewire:…": stays the same over restarts
   std::string name;      ///< for people
   std::string
       parent;  ///< identifies the physical device: a camera and its own microphone share it; may be empty
-  std::string formats;  ///< for people
+  std::string formats;            ///< for people
+  std::vector<CameraMode> modes;  ///< of a camera; empty when it doesn't tell them
   bool isVideo = false;
+  bool isReal = true;      ///< a piece of hardware, not made up by a program
+  bool isDefault = false;  ///< the sound server's own default
   GstHandle<GstDevice> device;
 };
 
-/// What is plugged in now, cameras first, each device once. Blocks for some milliseconds. Thread-safe.
+/// What is there now, each device once: cameras first, real hardware first, the sound server's default first,
+/// then by identifier. Opens no device for capturing. Blocks for some milliseconds. Thread-safe.
 std::vector<HardwareDevice> listHardware();
 
-/// The plugged-in device with that identifier; nothing when there is none.
+/// The device with that identifier, which may also be one under which the list has it no more because another
+/// interface lists the same device; nothing when there is none. Blocks for some milliseconds. Thread-safe.
 std::optional<HardwareDevice> findHardware(const std::string& uniqueID);
+
+/// Whether a "v4l2:…", "alsa:…" or "pipewire:…" can be opened as far as one can tell without opening it:
+/// findHardware() knows it, or it is any output of PipeWire's, or "alsa:device=NAME", a name in ALSA's own
+/// configuration. Blocks for some milliseconds. Thread-safe.
+bool isHardwareThere(const std::string& uniqueID);
+
+/// What is wanted of a camera on this machine: what it can decode is asked of GStreamer. Thread-safe.
+CameraDemand demandHere(PictureSize size = {1920, 1080}, double maximumRate = 30);
 
 }  // namespace lmx

@@ -9,6 +9,7 @@
 #include <cstring>
 #include <fstream>
 #include <limits>
+#include <numeric>
 #include <sstream>
 
 #include "capture/movie/movie_finish.h"
@@ -48,6 +49,13 @@ double writtenAt(const std::string& path) {
          kReferenceDateOffset;
 }
 
+/// Length of a frame of the clock that a track's samples were placed by: all of them are multiples of it.
+double grainSeconds(const TrackIndex& track) {
+  std::uint32_t units = 0;
+  for (const DurationRun& run : track.durations) units = std::gcd(units, run.duration);
+  return static_cast<double>(units) / track.format.timescale;
+}
+
 /// All of the media as one recording, for a journal that can't be trusted. Which request wanted what is not
 /// known any more; too much is better than too little, since it can be cut away later.
 /// @param mayGo  false: the folder stays, and is found again by each start, which must not submit it each
@@ -57,7 +65,7 @@ CaptureRecord wholeOf(const CaptureRecord& damaged, const MovieIndex& index, con
   const TrackIndex& lead = index.tracks.front();
   CaptureRecord record;
   record.recordingType = recordingTypeOf(index.video() != nullptr, index.audio() != nullptr);
-  record.frameSeconds = lead.seconds() / static_cast<double>(lead.sizes.size());
+  record.frameSeconds = grainSeconds(lead);
   record.wallOffset = writtenAt(folder + "/" + kMediaName) - lead.seconds();
   record.runs.push_back({.sessionTime = 0, .firstFrame = 0});
   SharedDictionary parameters;

@@ -2,6 +2,7 @@
 #include "capture/store/movie_writer.h"
 
 #include <algorithm>
+#include <cerrno>
 #include <chrono>
 #include <cstring>
 
@@ -14,37 +15,92 @@ using namespace std::chrono_literals;
 namespace {
 
 constexpr auto kSyncInterval = 1s;
+constexpr std::uint64_t kFormatPatienceSeconds = 30;
 
 }  // namespace
 
 MovieWriter::MovieWriter(GrowingMovie movie, std::size_t trackCount, Journal& journal,
-                         std::function<void(int)> onError)
-    : movie_(std::move(movie)), journal_(journal), on_error_(std::move(onError)), formats_(trackCount) {
+                         const Deadline& patience, std::function<void(int)> onError)
+    : movie_(std::move(movie)),
+      journal_(journal),
+      patience_(patience),
+      on_error_(std::move(onError)),
+      formats_(trackCount),
+      queued_duration_(trackCount) {
   thread_ = std::thread([this] { run(); });
 }
 
 MovieWriter::~MovieWriter() { finish(); }
 
-void MovieWriter::setFormat(std::uint32_t track, TrackFormat format) {
+bool MovieWriter::setFormat(std::uint32_t track, TrackFormat format) {
   const std::lock_guard lock(mutex_);
+  if (formats_used_) return false;
   formats_[track] = std::move(format);
   changed_.notify_all();
+  return true;
 }
 
 void MovieWriter::add(EncodedSample sample) {
   std::unique_lock lock(mutex_);
-  changed_.wait(lock, [this] { return queued_bytes_ < kQueueLimit || ending_ || error_ != 0; });
-  if (error_ != 0) return;
+  const auto hasRoom = [this] {
+    return queued_bytes_ < kQueueLimit || ending_ || error_ != 0 || overflowed_;
+  };
+  while (!hasRoom() && !patience_.passed()) changed_.wait_for(lock, kDeadlineCheck);
+  if (error_ != 0 || overflowed_) return;
+  int problem = 0;
+  if (!hasRoom()) {
+    overflowed_ = true;
+    problem = ETIMEDOUT;
+  } else if (formatIsOverdue()) {
+    error_ = problem = ENODATA;
+  }
+  if (problem == 0) {
+    queue(std::move(sample));
+    return;
+  }
+  changed_.notify_all();
+  lock.unlock();
+  on_error_(problem);
+}
+
+/// With mutex_ held.
+void MovieWriter::queue(EncodedSample sample) {
   queued_bytes_ += sample.data.size();
-  if (sample.track == 0) lead_duration_ += sample.duration;
+  queued_duration_[sample.track] += sample.duration;
   queue_.push_back(std::move(sample));
   if (fragmentDue()) changed_.notify_all();
 }
 
+bool MovieWriter::formatsKnown() const {
+  return std::all_of(formats_.begin(), formats_.end(), [](const auto& f) { return f.has_value(); });
+}
+
+/// Nothing can be written before all formats are known, and one that has not come by now will not come.
+bool MovieWriter::formatIsOverdue() const {
+  if (formatsKnown()) return false;
+  for (std::size_t t = 0; t < formats_.size(); ++t) {
+    if (formats_[t] && queued_duration_[t] >= formats_[t]->timescale * kFormatPatienceSeconds) return true;
+  }
+  return false;
+}
+
 bool MovieWriter::fragmentDue() const {
-  if (!std::all_of(formats_.begin(), formats_.end(), [](const auto& f) { return f.has_value(); }))
-    return false;
-  return lead_duration_ * 2 >= formats_.front()->timescale;  // half a second
+  if (!formatsKnown()) return false;
+  // Half a second of the leading track. If that stands still the others must not wait for it.
+  if (queued_duration_.front() * 2 >= formats_.front()->timescale) return true;
+  for (std::size_t t = 1; t < formats_.size(); ++t) {
+    if (queued_duration_[t] >= formats_[t]->timescale) return true;
+  }
+  return false;
+}
+
+void MovieWriter::fail(int error) {
+  {
+    const std::lock_guard lock(mutex_);
+    error_ = error;
+    changed_.notify_all();
+  }
+  on_error_(error);
 }
 
 void MovieWriter::run() {
@@ -68,7 +124,7 @@ MovieWriter::Fragment MovieWriter::takeFragment() {
   fragment.last = ending_;
   fragment.samples.swap(queue_);
   queued_bytes_ = 0;
-  lead_duration_ = 0;
+  queued_duration_.assign(formats_.size(), 0);
   changed_.notify_all();
   return fragment;
 }
@@ -92,23 +148,16 @@ void MovieWriter::writeFragment(const std::vector<EncodedSample>& samples) {
     error = movie_.begin(formats);
   }
   if (error == 0) error = movie_.append(samples);
-  if (error == 0) return;
-  error_ = error;
-  {
-    const std::lock_guard lock(mutex_);
-    changed_.notify_all();
-  }
-  on_error_(error);
+  if (error != 0) fail(error);
 }
 
 /// The formats of all tracks; empty as long as one is missing.
 std::vector<TrackFormat> MovieWriter::knownFormats() {
   std::vector<TrackFormat> formats;
   const std::lock_guard lock(mutex_);
-  for (const auto& format : formats_) {
-    if (!format) return {};
-    formats.push_back(*format);
-  }
+  if (!formatsKnown()) return {};
+  for (const auto& format : formats_) formats.push_back(*format);
+  formats_used_ = true;
   return formats;
 }
 

@@ -37,6 +37,13 @@ class Folder {
 class Reports : public CaptureControllerDelegate {
  public:
   enum class Kind { none, complete, cancel };
+  enum class Sound { there, lost, back };
+  void lmrCaptureSoundLost(const CaptureError& /*error*/) override { setSound(Sound::lost); }
+  void lmrCaptureSoundBack() override { setSound(Sound::back); }
+  bool waitForSound(Sound wanted, std::chrono::seconds limit = std::chrono::seconds(30)) {
+    std::unique_lock lock(mutex_);
+    return changed_.wait_for(lock, limit, [&] { return sound_ == wanted; });
+  }
   void lmrCaptureDidComplete(const std::optional<CaptureError>& error) override {
     set(Kind::complete, error);
   }
@@ -63,8 +70,14 @@ class Reports : public CaptureControllerDelegate {
     ++count_;
     changed_.notify_all();
   }
+  void setSound(Sound sound) {
+    const std::lock_guard lock(mutex_);
+    sound_ = sound;
+    changed_.notify_all();
+  }
   std::mutex mutex_;
   std::condition_variable changed_;
+  Sound sound_ = Sound::there;
   Kind kind_ = Kind::none;
   std::optional<CaptureError> error_;
   int count_ = 0;
@@ -90,13 +103,13 @@ struct Capture {
   bool prepare() { return controller->prepareRecording(settings, nullptr); }
   /// Wall-clock time of running time 0, once prepared.
   [[nodiscard]] double zero() const {
-    return std::dynamic_pointer_cast<CapturePipeline>(controller->session())->wallOffset();
+    return std::dynamic_pointer_cast<Source>(controller->session())->clock().wallOffset();
   }
 
   LMRRecordingContext settings;
   std::shared_ptr<Reports> reports = std::make_shared<Reports>();
   std::shared_ptr<CaptureController> controller =
-      std::make_shared<CaptureController>([] { return std::optional<std::string>(); });
+      std::make_shared<CaptureController>();
 };
 
 inline SharedDictionary parametersFor(const std::string& uuid) {

@@ -10,6 +10,8 @@
 namespace {
 
 std::atomic<int> to_fail{0};
+std::atomic<bool> held{false};
+std::atomic<int> waiting{0};
 
 }  // namespace
 
@@ -17,9 +19,21 @@ namespace lmx::testing {
 
 void failNextSyncs(int count) { to_fail = count; }
 
+HeldSyncs::HeldSyncs() { held = true; }
+
+HeldSyncs::~HeldSyncs() {
+  held = false;
+  held.notify_all();
+}
+
+bool HeldSyncs::anyHeld() { return waiting > 0; }
+
 }  // namespace lmx::testing
 
 extern "C" int fdatasync(int fd) {
+  ++waiting;
+  held.wait(true);
+  --waiting;
   for (int left = to_fail; left > 0;) {
     if (!to_fail.compare_exchange_weak(left, left - 1)) continue;
     errno = EIO;

@@ -3,6 +3,9 @@
 
 #include <gtest/gtest.h>
 
+#include <chrono>
+#include <thread>
+
 #include "tests/unit/capture/capture_harness.h"
 
 namespace lmx {
@@ -33,20 +36,36 @@ TEST(PreviewController, ACameraThatIsNotThereIsRefused) {
   EXPECT_EQ(error.code, kDeviceNotFound);
 }
 
-TEST(PreviewController, SharesItsDevicesWithARecording) {
+TEST(PreviewController, SharesItsCameraWithARecordingOfOtherSettings) {
   PreviewController preview(nullptr);
   CaptureError error;
   ASSERT_TRUE(preview.attachIOWithDevice(kCamera, &error));
-  preview.addAudioDeviceWithID("test://audio");
   preview.startPreview();
   const Folder folder;
   Capture capture(folder, kCamera, "test://audio");
+  capture.settings.maximumFrameRate = 15;
   ASSERT_TRUE(capture.prepare());
   EXPECT_EQ(capture.controller->session().get(), preview.session().get());
   capture.controller->cancelRecording();
   ASSERT_EQ(capture.reports->wait(), testing::Reports::Kind::cancel);
   EXPECT_EQ(capture.controller->session(), nullptr);
   EXPECT_TRUE(preview.session()->isRunning()) << "the preview still needs them";
+}
+
+TEST(PreviewController, ACameraThatWasLostIsOpenedAnewByTheNextRecording) {
+  PreviewController preview(nullptr);
+  CaptureError error;
+  const std::string camera = "test://video?size=320x180&lost-after=0.3";
+  ASSERT_TRUE(preview.attachIOWithDevice(camera, &error));
+  preview.startPreview();
+  const auto lost = std::dynamic_pointer_cast<Source>(preview.session());
+  while (preview.isPreviewRunning()) std::this_thread::sleep_for(std::chrono::milliseconds(10));
+  const Folder folder;
+  Capture capture(folder, camera, "test://audio");
+  ASSERT_TRUE(capture.prepare());
+  EXPECT_NE(capture.controller->session(), lost);
+  capture.controller->cancelRecording();
+  ASSERT_EQ(capture.reports->wait(), testing::Reports::Kind::cancel);
 }
 
 }  // namespace

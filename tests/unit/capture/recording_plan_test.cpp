@@ -6,8 +6,6 @@
 namespace lmx {
 namespace {
 
-std::optional<std::string> noMicrophone() { return std::nullopt; }
-
 LMRRecordingContext settings(bool video, bool audio) {
   LMRRecordingContext settings;
   settings.videoEnabled = video;
@@ -16,23 +14,18 @@ LMRRecordingContext settings(bool video, bool audio) {
   return settings;
 }
 
-TEST(RecordingPlan, TakesTheDefaultMicrophoneWhereNoneIsNamed) {
-  const auto plan =
-      planRecording(settings(true, true), [] { return std::optional<std::string>("alsa:first"); });
+TEST(RecordingPlan, TakesAnyMicrophoneWhereNoneIsNamed) {
+  const auto plan = planRecording(settings(true, true));
   ASSERT_TRUE(plan);
-  EXPECT_EQ(plan->source.videoDevice, "test://video");
-  EXPECT_EQ(plan->source.audioDevice, "alsa:first");
+  EXPECT_EQ(plan->camera, "test://video");
+  EXPECT_EQ(plan->microphone, kAnyMicrophone);
   EXPECT_TRUE(plan->encoding.video && plan->encoding.audio);
 }
 
-TEST(RecordingPlan, AMissingDeviceIsNamed) {
-  const auto noSound = planRecording(settings(true, true), noMicrophone);
-  ASSERT_FALSE(noSound);
-  EXPECT_EQ(noSound.error().code, kDeviceNotFound);
-  EXPECT_EQ(noSound.error().message, "no microphone is there");
+TEST(RecordingPlan, AMissingCameraIsNamed) {
   auto withoutCamera = settings(true, false);
   withoutCamera.videoDeviceID.reset();
-  EXPECT_EQ(planRecording(withoutCamera, noMicrophone).error().message, "no camera is there");
+  EXPECT_EQ(planRecording(withoutCamera).error().message, "no camera is there");
 }
 
 TEST(RecordingPlan, RateQualityAndLengthComeFromTheSettings) {
@@ -40,12 +33,12 @@ TEST(RecordingPlan, RateQualityAndLengthComeFromTheSettings) {
   wanted.maximumFrameRate = 25;
   wanted.maxDurationMinutes = 90;
   wanted.videoCompressionOptions = LMRCompressionOptions{.quality = RecordingQuality::best};
-  const auto plan = planRecording(wanted, noMicrophone);
+  const auto plan = planRecording(wanted);
   ASSERT_TRUE(plan);
   EXPECT_EQ(plan->encoding.video->frameRate, (FrameRate{25, 1}));
   EXPECT_EQ(plan->encoding.video->quality, RecordingQuality::best);
   EXPECT_EQ(plan->maxDuration, std::chrono::minutes(90));
-  EXPECT_FALSE(plan->source.audioDevice);
+  EXPECT_FALSE(plan->microphone);
 }
 
 TEST(RecordingPlan, TypesAreNumberedAsEverywhere) {
@@ -57,7 +50,40 @@ TEST(RecordingPlan, TypesAreNumberedAsEverywhere) {
       {CaptureType::file, kRecordingTypeFile}};
   for (const auto& [type, code] : types) {
     wanted.captureType = type;
-    EXPECT_EQ(planRecording(wanted, noMicrophone)->type, code);
+    EXPECT_EQ(planRecording(wanted)->type, code);
+  }
+}
+
+TEST(RecordingPlan, WhatCanBeNoMicrophoneIsRefused) {
+  auto wanted = settings(true, true);
+  wanted.audioDeviceID = "banana";
+  const auto plan = planRecording(wanted);
+  ASSERT_FALSE(plan);
+  EXPECT_EQ(plan.error().code, kDeviceNotFound);
+  EXPECT_NE(plan.error().message.find("\"banana\" is no microphone identifier"), std::string::npos);
+}
+
+struct Rates {
+  std::optional<FrameRate> camera;
+  double wanted;
+  FrameRate movie;
+};
+
+TEST(RecordingPlan, TheMovieTicksLikeTheCameraWhereThatIsNotTooFast) {
+  const Rates table[] = {
+      {FrameRate{25, 1}, 30, {25, 1}},          {FrameRate{30000, 1001}, 30, {30000, 1001}},
+      {FrameRate{15, 1}, 30, {15, 1}},          {FrameRate{60, 1}, 30, {30, 1}},
+      {FrameRate{50, 1}, 25, {25, 1}},          {std::nullopt, 30, {30, 1}},
+      {FrameRate{1, 10}, 30, {30, 1}},          {FrameRate{90000, 1}, 30, {30, 1}},
+      {FrameRate{30, 1}, 29.97, {30000, 1001}}, {FrameRate{5, 1}, 30, {5, 1}},
+  };
+  for (const Rates& row : table) {
+    auto wanted = settings(true, false);
+    wanted.maximumFrameRate = row.wanted;
+    const MovieEncoding encoding = completeEncoding(*planRecording(wanted), {{640, 360}, row.camera});
+    EXPECT_EQ(encoding.video->frameRate, row.movie)
+        << (row.camera ? row.camera->numerator : 0) << " wanted " << row.wanted;
+    EXPECT_EQ(encoding.video->size.width, 640);
   }
 }
 

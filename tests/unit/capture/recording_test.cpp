@@ -367,8 +367,11 @@ TEST_P(LostDevice, EndsTheRecordingWithWhatThereIs) {
   EXPECT_EQ(capture.reports->error()->code, GetParam().code);
   EXPECT_TRUE(capture.controller->hasShutDown());
   ASSERT_FALSE(capture.controller->processRequestWithUUID("R", folder.file("R.mov")));
-  const auto movie = decodeMovie(folder.file("R.mov"));
+  const auto movie = decodeMovie(folder.file("R.mov"), capture.settings.videoEnabled
+                                                           ? testing::Streams::both
+                                                           : testing::Streams::sound);
   EXPECT_EQ(movie.problem, "");
+  if (!capture.settings.videoEnabled) return;
   EXPECT_GE(movie.frameNumbers.size(), 27U);
   EXPECT_EQ(numberRuns(movie.frameNumbers).size(), 1U);
 }
@@ -379,7 +382,72 @@ INSTANTIATE_TEST_SUITE_P(
                       Fault{"test://video?size=320x180&eos-after=1", "test://audio?eos-after=1",
                             kStreamEnded},
                       Fault{"test://video?size=320x180&silent-after=1", "test://audio", kDeviceSilent},
-                      Fault{"test://video?size=320x180", "test://audio?silent-after=1", kAudioSilent}));
+                      Fault{"", "test://audio?silent-after=1", kAudioSilent}));
+
+TEST(LostMicrophone, ThePictureGoesOnWithSilenceUntilItIsBack) {
+  const Folder folder;
+  Capture capture(folder, "test://video?size=160x90", "test://audio?lost-after=1.2");
+  ASSERT_TRUE(capture.prepare());
+  capture.controller->setStartWithUUID("R", secondsSinceReferenceDate(), parametersFor("R"));
+  capture.controller->startRecording();
+  ASSERT_TRUE(capture.reports->waitForSound(testing::Reports::Sound::lost));
+  ASSERT_TRUE(capture.reports->waitForSound(testing::Reports::Sound::back));
+  const auto back = capture.controller->elapsedTimeInMilliseconds();
+  while (capture.controller->elapsedTimeInMilliseconds() < back + 1100) std::this_thread::sleep_for(10ms);
+  capture.controller->stopRecording();
+  ASSERT_EQ(capture.reports->wait(), Kind::complete);
+  EXPECT_FALSE(capture.reports->error());
+  ASSERT_FALSE(capture.controller->processRequestWithUUID("R", folder.file("R.mov")));
+  const auto movie = decodeMovie(folder.file("R.mov"));
+  EXPECT_EQ(movie.problem, "");
+  EXPECT_EQ(numberRuns(movie.frameNumbers).size(), 1U) << "no picture is lost";
+  EXPECT_NEAR(static_cast<double>(movie.sound.size()) / movie.sampleRate,
+              static_cast<double>(movie.frameNumbers.size()) / 30, 0.05);
+  const auto ticks = testing::tickTimes(movie);
+  ASSERT_GE(ticks.size(), 2U) << "before and after";
+  for (const double tick : ticks) {
+    const auto frame = static_cast<std::size_t>(std::lround((tick + kTickLead) * 30));
+    ASSERT_LT(frame, movie.frameNumbers.size() + 1);
+    if (frame == movie.frameNumbers.size()) continue;
+    EXPECT_EQ(movie.frameNumbers[frame] % 30, 0U) << tick;
+  }
+  EXPECT_GT(*std::max_element(ticks.begin(), ticks.end()) - *std::min_element(ticks.begin(), ticks.end()), 2.5);
+}
+
+TEST(LostMicrophone, OneThatIsNotThereLeavesSilence) {
+  const Folder folder;
+  Capture capture(folder, "test://video?size=160x90", "alsa:no-such-card");
+  ASSERT_TRUE(capture.prepare());
+  ASSERT_TRUE(capture.reports->waitForSound(testing::Reports::Sound::lost));
+  capture.controller->setStartWithUUID("R", secondsSinceReferenceDate(), parametersFor("R"));
+  capture.controller->startRecording();
+  while (capture.controller->elapsedTimeInMilliseconds() < 2500) std::this_thread::sleep_for(10ms);
+  const auto before = std::chrono::steady_clock::now();
+  capture.controller->stopRecording();
+  ASSERT_EQ(capture.reports->wait(), Kind::complete);
+  EXPECT_LT(std::chrono::steady_clock::now() - before, 900ms) << "nobody waits for it";
+  ASSERT_FALSE(capture.controller->processRequestWithUUID("R", folder.file("R.mov")));
+  const auto movie = decodeMovie(folder.file("R.mov"));
+  EXPECT_EQ(movie.problem, "");
+  EXPECT_GE(movie.frameNumbers.size(), 70U);
+  EXPECT_NEAR(static_cast<double>(movie.sound.size()) / movie.sampleRate,
+              static_cast<double>(movie.frameNumbers.size()) / 30, 0.05);
+  EXPECT_EQ(std::count_if(movie.sound.begin(), movie.sound.end(), [](float s) { return s != 0; }), 0);
+}
+
+TEST(LostMicrophone, WhereThereIsOnlySoundOneThatIsNotThereIsWaitedFor) {
+  const Folder folder;
+  Capture capture(folder, "", "alsa:no-such-card");
+  ASSERT_TRUE(capture.prepare());
+  capture.controller->setStartWithUUID("R", secondsSinceReferenceDate(), parametersFor("R"));
+  capture.controller->startRecording();
+  while (capture.controller->elapsedTimeInMilliseconds() < 1500) std::this_thread::sleep_for(10ms);
+  capture.controller->stopRecording();
+  ASSERT_EQ(capture.reports->wait(), Kind::complete);
+  ASSERT_FALSE(capture.controller->processRequestWithUUID("R", folder.file("R.mov")));
+  const auto movie = decodeMovie(folder.file("R.mov"), testing::Streams::sound);
+  EXPECT_NEAR(static_cast<double>(movie.sound.size()) / movie.sampleRate, 2.5, 0.9);
+}
 
 TEST(Preparing, AMissingDeviceIsNamed) {
   const Folder folder;

@@ -247,7 +247,7 @@ TEST_F(CommandLineTest, DaemonPreferencesAreDumped) {
 }
 
 TEST_F(CommandLineTest, UnusablePreferencesAreASoftwareError) {
-  framework_->audio_device_usable = false;
+  framework_->microphone_well_formed = false;
   EXPECT_EQ(parse({"-i", "daemon-prefs"}).exit_code, 70);
   EXPECT_TRUE(log_.contains(
       2, "Exception caught: Unknown device ID: microphone for preference: RecordingAudioInput"));

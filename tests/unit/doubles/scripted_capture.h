@@ -37,6 +37,7 @@ class ScriptedCaptureController : public LMRCaptureController {
   explicit ScriptedCaptureController(Journal& journal) : journal_(journal) {}
 
   bool prepare_succeeds = true;
+  bool microphone_there = true;
   bool start_succeeds = true;
   std::atomic<int> state{0};
   std::atomic<bool> shut_down{false};
@@ -70,6 +71,8 @@ class ScriptedCaptureController : public LMRCaptureController {
   }
   bool prepareRecording(const LMRRecordingContext& settings, std::shared_ptr<CaptureSession>) override {
     journal_.add("prepareRecording");
+    if (const auto reports = delegate(); reports && !microphone_there)
+      reports->lmrCaptureSoundLost({CaptureError::kDomain, kDeviceNotFound, "no microphone"});
     const std::lock_guard lock(mutex_);
     settings_ = settings;
     return prepare_succeeds;

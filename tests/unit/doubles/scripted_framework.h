@@ -17,7 +17,8 @@ class ScriptedFramework : public CaptureFramework {
  public:
   explicit ScriptedFramework(Journal& journal) : journal_(journal) {}
 
-  bool audio_device_usable = true;
+  bool microphone_well_formed = true;
+  bool microphone_there = true;
   bool cameras_attach = true;
   /// Prepares a new controller before the engine gets it.
   std::function<void(ScriptedCaptureController&)> on_new_controller;
@@ -68,7 +69,8 @@ class ScriptedFramework : public CaptureFramework {
   std::optional<std::string> defaultMuxedDevice() override { return std::nullopt; }
   bool hasDevice(const std::string& uniqueID) override { return uniqueID == "camera"; }
   PreferredAudio preferredAudioDevice(const std::string&) override { return {"microphone", false}; }
-  bool audioDeviceUsable(const std::optional<std::string>&) override { return audio_device_usable; }
+  bool canBeMicrophone(const std::string&) override { return microphone_well_formed; }
+  bool hasMicrophone(const std::optional<std::string>&) override { return microphone_there; }
   std::optional<LMRCompressionOptions> compressionOptions(MediaType media,
                                                           RecordingQuality quality) override {
     return LMRCompressionOptions{.media = media, .quality = quality};

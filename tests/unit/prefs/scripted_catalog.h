@@ -16,7 +16,7 @@ class ScriptedCatalog : public CaptureCatalog {
   std::optional<std::string> muxed;
   std::set<std::string> devices{"camera"};
   std::map<std::string, std::string> microphone_of{{"camera", "microphone"}};
-  std::set<std::optional<std::string>> usable{"microphone", std::nullopt};
+  std::set<std::string> malformed;  ///< what can't be a microphone's identifier
   std::set<MediaType> compressible{MediaType::audio, MediaType::video};
 
   std::optional<std::string> defaultVideoDevice() override { return camera; }
@@ -27,9 +27,8 @@ class ScriptedCatalog : public CaptureCatalog {
     if (found == microphone_of.end()) return {};
     return {found->second, found->second == videoDevice};
   }
-  bool audioDeviceUsable(const std::optional<std::string>& audioDevice) override {
-    return usable.contains(audioDevice);
-  }
+  bool canBeMicrophone(const std::string& audioDevice) override { return !malformed.contains(audioDevice); }
+  bool hasMicrophone(const std::optional<std::string>&) override { return true; }
   std::optional<LMRCompressionOptions> compressionOptions(MediaType media,
                                                           RecordingQuality quality) override {
     if (!compressible.contains(media)) return std::nullopt;

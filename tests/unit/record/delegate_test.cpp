@@ -59,6 +59,40 @@ TEST_F(Delegate, AReportWithoutErrorKeepsTheEarlierError) {
   EXPECT_TRUE(delegate_.deviceDisconnected());
 }
 
+TEST_F(Delegate, AMissingMicrophoneIsTheLastErrorUntilItIsBack) {
+  delegate_.lmrCaptureSoundLost(CaptureError{CaptureError::kDomain, kDeviceRemoved, "gone"});
+  EXPECT_EQ(session_->error.get(), kRecordNoInput);
+  EXPECT_FALSE(delegate_.deviceDisconnected()) << "the recording goes on";
+  delegate_.lmrCaptureSoundBack();
+  EXPECT_EQ(session_->error.get(), kRecordSuccess);
+  EXPECT_EQ(journal_.entries(), Entries{});
+}
+
+TEST_F(Delegate, AnotherErrorOutlastsTheReturnOfTheMicrophone) {
+  delegate_.lmrCaptureSoundLost(CaptureError{CaptureError::kDomain, kAudioSilent, "silent"});
+  session_->error.set(kRecordCannotWrite);
+  delegate_.lmrCaptureSoundBack();
+  EXPECT_EQ(session_->error.get(), kRecordCannotWrite);
+}
+
+TEST_F(Delegate, TheMicrophoneOfAnEarlierCaptureIsNoErrorOfTheNext) {
+  session_->captureController.set(std::make_shared<ScriptedCaptureController>(journal_));
+  delegate_.lmrCaptureSoundLost(CaptureError{CaptureError::kDomain, kDeviceRemoved, "gone"});
+  EXPECT_EQ(session_->error.get(), kRecordSuccess);
+  session_->error.set(kRecordNoInput);
+  delegate_.lmrCaptureSoundBack();
+  EXPECT_EQ(session_->error.get(), kRecordNoInput);
+}
+
+TEST_F(EngineTest, AMicrophoneThatIsMissingAtTheStartIsTheLastErrorOfAGrantedStart) {
+  framework_->on_new_controller = [](auto& controller) { controller.microphone_there = false; };
+  ASSERT_EQ(prepare(), 0);
+  EXPECT_EQ(session_->error.get(), kRecordNoInput);
+  EXPECT_EQ(session_->status.get(), kRecorderRecording);
+  session_->captureControllerDelegate.get()->lmrCaptureSoundBack();
+  EXPECT_EQ(session_->error.get(), kRecordSuccess);
+}
+
 TEST_F(Delegate, TypeOfASessionThatHasMovedOnIsKept) {
   session_->captureController.set(std::make_shared<ScriptedCaptureController>(journal_));
   delegate_.lmrCaptureDidComplete(std::nullopt);

@@ -88,6 +88,31 @@ TEST_F(Prepare, DurationOfTheContextIsTheLongestRecording) {
   EXPECT_EQ(framework_->controller(0)->settings()->maxDurationMinutes, 77U);
 }
 
+TEST_F(Prepare, AStartMayAskForMoreThanTheUsualLength) {
+  const std::pair<const char*, std::uint32_t> rows[] = {
+      {"600", 600}, {"240.1", 241}, {"50", 240}, {"0", 240}, {"", 240}};
+  for (const auto& [minutes, limit] : rows) {
+    ASSERT_EQ(prepare({{"RecordingMetadata_MAX_RECORDING_MINUTES", minutes}}), 0);
+    EXPECT_EQ(framework_->controller(framework_->controllersMade() - 1)->settings()->maxDurationMinutes,
+              limit)
+        << minutes;
+    endCaptures();
+    session_->status.set(kRecorderIdle);
+  }
+  ASSERT_EQ(prepare(), 0);
+  EXPECT_EQ(framework_->controller(framework_->controllersMade() - 1)->settings()->maxDurationMinutes, 240U);
+}
+
+TEST_F(Prepare, AnAdHocRecordingEndsWhenItsOperatorSaid) {
+  // Its preferences come from the user's file, which does not exist here, and from the defaults.
+  testing::writePreferences(testing::capturePreferences(repository_.path()));
+  context_->options.adhoc.set(true);
+  context_->options.adhoc_output_file.set(movie("out.mov"));
+  context_->options.duration.set(77);
+  ASSERT_EQ(prepare({{"RecordingMetadata_MAX_RECORDING_MINUTES", "600"}}), 0);
+  EXPECT_EQ(framework_->controller(0)->settings()->maxDurationMinutes, 77U);
+}
+
 TEST_F(Prepare, ADurationBelowOneMeansNoLimit) {
   for (const int duration : {0, -5}) {
     context_->options.duration.set(duration);
@@ -105,7 +130,7 @@ TEST_F(Prepare, ASegmentLengthOverridesTheDuration) {
       PlistDictionary{{"Enabled", false}, {"RecordingSegmentLength", std::int64_t{0x100000005}}};
   testing::writePreferences(preferences);
   context_->options.duration.set(77);
-  ASSERT_EQ(prepare(), 0);
+  ASSERT_EQ(prepare({{"RecordingMetadata_MAX_RECORDING_MINUTES", "600"}}), 0);
   EXPECT_EQ(framework_->controller(0)->settings()->maxDurationMinutes, 5U);
 }
 
@@ -184,7 +209,7 @@ TEST_F(Prepare, ARefusingFrameworkReturnsThree) {
 }
 
 TEST_F(Prepare, UnusablePreferencesReturnThree) {
-  framework_->audio_device_usable = false;
+  framework_->microphone_well_formed = false;
   EXPECT_EQ(prepare(), 3);
   EXPECT_TRUE(log_.contains(kLogCritical,
                             "Unable to load the recording context, exception = Unknown device ID: microphone "
@@ -250,12 +275,12 @@ TEST_F(Prepare, ARefusedRequestForSoundChangesNoType) {
 }
 
 TEST_F(Prepare, LogLinesOfThePrepareStepByResult) {
-  EXPECT_EQ(LXAgentRecordPrepareCaptureController(*context_), 0);
+  EXPECT_EQ(LXAgentRecordPrepareCaptureController(*context_, nullptr), 0);
   framework_->on_new_controller = [](auto& controller) {
     controller.prepare_succeeds = false;
     controller.error = CaptureError{CaptureError::kDomain, kDeviceBusy, "camera is busy"};
   };
-  EXPECT_EQ(LXAgentRecordPrepareCaptureController(*context_), 3);
+  EXPECT_EQ(LXAgentRecordPrepareCaptureController(*context_, nullptr), 3);
   EXPECT_TRUE(log_.contains(kLogError, "The capture could not be prepared: camera is busy"));
 }
 

@@ -38,6 +38,30 @@ TEST(HardStop, MinutesBecomeSeconds) {
   }
 }
 
+struct LengthCase {
+  std::int32_t usual;
+  const char* asked;
+  std::uint32_t minutes;
+};
+
+TEST(GreatestLength, IsTheLongerOfTheUsualAndTheAsked) {
+  for (const LengthCase& c : {LengthCase{240, "", 240},
+                              {240, "50", 240},
+                              {240, "240", 240},
+                              {240, "240.01", 241},
+                              {240, "600", 600},
+                              {240, "600.5", 601},
+                              {240, "0", 240},
+                              {240, "-600", 240},
+                              {240, "all day", 240},
+                              {240, "1e300", 35791395},
+                              {1, "0.5", 1},
+                              {0, "600", 0},
+                              {-5, "600", 0}}) {
+    EXPECT_EQ(greatestLengthInMinutes(c.usual, c.asked), c.minutes) << c.usual << " " << c.asked;
+  }
+}
+
 class StopTimesOfStart : public ::testing::Test {
  protected:
   void configure(const char* key, const char* value) { configureStopTimes({{key, value}}, stop_times_); }

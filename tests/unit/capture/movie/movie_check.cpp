@@ -102,6 +102,9 @@ DecodedMovie decodeMovie(const std::string& path, Streams streams) {
     const bool soundEnded = drain(audio.get(), [&](GstSample* sample) { takeSound(sample, movie); });
     ended = pictureEnded && soundEnded;
   }
+  gint64 duration = 0;
+  gst_element_query_duration(pipeline.get(), GST_FORMAT_TIME, &duration);
+  movie.duration = static_cast<double>(duration) / 1e9;
   gst_element_set_state(pipeline.get(), GST_STATE_NULL);
   return movie;
 }

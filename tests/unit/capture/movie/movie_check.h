@@ -9,6 +9,7 @@ namespace lmx::testing {
 struct DecodedMovie {
   std::vector<std::uint32_t> frameNumbers;  ///< the synthetic camera's, in order of presentation
   std::vector<double> frameTimes;           ///< seconds
+  double duration = 0;                      ///< seconds, as the demuxer says
   int width = 0;
   int height = 0;
   int sampleRate = 0;

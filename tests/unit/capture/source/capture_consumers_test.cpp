@@ -3,55 +3,78 @@
 
 #include <gtest/gtest.h>
 
-#include "tests/unit/doubles/log_capture.h"
-
 namespace lmx {
 namespace {
 
 class Consumer : public CaptureConsumer {
  public:
-  void onVideo(BufferHandle, double runningTime) override { video.push_back(runningTime); }
-  void onAudio(BufferHandle, double runningTime) override { audio.push_back(runningTime); }
-  void onCaptureError(const CaptureError& error) override { errors.push_back(error.code); }
-  std::vector<double> video;
-  std::vector<double> audio;
-  std::vector<int> errors;
+  void onPicture(SampleHandle, double time) override { pictures.push_back(time); }
+  void onSound(BufferHandle, double time) override { sounds.push_back(time); }
+  void onSourceLost(SourceUse, const CaptureError& error) override { lost.push_back(error.code); }
+  void onSourceAway(SourceUse, const CaptureError& error) override { away.push_back(error.code); }
+  void onSourceBack(SourceUse, double seconds) override { back.push_back(seconds); }
+  std::vector<double> pictures;
+  std::vector<double> sounds;
+  std::vector<int> lost;
+  std::vector<int> away;
+  std::vector<double> back;
 };
+
+constexpr SourceUse kBoth{.picture = true, .sound = true};
 
 CaptureError error(int code) { return {CaptureError::kDomain, code, "gone"}; }
 
-TEST(CaptureConsumers, GetWhatComesUntilTheyAreRemoved) {
+TEST(CaptureConsumers, GetWhatTheyUseUntilTheyAreRemoved) {
   ensureGStreamer();
   const BufferHandle buffer(gst_buffer_new());
+  const SampleHandle sample(gst_sample_new(buffer.get(), nullptr, nullptr, nullptr));
   CaptureConsumers consumers;
-  const auto consumer = std::make_shared<Consumer>();
-  consumers.add(consumer);
-  consumers.deliver(CaptureConsumers::Medium::video, buffer.get(), 1);
-  consumers.deliver(CaptureConsumers::Medium::audio, buffer.get(), 2);
-  consumers.remove(consumer.get());
-  consumers.deliver(CaptureConsumers::Medium::video, buffer.get(), 3);
-  EXPECT_EQ(consumer->video, std::vector<double>{1});
-  EXPECT_EQ(consumer->audio, std::vector<double>{2});
+  const auto both = std::make_shared<Consumer>();
+  const auto listener = std::make_shared<Consumer>();
+  consumers.add(both, kBoth);
+  consumers.add(listener, {.picture = false, .sound = true});
+  consumers.deliverPicture(sample.get(), 1);
+  consumers.deliverSound(buffer.get(), 2);
+  consumers.remove(both.get());
+  consumers.deliverPicture(sample.get(), 3);
+  EXPECT_EQ(both->pictures, std::vector<double>{1});
+  EXPECT_EQ(both->sounds, std::vector<double>{2});
+  EXPECT_TRUE(listener->pictures.empty());
+  EXPECT_EQ(listener->sounds, std::vector<double>{2});
 }
 
-TEST(CaptureConsumers, OnlyTheFirstErrorIsTold) {
-  const testing::LogCapture log;
+TEST(CaptureConsumers, OnlyTheFirstLossIsTold) {
   CaptureConsumers consumers;
   const auto consumer = std::make_shared<Consumer>();
-  consumers.add(consumer);
-  consumers.fail(error(kDeviceFailed));
-  consumers.fail(error(kStreamEnded));
-  EXPECT_EQ(consumer->errors, std::vector<int>{kDeviceFailed});
+  consumers.add(consumer, kBoth);
+  consumers.lost(error(kDeviceFailed));
+  consumers.lost(error(kStreamEnded));
+  EXPECT_EQ(consumer->lost, std::vector<int>{kDeviceFailed});
   EXPECT_EQ(consumers.failure()->code, kDeviceFailed);
 }
 
-TEST(CaptureConsumers, WhoComesAfterTheErrorIsToldToo) {
-  const testing::LogCapture log;
+TEST(CaptureConsumers, WhoComesAfterTheLossIsToldToo) {
   CaptureConsumers consumers;
-  consumers.fail(error(kDeviceFailed));
+  consumers.lost(error(kDeviceFailed));
   const auto late = std::make_shared<Consumer>();
-  consumers.add(late);
-  EXPECT_EQ(late->errors, std::vector<int>{kDeviceFailed});
+  consumers.add(late, kBoth);
+  EXPECT_EQ(late->lost, std::vector<int>{kDeviceFailed});
+}
+
+TEST(CaptureConsumers, AbsenceAndReturnAlternate) {
+  CaptureConsumers consumers;
+  const auto consumer = std::make_shared<Consumer>();
+  consumers.add(consumer, kBoth);
+  consumers.back(1);  // it was not away
+  consumers.away(error(kAudioSilent));
+  consumers.away(error(kAudioSilent));
+  const auto late = std::make_shared<Consumer>();
+  consumers.add(late, kBoth);
+  consumers.back(3);
+  EXPECT_EQ(consumer->away, std::vector<int>{kAudioSilent});
+  EXPECT_EQ(consumer->back, std::vector<double>{3});
+  EXPECT_EQ(late->away, std::vector<int>{kAudioSilent}) << "who comes meanwhile is told";
+  EXPECT_EQ(late->back, std::vector<double>{3});
 }
 
 }  // namespace

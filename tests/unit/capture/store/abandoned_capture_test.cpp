@@ -49,6 +49,28 @@ TEST(Recovery, MakesAMovieNamedForTheRecording) {
   EXPECT_EQ(readMovieIndex(repository.file("LECTURE.mov"))->tracks[0].sizes.size(), 60U);
 }
 
+/// A camera that gave every third frame: what counts is how long they are shown.
+TEST(Recovery, CountsTheTimeThatFramesAreShown) {
+  for (const bool damaged : {false, true}) {
+    const Folder repository;
+    const auto folder =
+        crashedCapture(repository, kJournal + std::string(damaged ? "run x\n" : "stop R 2\n"), 0);
+    GrowingMovie movie;
+    std::filesystem::remove(folder + "/media.mov");
+    ASSERT_EQ(movie.create(folder + "/media.mov"), 0);
+    ASSERT_EQ(movie.begin({testing::sampleFormats().front()}), 0);
+    for (int i = 0; i < 30; ++i) {
+      ASSERT_EQ(movie.append({{.data = Bytes(20), .duration = i == 0 ? 1000U : 3000U, .sync = i % 10 == 0}}),
+                0);
+    }
+    const auto capture = openAbandonedCapture(folder);
+    ASSERT_TRUE(capture);
+    const auto recovered = capture->recoverPending(repository.path());
+    ASSERT_EQ(recovered.size(), 1U);
+    EXPECT_NEAR(recovered[0].duration, damaged ? 88.0 / 30 : 60.0 / 30, 1e-6);
+  }
+}
+
 TEST(Recovery, TellsWhatHadBeenStopped) {
   for (const auto& [lines, submit] : std::vector<std::pair<std::string, bool>>{
            {"", false},

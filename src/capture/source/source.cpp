@@ -1,0 +1,310 @@
+// The life of an open device.
+#include "capture/source/source.h"
+
+#include <system_error>
+#include <thread>
+
+#include "capture/gst/picture_converter.h"
+#include "capture/source/device_list.h"
+#include "platform/log.h"
+#include "support/format.h"
+#include "support/redacted.h"
+
+namespace lmx {
+
+using namespace std::chrono_literals;
+
+namespace {
+
+constexpr auto kFirstSampleLimit = 10s;
+constexpr auto kSilenceLimit = 2s;
+constexpr auto kWatchInterval = 500ms;
+constexpr auto kRetryInterval = 3s;
+constexpr auto kNetworkLimit = 10s;  // for its three tries
+
+std::int64_t steadyMilliseconds() {
+  const auto time = std::chrono::steady_clock::now().time_since_epoch();
+  return std::chrono::duration_cast<std::chrono::milliseconds>(time).count();
+}
+
+std::chrono::milliseconds since(std::int64_t steadyMs) {
+  return std::chrono::milliseconds(steadyMilliseconds() - steadyMs);
+}
+
+std::shared_ptr<const HardwareDevice> lookUpHardware(const std::string& uniqueID) {
+  auto found = findHardware(uniqueID);
+  return found ? std::make_shared<const HardwareDevice>(std::move(*found)) : nullptr;
+}
+
+/// Whether the sound's times are made by counting samples, or by a network: they follow another clock then.
+bool hasOwnClock(const DeviceID& device) {
+  return device.kind == DeviceKind::hardware || device.kind == DeviceKind::network;
+}
+
+CameraFormat syntheticFormat(const DeviceID& device, const CameraDemand& demand) {
+  return {pictureSize(device), syntheticRate(device).value_or(frameRateFrom(demand.maximumRate))};
+}
+
+}  // namespace
+
+Source::Source(SourceWish wish)
+    : wish_(std::move(wish)), device_(parseDeviceID(wish_.device)), clock_(!device_.asFastAsPossible()) {}
+
+bool Source::open(const std::shared_ptr<Source>& source) {
+  try {
+    // Detached: a driver that never returns must not hold up whoever gives the source back.
+    std::thread([source] { source->live(); }).detach();
+    return true;
+  } catch (const std::system_error&) {
+    return false;
+  }
+}
+
+// ---- its users
+
+std::string Source::name() const { return redacted(wish_.device); }
+
+void Source::close() {
+  const std::lock_guard lock(mutex_);
+  closing_ = true;
+  if (pipeline_ != nullptr) pipeline_->wake();
+  changed_.notify_all();
+}
+
+bool Source::finished(std::chrono::milliseconds limit) {
+  std::unique_lock lock(mutex_);
+  return changed_.wait_for(lock, limit, [this] { return finished_; });
+}
+
+bool Source::closing() const {
+  const std::lock_guard lock(mutex_);
+  return closing_;
+}
+
+bool Source::isRunning() const {
+  const std::lock_guard lock(mutex_);
+  return phase_ == Phase::running;
+}
+
+std::optional<CaptureError> Source::waitUntilRunning(std::chrono::milliseconds limit) {
+  std::unique_lock lock(mutex_);
+  changed_.wait_for(lock, limit, [this] { return phase_ != Phase::opening; });
+  if (phase_ == Phase::running) return std::nullopt;
+  if (problem_) return problem_;
+  return CaptureError{CaptureError::kDomain, wish_.picture ? kDeviceSilent : kAudioSilent,
+                      name() + (wish_.picture ? ": gave no picture in time" : ": gave no sound in time")};
+}
+
+void Source::start() {
+  const std::lock_guard lock(mutex_);
+  start_wanted_ = true;
+  if (pipeline_ != nullptr && !clock_.realTime()) pipeline_->start();
+}
+
+CameraFormat Source::format() const {
+  const std::lock_guard lock(mutex_);
+  return format_.value_or(CameraFormat{});
+}
+
+std::shared_ptr<const HardwareDevice> Source::hardware() const {
+  const std::lock_guard lock(mutex_);
+  return hardware_;
+}
+
+// ---- its thread
+
+void Source::live() {
+  while (!closing()) {
+    const CaptureError error = openAndWatch();
+    if (closing()) break;
+    if (triesAgain()) {
+      goAway(error);
+      waitBeforeNextTry();
+      continue;
+    }
+    LMPLogMessage(nullptr, kLogError, "Capture device lost: %s (code %d)", error.message.c_str(), error.code);
+    {
+      const std::lock_guard lock(mutex_);
+      problem_ = error;
+    }
+    set(Phase::lost);
+    consumers_.lost(error);
+    std::unique_lock lock(mutex_);
+    changed_.wait(lock, [this] { return closing_; });
+  }
+  const std::lock_guard lock(mutex_);
+  phase_ = Phase::closed;
+  finished_ = true;
+  changed_.notify_all();
+}
+
+void Source::set(Phase phase) {
+  const std::lock_guard lock(mutex_);
+  phase_ = phase;
+  changed_.notify_all();
+}
+
+/// @return why the device delivers no more; meaningless when the source is being closed
+CaptureError Source::openAndWatch() {
+  for (;;) {
+    opened_at_ = Clock::now();
+    delivering_ = false;
+    steady_sound_.reset();
+    if (hasOwnClock(device_)) steady_sound_.emplace(kSoundRate, kSoundChannels);
+    auto opened = openPipeline();
+    if (!opened) return opened.error();
+    const std::unique_ptr<DevicePipeline> pipeline = *std::move(opened);
+    {
+      const std::lock_guard lock(mutex_);
+      pipeline_ = pipeline.get();
+      hardware_ = found_;
+      if (start_wanted_ && !clock_.realTime()) pipeline_->start();
+    }
+    std::optional<CaptureError> problem;
+    while (!problem && !closing()) problem = watch(*pipeline);
+    {
+      const std::lock_guard lock(mutex_);
+      pipeline_ = nullptr;
+      hardware_ = nullptr;
+    }
+    const bool again = problem && problem->code == kStreamEnded && device_.kind == DeviceKind::file && pacer_.played();
+    if (!again) return problem.value_or(CaptureError{});
+    pacer_.nextRound();
+  }
+}
+
+Result<std::unique_ptr<DevicePipeline>, CaptureError> Source::openPipeline() {
+  DevicePipeline::Wish wish{
+      .device = device_, .picture = wish_.picture, .demand = wish_.demand,   .hardware = nullptr};
+  if (!findHardwareFor(wish)) {
+    return CaptureError{CaptureError::kDomain, kDeviceNotFound,
+                        name() + (wish_.picture ? ": the camera is not there" : ": the microphone is not there")};
+  }
+  DeviceOutput output;
+  output.onPicture = [this](GstSample* picture, double time) { takePicture(picture, time); };
+  output.onSound = [this](GstBuffer* sound, double time, double arrival) { takeSound(sound, time, arrival); };
+  auto pipeline = DevicePipeline::open(wish, pacer_, std::move(output));
+  if (!pipeline) return pipeline;
+  if (!(*pipeline)->mode().empty() && !ever_ran_)
+    LMPLogMessage(nullptr, kLogInfo, "%s: %s", name().c_str(), (*pipeline)->mode().c_str());
+  if (clock_.realTime()) return pipeline;
+  {
+    const std::lock_guard lock(mutex_);
+    format_ = syntheticFormat(device_, wish_.demand);
+  }
+  set(Phase::running);
+  return pipeline;
+}
+
+/// @return false for hardware that is not there
+bool Source::findHardwareFor(DevicePipeline::Wish& wish) {
+  found_ = nullptr;
+  if (wish_.device == kAnyMicrophone) {
+    const auto devices = listHardware();
+    const HardwareDevice* first = firstDevice(devices, false);
+    if (first == nullptr) return false;
+    wish.device = parseDeviceID(first->uniqueID);
+    found_ = lookUpHardware(first->uniqueID);
+  } else if (device_.kind == DeviceKind::hardware && !device_.alsaName()) {
+    found_ = lookUpHardware(device_.text);
+  } else {
+    return true;
+  }
+  if (!found_) return false;
+  wish.hardware = found_;
+  return true;
+}
+
+std::optional<CaptureError> Source::watch(DevicePipeline& pipeline) {
+  if (auto problem = pipeline.watch(kWatchInterval)) return problem;
+  may_have_sound_ = pipeline.mayHaveSound();
+  return clock_.realTime() ? silence() : std::nullopt;
+}
+
+std::optional<CaptureError> Source::silence() const {
+  const CaptureErrorCode code = wish_.picture ? kDeviceSilent : kAudioSilent;
+  const char* what = wish_.picture ? "picture" : "sound";
+  if (!delivering_) {
+    const std::int64_t away = away_since_ms_;
+    const bool late = Clock::now() - opened_at_ > kFirstSampleLimit ||
+                      (wish_.picture && away != 0 && since(away) > kNetworkLimit);
+    if (!late) return std::nullopt;
+    return CaptureError{CaptureError::kDomain, code, name() + ": gave no " + what + " within 10 s"};
+  }
+  if (device_.kind == DeviceKind::file) return std::nullopt;  // the sound may be longer than the picture
+  if (since(last_sample_ms_) <= kSilenceLimit) return std::nullopt;
+  return CaptureError{CaptureError::kDomain, code, name() + ": no " + what + " for 2 s"};
+}
+
+// ---- away and back
+
+bool Source::triesAgain() const {
+  if (!wish_.picture) return true;
+  if (device_.kind != DeviceKind::network || !ever_ran_) return false;
+  return away_since_ms_ == 0 || since(away_since_ms_) + kRetryInterval < kNetworkLimit;
+}
+
+void Source::goAway(const CaptureError& error) {
+  const bool first = away_since_ms_ == 0;
+  if (first) away_since_ms_ = steadyMilliseconds();
+  {
+    const std::lock_guard lock(mutex_);
+    problem_ = error;
+  }
+  set(Phase::away);
+  if (!first) return;
+  LMPLogMessage(nullptr, kLogError, "The %s is away: %s (code %d); it is tried again every 3 s",
+                wish_.picture ? "camera" : "microphone", error.message.c_str(), error.code);
+  consumers_.away(error);
+}
+
+void Source::waitBeforeNextTry() {
+  const bool firstOfNetwork = wish_.picture && since(away_since_ms_) < 1s;
+  std::unique_lock lock(mutex_);
+  changed_.wait_for(lock, firstOfNetwork ? 500ms : std::chrono::milliseconds(kRetryInterval),
+                    [this] { return closing_; });
+}
+
+// ---- streaming threads
+
+void Source::takePicture(GstSample* picture, double time) {
+  if (wish_.picture) {
+    last_sample_ms_ = steadyMilliseconds();
+    if (!delivering_) {
+      const GstCaps* caps = gst_sample_get_caps(picture);
+      const std::lock_guard lock(mutex_);
+      if (!format_) format_ = CameraFormat{recordedSize(caps, wish_.demand.size), nominalRate(caps)};
+    }
+    firstSample();
+  }
+  consumers_.deliverPicture(picture, time);
+}
+
+void Source::takeSound(GstBuffer* sound, double time, double arrival) {
+  if (!wish_.picture) {
+    last_sample_ms_ = steadyMilliseconds();
+    firstSample();
+  }
+  if (!steady_sound_) {
+    consumers_.deliverSound(sound, time);
+    return;
+  }
+  for (const SteadySound::Chunk& chunk : steady_sound_->feed(BufferHandle(gst_buffer_ref(sound)), arrival))
+    consumers_.deliverSound(chunk.buffer.get(), chunk.time);
+  sound_correction_ = steady_sound_->partsPerMillion();
+}
+
+/// The first one since the device was opened, of what the source is watched by.
+void Source::firstSample() {
+  if (delivering_.exchange(true)) return;
+  ever_ran_ = true;
+  set(Phase::running);
+  const std::int64_t away = away_since_ms_.exchange(0);
+  if (away == 0) return;
+  const double seconds = std::chrono::duration<double>(since(away)).count();
+  LMPLogMessage(nullptr, kLogNotice, "The %s is back after %.1f s: %s", wish_.picture ? "camera" : "microphone",
+                seconds, name().c_str());
+  consumers_.back(seconds);
+}
+
+}  // namespace lmx

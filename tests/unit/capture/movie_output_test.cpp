@@ -1,0 +1,172 @@
+// Raw frames and sound on one side, a movie on the other.
+#include "capture/movie_output.h"
+
+#include <gtest/gtest.h>
+
+#include "capture/movie/movie_copy.h"
+#include "capture/movie/movie_reader.h"
+#include "capture/source/test_picture.h"
+#include "tests/unit/capture/capture_harness.h"
+#include "tests/unit/capture/movie/movie_check.h"
+#include "tests/unit/doubles/wait_until.h"
+
+namespace lmx {
+namespace {
+
+using testing::decodeMovie;
+using testing::Folder;
+using testing::Streams;
+using Numbers = std::vector<std::uint32_t>;
+
+constexpr PictureSize kSize{160, 90};
+constexpr double kFrame = 1.0 / 30.0;
+
+/// A picture with `number` written into it.
+BufferHandle pictureOf(std::uint32_t number) {
+  const auto luma = static_cast<std::size_t>(kSize.width) * static_cast<std::size_t>(kSize.height);
+  BufferHandle buffer(gst_buffer_new_allocate(nullptr, luma * 3 / 2, nullptr));
+  gst_buffer_memset(buffer.get(), 0, 128, luma * 3 / 2);
+  GstMapInfo map;
+  gst_buffer_map(buffer.get(), &map, GST_MAP_WRITE);
+  drawFrameNumber({{map.data, luma}, kSize.width, kSize.height, kSize.width}, number);
+  gst_buffer_unmap(buffer.get(), &map);
+  return buffer;
+}
+
+/// An output into a folder. Frames bear their places as numbers.
+class Output {
+ public:
+  explicit Output(const MovieEncoding& encoding) : encoding_(encoding) {
+    if (encoding_.video) encoding_.video->size = kSize;
+    ensureGStreamer();
+    journal_ = *Journal::create(folder_.file("journal"));
+    GrowingMovie movie;
+    EXPECT_EQ(movie.create(path()), 0);
+    output_ =
+        std::make_unique<MovieOutput>(encoding_, std::move(movie), *journal_, patience_,
+                                      [this](const CaptureError& error) { ADD_FAILURE() << error.message; });
+    EXPECT_TRUE(output_->start());
+  }
+  void frames(const Numbers& places, const Numbers& keys = {}) {
+    for (const std::uint32_t place : places) {
+      const bool key = std::find(keys.begin(), keys.end(), place) != keys.end();
+      output_->pushFrame(pictureOf(place).get(), place, key);
+    }
+  }
+  void close(std::uint32_t totalFrames, std::int64_t samples = 0) {
+    output_->close(totalFrames, samples);
+    EXPECT_EQ(output_->framesWritten(totalFrames), totalFrames);
+  }
+  /// Copies ranges of the closed movie. @return the copy's path
+  std::string copy(const std::vector<FrameRange>& ranges) {
+    const auto index = readMovieIndex(path());
+    EXPECT_TRUE(index);
+    EXPECT_EQ(copyMovieRanges(path(), *index, ranges, kFrame, folder_.file("copy.mov")), 0);
+    return folder_.file("copy.mov");
+  }
+  [[nodiscard]] std::string path() const { return folder_.file("media.mov"); }
+  MovieOutput& operator*() { return *output_; }
+
+ private:
+  Folder folder_;
+  MovieEncoding encoding_;
+  std::shared_ptr<Journal> journal_;
+  Deadline patience_;
+  std::unique_ptr<MovieOutput> output_;
+};
+
+MovieEncoding pictureOnly() { return {VideoEncoding{{}, {30, 1}}, std::nullopt}; }
+
+/// Numbers and times (in frames) of a movie's pictures, and where the last one ends.
+struct Shown {
+  Numbers numbers;
+  Numbers times;
+  std::uint32_t end = 0;
+};
+
+Shown shownIn(const std::string& path) {
+  const auto movie = decodeMovie(path, Streams::picture);
+  EXPECT_EQ(movie.problem, "");
+  Shown shown{movie.frameNumbers, {}, 0};
+  for (const double time : movie.frameTimes) {
+    shown.times.push_back(static_cast<std::uint32_t>(std::lround(time / kFrame)));
+    EXPECT_NEAR(time / kFrame, shown.times.back(), 1e-3);
+  }
+  shown.end = static_cast<std::uint32_t>(std::lround(movie.duration / kFrame));
+  return shown;
+}
+
+TEST(MovieOutput, AFrameBeforeAHoleIsShownForLonger) {
+  Output output(pictureOnly());
+  Numbers places{2, 3, 4, 9};  // holes in front and in the middle
+  for (std::uint32_t place = 12; place < 40; place += 2) places.push_back(place);  // over several fragments
+  places.push_back(90);                                                            // behind a long one
+  output.frames(places, {2});
+  output.close(100);
+  const Shown shown = shownIn(output.path());
+  EXPECT_EQ(shown.numbers, places) << "nothing is encoded twice";
+  places.front() = 0;
+  EXPECT_EQ(shown.times, places);
+  EXPECT_EQ(shown.end, 100U);
+}
+
+TEST(MovieOutput, APictureDoesNotWaitForItsSound) {
+  for (const bool withSound : {false, true}) {
+    MovieEncoding encoding = pictureOnly();
+    encoding.audio = AudioEncoding{};
+    Output output(encoding);
+    Numbers places;
+    for (std::uint32_t place = 0; place < 60; ++place) places.push_back(place);
+    output.frames(places);
+    const auto onDisk = [&] {
+      const auto index = readMovieIndex(output.path());
+      return index && index->video()->sizes.size() >= 30;
+    };
+    EXPECT_TRUE(testing::waitUntil(onDisk)) << "a crash now would lose more than half a second";
+    if (withSound) (*output).pushSound(nullptr, 96000);
+    output.close(60, 96000);
+    const auto movie = decodeMovie(output.path(), withSound ? Streams::both : Streams::picture);
+    EXPECT_EQ(movie.problem, "");
+    EXPECT_EQ(movie.frameNumbers, places);
+    EXPECT_NEAR(movie.duration, 2.0, 0.03);
+  }
+}
+
+TEST(MovieOutput, ASlowCamerasKeyFramesAreTwoSecondsApartAtMost) {
+  Output output(pictureOnly());
+  Numbers places;
+  for (std::uint32_t place = 0; place < 600; place += 15) places.push_back(place);
+  output.frames(places, {0});
+  output.close(600);
+  const auto index = readMovieIndex(output.path());
+  ASSERT_TRUE(index);
+  EXPECT_EQ(index->video()->syncSamples, (Numbers{0, 4, 8, 12, 16, 20, 24, 28, 32, 36}));
+}
+
+TEST(MovieOutput, ACopyMayBeginAndEndInsideALongFrame) {
+  Output output(pictureOnly());
+  output.frames({0, 10, 20, 24, 30, 40, 41}, {0, 10, 30});
+  output.close(60);
+  struct Case {
+    std::vector<FrameRange> ranges;
+    Numbers numbers;
+    Numbers times;
+    std::uint32_t end;
+  };
+  for (const Case& c : {
+           Case{{{13, 22}}, {10, 20}, {0, 7}, 9},            // begins inside a key frame, which is shortened
+           Case{{{26, 35}}, {30}, {0}, 9},                   // inside another one: a key frame follows
+           Case{{{22, 26}}, {10, 20, 24}, {0, 10, 14}, 16},  // none follows: the key frame before
+           Case{{{0, 5}, {35, 50}}, {0, 30, 40, 41}, {0, 5, 10, 11}, 20},
+           Case{{{45, 60}}, {30, 40, 41}, {0, 10, 11}, 30},
+           Case{{{12, 13}}, {10}, {0}, 1},
+       }) {
+    const Shown shown = shownIn(output.copy(c.ranges));
+    EXPECT_EQ(shown.numbers, c.numbers) << c.ranges.front().first;
+    EXPECT_EQ(shown.times, c.times) << c.ranges.front().first;
+    EXPECT_EQ(shown.end, c.end) << c.ranges.front().first;
+  }
+}
+
+}  // namespace
+}  // namespace lmx
