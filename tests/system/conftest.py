@@ -12,6 +12,7 @@ import pytest
 sys.path.insert(0, str(Path(__file__).resolve().parent))
 
 from harness.agent import Agent  # noqa: E402
+from harness.odd_movies import movie_file  # noqa: E402
 from harness.tunnel_server import TunnelServer  # noqa: E402
 
 ROOT = Path(__file__).resolve().parents[2]
@@ -72,6 +73,15 @@ def registry(tmp_path_factory):
     subprocess.run(["gst-inspect-1.0", "fakesink"], env={**os.environ, "GST_REGISTRY": str(path)}, check=True,
                    stdout=subprocess.DEVNULL, timeout=120)
     return path
+
+
+@pytest.fixture(scope="session")
+def odd_movie(tmp_path_factory):
+    """Makes a movie of harness/odd_movies.py by its name, once for all workers. @return a function name → path"""
+    base = tmp_path_factory.getbasetemp()
+    directory = (base.parent if "PYTEST_XDIST_WORKER" in os.environ else base) / "odd-movies"
+    directory.mkdir(exist_ok=True)
+    return lambda name: movie_file(directory, name)
 
 
 @pytest.fixture

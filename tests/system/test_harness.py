@@ -1,30 +1,13 @@
 """The harness's readers against known material: a reader that finds nothing would prove nothing."""
-import subprocess
-
 import numpy
 import pytest
 from harness import movie
 from harness.agent import REPOSITORY
+from harness.numbered import make_movie
 from harness.one_thread import main_thread_held
 from harness.power_cut import PowerCut
 from harness.unread import all_read, wait_read
 from harness.waiting import let_pass
-
-
-def picture(counter, width=320, height=180):
-    frame = numpy.full((height, width), 90, dtype=numpy.uint8)
-    for cell in range(movie.CELLS):
-        bit = counter >> (movie.CELLS - 1 - cell) & 1
-        left, right = cell * width // movie.CELLS, (cell + 1) * width // movie.CELLS
-        frame[: height // movie.ROWS, left:right] = 255 if bit else 0
-    return frame.tobytes()
-
-
-def make_movie(path, numbers):
-    frames = b"".join(picture(number) for number in numbers)
-    subprocess.run(["ffmpeg", "-v", "error", "-f", "rawvideo", "-pix_fmt", "gray", "-s", "320x180", "-r", "30",
-                    "-i", "-", "-c:v", "libx264", "-preset", "superfast", "-pix_fmt", "yuv420p", str(path)],
-                   input=frames, check=True, timeout=60)
 
 
 def test_counters_are_read_back(tmp_path):

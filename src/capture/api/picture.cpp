@@ -1,9 +1,22 @@
-// Turns frame rates into fractions.
+// Turns frame rates into fractions, and texts into sizes.
 #include "capture/api/picture.h"
 
+#include <charconv>
 #include <cmath>
 
 namespace lmx {
+
+std::optional<PictureSize> pictureSizeFrom(const std::string& text) {
+  PictureSize size;
+  const char* end = text.data() + text.size();
+  const auto width = std::from_chars(text.data(), end, size.width);
+  if (width.ec != std::errc() || width.ptr == end || *width.ptr != 'x') return std::nullopt;
+  const auto height = std::from_chars(width.ptr + 1, end, size.height);
+  if (height.ec != std::errc() || height.ptr != end) return std::nullopt;
+  if (size.width < 64 || size.height < 64 || size.width > kFullHD.width || size.height > kFullHD.height)
+    return std::nullopt;
+  return size;
+}
 
 FrameRate frameRateFrom(double framesPerSecond) {
   const double whole = std::round(framesPerSecond);

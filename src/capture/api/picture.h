@@ -1,12 +1,19 @@
 // Size and rate of pictures.
 #pragma once
+#include <optional>
+#include <string>
 
 namespace lmx {
 
 struct PictureSize {
   int width = 1280;
   int height = 720;
+  bool operator==(const PictureSize&) const = default;
 };
+/// The largest picture that is recorded.
+inline constexpr PictureSize kFullHD{1920, 1080};
+/// Reads a size such as "1280x720"; nothing when it is none, or not within 64x64 and full HD.
+std::optional<PictureSize> pictureSizeFrom(const std::string& text);
 
 /// A frame rate as a fraction: 29.97 is 30000/1001, whole numbers n/1, others in thousandths.
 struct FrameRate {

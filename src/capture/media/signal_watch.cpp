@@ -24,7 +24,7 @@ constexpr double kInterval = 1;
 
 float amplitude(double decibels) { return static_cast<float>(std::pow(10, decibels / 20)); }
 
-std::vector<std::uint8_t> pointsOf(const LumaPlane& luma) {
+std::vector<std::uint8_t> pointsOf(const PictureLuma& luma) {
   std::vector<std::uint8_t> points;
   if (luma.width == 0 || luma.height == 0) return points;
   points.reserve(kColumns * kRows);
@@ -91,7 +91,7 @@ bool SignalWatch::wantsPicture(double t) const {
          t >= last_picture_ + kInterval;
 }
 
-SignalEvents SignalWatch::picture(const LumaPlane& luma, double t) {
+SignalEvents SignalWatch::picture(const PictureLuma& luma, double t) {
   SignalEvents events;
   if (!wantsPicture(t)) return events;
   const std::vector<std::uint8_t> before = std::exchange(points_, pointsOf(luma));

@@ -13,7 +13,7 @@
 namespace lmx {
 
 /// The luma of an I420 picture, limited range; a loan for the call.
-struct LumaPlane {
+struct PictureLuma {
   const std::uint8_t* data = nullptr;
   std::size_t stride = 0;  ///< bytes from one row to the next
   std::size_t width = 0;
@@ -65,7 +65,7 @@ class SignalWatch {
 
   /// Whether a picture of running time `t` would be looked at; times ascend.
   [[nodiscard]] bool wantsPicture(double t) const;
-  SignalEvents picture(const LumaPlane& luma, double t);
+  SignalEvents picture(const PictureLuma& luma, double t);
   /// @param samples  interleaved
   /// @param t  running time of the first one, seconds
   SignalEvents sound(std::span<const float> samples, int channels, int sampleRate, double t);

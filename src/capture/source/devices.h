@@ -37,6 +37,6 @@ std::optional<HardwareDevice> findHardware(const std::string& uniqueID);
 bool isHardwareThere(const std::string& uniqueID);
 
 /// What is wanted of a camera on this machine: what it can decode is asked of GStreamer. Thread-safe.
-CameraDemand demandHere(PictureSize size = {1920, 1080}, double maximumRate = 30);
+CameraDemand demandHere(PictureSize size = kFullHD, double maximumRate = 30);
 
 }  // namespace lmx

@@ -4,7 +4,7 @@
 #include <system_error>
 #include <thread>
 
-#include "capture/gst/picture_converter.h"
+#include "capture/gst/picture_format.h"
 #include "capture/source/device_list.h"
 #include "platform/log.h"
 #include "support/format.h"

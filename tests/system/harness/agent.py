@@ -185,8 +185,8 @@ class Agent:
             self.log.wait(rf"^Command: {re.escape(line.split(' ')[0])} took", after=before, timeout=5)
             return exchange(peer, "STATUS").text
 
-    def start_recording(self, uuid, minutes="60", unattended="60", **parameters):
-        return self.command(start_line(uuid, minutes, unattended, **parameters))
+    def start_recording(self, uuid, minutes="60", unattended="60", timeout=20.0, **parameters):
+        return self.command(start_line(uuid, minutes, unattended, **parameters), timeout)
 
     def let_record(self, seconds):
         """Waits until the running recording holds so many whole seconds of media; pauses don't count."""

@@ -64,6 +64,13 @@ def counters(path):
     return [int(value) for value in (cells >= 128) @ weights]
 
 
+def brightness(path, part="null"):
+    """The mean luminance (16 … 235) of a part of each picture; `part` is an FFmpeg filter such as crop=W:H:X:Y."""
+    result = _run(["ffmpeg", "-v", "error", "-i", path, "-map", "0:v:0", "-fps_mode", "passthrough", "-vf",
+                   f"{part},scale=1:1:flags=area,extractplanes=y", "-f", "rawvideo", "-"])
+    return list(result.stdout)
+
+
 def runs(values):
     """Splits counters into stretches that rise by one: [(first, last), …]. A doubled or reversed frame is a failure."""
     result = []

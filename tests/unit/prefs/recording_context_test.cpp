@@ -140,6 +140,22 @@ TEST_F(RecordingContext, TheSuffixOfThePresetIsTheQuality) {
 
 // Devices.
 
+TEST_F(RecordingContext, TheLargestPictureIsFullHDOrTheSizeAskedFor) {
+  PlistDictionary all = complete();
+  replace(all);
+  EXPECT_EQ(build()->maximumSize, (PictureSize{1920, 1080}));
+  all["RecordingVideoMaximumSize"] = "1280x720";
+  replace(all);
+  EXPECT_EQ(build()->maximumSize, (PictureSize{1280, 720}));
+  EXPECT_FALSE(log_.mentions("1920x1080 is taken"));
+  all["RecordingVideoMaximumSize"] = "720p";
+  replace(all);
+  EXPECT_EQ(build()->maximumSize, (PictureSize{1920, 1080}));
+  EXPECT_TRUE(log_.contains(kLogError,
+                            "\"RecordingVideoMaximumSize\" is \"720p\", which is no size from 64x64 to "
+                            "1920x1080: 1920x1080 is taken"));
+}
+
 TEST_F(RecordingContext, WithoutACameraAutomaticTakesTheMuxedDevice) {
   replace(complete());
   catalog_->camera.reset();

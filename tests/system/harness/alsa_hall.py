@@ -1,0 +1,64 @@
+"""Microphones of ALSA without hardware: PCMs of its user-space plug-ins, named by a configuration of the test's own.
+
+    hall = AlsaHall(agent)
+    hall.pcm("desk", 'type file slave.pcm "null" file "/dev/null" infile "/var/alsa/desk.raw" format "raw"')
+    agent.preferences(RecordingAudioInput=hall.id("desk"))
+    agent.start(env=hall.env)
+"""
+from .sounds import sine
+
+PLACE = "/var/alsa"
+# The system's own plug-ins, but none of its devices becomes the default.
+BEGIN = "</usr/share/alsa/alsa.conf>\n"
+
+
+class AlsaHall:
+    """A configuration in the sandbox; nothing runs."""
+
+    env = {"ALSA_CONFIG_PATH": f"{PLACE}/asound.conf"}
+
+    def __init__(self, agent):
+        self.place = agent.sandbox.root / PLACE.lstrip("/")
+        self.place.mkdir(parents=True, exist_ok=True)
+        self._pcms = {}
+        self._write()
+
+    def pcm(self, name, definition):
+        """Adds or replaces a PCM; `definition` is what stands between its braces."""
+        self._pcms[name] = definition
+        self._write()
+
+    def definition(self, name):
+        """What stands between the braces of a PCM."""
+        return self._pcms[name]
+
+    def remove(self, name):
+        """Takes a PCM away: opening it fails as with a microphone that is unplugged."""
+        del self._pcms[name]
+        self._write()
+
+    def silent(self, name):
+        """A microphone that gives silence as fast as it is read: nothing sets its pace."""
+        self.pcm(name, "type null")
+
+    def playing(self, name, frequency=440):
+        """A microphone that gives a sine from a file as fast as it is read."""
+        path = sine(self.place / f"{name}.wav", frequency, rate=48000, channels=2)
+        raw = path.with_suffix(".raw")
+        raw.write_bytes(path.read_bytes()[44:])
+        self.pcm(name, f'type file slave.pcm "null" file "/dev/null" infile "{PLACE}/{raw.name}" format "raw"')
+
+    def of_pipewire(self, name, device):
+        """A virtual microphone of a PipeWireHall as an ALSA device, at its pace. The agent needs both halls' `env`."""
+        self.pcm(name, f'type pipewire capture_node "{device.name}"')
+
+    @staticmethod
+    def id(name):
+        """What the preferences name."""
+        return "alsa:device=" + name
+
+    def _write(self):
+        text = BEGIN + "".join(f"pcm.{name} {{ {definition} }}\n" for name, definition in self._pcms.items())
+        path = self.place / "asound.conf"
+        path.with_suffix(".new").write_text(text)
+        path.with_suffix(".new").rename(path)

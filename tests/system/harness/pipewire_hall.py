@@ -1,0 +1,164 @@
+"""Virtual cameras and microphones of a PipeWire of the test's own, with its session manager, without hardware or D-Bus.
+
+The agent finds its socket by the environment that PipeWireHall.env holds:
+
+    hall = PipeWireHall(agent).start()
+    camera = hall.camera("podium").start()
+    agent.preferences(RecordingVideoInput="pipewire:podium")
+    agent.start(env=hall.env)
+"""
+import json
+import os
+import shutil
+import signal
+import subprocess
+from pathlib import Path
+
+from .guest import Guest
+from .sounds import sine
+from .waiting import wait_until
+
+PLACE = "/var/pipewire"
+NO_BUS = "unix:path=/nowhere"
+SHARED = Path("/usr/share/wireplumber")
+# The scripts of WirePlumber that link streams to devices; none that looks for hardware.
+ENABLED = """
+load_module("metadata")
+default_access.properties["enable-flatpak-portal"] = false  -- asks D-Bus
+default_access.enable()
+stream_defaults.properties["restore-props"] = false
+stream_defaults.properties["restore-target"] = false
+stream_defaults.enable()
+"""
+
+
+class PipeWireHall:
+    """The server and its session manager."""
+
+    env = {"PIPEWIRE_RUNTIME_DIR": PLACE, "XDG_RUNTIME_DIR": PLACE}
+
+    def __init__(self, agent):
+        self.agent = agent
+        self.place = agent.sandbox.root / PLACE.lstrip("/")  # in the host: the server is no process of the sandbox
+        self.place.mkdir(parents=True, exist_ok=True)
+        # No bus: nothing of the machine's own session may take part.
+        self.host_env = {"PIPEWIRE_RUNTIME_DIR": str(self.place), "XDG_RUNTIME_DIR": str(self.place),
+                         "XDG_CONFIG_HOME": str(self.place), "XDG_STATE_HOME": str(self.place),
+                         "HOME": str(self.place), "DBUS_SESSION_BUS_ADDRESS": NO_BUS,
+                         "DBUS_SYSTEM_BUS_ADDRESS": NO_BUS, "PIPEWIRE_REMOTE": "pipewire-0",
+                         "WIREPLUMBER_CONFIG_DIR": str(self.place / "wireplumber")}
+        self._guests = []
+
+    def __enter__(self):
+        return self.start()
+
+    def __exit__(self, *details):
+        self.close()
+
+    def start(self):
+        """Returns once both run."""
+        self._configure()
+        self._run(["pipewire"])
+        wait_until((self.place / "pipewire-0").exists, what="PipeWire's socket")
+        self._run(["wireplumber"])
+        wait_until(lambda: any("WirePlumber" == props.get("application.name") for props in self.objects("Client")),
+                   what="the session manager")
+        return self
+
+    def _configure(self):
+        config = self.place / "wireplumber"
+        if config.exists():
+            return
+        (config / "main.lua.d").mkdir(parents=True)
+        for name in ("00-functions", "20-default-access", "40-stream-defaults", "50-default-access-config"):
+            shutil.copy(SHARED / f"main.lua.d/{name}.lua", config / "main.lua.d")
+        (config / "main.lua.d/90-enable-all.lua").write_text(ENABLED)
+        shutil.copytree(SHARED / "policy.lua.d", config / "policy.lua.d")
+        text = (SHARED / "wireplumber.conf").read_text()
+        (config / "wireplumber.conf").write_text(text.replace("{ name = bluetooth.lua, type = config/lua }", ""))
+
+    def _run(self, command):
+        one = Guest(self.agent)
+        one.run(command, env=self.host_env, stdin=subprocess.DEVNULL, stdout=subprocess.DEVNULL)
+        self._guests.append(one)
+        return one
+
+    def camera(self, name, launch=None, size=(320, 180), rate=30):
+        """A virtual camera, to be started: `launch` makes its raw pictures."""
+        caps = f"video/x-raw,format=YUY2,width={size[0]},height={size[1]},framerate={rate}/1"
+        return VirtualCamera(self, name, launch or f"videotestsrc is-live=true pattern=smpte horizontal-speed=2 ! {caps}")
+
+    def microphone(self, name, frequency=440):
+        """A virtual microphone, to be started: two minutes of a sine of so many hertz."""
+        return VirtualMicrophone(self, name, sine(self.place / f"{frequency}.wav", frequency))
+
+    def objects(self, kind):
+        """The properties of all objects of a kind, such as "Node" or "Client"."""
+        dump = subprocess.run(["pw-dump"], env={**os.environ, **self.host_env}, capture_output=True, timeout=20,
+                              check=False).stdout
+        try:
+            found = json.loads(dump or "[]")
+        except json.JSONDecodeError:
+            return []
+        return [one["info"]["props"] for one in found
+                if one["type"].endswith(":" + kind) and one.get("info") and one["info"].get("props")]
+
+    def has(self, name):
+        return any(props.get("node.name") == name for props in self.objects("Node"))
+
+    def kill(self):
+        """Ends server and session manager at once; start() brings them back."""
+        while self._guests:
+            self._guests.pop().kill()
+        for left in self.place.glob("pipewire-0*"):
+            left.unlink()
+
+    close = kill
+
+
+class VirtualDevice(Guest):
+    """A node of the hall's PipeWire. Killed it is unplugged; it may be started again."""
+
+    def __init__(self, hall, name, command):
+        super().__init__(hall.agent)
+        self.hall = hall
+        self.name = name
+        self._command = command
+
+    @property
+    def id(self):
+        """What the preferences name."""
+        return "pipewire:" + self.name
+
+    def start(self):
+        """Returns once the node is there."""
+        self.run(self._command, env=self.hall.host_env, stdin=subprocess.DEVNULL, stdout=subprocess.DEVNULL)
+        wait_until(lambda: self.hall.has(self.name), what=f"{self.name} in PipeWire", interval=0.1)
+        return self
+
+    def unplug(self):
+        """The node goes; returns once PipeWire no longer has it."""
+        self.kill()
+        wait_until(lambda: not self.hall.has(self.name), what=f"PipeWire without {self.name}", interval=0.1)
+
+    def stall(self):
+        """The node stays, but nothing comes from it."""
+        self.process.send_signal(signal.SIGSTOP)
+
+    def go_on(self):
+        self.process.send_signal(signal.SIGCONT)
+
+
+class VirtualCamera(VirtualDevice):
+    def __init__(self, hall, name, launch):
+        node = f"props,media.class=Video/Source,node.name={name},node.description={name}"
+        super().__init__(hall, name, ["gst-launch-1.0", "-q", *launch.split(), "!", "pipewiresink", "mode=provide",
+                                      f"stream-properties={node}"])
+
+
+class VirtualMicrophone(VirtualDevice):
+    """Played by pw-cat: the graph's own clock drives it. (pipewiresink does not deliver sound reliably.)"""
+
+    def __init__(self, hall, name, sound):
+        node = f"{{ media.class=Audio/Source node.name={name} node.description={name} }}"
+        super().__init__(hall, name, ["pw-cat", "--playback", "--properties", node, str(sound)])

@@ -1,0 +1,42 @@
+"""Sounds that can be told apart in a movie: sines made for microphones, and what is heard in a stretch of sound."""
+import wave
+
+import numpy
+
+from . import movie
+
+RATE = 8000
+
+
+def sine(path, frequency, seconds=120.0, rate=RATE, channels=1):
+    """Writes a sine as a WAV file. @return its path"""
+    tone = numpy.sin(2 * numpy.pi * frequency * numpy.arange(int(seconds * rate)) / rate)
+    samples = numpy.repeat((tone * 16000).astype("<i2"), channels)
+    with wave.open(str(path), "wb") as file:
+        file.setnchannels(channels)
+        file.setsampwidth(2)
+        file.setframerate(rate)
+        file.writeframes(samples.tobytes())
+    return path
+
+
+def loudness(sound):
+    """Root mean square; a sine at half the full scale has 0.35."""
+    return float(numpy.sqrt(numpy.mean(sound**2))) if len(sound) else 0.0
+
+
+def pitch(sound, rate=RATE):
+    """The strongest frequency in hertz, None in silence."""
+    if loudness(sound) < 0.005:
+        return None
+    spectrum = numpy.abs(numpy.fft.rfft(sound * numpy.hanning(len(sound))))
+    return float(numpy.argmax(spectrum[1:]) + 1) * rate / len(sound)
+
+
+def heard(path, step=0.5):
+    """What a movie's sound holds, piece by piece of `step` seconds: the pitch rounded to 10 Hz, None for silence."""
+    sound = movie.sound(path, RATE)
+    size = int(step * RATE)
+    pieces = [sound[at: at + size] for at in range(0, len(sound) - size + 1, size)]
+    pitches = [pitch(piece) for piece in pieces]
+    return [None if one is None else round(one, -1) for one in pitches]
