@@ -49,6 +49,7 @@ Result<RecordingPlan, CaptureError> planRecording(const LMRRecordingContext& set
                      .demand = {},
                      .encoding = encodingOf(settings),
                      .maxDuration = {}};
+  plan.demand.size = settings.maximumSize;
   plan.demand.maximumRate = settings.maximumFrameRate;
   if (settings.videoEnabled) plan.camera = settings.videoDeviceID;
   if (settings.audioEnabled) plan.microphone = settings.audioDeviceID.value_or(kAnyMicrophone);
@@ -65,7 +66,8 @@ Result<RecordingPlan, CaptureError> planRecording(const LMRRecordingContext& set
 MovieEncoding completeEncoding(const RecordingPlan& plan, const CameraFormat& camera) {
   MovieEncoding encoding = plan.encoding;
   if (!encoding.video) return encoding;
-  encoding.video->size = camera.size;
+  // Another user may have opened the camera for a larger picture.
+  encoding.video->size = fittedSize(camera.size.width, camera.size.height, plan.demand.size);
   const FrameRate wanted = encoding.video->frameRate;
   if (!camera.rate) return encoding;
   const double seconds = camera.rate->frameSeconds();
