@@ -1,9 +1,6 @@
 // From the settings of a recording to its plan.
 #include "capture/recording_plan.h"
 
-#include <algorithm>
-#include <cmath>
-
 namespace lmx {
 namespace {
 
@@ -27,15 +24,6 @@ CaptureError missing(const std::string& problem) { return {CaptureError::kDomain
 
 CaptureError noIdentifier(const std::string& device, const char* what) {
   return missing("\"" + device + "\" is no " + what + " identifier; list them with lmxagentd -i zq-device-list");
-}
-
-int evenShare(int side, double scale) { return std::max(16, static_cast<int>(std::lround(side * scale / 2)) * 2); }
-
-/// `size`, no larger than `limit`, with the aspect ratio kept; even numbers.
-PictureSize fitted(PictureSize size, PictureSize limit) {
-  const double scale = std::min({1.0, static_cast<double>(limit.width) / size.width,
-                                 static_cast<double>(limit.height) / size.height});
-  return {evenShare(size.width, scale), evenShare(size.height, scale)};
 }
 
 MovieEncoding encodingOf(const LMRRecordingContext& settings) {
@@ -77,7 +65,8 @@ Result<RecordingPlan, CaptureError> planRecording(const LMRRecordingContext& set
 MovieEncoding completeEncoding(const RecordingPlan& plan, const CameraFormat& camera) {
   MovieEncoding encoding = plan.encoding;
   if (!encoding.video) return encoding;
-  encoding.video->size = fitted(camera.size, plan.demand.size);
+  // Another user may have opened the camera for a larger picture.
+  encoding.video->size = fittedSize(camera.size.width, camera.size.height, plan.demand.size);
   const FrameRate wanted = encoding.video->frameRate;
   if (!camera.rate) return encoding;
   const double seconds = camera.rate->frameSeconds();

@@ -1,6 +1,7 @@
 // Turns frame rates into fractions, and texts into sizes.
 #include "capture/api/picture.h"
 
+#include <algorithm>
 #include <charconv>
 #include <cmath>
 
@@ -16,6 +17,14 @@ std::optional<PictureSize> pictureSizeFrom(const std::string& text) {
   if (size.width < 64 || size.height < 64 || size.width > kFullHD.width || size.height > kFullHD.height)
     return std::nullopt;
   return size;
+}
+
+PictureSize fittedSize(double width, double height, PictureSize limit) {
+  const double scale = std::min({1.0, limit.width / width, limit.height / height});
+  const auto even = [scale](double side) {
+    return std::max(16, 2 * static_cast<int>(std::lround(side * scale / 2)));
+  };
+  return {even(width), even(height)};
 }
 
 FrameRate frameRateFrom(double framesPerSecond) {
