@@ -52,8 +52,8 @@ def test_sound_alone(agent, alsa, desk):
     assert heard[1:-1] == [440] * (len(heard) - 2), heard
 
 
-@pytest.mark.parametrize("kind, pitch", [("silent", None), ("playing", 440)])
-def test_a_device_without_a_pace(agent, alsa, kind, pitch):
+@pytest.mark.parametrize("kind", ["silent", "playing"])
+def test_a_device_without_a_pace(agent, alsa, kind):
     """It gives sound as fast as it is read; the recording keeps to the clock, and the picture does not suffer."""
     getattr(alsa, kind)("tape")
     agent.preferences(RecordingAudioInput=alsa.id("tape"))
@@ -64,7 +64,7 @@ def test_a_device_without_a_pace(agent, alsa, kind, pitch):
     for stream in movie.streams(path).values():
         assert abs(stream.duration - (stop.sent - start.received)) < 0.3
     assert len(movie.runs(movie.counters(path))) == 1
-    assert pitch in sounds.heard(path)
+    assert (sounds.loudness(movie.sound(path)) > 0.05) == (kind == "playing")
 
 
 def test_a_name_that_is_not_there_is_silence(agent, alsa):

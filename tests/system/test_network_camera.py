@@ -210,10 +210,10 @@ def test_a_size_that_changes(agent):
         agent.let_record(2)
         mark = agent.log.mark()
         camera.change("mode", "caps", mode((640, 480)))
-        agent.log.wait("640x480", after=mark, level=Level.NOTICE)
+        agent.log.wait("become 640x480", after=mark, level=Level.NOTICE)
         agent.let_record(5)
         stop(agent, "SIZES")
-        assert len(agent.log.lines("640x480", after=mark)) == 1
+        assert len(agent.log.lines("become 640x480", after=mark)) == 1
     path = agent.movie("SIZES")
     movie.decodes(path)
     stream = movie.streams(path)["video"]

@@ -95,7 +95,7 @@ def test_what_changes_midway(agent, odd_movie, name):
     stream = movie.streams(path)["video"]
     assert (stream.width, stream.height) == (320, 180)
     assert longest_still(path) < 1.2, "the picture goes on"
-    told = agent.log.lines(r"640x480", level=Level.NOTICE)
+    told = agent.log.lines("become 640x480", level=Level.NOTICE)
     if name == "size-changes.ts":
         assert len(told) == 1, "one notice for the change to that size"
         left = movie.brightness(path, "crop=16:180:0:0")

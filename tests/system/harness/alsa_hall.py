@@ -42,11 +42,12 @@ class AlsaHall:
         self.pcm(name, "type null")
 
     def playing(self, name, frequency=440):
-        """A microphone that gives a sine from a file as fast as it is read."""
+        """A microphone that gives a sine from a file as fast as it is read, 16 bits a sample."""
         path = sine(self.place / f"{name}.wav", frequency, rate=48000, channels=2)
         raw = path.with_suffix(".raw")
         raw.write_bytes(path.read_bytes()[44:])
-        self.pcm(name, f'type file slave.pcm "null" file "/dev/null" infile "{PLACE}/{raw.name}" format "raw"')
+        file = f'type file slave.pcm "null" file "/dev/null" infile "{PLACE}/{raw.name}" format "raw"'
+        self.pcm(name, f"type plug slave {{ pcm {{ {file} }} format S16_LE rate 48000 channels 2 }}")
 
     def of_pipewire(self, name, device):
         """A virtual microphone of a PipeWireHall as an ALSA device, at its pace. The agent needs both halls' `env`."""

@@ -15,6 +15,7 @@ import subprocess
 from pathlib import Path
 
 from .guest import Guest
+from .sandbox import HARNESS
 from .sounds import sine
 from .waiting import wait_until
 
@@ -83,10 +84,9 @@ class PipeWireHall:
         self._guests.append(one)
         return one
 
-    def camera(self, name, launch=None, size=(320, 180), rate=30):
-        """A virtual camera, to be started: `launch` makes its raw pictures."""
-        caps = f"video/x-raw,format=YUY2,width={size[0]},height={size[1]},framerate={rate}/1"
-        return VirtualCamera(self, name, launch or f"videotestsrc is-live=true pattern=smpte horizontal-speed=2 ! {caps}")
+    def camera(self, name, size=(320, 180), rate=30):
+        """A virtual camera, to be started: numbered pictures (movie.counters) of one size and rate."""
+        return VirtualCamera(self, name, size, rate)
 
     def microphone(self, name, frequency=440):
         """A virtual microphone, to be started: two minutes of a sine of so many hertz."""
@@ -150,10 +150,16 @@ class VirtualDevice(Guest):
 
 
 class VirtualCamera(VirtualDevice):
-    def __init__(self, hall, name, launch):
-        node = f"props,media.class=Video/Source,node.name={name},node.description={name}"
-        super().__init__(hall, name, ["gst-launch-1.0", "-q", *launch.split(), "!", "pipewiresink", "mode=provide",
-                                      f"stream-properties={node}"])
+    """See pipewire_camera.c. (pipewiresink stops delivering after a few viewers.)"""
+
+    def __init__(self, hall, name, size, rate):
+        program = hall.place / "camera"
+        if not program.exists():
+            flags = subprocess.run(["pkg-config", "--cflags", "--libs", "libpipewire-0.3"], check=True, timeout=20,
+                                   capture_output=True, text=True).stdout.split()
+            subprocess.run(["cc", "-O1", "-Wall", "-o", program, HARNESS / "pipewire_camera.c", *flags], check=True,
+                           timeout=60)
+        super().__init__(hall, name, [str(program), name, *map(str, size), str(rate)])
 
 
 class VirtualMicrophone(VirtualDevice):

@@ -34,9 +34,10 @@ def pitch(sound, rate=RATE):
 
 
 def heard(path, step=0.5):
-    """What a movie's sound holds, piece by piece of `step` seconds: the pitch rounded to 10 Hz, None for silence."""
+    """What a movie's sound holds, piece by piece of `step` seconds: None for silence, else the pitch, rounded to
+    40 Hz: a step of the sound within a piece shifts what is measured."""
     sound = movie.sound(path, RATE)
     size = int(step * RATE)
     pieces = [sound[at: at + size] for at in range(0, len(sound) - size + 1, size)]
     pitches = [pitch(piece) for piece in pieces]
-    return [None if one is None else round(one, -1) for one in pitches]
+    return [None if one is None else 40 * round(one / 40) for one in pitches]
