@@ -34,7 +34,7 @@ void MediaQueue::pushVideo(RawMedium frame) {
     return;
   }
   if (closed_) return;
-  video_bytes_ += gst_buffer_get_size(frame.buffer.get());
+  if (frame.buffer) video_bytes_ += gst_buffer_get_size(frame.buffer.get());
   video_.push_back(std::move(frame));
   changed_.notify_all();
 }
