@@ -49,6 +49,7 @@ CaptureRecorder::CaptureRecorder(const RecordingPlan& plan, RecordingSources sou
       journal_(std::move(files.journal)),
       marks_(journal_),
       queue_(encoding_.video.has_value(), clock_.realTime()),
+      account_(plan.signal, *journal_, clock_.realTime() ? CaptureClock::now() : 0),
       sources_(std::move(sources)),
       movie_(std::make_unique<MovieOutput>(encoding_, std::move(files.movie), *journal_, patience_,
                                            [this](const CaptureError& error) { fail(error); })),
@@ -57,6 +58,8 @@ CaptureRecorder::CaptureRecorder(const RecordingPlan& plan, RecordingSources sou
                .journal = *journal_,
                .movie = *movie_,
                .convert = [this](const RawMedium& frame) { return convert(frame); },
+               .heard = [this](const RawMedium& chunk) { account_.sound(chunk); },
+               .silenced = [this](double t, double seconds) { account_.silence(t, seconds); },
                .live = clock_.realTime()}) {
   if (encoding_.video) converter_.emplace(encoding_.video->size);
   journal_->capture(plan_.type, frame_seconds_, wall_offset_);
@@ -69,8 +72,8 @@ std::optional<CaptureError> CaptureRecorder::run(Reporter reporter, SoundReport 
     sound_report_ = std::move(soundReport);
   }
   sources.add(shared_from_this());
-  if (encoding_.audio && sources.hasNoSound())
-    soundLost({CaptureError::kDomain, kAudioSilent, sources.name() + ": has no sound"});
+  if (encoding_.audio && !sources.hasMicrophone())
+    soundLost({CaptureError::kDomain, kDeviceBusy, "the microphone is still being closed"});
   try {
     // Detached: this thread may hold the last reference to the recorder, and a thread cannot join itself.
     std::thread([self = shared_from_this(), reporter = std::move(reporter)] {
@@ -181,14 +184,14 @@ void CaptureRecorder::onSourceLost(SourceUse use, const CaptureError& error) {
 }
 
 void CaptureRecorder::onSourceAway(SourceUse use, const CaptureError& error) {
-  if (use.picture) return;  // the frame before stays until the camera is back
+  if (use.picture) return account_.cameraLost(CaptureClock::now());  // the frame before stays until it is back
   // Where there is only sound its loss is the end; but a microphone that has never been there is waited for.
   !encoding_.video && heard_ ? fail(error) : soundLost(error);
 }
 
-void CaptureRecorder::onSourceBack(SourceUse use, double seconds) {
-  (void)seconds;
-  if (use.picture) return;
+void CaptureRecorder::onSourceBack(SourceUse use, double /*seconds*/) {
+  if (use.picture) return account_.cameraBack(CaptureClock::now());
+  account_.microphoneBack(CaptureClock::now());
   sound_away_ = false;
   SoundReport report;
   {
@@ -200,6 +203,7 @@ void CaptureRecorder::onSourceBack(SourceUse use, double seconds) {
 
 void CaptureRecorder::soundLost(const CaptureError& error) {
   if (sound_away_.exchange(true)) return;
+  account_.microphoneLost(CaptureClock::now());
   SoundReport report;
   {
     const std::lock_guard lock(mutex_);
@@ -235,12 +239,12 @@ void CaptureRecorder::record(const Reporter& reporter) {
   // Whoever is to be told is held from before anybody can see that the capture has ended.
   const Report report = reporter();
   const std::optional<CaptureError> problem = error();
-  sayWhatIsNotReal();
+  account_.finish(endOfMedia(), sources.soundCorrection());
   publish(frames);
   movie_.reset();
-  sources.release();  // closes the devices unless somebody else has them
   finished()->removeIfResolved();
   report({marks_.cancelled(), problem});
+  sources.release();  // last: a driver may take its time to close
 }
 
 /// Runs a step of the recording. No memory, no thread: what there is becomes the movie.
@@ -258,6 +262,7 @@ void CaptureRecorder::recordUntilTheEnd() {
     const bool inTime = batch.inTime;
     const bool nothing = batch.audio.empty() && batch.video.empty();
     feed(std::move(batch));
+    account_.tick(cutter_.frames().horizon(), queue_.dropped(), clock_.wallOffset());
     if (nothing) cutter_.feedNothing(CaptureClock::now());
     checkLimits();
     more = inTime && !reachedEnd();
@@ -306,15 +311,10 @@ BufferHandle CaptureRecorder::convert(const RawMedium& frame) {
   if (const auto change = converter_->formatChange()) {
     LMPLogMessage(nullptr, kLogNotice, "The camera's picture has changed: %s; it is fitted into the recording's",
                   change->c_str());
+    account_.sizeChanged(frame.time, recordedSize(frame.caps.get()));
   }
+  if (picture) account_.picture(picture.get(), encoding_.video->size, frame.time);
   return picture;
-}
-
-void CaptureRecorder::sayWhatIsNotReal() {
-  if (const std::uint64_t dropped = queue_.dropped()) {
-    LMPLogMessage(nullptr, kLogWarning, "%llu pictures of the recording were lost: the machine could not keep up",
-                  static_cast<unsigned long long>(dropped));
-  }
 }
 
 void CaptureRecorder::publish(std::uint32_t totalFrames) {

@@ -15,6 +15,7 @@
 #include "capture/movie_output.h"
 #include "capture/recording_plan.h"
 #include "capture/gst/picture_converter.h"
+#include "capture/recording_account.h"
 #include "capture/recording_sources.h"
 #include "capture/store/capture_files.h"
 #include "capture/store/capture_marks.h"
@@ -32,7 +33,7 @@ class CaptureRecorder : public CaptureConsumer, public std::enable_shared_from_t
     bool cancelled = false;
     std::optional<CaptureError> error;
   };
-  /// Told on the recording thread when the file is closed and the devices are given back.
+  /// Told on the recording thread when the file is closed; the devices are about to be given back.
   using Report = std::function<void(const Outcome&)>;
   /// Told on a source's thread when the microphone is lost while the recording goes on, and when it is back (null).
   using SoundReport = std::function<void(const CaptureError* error)>;
@@ -88,7 +89,6 @@ class CaptureRecorder : public CaptureConsumer, public std::enable_shared_from_t
   void publish(std::uint32_t totalFrames);
   [[nodiscard]] double endOfMedia() const;
   [[nodiscard]] BufferHandle convert(const RawMedium& frame);
-  void sayWhatIsNotReal();
   [[nodiscard]] bool soundComes() const;
 
   // Any thread.
@@ -105,6 +105,7 @@ class CaptureRecorder : public CaptureConsumer, public std::enable_shared_from_t
   CaptureMarks marks_;
   MediaQueue queue_;
   Deadline patience_;                          // of all that the movie's threads wait for
+  RecordingAccount account_;
   std::optional<PictureConverter> converter_;  // recording thread
   bool limit_reached_ = false;                 // recording thread
   std::atomic<bool> heard_{false};             ///< some sound has come

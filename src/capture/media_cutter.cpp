@@ -98,6 +98,8 @@ void MediaCutter::fillSilence(double until) {
 
 /// In pieces: an hour of it must not be an hour of memory.
 void MediaCutter::pushSilence(std::uint32_t samples) {
+  const double seconds = static_cast<double>(samples) / audio_->sampleRate;
+  around_.silenced(frames_.horizon() - seconds, seconds);
   const auto most = static_cast<std::uint32_t>(kSilencePiece * audio_->sampleRate);
   while (samples > 0) {
     const std::uint32_t piece = std::min(samples, most);
@@ -109,7 +111,9 @@ void MediaCutter::pushSilence(std::uint32_t samples) {
 void MediaCutter::cutChunk(const RawMedium& chunk) {
   const auto count = static_cast<std::uint32_t>(std::llround(chunkSeconds(chunk) * audio_->sampleRate));
   const auto pieces = sound_->cut(chunk.time, count);
-  if (!pieces.empty() && startMovie()) pushPieces(chunk, pieces);
+  if (pieces.empty() || !startMovie()) return;
+  around_.heard(chunk);
+  pushPieces(chunk, pieces);
 }
 
 void MediaCutter::pushPieces(const RawMedium& chunk, const std::vector<SoundPiece>& pieces) {

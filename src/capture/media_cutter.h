@@ -25,6 +25,8 @@ class MediaCutter {
     MovieOutput& movie;
     /// A frame in the movie's size and colours; null when it can't be read.
     std::function<BufferHandle(const RawMedium& frame)> convert;
+    std::function<void(const RawMedium& chunk)> heard;           ///< sound that is recorded
+    std::function<void(double t, double seconds)> silenced;      ///< silence that is recorded instead
     bool live = true;  ///< sound that is not there in time is silence
   };
   /// @param begin  running time at which the capture begins, seconds

@@ -46,10 +46,10 @@ Result<RecordingPlan, CaptureError> planRecording(const LMRRecordingContext& set
                      .type = recordingTypeOf(settings.captureType),
                      .camera = {},
                      .microphone = {},
-                     .demand = {},
+                     .demand = {.size = settings.maximumSize, .maximumRate = settings.maximumFrameRate},
+                     .signal = settings.signal,
                      .encoding = encodingOf(settings),
                      .maxDuration = {}};
-  plan.demand.maximumRate = settings.maximumFrameRate;
   if (settings.videoEnabled) plan.camera = settings.videoDeviceID;
   if (settings.audioEnabled) plan.microphone = settings.audioDeviceID.value_or(kAnyMicrophone);
   if (settings.videoEnabled && !plan.camera) return missing("no camera is there");
@@ -65,7 +65,8 @@ Result<RecordingPlan, CaptureError> planRecording(const LMRRecordingContext& set
 MovieEncoding completeEncoding(const RecordingPlan& plan, const CameraFormat& camera) {
   MovieEncoding encoding = plan.encoding;
   if (!encoding.video) return encoding;
-  encoding.video->size = camera.size;
+  // Another user may have opened the camera for a larger picture.
+  encoding.video->size = fittedSize(camera.size.width, camera.size.height, plan.demand.size);
   const FrameRate wanted = encoding.video->frameRate;
   if (!camera.rate) return encoding;
   const double seconds = camera.rate->frameSeconds();

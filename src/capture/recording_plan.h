@@ -19,6 +19,7 @@ struct RecordingPlan {
   std::optional<std::string> camera;      ///< unique identifier
   std::optional<std::string> microphone;  ///< the same; may be the camera's, or kAnyMicrophone
   CameraDemand demand;                    ///< what is wanted of the camera at most
+  SignalThresholds signal;                ///< what counts as trouble with picture or sound
   MovieEncoding encoding;                 ///< size and rate are the camera's: completeEncoding
   std::optional<std::chrono::minutes> maxDuration;
 };
@@ -27,7 +28,7 @@ struct RecordingPlan {
 Result<RecordingPlan, CaptureError> planRecording(const LMRRecordingContext& settings);
 
 /// The plan's encoding for what the camera gives. The movie's clock ticks at the camera's nominal rate if that makes sense
-/// and is not above the wanted one, else at the wanted one.
+/// and is not above the wanted one, else at the wanted one. Its size is the camera's, no larger than wanted.
 MovieEncoding completeEncoding(const RecordingPlan& plan, const CameraFormat& camera);
 
 }  // namespace lmx

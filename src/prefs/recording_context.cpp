@@ -4,9 +4,11 @@
 #include <cstdlib>
 
 #include "platform/identifiers.h"
+#include "platform/log.h"
 #include "platform/paths.h"
 #include "prefs/continuous_settings.h"
 #include "prefs/recording_types.h"
+#include "prefs/signal_settings.h"
 #include "support/format.h"
 #include "support/redacted.h"
 
@@ -19,6 +21,18 @@ RecordingQuality qualityOf(const Text& preset) {
   if (preset && preset->ends_with(":Good")) return RecordingQuality::good;
   if (preset && preset->ends_with(":Best")) return RecordingQuality::best;
   return RecordingQuality::better;
+}
+
+PictureSize maximumSizeFrom(const Text& text) {
+  if (!text || text->empty()) return kFullHD;
+  const auto size = pictureSizeFrom(*text);
+  if (!size) {
+    LMPLogMessage(nullptr, kLogError,
+                  "\"RecordingVideoMaximumSize\" is \"%s\", which is no size from 64x64 to 1920x1080: "
+                  "1920x1080 is taken",
+                  text->c_str());
+  }
+  return size.value_or(kFullHD);
 }
 
 std::int64_t integerOf(const Text& text) { return text ? std::strtoll(text->c_str(), nullptr, 10) : 0; }
@@ -82,6 +96,7 @@ std::shared_ptr<LMRRecordingContext> RecordingContextBuilder::newRecordingContex
   context->captureTempDir = *repository;
   context->diskSpaceCutoffInMB = integerOf(text("RecordingDiskSpaceCutoffInMB"));
   context->previewIntervalInMilliseconds = integerOf(text("PreviewIntervalInMilliseconds"));
+  context->signal = signalThresholds([this](const char* key) { return text(key); });
   context->previewImagePath = systemPath(kPreviewImage);
   const auto continuous = (prefs_.*read_)("ContinuousRecording");
   if (continuous && continuous->dictionary() != nullptr) {
@@ -94,6 +109,7 @@ std::shared_ptr<LMRRecordingContext> RecordingContextBuilder::newRecordingContex
 
 void RecordingContextBuilder::chooseVideo(LMRRecordingContext& context, const Text& preset) {
   context.videoDeviceID = chooseVideoDevice(text("RecordingVideoInput"), catalog_);
+  context.maximumSize = maximumSizeFrom(text("RecordingVideoMaximumSize"));
   context.videoCompressionOptions = catalog_.compressionOptions(MediaType::video, qualityOf(preset));
   if (!context.videoCompressionOptions) failInvalidCompression("RecordingCapturePreset", textOrNull(preset));
 }

@@ -67,8 +67,8 @@ def test_a_camera_lost_in_the_middle(agent, fault):
     assert agent.document("LOST")["RecordingMetadata_RECORDING_UUID"] == "LOST"
 
 
-def test_a_microphone_lost_in_the_middle(agent):
-    agent.preferences(RecordingAudioInput="test://audio?silent-after=2")
+def test_a_microphone_that_is_all_there_is_lost_in_the_middle(agent):
+    agent.preferences(RecordingType="Audio", RecordingAudioInput="test://audio?silent-after=2")
     agent.start()
     assert agent.start_recording("MUTE").text == "cmdStatus=0"
     agent.log.wait(r"^The capture device has been disconnected\.$", timeout=30, level=Level.CRITICAL)

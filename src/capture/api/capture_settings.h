@@ -5,6 +5,8 @@
 #include <optional>
 #include <string>
 
+#include "capture/api/picture.h"
+#include "capture/api/signal_thresholds.h"
 #include "model/continuous_recording.h"
 #include "support/dictionary.h"
 
@@ -35,6 +37,7 @@ struct LMRRecordingContext {
   /// Absent: the first microphone there is when the capture begins. With a microphone that isn't there, or
   /// none at all, the recording is silent until one is.
   std::optional<std::string> audioDeviceID;
+  PictureSize maximumSize = kFullHD;  ///< of the picture; a camera is asked for no more
   std::optional<LMRCompressionOptions> videoCompressionOptions;
   std::optional<LMRCompressionOptions> audioCompressionOptions;
   std::string captureTempDir;  ///< the recording repository
@@ -42,6 +45,7 @@ struct LMRRecordingContext {
   std::int64_t previewIntervalInMilliseconds = 0;
   std::string previewImagePath;
   LMRContinuousRecordingInfo continuous;
+  SignalThresholds signal;
   // Set by the engine:
   std::string outputPath;                ///< final name of the movie
   std::uint32_t maxDurationMinutes = 0;  ///< 0: no limit

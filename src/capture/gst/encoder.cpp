@@ -14,7 +14,9 @@
 namespace lmx {
 namespace {
 
-constexpr int kSamplesPerPacket = 1024;  // AAC
+// AAC
+constexpr int kSamplesPerPacket = 1024;
+constexpr int kEncoderDelay = 1024;  // samples
 /// The encoder counts frames, not time: a slow camera's key frames would be far apart.
 constexpr double kKeyFrameSeconds = 2.0;
 /// How far the encoder may be behind its feeder.
@@ -240,7 +242,9 @@ std::uint32_t Encoder::placeOf(GstSample* sample) const {
 }
 
 TrackFormat Encoder::soundFormat(const Bytes& config) const {
-  TrackFormat format{.timescale = static_cast<std::uint32_t>(audio_->sampleRate), .sampleDescription = {}};
+  TrackFormat format{.timescale = static_cast<std::uint32_t>(audio_->sampleRate),
+                     .sampleDescription = {},
+                     .priming = kEncoderDelay};
   format.sampleDescription =
       audioSampleDescription(format.timescale, static_cast<std::uint16_t>(audio_->channels), config);
   return format;
@@ -251,10 +255,9 @@ void Encoder::takeAudio(GstSample* sample) {
     const Bytes config = codecData(sample);
     if (!config.empty() && config != sound_config_) output_.onFormat(soundTrack(), soundFormat(config));
   }
-  // The first packet holds nothing but the encoder's 1,024 samples of delay; without it the sound stands
-  // where it belongs, with no edit list that a player might ignore.
-  const std::int64_t start = (audio_packets_++ - 1) * kSamplesPerPacket;
-  if (start >= 0 && start < total_samples_) {
+  // The first packet is all delay. It stays: without it a decoder can't make the first samples of the second.
+  const std::int64_t start = audio_packets_++ * kSamplesPerPacket - kEncoderDelay;
+  if (start < total_samples_) {
     output_.onSound({.track = soundTrack(),
                      .data = contents(gst_sample_get_buffer(sample)),
                      .duration = kSamplesPerPacket,

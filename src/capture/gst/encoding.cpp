@@ -16,7 +16,8 @@ std::string videoDescription(const VideoEncoding& video) {
   const int keyInterval = std::max(1, static_cast<int>(std::lround(1.0 / rate.frameSeconds())));
   return string_with_format(
       "appsrc name=vsrc format=time max-buffers=0 max-bytes=0 max-time=0 stream-type=stream "
-      "caps=video/x-raw,format=I420,width=%d,height=%d,framerate=%d/%d,pixel-aspect-ratio=1/1 ! "
+      "caps=video/x-raw,format=I420,width=%d,height=%d,framerate=%d/%d,pixel-aspect-ratio=1/1,"
+      "colorimetry=bt709 ! "
       "x264enc tune=zerolatency speed-preset=%s bitrate=%d key-int-max=%d byte-stream=false aud=false "
       "option-string=scenecut=0 ! video/x-h264,stream-format=avc,alignment=au ! "
       "appsink name=vout sync=false async=false max-buffers=0 enable-last-sample=false ",

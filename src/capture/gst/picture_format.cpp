@@ -9,7 +9,6 @@
 namespace lmx {
 namespace {
 
-constexpr int kSmallest = 16;
 constexpr int kLargestSD = 576;  // rows; above it an untold matrix of a stream is BT.709
 
 const GstStructure* structureOf(const GstCaps* caps) {
@@ -22,8 +21,6 @@ int number(const GstStructure* structure, const char* field) {
   int value = 0;
   return gst_structure_get_int(structure, field, &value) != FALSE ? value : 0;
 }
-
-int evenNumber(double value) { return std::max(kSmallest, 2 * static_cast<int>(std::lround(value / 2))); }
 
 double pixelAspect(const GstStructure* structure) {
   int numerator = 1;
@@ -55,8 +52,7 @@ PictureSize recordedSize(const GstCaps* caps, PictureSize limit) {
   // Pixels are only ever stretched, so that squaring them loses nothing.
   const double aspect = pixelAspect(structure);
   (aspect > 1 ? width : height) *= std::max(aspect, 1 / aspect);
-  const double scale = std::min({1.0, limit.width / width, limit.height / height});
-  return {evenNumber(width * scale), evenNumber(height * scale)};
+  return fittedSize(width, height, limit);
 }
 
 std::optional<FrameRate> nominalRate(const GstCaps* caps) {

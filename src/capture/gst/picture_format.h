@@ -11,7 +11,7 @@ namespace lmx {
 
 /// Size in which pictures of that format are recorded: square pixels, no larger than `limit` with the aspect
 /// ratio kept, even numbers, at least 16. `limit` itself when the caps tell no size.
-PictureSize recordedSize(const GstCaps* caps, PictureSize limit = {1920, 1080});
+PictureSize recordedSize(const GstCaps* caps, PictureSize limit = kFullHD);
 
 /// Nominal frame rate of the caps; nothing when it is variable or unknown. Rates that a driver gives in
 /// 100 ns units are the round ones they stand for.

@@ -10,6 +10,11 @@ std::uint32_t BoxReader::u32() {
          static_cast<std::uint32_t>(b[2]) << 8 | b[3];
 }
 
+std::uint64_t BoxReader::u64() {
+  const std::uint64_t high = u32();
+  return high << 32 | u32();
+}
+
 std::span<const std::uint8_t> BoxReader::take(std::size_t n) {
   if (n > bytes_.size()) {
     ok_ = false;

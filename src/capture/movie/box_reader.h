@@ -12,6 +12,7 @@ class BoxReader {
   explicit BoxReader(std::span<const std::uint8_t> bytes) : bytes_(bytes) {}
   [[nodiscard]] bool ok() const { return ok_; }
   std::uint32_t u32();
+  std::uint64_t u64();
   /// The next `n` bytes; empty when there are not so many.
   std::span<const std::uint8_t> take(std::size_t n);
 

@@ -47,8 +47,9 @@ int GrowingMovie::create(const std::string& path) {
 }
 
 int GrowingMovie::begin(const std::vector<TrackFormat>& tracks) {
+  index_.created = movieTimeNow();
   Bytes start = fileStart();
-  const Bytes header = fragmentedHeader(tracks);
+  const Bytes header = fragmentedHeader(tracks, index_.created);
   start.insert(start.end(), header.begin(), header.end());
   if (const int error = writeAllAt(file_.get(), start, 0)) return error;
   for (const TrackFormat& format : tracks) index_.tracks.push_back({.format = format});

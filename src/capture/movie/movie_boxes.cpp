@@ -2,6 +2,7 @@
 #include "capture/movie/movie_boxes.h"
 
 #include <algorithm>
+#include <chrono>
 #include <string_view>
 
 #include "capture/movie/box_writer.h"
@@ -15,10 +16,19 @@ void identityMatrix(BoxWriter& w) {
   for (const std::uint32_t v : {0x00010000U, 0U, 0U, 0U, 0x00010000U, 0U, 0U, 0U, 0x40000000U}) w.u32(v);
 }
 
-void movieHeaderBox(BoxWriter& w, std::uint64_t duration, std::uint32_t nextTrack) {
+/// When a movie was made and last changed, seconds since 1904-01-01 UTC.
+struct Times {
+  std::uint64_t created = 0;
+  std::uint64_t modified = 0;
+  void write(BoxWriter& w) const {
+    w.u64(created);
+    w.u64(modified);
+  }
+};
+
+void movieHeaderBox(BoxWriter& w, const Times& times, std::uint64_t duration, std::uint32_t nextTrack) {
   w.fullBox("mvhd", 1, 0, [&] {
-    w.u64(0);
-    w.u64(0);
+    times.write(w);
     w.u32(kMovieTimescale);
     w.u64(duration);
     w.u32(0x00010000);  // normal speed
@@ -30,10 +40,10 @@ void movieHeaderBox(BoxWriter& w, std::uint64_t duration, std::uint32_t nextTrac
   });
 }
 
-void trackHeaderBox(BoxWriter& w, const TrackFormat& format, std::uint32_t number, std::uint64_t duration) {
+void trackHeaderBox(BoxWriter& w, const TrackFormat& format, const Times& times, std::uint32_t number,
+                    std::uint64_t duration) {
   w.fullBox("tkhd", 1, 3, [&] {  // enabled, in the movie
-    w.u64(0);
-    w.u64(0);
+    times.write(w);
     w.u32(number);
     w.u32(0);
     w.u64(duration);
@@ -45,6 +55,40 @@ void trackHeaderBox(BoxWriter& w, const TrackFormat& format, std::uint32_t numbe
     identityMatrix(w);
     w.u32(static_cast<std::uint32_t>(format.width) << 16);
     w.u32(static_cast<std::uint32_t>(format.height) << 16);
+  });
+}
+
+/// Length of the movie, movie timescale units. GStreamer's demuxer compares it with the media time of packets
+/// and would leave out a last packet of sound that begins, in the media, where the movie ends.
+std::uint64_t movieDuration(const MovieIndex& index) {
+  std::uint64_t longest = 0;
+  for (const TrackIndex& track : index.tracks) {
+    if (track.sizes.empty()) continue;
+    std::uint64_t end = track.presented();
+    if (track.format.priming > 0) end = std::max(end, track.totalDuration - track.durations.back().duration);
+    const std::uint64_t units = (end * kMovieTimescale + track.format.timescale - 1) / track.format.timescale;
+    longest = std::max(longest, units + (track.format.priming > 0 ? 1 : 0));
+  }
+  return longest;
+}
+
+/// One edit: the media without their priming.
+/// @param duration  movie timescale units; 0 in front of fragments: all that follows
+void editListBox(BoxWriter& w, std::uint32_t priming, std::uint64_t duration) {
+  if (priming == 0) return;
+  const bool wide = duration > 0xFFFFFFFFULL;
+  w.box("edts", [&] {
+    w.fullBox("elst", wide ? 1 : 0, 0, [&] {
+      w.u32(1);
+      if (wide) {
+        w.u64(duration);
+        w.u64(priming);
+      } else {
+        w.u32(static_cast<std::uint32_t>(duration));
+        w.u32(priming);
+      }
+      w.u32(0x00010000);  // normal speed
+    });
   });
 }
 
@@ -67,10 +111,9 @@ void dataInformationBox(BoxWriter& w) {
   });
 }
 
-void mediaHeaderBox(BoxWriter& w, std::uint32_t timescale, std::uint64_t duration) {
+void mediaHeaderBox(BoxWriter& w, const Times& times, std::uint32_t timescale, std::uint64_t duration) {
   w.fullBox("mdhd", 1, 0, [&] {
-    w.u64(0);
-    w.u64(0);
+    times.write(w);
     w.u32(timescale);
     w.u64(duration);
     w.u16(0x55C4);  // language undetermined
@@ -96,16 +139,18 @@ void mediaInformationBox(BoxWriter& w, const TrackFormat& format, Tables sampleT
   });
 }
 
-/// @param mediaDuration  timescale units of the track
+/// @param track  its index may be empty
 /// @param sampleTables  writes what follows "stsd"
 template <class Tables>
-void trackBox(BoxWriter& w, const TrackFormat& format, std::uint32_t number, std::uint64_t mediaDuration,
+void trackBox(BoxWriter& w, const TrackIndex& track, const Times& times, std::uint32_t number,
               Tables sampleTables) {
-  const auto movieDuration = format.timescale == 0 ? 0 : mediaDuration * kMovieTimescale / format.timescale;
+  const TrackFormat& format = track.format;
+  const auto duration = format.timescale == 0 ? 0 : track.presented() * kMovieTimescale / format.timescale;
   w.box("trak", [&] {
-    trackHeaderBox(w, format, number, movieDuration);
+    trackHeaderBox(w, format, times, number, duration);
+    editListBox(w, format.priming, duration);
     w.box("mdia", [&] {
-      mediaHeaderBox(w, format.timescale, mediaDuration);
+      mediaHeaderBox(w, times, format.timescale, track.totalDuration);
       handlerBox(w, "mhlr", format.isVideo ? "vide" : "soun",
                  format.isVideo ? "VideoHandler" : "SoundHandler");
       mediaInformationBox(w, format, sampleTables);
@@ -155,6 +200,23 @@ void chunkOffsetBox(BoxWriter& w, const std::vector<Chunk>& chunks) {
   });
 }
 
+/// Says that a decoder of sound is right from the second packet on.
+void rollGroupBoxes(BoxWriter& w, std::size_t samples) {
+  constexpr unsigned kOneBefore = 0xFFFF;  // -1
+  w.fullBox("sgpd", 1, 0, [&] {
+    w.text("roll");
+    w.u32(2);  // bytes of an entry
+    w.u32(1);
+    w.u16(kOneBefore);
+  });
+  w.fullBox("sbgp", 0, 0, [&] {
+    w.text("roll");
+    w.u32(1);
+    w.u32(static_cast<std::uint32_t>(samples));
+    w.u32(1);
+  });
+}
+
 void fullSampleTables(BoxWriter& w, const TrackIndex& track) {
   w.fullBox("stts", 0, 0, [&] {
     w.u32(static_cast<std::uint32_t>(track.durations.size()));
@@ -176,6 +238,7 @@ void fullSampleTables(BoxWriter& w, const TrackIndex& track) {
     for (const std::uint32_t size : track.sizes) w.u32(size);
   });
   chunkOffsetBox(w, track.chunks);
+  if (!track.format.isVideo) rollGroupBoxes(w, track.sizes.size());
 }
 
 }  // namespace
@@ -192,13 +255,23 @@ Bytes fileStart() {
   return out;
 }
 
-Bytes fragmentedHeader(const std::vector<TrackFormat>& tracks) {
+std::uint64_t movieTimeNow() {
+  constexpr std::uint64_t kFrom1904To1970 = 2082844800;
+  const auto now = std::chrono::system_clock::now().time_since_epoch();
+  return kFrom1904To1970 +
+         static_cast<std::uint64_t>(std::chrono::duration_cast<std::chrono::seconds>(now).count());
+}
+
+Bytes fragmentedHeader(const std::vector<TrackFormat>& tracks, std::uint64_t created) {
+  const Times times{created, created};
   Bytes out;
   BoxWriter w(out);
   w.box("moov", [&] {
-    movieHeaderBox(w, 0, static_cast<std::uint32_t>(tracks.size() + 1));
+    movieHeaderBox(w, times, 0, static_cast<std::uint32_t>(tracks.size() + 1));
     std::uint32_t number = 0;
-    for (const TrackFormat& format : tracks) trackBox(w, format, ++number, 0, [&] { emptySampleTables(w); });
+    for (const TrackFormat& format : tracks) {
+      trackBox(w, {.format = format}, times, ++number, [&] { emptySampleTables(w); });
+    }
     w.box("mvex", [&] {
       for (std::uint32_t i = 1; i <= tracks.size(); ++i) {
         w.fullBox("trex", 0, 0, [&] {
@@ -221,19 +294,19 @@ Bytes mediaHead(std::uint64_t mediaEnd) {
   return out;
 }
 
-Bytes movieHeader(const MovieIndex& index) {
+Bytes movieHeader(const MovieIndex& index, std::uint64_t modified) {
+  const Times times{index.created, modified};
   Bytes out;
   std::size_t samples = 0;
   for (const TrackIndex& track : index.tracks) samples += track.sizes.size();
   out.reserve(samples * 5 + 4096);
   BoxWriter w(out);
   w.box("moov", [&] {
-    movieHeaderBox(w, static_cast<std::uint64_t>(index.seconds() * kMovieTimescale),
-                   static_cast<std::uint32_t>(index.tracks.size() + 1));
+    movieHeaderBox(w, times, movieDuration(index), static_cast<std::uint32_t>(index.tracks.size() + 1));
     std::uint32_t number = 0;
     for (const TrackIndex& track : index.tracks) {
       if (track.sizes.empty()) continue;  // some players refuse a movie with an empty track
-      trackBox(w, track.format, ++number, track.totalDuration, [&] { fullSampleTables(w, track); });
+      trackBox(w, track, times, ++number, [&] { fullSampleTables(w, track); });
     }
   });
   return out;

@@ -28,6 +28,12 @@ struct Piece {
   [[nodiscard]] bool empty() const { return first >= end || start >= stop; }
 };
 
+/// A part of the movie's time, seconds.
+struct Stretch {
+  double start = 0;
+  double end = 0;
+};
+
 /// A track to copy from: its index, and where each of its samples lies and when it begins.
 struct SourceTrack {
   explicit SourceTrack(const TrackIndex& track);
@@ -43,8 +49,8 @@ struct SourceTrack {
   /// The sample whose start is nearest to `units`; may be the one behind the last.
   [[nodiscard]] std::size_t sampleNear(std::uint64_t units) const;
   [[nodiscard]] bool isKey(std::size_t sample) const;
-  /// Length of a sample of a track whose samples are all equally long.
-  [[nodiscard]] double sampleSeconds() const;
+  /// The nearest position inside the track.
+  [[nodiscard]] std::uint64_t clamped(std::int64_t units) const;
 
   const TrackIndex& index;
   std::vector<std::uint64_t> offsets;
@@ -89,9 +95,8 @@ bool SourceTrack::isKey(std::size_t sample) const {
          std::binary_search(index.syncSamples.begin(), index.syncSamples.end(), sample);
 }
 
-double SourceTrack::sampleSeconds() const {
-  const std::uint32_t units = index.durations.empty() ? 0 : index.durations.front().duration;
-  return units == 0 ? 1.0 : seconds(units);
+std::uint64_t SourceTrack::clamped(std::int64_t units) const {
+  return static_cast<std::uint64_t>(std::clamp<std::int64_t>(units, 0, static_cast<std::int64_t>(total())));
 }
 
 /// The frames that are shown from `start` to `stop`. A picture can only be decoded from a key frame on.
@@ -112,14 +117,6 @@ Piece framesBetween(const SourceTrack& track, std::uint64_t start, std::uint64_t
   return piece;
 }
 
-/// Whole packets, as near to the wanted time as they come.
-Piece packetsBetween(const SourceTrack& track, std::uint64_t start, std::uint64_t stop) {
-  Piece piece{.first = track.sampleNear(start), .end = track.sampleNear(stop)};
-  piece.start = track.starts[piece.first];
-  piece.stop = track.starts[piece.end];
-  return piece;
-}
-
 /// Appends ranges to the new file and to its index. The first track leads: ranges are counted in its time.
 class RangeCopier {
  public:
@@ -129,7 +126,7 @@ class RangeCopier {
   int copy(const FrameRange& frames, double frameSeconds);
 
  private:
-  [[nodiscard]] Piece samplesFrom(std::size_t track, double seconds) const;
+  [[nodiscard]] Piece soundFor(std::size_t track, const Stretch& stretch);
   int copySamples(std::size_t track, const Piece& piece);
   int copyBytes(std::uint64_t from, std::uint64_t count);
 
@@ -137,45 +134,54 @@ class RangeCopier {
   int target_;
   MovieIndex& out_;
   std::vector<SourceTrack> tracks_;
-  std::vector<double> copied_;  ///< seconds of each track
+  double copied_seconds_ = 0;
 };
 
 RangeCopier::RangeCopier(int source, int target, const MovieIndex& index, MovieIndex& out)
-    : source_(source),
-      target_(target),
-      out_(out),
-      tracks_(index.tracks.begin(), index.tracks.end()),
-      copied_(index.tracks.size()) {}
+    : source_(source), target_(target), out_(out), tracks_(index.tracks.begin(), index.tracks.end()) {}
 
 int RangeCopier::copy(const FrameRange& frames, double frameSeconds) {
+  Stretch stretch{frames.first * frameSeconds, frames.end * frameSeconds};
   const SourceTrack& lead = tracks_[0];
-  const std::uint64_t start = lead.unitsTo(frames.first, frameSeconds);
-  const std::uint64_t stop = lead.unitsTo(frames.end, frameSeconds);
-  const Piece piece =
-      lead.index.format.isVideo ? framesBetween(lead, start, stop) : packetsBetween(lead, start, stop);
-  if (piece.empty()) return 0;
-  if (const int error = copySamples(0, piece)) return error;
-  copied_[0] += lead.seconds(piece.stop - piece.start);
-  for (std::size_t t = 1; t < tracks_.size(); ++t) {
-    const Piece sound = samplesFrom(t, lead.seconds(piece.start));
+  const bool hasPicture = lead.index.format.isVideo;
+  if (hasPicture) {
+    const Piece piece =
+        framesBetween(lead, lead.unitsTo(frames.first, frameSeconds), lead.unitsTo(frames.end, frameSeconds));
+    if (piece.empty()) return 0;
+    if (const int error = copySamples(0, piece)) return error;
+    stretch = {lead.seconds(piece.start), lead.seconds(piece.stop)};
+  }
+  for (std::size_t t = hasPicture ? 1 : 0; t < tracks_.size(); ++t) {
+    const Piece sound = soundFor(t, stretch);
     if (sound.empty()) continue;
     if (const int error = copySamples(t, sound)) return error;
-    copied_[t] += tracks_[t].seconds(sound.stop - sound.start);
   }
+  copied_seconds_ += stretch.end - stretch.start;
   return 0;
 }
 
-/// As many samples of `track`, from `seconds` on, as it takes to be as long as the leading track. This evens
-/// out the rounding of earlier ranges: sound never drifts away from the picture.
-Piece RangeCopier::samplesFrom(std::size_t track, double seconds) const {
+/// The packets of a stretch of the source, and the one before the first, which makes the decoder right. Later
+/// stretches follow in whole packets: each begins and ends with the packet that comes nearest, so sound is
+/// never further than half a packet from its picture.
+Piece RangeCopier::soundFor(std::size_t track, const Stretch& stretch) {
   const SourceTrack& from = tracks_[track];
-  const double sample = from.sampleSeconds();
-  const auto first = static_cast<std::size_t>(std::lround(seconds / sample));
-  const auto count =
-      static_cast<std::size_t>(std::max(0L, std::lround((copied_[0] - copied_[track]) / sample)));
-  Piece piece{.first = std::min(first, from.size()), .end = std::min(first + count, from.size())};
+  TrackIndex& to = out_.tracks[track];
+  const auto units = [&](double seconds) { return std::llround(seconds * from.index.format.timescale); };
+  const std::int64_t presented = static_cast<std::int64_t>(to.totalDuration) - to.format.priming;
+  const std::int64_t ahead = to.sizes.empty() ? 0 : presented - units(copied_seconds_);
+  const auto begin = from.clamped(units(stretch.start) + from.index.format.priming + ahead);
+  Piece piece;
+  if (to.sizes.empty()) {
+    piece.first = from.sampleAt(begin);
+    if (piece.first > 0) --piece.first;
+    to.format.priming = static_cast<std::uint32_t>(begin - from.starts[piece.first]);
+  } else {
+    piece.first = from.sampleNear(begin);
+  }
+  const std::int64_t length = units(stretch.end) - units(stretch.start) - ahead;
+  piece.end = from.sampleNear(from.clamped(static_cast<std::int64_t>(begin) + length));
   piece.start = from.starts[piece.first];
-  piece.stop = from.starts[piece.end];
+  piece.stop = from.starts[std::max(piece.first, piece.end)];
   return piece;
 }
 
@@ -210,7 +216,7 @@ int RangeCopier::copyBytes(std::uint64_t from, std::uint64_t count) {
 int writeBoxes(int fd, const MovieIndex& index) {
   if (const int error = writeAllAt(fd, fileStart(), 0)) return error;
   if (const int error = writeAllAt(fd, mediaHead(index.mediaEnd), kFileTypeSize)) return error;
-  return writeAllAt(fd, movieHeader(index), index.mediaEnd);
+  return writeAllAt(fd, movieHeader(index, movieTimeNow()), index.mediaEnd);
 }
 
 }  // namespace
@@ -224,6 +230,7 @@ int copyMovieRanges(const std::string& source, const MovieIndex& index, const st
   if (index.tracks.empty() || index.tracks.front().sizes.empty()) return ENODATA;
   MovieIndex out;
   for (const TrackIndex& track : index.tracks) out.tracks.push_back({.format = track.format});
+  out.created = index.created;
   out.mediaEnd = kFileTypeSize + kPlaceholderSize;
   RangeCopier copier(from.get(), to.get(), index, out);
   for (const FrameRange& range : ranges) {

@@ -18,8 +18,8 @@ struct FrameRange {
 /// Copies `ranges` of `source` to the new movie `target`. The copy is synced but bears its name from the
 /// start, so give a temporary one. A range that does not begin with a key frame begins with the one before
 /// it; one that begins while a frame is shown for longer begins with that frame shortened, or, if that is
-/// none, with a key frame that follows it. Sound is copied in whole AAC frames; the rounding error is carried
-/// from range to range.
+/// none, with a key frame that follows it. The first sound heard is exact to the sample; each later range of
+/// sound begins with the packet that comes nearest, and the rounding error is carried on.
 /// @param index  of `source`
 /// @param frameSeconds  length of a frame of `ranges`
 /// @return 0 or the errno; half a copy may be left then

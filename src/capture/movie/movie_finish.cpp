@@ -20,7 +20,7 @@ int cutAt(int fd, std::uint64_t size) { return ftruncate(fd, static_cast<off_t>(
 }  // namespace
 
 int finishMovie(int fd, const MovieIndex& index) {
-  const Bytes header = movieHeader(index);
+  const Bytes header = movieHeader(index, movieTimeNow());
   if (const int error = writeAllAt(fd, header, index.mediaEnd)) {
     const int cutError = cutAt(fd, index.mediaEnd);
     return cutError != 0 ? cutError : error;

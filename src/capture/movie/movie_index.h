@@ -14,6 +14,9 @@ struct TrackFormat {
   std::uint16_t width = 0;      ///< pixels, video
   std::uint16_t height = 0;
   Bytes sampleDescription;  ///< the whole "stsd" box
+  /// Timescale units at the start of the media that are decoded but not presented: an encoder's delay, or
+  /// what a decoder needs before it is right.
+  std::uint32_t priming = 0;
 };
 
 /// One contiguous run of samples in the file.
@@ -39,8 +42,12 @@ struct TrackIndex {
 
   /// Appends a sample to the newest chunk; there must be one.
   void addSample(std::uint32_t size, std::uint32_t duration, bool sync);
+  /// What is presented of it, timescale units.
+  [[nodiscard]] std::uint64_t presented() const {
+    return totalDuration > format.priming ? totalDuration - format.priming : 0;
+  }
   [[nodiscard]] double seconds() const {
-    return format.timescale == 0 ? 0 : static_cast<double>(totalDuration) / format.timescale;
+    return format.timescale == 0 ? 0 : static_cast<double>(presented()) / format.timescale;
   }
 };
 
@@ -48,6 +55,7 @@ struct TrackIndex {
 struct MovieIndex {
   std::vector<TrackIndex> tracks;
   std::uint64_t mediaEnd = 0;  ///< file offset behind the last whole fragment
+  std::uint64_t created = 0;   ///< see movieTimeNow
 
   /// The first track of its kind; null when there is none.
   [[nodiscard]] const TrackIndex* video() const;

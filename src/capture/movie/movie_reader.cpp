@@ -24,6 +24,17 @@ void readTrackHeader(Body body, TrackFormat& format) {
   format.height = static_cast<std::uint16_t>(reader.u32() >> 16);
 }
 
+/// The priming. Movies of earlier versions have no edits; one that makes no sense counts as none.
+void readEditList(Body body, TrackFormat& format) {
+  constexpr std::uint64_t kLongestPriming = 1U << 20;
+  BoxReader reader(body);
+  const bool wide = reader.u32() >> 24 == 1;
+  reader.u32();  // how many
+  wide ? reader.u64() : reader.u32();
+  const std::uint64_t start = wide ? reader.u64() : reader.u32();
+  if (reader.ok() && start <= kLongestPriming) format.priming = static_cast<std::uint32_t>(start);
+}
+
 void readTrackBoxes(Body bytes, TrackFormat& format) {
   forEachBox(bytes, [&](std::string_view type, Body body, Body whole) {
     if (type == "tkhd") {
@@ -36,7 +47,9 @@ void readTrackBoxes(Body bytes, TrackFormat& format) {
       format.isVideo = true;
     } else if (type == "stsd") {
       format.sampleDescription.assign(whole.begin(), whole.end());
-    } else if (type == "mdia" || type == "minf" || type == "stbl") {
+    } else if (type == "elst") {
+      readEditList(body, format);
+    } else if (type == "edts" || type == "mdia" || type == "minf" || type == "stbl") {
       readTrackBoxes(body, format);
     }
   });
@@ -47,6 +60,11 @@ MovieIndex readTracks(Body moov) {
   MovieIndex index;
   forEachBox(moov, [&](std::string_view type, Body body, Body) {
     if (type == "trak") readTrackBoxes(body, index.tracks.emplace_back().format);
+    if (type == "mvhd") {
+      BoxReader reader(body);
+      reader.u32();
+      index.created = reader.u64();
+    }
   });
   for (const TrackIndex& track : index.tracks) {
     if (track.format.timescale == 0 || track.format.sampleDescription.empty()) return {};

@@ -96,6 +96,10 @@ Bytes videoSampleDescription(std::uint16_t width, std::uint16_t height, std::spa
       w.u16(24);
       w.u16(0xFFFF);
       w.box("avcC", [&] { w.bytes(avcC); });
+      w.box("colr", [&] {
+        w.text("nclc");
+        for (int i = 0; i < 3; ++i) w.u16(1);  // primaries, transfer and matrix of BT.709
+      });
     });
   });
   return out;

@@ -7,7 +7,8 @@
 
 namespace lmx {
 
-/// "stsd" of an H.264 track. @param avcC  decoder configuration record (ISO/IEC 14496-15)
+/// "stsd" of an H.264 track in the colours of BT.709. @param avcC  decoder configuration record (ISO/IEC
+/// 14496-15)
 Bytes videoSampleDescription(std::uint16_t width, std::uint16_t height, std::span<const std::uint8_t> avcC);
 
 /// AudioSpecificConfig (ISO/IEC 14496-3) of AAC-LC without band replication; known before any sound is

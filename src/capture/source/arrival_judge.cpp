@@ -11,7 +11,7 @@ constexpr double kEarly = -0.050;
 /// At the start the clock is set to the earliest arrival of this time.
 constexpr double kStart = 0.250;
 /// Sound that is late and has not caught up for this long will not catch up.
-constexpr double kSteadilyLate = 0.300;
+constexpr double kSteadilyLate = 0.500;
 constexpr double kCatchingUp = 0.005;
 /// Users fill up with silence what lags for a second.
 constexpr double kLongestWait = 0.800;

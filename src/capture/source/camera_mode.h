@@ -28,9 +28,9 @@ struct CameraMode {
 
 /// What is wanted of a camera.
 struct CameraDemand {
-  PictureSize size{1920, 1080};  ///< the largest picture that is of use
-  double maximumRate = 30;       ///< frames a second
-  bool decodesJPEG = true;       ///< whether the machine can
+  PictureSize size = kFullHD;  ///< the largest picture that is of use
+  double maximumRate = 30;     ///< frames a second
+  bool decodesJPEG = true;     ///< whether the machine can
   bool decodesH264 = true;
 };
 

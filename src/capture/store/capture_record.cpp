@@ -104,7 +104,7 @@ bool applyPause(CaptureRecord& record, LineReader line) {
 }
 
 bool applyLine(CaptureRecord& record, const JournalWords& words) {
-  if (words.empty()) return true;
+  if (words.empty() || words[0] == "gap") return true;  // gaps are for people
   const LineReader line(words);
   if (line.is("capture", 4)) return applyCapture(record, line);
   if (line.is("run", 3)) return applyRun(record, line);

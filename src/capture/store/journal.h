@@ -44,6 +44,8 @@ class Journal {
   void movie(const std::string& uuid, const std::string& path);
   /// Movie and document of the request are in place.
   void done(const std::string& uuid);
+  /// What is not real in the movie; `words` come from GapLedger. Nothing reads them back.
+  void gap(const JournalWords& words) { append(words); }
   /// @return 0 or the errno
   [[nodiscard]] int sync() const;
 

@@ -41,6 +41,17 @@ TEST(RecordingPlan, RateQualityAndLengthComeFromTheSettings) {
   EXPECT_FALSE(plan->microphone);
 }
 
+TEST(RecordingPlan, ThePictureIsNoLargerThanTheSettingsAllow) {
+  auto wanted = settings(true, false);
+  EXPECT_EQ(planRecording(wanted)->demand.size, kFullHD);
+  wanted.maximumSize = {1280, 720};
+  const auto plan = planRecording(wanted);
+  EXPECT_EQ(plan->demand.size, (PictureSize{1280, 720}));
+  EXPECT_EQ(completeEncoding(*plan, {.size = {1920, 1080}, .rate = {}}).video->size,
+            (PictureSize{1280, 720}));
+  EXPECT_EQ(completeEncoding(*plan, {.size = {640, 480}, .rate = {}}).video->size, (PictureSize{640, 480}));
+}
+
 TEST(RecordingPlan, TypesAreNumberedAsEverywhere) {
   auto wanted = settings(true, false);
   const std::pair<CaptureType, RecordingTypeCode> types[] = {

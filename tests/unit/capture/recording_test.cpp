@@ -8,6 +8,8 @@
 #include <fstream>
 #include <thread>
 
+#include "capture/movie/movie_copy.h"
+#include "capture/movie/movie_reader.h"
 #include "model/codes.h"
 #include "support/time_value.h"
 #include "tests/unit/capture/capture_harness.h"
@@ -109,6 +111,36 @@ TEST(Recording, DoesNotDriftInThirtyMinutes) {
   ASSERT_EQ(ticks.size(), static_cast<std::size_t>(kDriftSeconds));
   for (std::size_t i = 0; i < ticks.size(); ++i)
     ASSERT_NEAR(ticks[i], static_cast<double>(i + 1) - kTickLead, 0.001) << i;
+}
+
+/// The first sound of a copy is exact to the sample, each later range is off by half a packet at most.
+TEST(Recording, SoundStaysWithThePictureInCopies) {
+  const Folder folder;
+  Capture capture(folder, kFastVideo, kFastAudio);
+  const std::string path = recordFast(folder, capture, {{0.0, 20.0}});
+  const auto index = readMovieIndex(path);
+  ASSERT_TRUE(index);
+  constexpr double kHalfPacket = 512.0 / 48000.0;
+  for (const auto& ranges : std::vector<std::vector<FrameRange>>{
+           {{0, 600}}, {{7, 130}}, {{555, 556}}, {{1, 95}, {131, 277}, {300, 333}, {401, 590}}}) {
+    const std::string copy = folder.file("copy.mov");
+    ASSERT_EQ(copyMovieRanges(path, *index, ranges, 1.0 / 30.0, copy), 0);
+    const auto movie = decodeMovie(copy);
+    EXPECT_EQ(movie.problem, "");
+    EXPECT_NEAR(movie.soundStart, 0.0, 1e-6);
+    std::vector<double> expected;
+    for (std::size_t i = 0; i < movie.frameNumbers.size(); ++i) {
+      if (movie.frameNumbers[i] % 30 == 29) expected.push_back(movie.frameTimes[i] + 1.0 / 30.0);
+    }
+    const auto ticks = testing::tickTimes(movie);
+    ASSERT_EQ(ticks.size(), expected.size()) << ranges.front().first;
+    for (std::size_t i = 0; i < ticks.size(); ++i) {
+      const bool first = ticks[i] < (ranges.front().end - ranges.front().first) / 30.0;
+      EXPECT_NEAR(ticks[i], expected[i] - kTickLead, first ? 0.0005 : kHalfPacket + 0.0005) << i;
+    }
+    EXPECT_NEAR(static_cast<double>(movie.sound.size()) / movie.sampleRate,
+                movie.frameTimes.back() + 1.0 / 30.0, 0.022);
+  }
 }
 
 TEST(Recording, SoundOnly) {

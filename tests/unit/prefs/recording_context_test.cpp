@@ -52,6 +52,15 @@ class RecordingContext : public testing::PrefsFixture {
   std::shared_ptr<ScriptedCatalog> catalog_ = std::make_shared<ScriptedCatalog>();
 };
 
+TEST_F(RecordingContext, HoldsTheThresholdsOfSignalTrouble) {
+  replace(complete());
+  EXPECT_EQ(build()->signal, SignalThresholds{});
+  PlistDictionary changed = complete();
+  changed["SignalBlackLevel"] = "40";
+  replace(changed);
+  EXPECT_EQ(build()->signal, SignalThresholds{.blackLevel = 40});
+}
+
 TEST_F(RecordingContext, HoldsWhatThePreferencesSay) {
   replace(complete());
   const auto context = build();
@@ -130,6 +139,22 @@ TEST_F(RecordingContext, TheSuffixOfThePresetIsTheQuality) {
 }
 
 // Devices.
+
+TEST_F(RecordingContext, TheLargestPictureIsFullHDOrTheSizeAskedFor) {
+  PlistDictionary all = complete();
+  replace(all);
+  EXPECT_EQ(build()->maximumSize, (PictureSize{1920, 1080}));
+  all["RecordingVideoMaximumSize"] = "1280x720";
+  replace(all);
+  EXPECT_EQ(build()->maximumSize, (PictureSize{1280, 720}));
+  EXPECT_FALSE(log_.mentions("1920x1080 is taken"));
+  all["RecordingVideoMaximumSize"] = "720p";
+  replace(all);
+  EXPECT_EQ(build()->maximumSize, (PictureSize{1920, 1080}));
+  EXPECT_TRUE(log_.contains(kLogError,
+                            "\"RecordingVideoMaximumSize\" is \"720p\", which is no size from 64x64 to "
+                            "1920x1080: 1920x1080 is taken"));
+}
 
 TEST_F(RecordingContext, WithoutACameraAutomaticTakesTheMuxedDevice) {
   replace(complete());

@@ -67,7 +67,7 @@ TEST(Encoder, SoundThatIsNoSoundDoesNotEndIt) {
   }
   EXPECT_TRUE(encoder->finish(48000, 20s));
   EXPECT_TRUE(problems.entries().empty());
-  EXPECT_EQ(packets, 47) << "48,000 samples in packets of 1,024, begun ones too";
+  EXPECT_EQ(packets, 48) << "1,024 of delay and 48,000 samples in packets of 1,024, begun ones too";
 }
 
 /// A player that waited for the first sound would wait for ever where none comes.

@@ -128,7 +128,7 @@ TEST(LargeMovie, TheIndexOfTwelveHoursIsComplete) {
   const MovieIndex index = halfADay();
   EXPECT_NEAR(index.seconds(), kSeconds, 0.03);
   ASSERT_GT(index.mediaEnd, 13'000'000'000ULL);
-  const Bytes header = movieHeader(index);
+  const Bytes header = movieHeader(index, 0);
   EXPECT_NEAR(static_cast<double>(number(find(header, {"moov", "mvhd"}), 24, 8)) / 90000, kSeconds, 0.03);
   const Body video = find(header, {"moov", "trak"});
   EXPECT_EQ(number(find(video, {"tkhd"}), 28, 8), kSeconds * 90000);

@@ -53,6 +53,25 @@ TEST(ReadMovieIndex, SamplesOutsideOfTheirMediaAreRefused) {
   EXPECT_EQ(framesRead(folder, kDataOffsetAt, 0xFF), 0U) << "begins behind the file";
 }
 
+TEST(ReadMovieIndex, KnowsWhatIsNotPresented) {
+  const Folder folder;
+  auto formats = testing::sampleFormats();
+  for (const std::uint32_t priming : {0U, 1024U, 2047U}) {  // earlier versions wrote no edit list
+    formats[1].priming = priming;
+    const std::string path = folder.file(std::to_string(priming));
+    GrowingMovie movie;
+    ASSERT_EQ(movie.create(path), 0);
+    ASSERT_EQ(movie.begin(formats), 0);
+    ASSERT_EQ(movie.append(testing::sampleFragment(0)), 0);
+    const auto index = readMovieIndex(path);
+    ASSERT_TRUE(index);
+    EXPECT_EQ(index->tracks[0].format.priming, 0U);
+    EXPECT_EQ(index->tracks[1].format.priming, priming);
+    EXPECT_EQ(index->tracks[1].presented(), 23U * 1024 - priming);
+    EXPECT_LE(movieTimeNow() - index->created, 60U);
+  }
+}
+
 TEST(ReadMovieIndex, AnyCorruptionIsSurvived) {
   const Folder folder;
   writeSampleMovie(folder.file("a.mov"), 2, false);

@@ -115,6 +115,21 @@ std::string nameOf(const ::testing::TestParamInfo<Case>& info) {
 
 INSTANTIATE_TEST_SUITE_P(, SteadySoundForHours, ::testing::ValuesIn(kCases), nameOf);
 
+TEST(SteadySound, AVeryBadClockIsFollowedAfterAMinute) {
+  for (const double ppm : {-3000.0, 1000.0, 4000.0}) {
+    SteadySound sound(8000, 2);
+    Microphone microphone(8000, ppm, 25);
+    Delivery delivery(8000, {480, Jitter::uniform});
+    Listener start(8000, 25);
+    record(sound, microphone, delivery, start, 60);
+    Listener listener(8000, 25);
+    record(sound, microphone, delivery, listener, 600);
+    EXPECT_LT(listener.worst(), 0.005) << ppm;
+    EXPECT_LT(start.worst(), 0.02) << ppm;
+    EXPECT_EQ(sound.jumps(), 0U) << ppm;
+  }
+}
+
 // ---- how it sounds
 
 /// Greatest deviation from a pure tone within `samples`, in decibels of the tone: a click, a step, hiss. The

@@ -39,6 +39,14 @@ TEST(ParseJournal, ANumberThatIsNoneIsDamage) {
   }
 }
 
+TEST(ParseJournal, GapsAreNoDamage) {
+  const std::string text = "capture 2 0.04 1000\nstart R 1\nrun 1 0\n";
+  for (const char* line :
+       {"gap frames 1.0 2.0 5\n", "gap size 1.0 1280x720\n", "gap of another version\n", "gap\n"}) {
+    EXPECT_TRUE(parseJournal(text + line).intact) << line;
+  }
+}
+
 TEST(ParseJournal, AFrameOfNoLengthIsDamage) {
   for (const char* length : {"0", "-1", "1e-300", "1e300", "nan"}) {
     const std::string text = std::string("capture 2 ") + length + " 1000\nstart R 1\nrun 1 0\n";
