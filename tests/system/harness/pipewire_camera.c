@@ -104,6 +104,7 @@ int main(int argc, char** argv) {
   struct pw_properties* properties =
       pw_properties_new(PW_KEY_MEDIA_CLASS, "Video/Source", PW_KEY_NODE_NAME, argv[1],
                         PW_KEY_NODE_DESCRIPTION, argv[1], PW_KEY_MEDIA_ROLE, "Camera", NULL);
+  if (argv[5][0]) pw_properties_set(properties, PW_KEY_DEVICE_API, argv[5]);
   camera.stream =
       pw_stream_new_simple(pw_main_loop_get_loop(camera.loop), argv[1], properties, &kEvents, &camera);
   uint8_t space[1024];
