@@ -72,8 +72,8 @@ std::optional<CaptureError> CaptureRecorder::run(Reporter reporter, SoundReport 
     sound_report_ = std::move(soundReport);
   }
   sources.add(shared_from_this());
-  if (encoding_.audio && sources.hasNoSound())
-    soundLost({CaptureError::kDomain, kAudioSilent, sources.name() + ": has no sound"});
+  if (encoding_.audio && !sources.hasMicrophone())
+    soundLost({CaptureError::kDomain, kDeviceBusy, "the microphone is still being closed"});
   try {
     // Detached: this thread may hold the last reference to the recorder, and a thread cannot join itself.
     std::thread([self = shared_from_this(), reporter = std::move(reporter)] {
@@ -242,9 +242,9 @@ void CaptureRecorder::record(const Reporter& reporter) {
   account_.finish(endOfMedia(), sources.soundCorrection());
   publish(frames);
   movie_.reset();
-  sources.release();  // closes the devices unless somebody else has them
   finished()->removeIfResolved();
   report({marks_.cancelled(), problem});
+  sources.release();  // last: a driver may take its time to close
 }
 
 /// Runs a step of the recording. No memory, no thread: what there is becomes the movie.

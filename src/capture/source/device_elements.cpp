@@ -2,6 +2,7 @@
 #include "capture/source/device_elements.h"
 
 #include "capture/source/device_pipeline.h"
+#include "capture/source/pipewire_connection.h"
 #include "platform/log.h"
 #include "support/format.h"
 
@@ -17,6 +18,30 @@ std::string rateText(FrameRate rate) { return string_with_format("%d/%d", rate.n
 std::string soundCaps() {
   return string_with_format("audio/x-raw,format=F32LE,layout=interleaved,rate=%d,channels=%d", kSoundRate,
                             kSoundChannels);
+}
+
+/// Takes what a container says about colours out of the caps of a stream that tells them itself: containers
+/// don't tell the range, and what they say goes before what the stream says.
+GstPadProbeReturn dropColours(GstPad* /*pad*/, GstPadProbeInfo* info, gpointer /*unused*/) noexcept {
+  GstEvent* event = gst_pad_probe_info_get_event(info);
+  if (GST_EVENT_TYPE(event) != GST_EVENT_CAPS) return GST_PAD_PROBE_OK;
+  GstCaps* stated = nullptr;
+  gst_event_parse_caps(event, &stated);
+  const CapsHandle caps(gst_caps_copy(stated));
+  gst_structure_remove_field(gst_caps_get_structure(caps.get(), 0), "colorimetry");
+  info->data = gst_event_new_caps(caps.get());
+  gst_event_unref(event);
+  return GST_PAD_PROBE_OK;
+}
+
+void onElement(GstBin* /*decoder*/, GstBin* /*parent*/, GstElement* element, gpointer /*unused*/) noexcept {
+  GstElementFactory* factory = gst_element_get_factory(element);
+  const std::string name = factory == nullptr ? "" : GST_OBJECT_NAME(factory);
+  if (name != "h264parse" && name != "h265parse") return;
+  const GstHandle<GstPad> sink(gst_element_get_static_pad(element, "sink"));
+  if (sink) {
+    gst_pad_add_probe(sink.get(), GST_PAD_PROBE_TYPE_EVENT_DOWNSTREAM, dropColours, nullptr, nullptr);
+  }
 }
 
 bool has(GstElement* element, const char* property) {
@@ -65,9 +90,18 @@ GstHandle<GstElement> uriDecoder(const DeviceID& device) {
   if (decoder == nullptr) return nullptr;
   gst_object_ref_sink(decoder);
   g_object_set(decoder, "uri", device.text.c_str(), nullptr);
+<<<<<<< HEAD
+  decodeInSoftware(decoder);
+=======
   // A hardware decoder's memory can't be read everywhere; what is here decodes in software.
   if (has(decoder, "force-sw-decoders")) g_object_set(decoder, "force-sw-decoders", TRUE, nullptr);
+  g_signal_connect(decoder, "deep-element-added", G_CALLBACK(&onElement), nullptr);
+>>>>>>> wt-picture
   return GstHandle<GstElement>(decoder);
+}
+
+void decodeInSoftware(GstElement* decoder) {
+  if (has(decoder, "force-sw-decoders")) g_object_set(decoder, "force-sw-decoders", TRUE, nullptr);
 }
 
 GstHandle<GstElement> alsaSource(const std::string& pcm) {
@@ -78,14 +112,15 @@ GstHandle<GstElement> alsaSource(const std::string& pcm) {
   return GstHandle<GstElement>(source);
 }
 
-void tuneSource(GstElement* source) {
+void tuneSource(GstElement* source, bool overUdp) {
+  connectApart(source);
   if (has(source, "provide-clock")) g_object_set(source, "provide-clock", FALSE, nullptr);
   if (has(source, "slave-method")) gst_util_set_object_arg(G_OBJECT(source), "slave-method", "none");
   if (has(source, "always-copy")) g_object_set(source, "always-copy", TRUE, nullptr);
-  if (has(source, "protocols") && has(source, "latency")) {  // RTSP: over its own connection nothing gets lost
+  if (has(source, "protocols") && has(source, "latency")) {  // RTSP
     g_object_set(source, "latency", kNetworkLatencyMs, "tcp-timeout", kNetworkTimeoutUs, "timeout",
                  kNetworkTimeoutUs, nullptr);
-    gst_util_set_object_arg(G_OBJECT(source), "protocols", "tcp+udp");
+    gst_util_set_object_arg(G_OBJECT(source), "protocols", overUdp ? "udp" : "tcp");
   }
 }
 
