@@ -90,13 +90,8 @@ GstHandle<GstElement> uriDecoder(const DeviceID& device) {
   if (decoder == nullptr) return nullptr;
   gst_object_ref_sink(decoder);
   g_object_set(decoder, "uri", device.text.c_str(), nullptr);
-<<<<<<< HEAD
   decodeInSoftware(decoder);
-=======
-  // A hardware decoder's memory can't be read everywhere; what is here decodes in software.
-  if (has(decoder, "force-sw-decoders")) g_object_set(decoder, "force-sw-decoders", TRUE, nullptr);
   g_signal_connect(decoder, "deep-element-added", G_CALLBACK(&onElement), nullptr);
->>>>>>> wt-picture
   return GstHandle<GstElement>(decoder);
 }
 
