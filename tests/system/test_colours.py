@@ -1,6 +1,7 @@
 """Grey stays grey and red stays red, whatever a camera's way of writing them."""
 import pytest
 from harness import colour_bars
+from harness.pipewire_hall import PipeWireHall, VirtualDevice
 
 NEAR = 3  # of 255
 HD = (1280, 720)
@@ -42,4 +43,20 @@ def test_colours_of_a_camera_are_those_of_the_movie(agent, name):
     agent.start()
     agent.record("R", 1)
     assert colour_bars.tags(agent.movie("R")) == ("tv", "bt709", "bt709", "bt709")
+    assert colour_bars.distance(agent.movie("R")) <= NEAR
+
+
+@pytest.mark.parametrize("pixels, caps", [("nv12", "nv12"), ("yuyv422", "yuy2"), ("bgr0", "bgrx")])
+def test_colours_of_a_camera_that_does_not_tell_them(agent, pixels, caps):
+    width, height = HD
+    colour_bars.make(agent.path("/var/lmx/picture"), HD, pixels, "-f rawvideo", rate=1, seconds=1,
+                     conversion="" if pixels == "bgr0" else LIMITED_601)
+    node = "props,media.class=Video/Source,node.name=colours,node.description=colours"
+    launch = (f"filesrc location={agent.path('/var/lmx/picture')} ! rawvideoparse format={caps} width={width} "
+              f"height={height} framerate=10/1 ! imagefreeze is-live=true ! pipewiresink mode=provide "
+              f"stream-properties={node}")
+    with PipeWireHall(agent) as hall, VirtualDevice(hall, "colours", ["gst-launch-1.0", "-q", *launch.split()]) as camera:
+        agent.preferences(RecordingType="Video", RecordingVideoInput=camera.id, RecordingCapturePreset="Video:Best")
+        agent.start(env=hall.env)
+        agent.record("R", 1)
     assert colour_bars.distance(agent.movie("R")) <= NEAR

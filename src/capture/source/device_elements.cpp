@@ -1,6 +1,7 @@
 // Makes and sets up elements.
 #include "capture/source/device_elements.h"
 
+#include "capture/gst/stream_colours.h"
 #include "capture/source/device_pipeline.h"
 #include "capture/source/pipewire_connection.h"
 #include "platform/log.h"
@@ -18,30 +19,6 @@ std::string rateText(FrameRate rate) { return string_with_format("%d/%d", rate.n
 std::string soundCaps() {
   return string_with_format("audio/x-raw,format=F32LE,layout=interleaved,rate=%d,channels=%d", kSoundRate,
                             kSoundChannels);
-}
-
-/// Takes what a container says about colours out of the caps of a stream that tells them itself: containers
-/// don't tell the range, and what they say goes before what the stream says.
-GstPadProbeReturn dropColours(GstPad* /*pad*/, GstPadProbeInfo* info, gpointer /*unused*/) noexcept {
-  GstEvent* event = gst_pad_probe_info_get_event(info);
-  if (GST_EVENT_TYPE(event) != GST_EVENT_CAPS) return GST_PAD_PROBE_OK;
-  GstCaps* stated = nullptr;
-  gst_event_parse_caps(event, &stated);
-  const CapsHandle caps(gst_caps_copy(stated));
-  gst_structure_remove_field(gst_caps_get_structure(caps.get(), 0), "colorimetry");
-  info->data = gst_event_new_caps(caps.get());
-  gst_event_unref(event);
-  return GST_PAD_PROBE_OK;
-}
-
-void onElement(GstBin* /*decoder*/, GstBin* /*parent*/, GstElement* element, gpointer /*unused*/) noexcept {
-  GstElementFactory* factory = gst_element_get_factory(element);
-  const std::string name = factory == nullptr ? "" : GST_OBJECT_NAME(factory);
-  if (name != "h264parse" && name != "h265parse") return;
-  const GstHandle<GstPad> sink(gst_element_get_static_pad(element, "sink"));
-  if (sink) {
-    gst_pad_add_probe(sink.get(), GST_PAD_PROBE_TYPE_EVENT_DOWNSTREAM, dropColours, nullptr, nullptr);
-  }
 }
 
 bool has(GstElement* element, const char* property) {
@@ -91,7 +68,7 @@ GstHandle<GstElement> uriDecoder(const DeviceID& device) {
   gst_object_ref_sink(decoder);
   g_object_set(decoder, "uri", device.text.c_str(), nullptr);
   decodeInSoftware(decoder);
-  g_signal_connect(decoder, "deep-element-added", G_CALLBACK(&onElement), nullptr);
+  correctColoursIn(decoder);
   return GstHandle<GstElement>(decoder);
 }
 

@@ -5,6 +5,7 @@
 
 #include <cstring>
 
+#include "capture/gst/stream_colours.h"
 #include "capture/source/capture_clock.h"
 #include "capture/source/device_elements.h"
 #include "capture/source/test_source.h"
@@ -135,6 +136,8 @@ std::optional<CaptureError> DevicePipeline::addDecoder(GstElement* source, const
   // A sound and picture server links nobody who takes anything.
   const CapsHandle anyPicture(gst_caps_from_string("video/x-raw; image/jpeg; video/x-h264"));
   g_object_set(filter.get(), "caps", caps != nullptr ? caps : anyPicture.get(), nullptr);
+  const GstHandle<GstPad> filtered(gst_element_get_static_pad(filter.get(), "src"));
+  correctColours(filtered.get());
   decodeInSoftware(decoder.get());
   g_signal_connect(decoder.get(), "pad-added", G_CALLBACK(&onPad), this);
   for (const auto& element : {&filter, &decoder})
