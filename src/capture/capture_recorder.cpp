@@ -60,6 +60,7 @@ CaptureRecorder::CaptureRecorder(const RecordingPlan& plan, RecordingSources sou
                .convert = [this](const RawMedium& frame) { return convert(frame); },
                .heard = [this](const RawMedium& chunk) { account_.sound(chunk); },
                .silenced = [this](double t, double seconds) { account_.silence(t, seconds); },
+               .soundComes = [this] { return !sound_away_; },
                .live = clock_.realTime()}) {
   if (encoding_.video) converter_.emplace(encoding_.video->size);
   journal_->capture(plan_.type, frame_seconds_, wall_offset_);
@@ -72,8 +73,8 @@ std::optional<CaptureError> CaptureRecorder::run(Reporter reporter, SoundReport 
     sound_report_ = std::move(soundReport);
   }
   sources.add(shared_from_this());
-  if (encoding_.audio && sources.hasNoSound())
-    soundLost({CaptureError::kDomain, kAudioSilent, sources.name() + ": has no sound"});
+  if (encoding_.audio && !sources.hasMicrophone())
+    soundLost({CaptureError::kDomain, kDeviceBusy, "the microphone is still being closed"});
   try {
     // Detached: this thread may hold the last reference to the recorder, and a thread cannot join itself.
     std::thread([self = shared_from_this(), reporter = std::move(reporter)] {
@@ -213,8 +214,6 @@ void CaptureRecorder::soundLost(const CaptureError& error) {
   if (report) report(&error);
 }
 
-bool CaptureRecorder::soundComes() const { return !sound_away_; }
-
 void CaptureRecorder::fail(const CaptureError& error) {
   double now = 0;
   {
@@ -243,9 +242,9 @@ void CaptureRecorder::record(const Reporter& reporter) {
   account_.finish(endOfMedia(), sources.soundCorrection());
   publish(frames);
   movie_.reset();
-  sources.release();  // closes the devices unless somebody else has them
   finished()->removeIfResolved();
   report({marks_.cancelled(), problem});
+  sources.release();  // last: a driver may take its time to close
 }
 
 /// Runs a step of the recording. No memory, no thread: what there is becomes the movie.
@@ -284,7 +283,7 @@ void CaptureRecorder::feed(MediaQueue::Batch batch) {
 bool CaptureRecorder::reachedEnd() const {
   const auto end = marks_.endTime();
   if (!end) return false;
-  return marks_.worthless() || queue_.expired() || cutter_.reaches(*end, soundComes());
+  return marks_.worthless() || queue_.expired() || cutter_.reaches(*end);
 }
 
 void CaptureRecorder::checkLimits() {

@@ -33,7 +33,7 @@ class CaptureRecorder : public CaptureConsumer, public std::enable_shared_from_t
     bool cancelled = false;
     std::optional<CaptureError> error;
   };
-  /// Told on the recording thread when the file is closed and the devices are given back.
+  /// Told on the recording thread when the file is closed; the devices are about to be given back.
   using Report = std::function<void(const Outcome&)>;
   /// Told on a source's thread when the microphone is lost while the recording goes on, and when it is back (null).
   using SoundReport = std::function<void(const CaptureError* error)>;
@@ -89,7 +89,6 @@ class CaptureRecorder : public CaptureConsumer, public std::enable_shared_from_t
   void publish(std::uint32_t totalFrames);
   [[nodiscard]] double endOfMedia() const;
   [[nodiscard]] BufferHandle convert(const RawMedium& frame);
-  [[nodiscard]] bool soundComes() const;
 
   // Any thread.
   void fail(const CaptureError& error);

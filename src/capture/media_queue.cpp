@@ -10,7 +10,7 @@ namespace {
 
 constexpr std::size_t kMaxFrames = 90;    // three seconds: an encoder this far behind will not catch up
 constexpr std::size_t kMaxFrameBytes = 256U << 20;
-constexpr std::size_t kMaxChunks = 1000;  // ten seconds
+constexpr double kMostSound = 20;         // seconds: a network camera may be away for ten
 constexpr std::size_t kFastQueue = 16;    // not live: the source waits
 constexpr double kFastLead = 1.0;         // seconds that sound may be ahead of the picture then
 constexpr std::uint64_t kDropsPerLogLine = 300;
@@ -34,7 +34,7 @@ void MediaQueue::pushVideo(RawMedium frame) {
     return;
   }
   if (closed_) return;
-  video_bytes_ += gst_buffer_get_size(frame.buffer.get());
+  if (frame.buffer) video_bytes_ += gst_buffer_get_size(frame.buffer.get());
   video_.push_back(std::move(frame));
   changed_.notify_all();
 }
@@ -46,7 +46,7 @@ void MediaQueue::pushAudio(RawMedium chunk) {
       const bool near = !has_video_ || chunk.time < std::max(0.0, picture_horizon_.load()) + kFastLead;
       return closed_ || (audio_.size() < kFastQueue && near);
     });
-  } else if (audio_.size() >= kMaxChunks) {
+  } else if (!audio_.empty() && chunk.time - audio_.front().time > kMostSound) {
     return;  // the cutter fills the hole with silence
   }
   if (closed_) return;

@@ -60,7 +60,7 @@ void PreviewController::startPreview() {
   SourceWish wish;
   {
     const std::lock_guard lock(mutex_);
-    if (lease_) return;
+    if (lease_ && !lease_->consumers().failure()) return;
     wish = wish_;
   }
   auto lease = Sources::instance().lease(wish);
@@ -69,8 +69,10 @@ void PreviewController::startPreview() {
     LMPLogMessage(nullptr, kLogError, "The preview could not be started: %s", problem->message.c_str());
     return;
   }
+  SourceLease before;  // one that was lost; given back without the lock
   const std::lock_guard lock(mutex_);
-  if (!lease_) lease_ = *std::move(lease);
+  before.swap(lease_);
+  lease_ = *std::move(lease);
 }
 
 void PreviewController::stopPreview() {
@@ -81,7 +83,7 @@ void PreviewController::stopPreview() {
 
 bool PreviewController::isPreviewRunning() const {
   const std::lock_guard lock(mutex_);
-  return lease_ && lease_->isRunning();
+  return lease_ != nullptr;
 }
 
 }  // namespace lmx

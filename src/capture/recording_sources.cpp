@@ -86,10 +86,6 @@ std::shared_ptr<CaptureSession> RecordingSources::session() const {
   return microphone_;
 }
 
-bool RecordingSources::hasNoSound() const { return !microphone_ || !microphone_->mayHaveSound(); }
-
-std::string RecordingSources::name() const { return microphone_ ? microphone_->name() : "the recording"; }
-
 double RecordingSources::soundCorrection() const { return microphone_ ? microphone_->soundCorrection() : 0; }
 
 }  // namespace lmx

@@ -26,10 +26,8 @@ class RecordingSources {
   [[nodiscard]] const CameraFormat& format() const { return format_; }
   /// The open devices, for the engine; null once they are given back.
   [[nodiscard]] std::shared_ptr<CaptureSession> session() const;
-  /// Whether the device that should give the sound has none.
-  [[nodiscard]] bool hasNoSound() const;
-  /// For messages: the device that should give the sound.
-  [[nodiscard]] std::string name() const;
+  /// False when there is none, or it could not be opened because it is still being closed.
+  [[nodiscard]] bool hasMicrophone() const { return microphone_ != nullptr; }
   /// See Source::soundCorrection.
   [[nodiscard]] double soundCorrection() const;
 

@@ -183,6 +183,8 @@ bool PictureConverter::prepare() {
   in_.colorimetry = colorimetryOf(caps_.get(), in_.finfo);
   // What interlacing is left can't be undone here, and fields must not be scaled apart.
   in_.interlace_mode = GST_VIDEO_INTERLACE_MODE_PROGRESSIVE;
+  // Some demuxers write nonsense where they know no aspect ratio.
+  if (in_.par_n <= 0 || in_.par_d <= 0) in_.par_n = in_.par_d = 1;
   place_ = placeIn(size_, in_);
   if (GST_VIDEO_FORMAT_INFO_IS_RGB(in_.finfo)) {
     rgb_.emplace(in_.colorimetry.range == GST_VIDEO_COLOR_RANGE_0_255, kBT709);

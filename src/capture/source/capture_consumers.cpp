@@ -4,19 +4,20 @@
 namespace lmx {
 
 void CaptureConsumers::add(const std::shared_ptr<CaptureConsumer>& consumer, SourceUse use) {
+  const std::lock_guard news(news_mutex_);
   std::optional<CaptureError> failure;
   std::optional<CaptureError> away;
+  std::optional<CaptureError> mute;
   {
     const std::lock_guard lock(mutex_);
     users_.push_back({consumer, use});
     failure = failure_;
     away = away_;
+    mute = mute_;
   }
-  if (failure) {
-    consumer->onSourceLost(use, *failure);
-  } else if (away) {
-    consumer->onSourceAway(use, *away);
-  }
+  if (failure) return consumer->onSourceLost(use, *failure);
+  if (away) consumer->onSourceAway(use, *away);
+  if (mute && use.sound) consumer->onSourceAway({.picture = false, .sound = true}, *mute);
 }
 
 void CaptureConsumers::remove(const CaptureConsumer* consumer) {
@@ -53,6 +54,7 @@ void CaptureConsumers::deliverSound(GstBuffer* sound, double time) const {
 }
 
 void CaptureConsumers::lost(const CaptureError& error) {
+  const std::lock_guard news(news_mutex_);
   std::vector<Held> users;
   {
     const std::lock_guard lock(mutex_);
@@ -64,6 +66,7 @@ void CaptureConsumers::lost(const CaptureError& error) {
 }
 
 void CaptureConsumers::away(const CaptureError& error) {
+  const std::lock_guard news(news_mutex_);
   std::vector<Held> users;
   {
     const std::lock_guard lock(mutex_);
@@ -74,7 +77,22 @@ void CaptureConsumers::away(const CaptureError& error) {
   for (const Held& user : users) user.consumer->onSourceAway(user.use, error);
 }
 
+void CaptureConsumers::noSound(const CaptureError& error) {
+  const std::lock_guard news(news_mutex_);
+  std::vector<Held> users;
+  {
+    const std::lock_guard lock(mutex_);
+    if (failure_ || mute_) return;
+    mute_ = error;
+    users = heldLocked();
+  }
+  for (const Held& user : users) {
+    if (user.use.sound) user.consumer->onSourceAway({.picture = false, .sound = true}, error);
+  }
+}
+
 void CaptureConsumers::back(double seconds) {
+  const std::lock_guard news(news_mutex_);
   std::vector<Held> users;
   {
     const std::lock_guard lock(mutex_);

@@ -33,7 +33,8 @@ class CaptureConsumer {
   virtual void onSourceBack(SourceUse use, double seconds) = 0;
 };
 
-/// The users of a source, and what they have to know of it. Users are called without the lock held. Thread-safe.
+/// The users of a source, and what they have to know of it. Media are delivered without any lock held. News come one
+/// after the other, so that nobody hears of a return before the loss: no user may add one from inside a call. Thread-safe.
 class CaptureConsumers {
  public:
   /// One that is added while the source is away, or after it was lost, is told at once.
@@ -48,6 +49,8 @@ class CaptureConsumers {
   void lost(const CaptureError& error);
   void away(const CaptureError& error);
   void back(double seconds);
+  /// The device has no sound, whatever somebody wants of it: for users of its sound that is away for good.
+  void noSound(const CaptureError& error);
   [[nodiscard]] std::optional<CaptureError> failure() const;
 
  private:
@@ -61,10 +64,12 @@ class CaptureConsumers {
   };
   [[nodiscard]] std::vector<Held> heldLocked() const;
   [[nodiscard]] std::vector<Held> held() const;
+  std::mutex news_mutex_;  ///< held while news are told
   mutable std::mutex mutex_;
   std::vector<User> users_;              // guarded by mutex_
   std::optional<CaptureError> failure_;  // guarded by mutex_
   std::optional<CaptureError> away_;     // guarded by mutex_
+  std::optional<CaptureError> mute_;     // guarded by mutex_
 };
 
 }  // namespace lmx

@@ -1,7 +1,9 @@
 // Makes and sets up elements.
 #include "capture/source/device_elements.h"
 
+#include "capture/gst/stream_colours.h"
 #include "capture/source/device_pipeline.h"
+#include "capture/source/pipewire_connection.h"
 #include "platform/log.h"
 #include "support/format.h"
 
@@ -65,9 +67,13 @@ GstHandle<GstElement> uriDecoder(const DeviceID& device) {
   if (decoder == nullptr) return nullptr;
   gst_object_ref_sink(decoder);
   g_object_set(decoder, "uri", device.text.c_str(), nullptr);
-  // A hardware decoder's memory can't be read everywhere; what is here decodes in software.
-  if (has(decoder, "force-sw-decoders")) g_object_set(decoder, "force-sw-decoders", TRUE, nullptr);
+  decodeInSoftware(decoder);
+  correctColoursIn(decoder);
   return GstHandle<GstElement>(decoder);
+}
+
+void decodeInSoftware(GstElement* decoder) {
+  if (has(decoder, "force-sw-decoders")) g_object_set(decoder, "force-sw-decoders", TRUE, nullptr);
 }
 
 GstHandle<GstElement> alsaSource(const std::string& pcm) {
@@ -78,14 +84,15 @@ GstHandle<GstElement> alsaSource(const std::string& pcm) {
   return GstHandle<GstElement>(source);
 }
 
-void tuneSource(GstElement* source) {
+void tuneSource(GstElement* source, bool overUdp) {
+  connectApart(source);
   if (has(source, "provide-clock")) g_object_set(source, "provide-clock", FALSE, nullptr);
   if (has(source, "slave-method")) gst_util_set_object_arg(G_OBJECT(source), "slave-method", "none");
   if (has(source, "always-copy")) g_object_set(source, "always-copy", TRUE, nullptr);
-  if (has(source, "protocols") && has(source, "latency")) {  // RTSP: over its own connection nothing gets lost
+  if (has(source, "protocols") && has(source, "latency")) {  // RTSP
     g_object_set(source, "latency", kNetworkLatencyMs, "tcp-timeout", kNetworkTimeoutUs, "timeout",
                  kNetworkTimeoutUs, nullptr);
-    gst_util_set_object_arg(G_OBJECT(source), "protocols", "tcp+udp");
+    gst_util_set_object_arg(G_OBJECT(source), "protocols", overUdp ? "udp" : "tcp");
   }
 }
 

@@ -17,11 +17,15 @@ std::string syntheticDevice(const DeviceID& device, bool picture, FrameRate rate
 /// Decodes whatever stands under the device's address; pads come and go. Null when the element is missing.
 GstHandle<GstElement> uriDecoder(const DeviceID& device);
 
+/// A hardware decoder's memory can't be read everywhere; what is here decodes in software.
+void decodeInSoftware(GstElement* decoder);
+
 /// A microphone of ALSA's own configuration, which no list shows. Null when the element is missing.
 GstHandle<GstElement> alsaSource(const std::string& pcm);
 
 /// Sets what the device's source element offers for low latency and true times: no clock of its own, no correction of
 /// times by leaping, no buffers that the device waits for.
-void tuneSource(GstElement* source);
+/// @param overUdp  what an RTSP camera is asked for; else its own connection, in which nothing gets lost
+void tuneSource(GstElement* source, bool overUdp);
 
 }  // namespace lmx

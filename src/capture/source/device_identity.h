@@ -25,9 +25,9 @@ inline constexpr const char* kInputIndex = "lmx.input-index";
 /// What is known about a device apart from its list entry.
 struct DeviceIdentity {
   std::string uniqueID;  ///< "v4l2:…", "alsa:…", "pipewire:…": stays the same over restarts; empty for none
-  std::string parent;  ///< identifies the physical device, which a camera and its own microphone share; may
-                       ///< be empty
-  bool isReal = false;     ///< a piece of hardware, not made up by a program
+  std::string parent;   ///< identifies the physical device, which a camera and its own microphone share; may
+                        ///< be empty
+  bool isReal = false;  ///< a piece of hardware, not made up by a program
   bool isDefault = false;  ///< the sound server's own default
   /// Whether it is left out of the list: the same as another entry, or nothing that can be captured from.
   bool hidden = false;

@@ -5,6 +5,7 @@
 
 #include <cstring>
 
+#include "capture/gst/stream_colours.h"
 #include "capture/source/capture_clock.h"
 #include "capture/source/device_elements.h"
 #include "capture/source/test_source.h"
@@ -68,6 +69,8 @@ Result<std::unique_ptr<DevicePipeline>, CaptureError> DevicePipeline::open(const
 DevicePipeline::DevicePipeline(const Wish& wish, FilePacer& pacer, DeviceOutput output)
     : device_(wish.device),
       real_time_(!wish.device.asFastAsPossible()),
+      picture_wanted_(wish.picture),
+      over_udp_(wish.overUdp),
       pacer_(pacer),
       output_(std::move(output)) {
   pacer_.resume();
@@ -112,7 +115,7 @@ std::optional<CaptureError> DevicePipeline::addHardware(const Wish& wish) {
                           ? alsaSource(*device_.alsaName())
                           : owned(gst_device_create_element(wish.hardware->device.get(), nullptr));
   if (!source) return error(kDeviceFailed, "can't be set up");
-  tuneSource(source.get());
+  tuneSource(source.get(), false);
   gst_bin_add(GST_BIN(pipeline_.get()), source.get());
   if (wish.picture && wish.hardware) {
     const auto mode = chooseMode(wish.hardware->modes, wish.demand);
@@ -133,6 +136,9 @@ std::optional<CaptureError> DevicePipeline::addDecoder(GstElement* source, const
   // A sound and picture server links nobody who takes anything.
   const CapsHandle anyPicture(gst_caps_from_string("video/x-raw; image/jpeg; video/x-h264"));
   g_object_set(filter.get(), "caps", caps != nullptr ? caps : anyPicture.get(), nullptr);
+  const GstHandle<GstPad> filtered(gst_element_get_static_pad(filter.get(), "src"));
+  correctColours(filtered.get());
+  decodeInSoftware(decoder.get());
   g_signal_connect(decoder.get(), "pad-added", G_CALLBACK(&onPad), this);
   for (const auto& element : {&filter, &decoder})
     gst_bin_add(GST_BIN(pipeline_.get()), element->get());
@@ -143,8 +149,8 @@ std::optional<CaptureError> DevicePipeline::addDecoder(GstElement* source, const
 
 // ---- streams that show up
 
-void DevicePipeline::onUriSource(GstElement* /*decoder*/, GstElement* source, gpointer /*self*/) noexcept {
-  tuneSource(source);
+void DevicePipeline::onUriSource(GstElement* /*decoder*/, GstElement* source, gpointer self) noexcept {
+  tuneSource(source, static_cast<DevicePipeline*>(self)->over_udp_);
 }
 
 void DevicePipeline::onPad(GstElement* /*decoder*/, GstPad* pad, gpointer self) noexcept {
@@ -154,8 +160,10 @@ void DevicePipeline::onPad(GstElement* /*decoder*/, GstPad* pad, gpointer self) 
 void DevicePipeline::onNoMorePads(GstElement* decoder, gpointer self) noexcept {
   auto& pipeline = *static_cast<DevicePipeline*>(self);
   pipeline.may_have_sound_ = pipeline.has_sound_.load();
-  if (pipeline.has_picture_ || pipeline.has_sound_) return;
-  GST_ELEMENT_ERROR(decoder, STREAM, WRONG_TYPE, ("it holds neither picture nor sound"), (nullptr));
+  pipeline.wake();
+  if (pipeline.picture_wanted_ ? pipeline.has_picture_ : pipeline.has_sound_) return;
+  GST_ELEMENT_ERROR(decoder, STREAM, WRONG_TYPE,
+                    ("it has no %s that can be decoded", pipeline.picture_wanted_ ? "picture" : "sound"), (nullptr));
 }
 
 /// The first picture and the first sound are taken.
@@ -168,10 +176,11 @@ void DevicePipeline::linkPad(GstPad* pad) {
   if (!picture && std::strncmp(name, "audio/", 6) != 0) return;
   if ((picture ? has_picture_ : has_sound_).exchange(true)) return;
   GstElement* branch = addBranch(picture);
-  if (branch == nullptr) return;
-  const GstHandle<GstPad> sink(gst_element_get_static_pad(branch, "sink"));
-  gst_element_sync_state_with_parent(branch);
-  gst_pad_link(pad, sink.get());
+  const GstHandle<GstPad> sink(branch == nullptr ? nullptr : gst_element_get_static_pad(branch, "sink"));
+  if (branch != nullptr) gst_element_sync_state_with_parent(branch);
+  if (sink && gst_pad_link(pad, sink.get()) == GST_PAD_LINK_OK) return;
+  GST_ELEMENT_ERROR(pipeline_.get(), STREAM, FORMAT, ("it gives a %s that can't be taken: %s",
+                    picture ? "picture" : "sound", GText(gst_caps_to_string(caps.get())).get()), (nullptr));
 }
 
 /// @return the branch, which the pipeline owns; null when it can't be made

@@ -36,6 +36,7 @@ class DevicePipeline {
   struct Wish {
     DeviceID device;
     bool picture = false;               ///< of hardware and synthetic devices, which give one of both
+    bool overUdp = false;               ///< how a network camera sends
     CameraDemand demand;                ///< the greatest picture and rate that are any use
     std::shared_ptr<const HardwareDevice> hardware;  ///< the device, if it is hardware from the list
   };
@@ -83,6 +84,8 @@ class DevicePipeline {
 
   const DeviceID device_;
   const bool real_time_;
+  const bool picture_wanted_;
+  const bool over_udp_;
   FilePacer& pacer_;
   const DeviceOutput output_;
   std::string mode_;

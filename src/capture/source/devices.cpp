@@ -104,13 +104,9 @@ std::vector<GstHandle<GstDevice>> devicesOf(std::initializer_list<const char*> c
   const GstHandle<GstDeviceMonitor> monitor(gst_device_monitor_new());
   for (const char* name : classes) gst_device_monitor_add_filter(monitor.get(), name, nullptr);
   std::vector<GstHandle<GstDevice>> devices;
-  // Started: otherwise the sound and picture server's provider tells of devices, in use through the same connection,
-  // after they have gone.
-  const bool started = gst_device_monitor_start(monitor.get()) != FALSE;
   GList* found = gst_device_monitor_get_devices(monitor.get());
   for (GList* item = found; item != nullptr; item = item->next) devices.emplace_back(GST_DEVICE(item->data));
   g_list_free(found);
-  if (started) gst_device_monitor_stop(monitor.get());
   return devices;
 }
 
@@ -145,11 +141,29 @@ std::vector<HardwareDevice> listHardware() {
   for (Found& found : everything()) {
     if (!found.hidden) devices.push_back(std::move(found.device));
   }
+  sortDevices(devices);
+  return devices;
+}
+
+HardwareDevice copyOf(const HardwareDevice& device) {
+  HardwareDevice copy;
+  copy.uniqueID = device.uniqueID;
+  copy.name = device.name;
+  copy.parent = device.parent;
+  copy.formats = device.formats;
+  copy.modes = device.modes;
+  copy.isVideo = device.isVideo;
+  copy.isReal = device.isReal;
+  copy.isDefault = device.isDefault;
+  copy.device.reset(GST_DEVICE(gst_object_ref(device.device.get())));
+  return copy;
+}
+
+void sortDevices(std::vector<HardwareDevice>& devices) {
   std::sort(devices.begin(), devices.end(), [](const HardwareDevice& one, const HardwareDevice& other) {
     return std::tuple(!one.isVideo, !one.isReal, !one.isDefault, one.uniqueID) <
            std::tuple(!other.isVideo, !other.isReal, !other.isDefault, other.uniqueID);
   });
-  return devices;
 }
 
 std::optional<HardwareDevice> findHardware(const std::string& uniqueID) {

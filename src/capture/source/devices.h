@@ -27,6 +27,12 @@ struct HardwareDevice {
 /// then by identifier. Opens no device for capturing. Blocks for some milliseconds. Thread-safe.
 std::vector<HardwareDevice> listHardware();
 
+/// The same device once more.
+HardwareDevice copyOf(const HardwareDevice& device);
+
+/// Puts devices into that order.
+void sortDevices(std::vector<HardwareDevice>& devices);
+
 /// The device with that identifier, which may also be one under which the list has it no more because another
 /// interface lists the same device; nothing when there is none. Blocks for some milliseconds. Thread-safe.
 std::optional<HardwareDevice> findHardware(const std::string& uniqueID);

@@ -20,6 +20,9 @@ constexpr auto kFirstSampleLimit = 10s;
 constexpr auto kSilenceLimit = 2s;
 constexpr auto kWatchInterval = 500ms;
 constexpr auto kRetryInterval = 3s;
+constexpr int kOftenTries = 20;
+constexpr auto kSeldomInterval = 10s;
+constexpr auto kUdpLimit = 5s;       // a refusal comes at once
 constexpr auto kNetworkLimit = 10s;  // for its three tries
 
 std::int64_t steadyMilliseconds() {
@@ -48,7 +51,7 @@ CameraFormat syntheticFormat(const DeviceID& device, const CameraDemand& demand)
 }  // namespace
 
 Source::Source(SourceWish wish)
-    : wish_(std::move(wish)), device_(parseDeviceID(wish_.device)), clock_(!device_.asFastAsPossible()) {}
+    : wish_(std::move(wish)), device_(parseDeviceID(wish_.device)), clock_(!device_.asFastAsPossible()), as_camera_(wish_.picture) {}
 
 bool Source::open(const std::shared_ptr<Source>& source) {
   try {
@@ -62,7 +65,9 @@ bool Source::open(const std::shared_ptr<Source>& source) {
 
 // ---- its users
 
-std::string Source::name() const { return redacted(wish_.device); }
+std::string Source::name() const {
+  return wish_.device == kAnyMicrophone ? "any microphone" : redacted(wish_.device);
+}
 
 void Source::close() {
   const std::lock_guard lock(mutex_);
@@ -91,8 +96,8 @@ std::optional<CaptureError> Source::waitUntilRunning(std::chrono::milliseconds l
   changed_.wait_for(lock, limit, [this] { return phase_ != Phase::opening; });
   if (phase_ == Phase::running) return std::nullopt;
   if (problem_) return problem_;
-  return CaptureError{CaptureError::kDomain, wish_.picture ? kDeviceSilent : kAudioSilent,
-                      name() + (wish_.picture ? ": gave no picture in time" : ": gave no sound in time")};
+  return CaptureError{CaptureError::kDomain, as_camera_ ? kDeviceSilent : kAudioSilent,
+                      name() + (as_camera_ ? ": gave no picture in time" : ": gave no sound in time")};
 }
 
 void Source::start() {
@@ -117,6 +122,7 @@ void Source::live() {
   while (!closing()) {
     const CaptureError error = openAndWatch();
     if (closing()) break;
+    if (triesOverUdp(error)) continue;
     if (triesAgain()) {
       goAway(error);
       waitBeforeNextTry();
@@ -150,10 +156,9 @@ CaptureError Source::openAndWatch() {
     opened_at_ = Clock::now();
     delivering_ = false;
     steady_sound_.reset();
-    if (hasOwnClock(device_)) steady_sound_.emplace(kSoundRate, kSoundChannels);
     auto opened = openPipeline();
     if (!opened) return opened.error();
-    const std::unique_ptr<DevicePipeline> pipeline = *std::move(opened);
+    std::unique_ptr<DevicePipeline> pipeline = *std::move(opened);
     {
       const std::lock_guard lock(mutex_);
       pipeline_ = pipeline.get();
@@ -165,6 +170,10 @@ CaptureError Source::openAndWatch() {
     {
       const std::lock_guard lock(mutex_);
       pipeline_ = nullptr;
+    }
+    pipeline.reset();  // while the driver closes lists leave the device out
+    {
+      const std::lock_guard lock(mutex_);
       hardware_ = nullptr;
     }
     const bool again = problem && problem->code == kStreamEnded && device_.kind == DeviceKind::file && pacer_.played();
@@ -175,11 +184,12 @@ CaptureError Source::openAndWatch() {
 
 Result<std::unique_ptr<DevicePipeline>, CaptureError> Source::openPipeline() {
   DevicePipeline::Wish wish{
-      .device = device_, .picture = wish_.picture, .demand = wish_.demand,   .hardware = nullptr};
+      .device = device_, .picture = as_camera_, .overUdp = over_udp_, .demand = wish_.demand,   .hardware = nullptr};
   if (!findHardwareFor(wish)) {
     return CaptureError{CaptureError::kDomain, kDeviceNotFound,
-                        name() + (wish_.picture ? ": the camera is not there" : ": the microphone is not there")};
+                        name() + (as_camera_ ? ": the camera is not there" : ": the microphone is not there")};
   }
+  if (hasOwnClock(wish.device)) steady_sound_.emplace(kSoundRate, kSoundChannels);
   DeviceOutput output;
   output.onPicture = [this](GstSample* picture, double time) { takePicture(picture, time); };
   output.onSound = [this](GstBuffer* sound, double time, double arrival) { takeSound(sound, time, arrival); };
@@ -204,7 +214,7 @@ bool Source::findHardwareFor(DevicePipeline::Wish& wish) {
     const HardwareDevice* first = firstDevice(devices, false);
     if (first == nullptr) return false;
     wish.device = parseDeviceID(first->uniqueID);
-    found_ = lookUpHardware(first->uniqueID);
+    found_ = std::make_shared<const HardwareDevice>(copyOf(*first));
   } else if (device_.kind == DeviceKind::hardware && !device_.alsaName()) {
     found_ = lookUpHardware(device_.text);
   } else {
@@ -217,17 +227,21 @@ bool Source::findHardwareFor(DevicePipeline::Wish& wish) {
 
 std::optional<CaptureError> Source::watch(DevicePipeline& pipeline) {
   if (auto problem = pipeline.watch(kWatchInterval)) return problem;
-  may_have_sound_ = pipeline.mayHaveSound();
+  const bool sound = pipeline.mayHaveSound();
+  if (!sound && may_have_sound_.exchange(sound)) {
+    LMPLogMessage(nullptr, kLogError, "%s has no sound: what is recorded of it is silent", name().c_str());
+    consumers_.noSound({CaptureError::kDomain, kAudioSilent, name() + ": has no sound"});
+  }
   return clock_.realTime() ? silence() : std::nullopt;
 }
 
 std::optional<CaptureError> Source::silence() const {
-  const CaptureErrorCode code = wish_.picture ? kDeviceSilent : kAudioSilent;
-  const char* what = wish_.picture ? "picture" : "sound";
+  const CaptureErrorCode code = as_camera_ ? kDeviceSilent : kAudioSilent;
+  const char* what = as_camera_ ? "picture" : "sound";
   if (!delivering_) {
     const std::int64_t away = away_since_ms_;
     const bool late = Clock::now() - opened_at_ > kFirstSampleLimit ||
-                      (wish_.picture && away != 0 && since(away) > kNetworkLimit);
+                      (as_camera_ && away != 0 && since(away) > kNetworkLimit);
     if (!late) return std::nullopt;
     return CaptureError{CaptureError::kDomain, code, name() + ": gave no " + what + " within 10 s"};
   }
@@ -239,7 +253,7 @@ std::optional<CaptureError> Source::silence() const {
 // ---- away and back
 
 bool Source::triesAgain() const {
-  if (!wish_.picture) return true;
+  if (!as_camera_) return true;
   if (device_.kind != DeviceKind::network || !ever_ran_) return false;
   return away_since_ms_ == 0 || since(away_since_ms_) + kRetryInterval < kNetworkLimit;
 }
@@ -247,6 +261,7 @@ bool Source::triesAgain() const {
 void Source::goAway(const CaptureError& error) {
   const bool first = away_since_ms_ == 0;
   if (first) away_since_ms_ = steadyMilliseconds();
+  failed_tries_ = first ? 0 : failed_tries_ + 1;
   {
     const std::lock_guard lock(mutex_);
     problem_ = error;
@@ -254,34 +269,33 @@ void Source::goAway(const CaptureError& error) {
   set(Phase::away);
   if (!first) return;
   LMPLogMessage(nullptr, kLogError, "The %s is away: %s (code %d); it is tried again every 3 s",
-                wish_.picture ? "camera" : "microphone", error.message.c_str(), error.code);
+                as_camera_ ? "camera" : "microphone", error.message.c_str(), error.code);
   consumers_.away(error);
 }
 
 void Source::waitBeforeNextTry() {
-  const bool firstOfNetwork = wish_.picture && since(away_since_ms_) < 1s;
+  std::chrono::milliseconds pause = kRetryInterval;
+  if (as_camera_ && since(away_since_ms_) < 1s) pause = 500ms;
+  if (failed_tries_ > kOftenTries) pause = kSeldomInterval;  // looking for it wakes the drivers of all devices
   std::unique_lock lock(mutex_);
-  changed_.wait_for(lock, firstOfNetwork ? 500ms : std::chrono::milliseconds(kRetryInterval),
-                    [this] { return closing_; });
+  changed_.wait_for(lock, pause, [this] { return closing_; });
 }
 
 // ---- streaming threads
 
 void Source::takePicture(GstSample* picture, double time) {
-  if (wish_.picture) {
-    last_sample_ms_ = steadyMilliseconds();
-    if (!delivering_) {
-      const GstCaps* caps = gst_sample_get_caps(picture);
-      const std::lock_guard lock(mutex_);
-      if (!format_) format_ = CameraFormat{recordedSize(caps), nominalRate(caps)};
-    }
-    firstSample();
+  last_sample_ms_ = steadyMilliseconds();
+  if (!has_format_.exchange(true)) {
+    const GstCaps* caps = gst_sample_get_caps(picture);
+    const std::lock_guard lock(mutex_);
+    format_ = CameraFormat{recordedSize(caps), nominalRate(caps)};
   }
+  firstSample();
   consumers_.deliverPicture(picture, time);
 }
 
 void Source::takeSound(GstBuffer* sound, double time, double arrival) {
-  if (!wish_.picture) {
+  if (!as_camera_) {
     last_sample_ms_ = steadyMilliseconds();
     firstSample();
   }
@@ -294,6 +308,14 @@ void Source::takeSound(GstBuffer* sound, double time, double arrival) {
   sound_correction_ = steady_sound_->partsPerMillion();
 }
 
+/// One that offers nothing else.
+bool Source::triesOverUdp(const CaptureError& error) {
+  const bool refused = error.code != kDeviceNotPermitted && !delivering_ && Clock::now() - opened_at_ < kUdpLimit;
+  if (device_.kind != DeviceKind::network || ever_ran_ || over_udp_ || !refused) return false;
+  over_udp_ = true;
+  return true;
+}
+
 /// The first one since the device was opened, of what the source is watched by.
 void Source::firstSample() {
   if (delivering_.exchange(true)) return;
@@ -302,7 +324,7 @@ void Source::firstSample() {
   const std::int64_t away = away_since_ms_.exchange(0);
   if (away == 0) return;
   const double seconds = std::chrono::duration<double>(since(away)).count();
-  LMPLogMessage(nullptr, kLogNotice, "The %s is back after %.1f s: %s", wish_.picture ? "camera" : "microphone",
+  LMPLogMessage(nullptr, kLogNotice, "The %s is back after %.1f s: %s", as_camera_ ? "camera" : "microphone",
                 seconds, name().c_str());
   consumers_.back(seconds);
 }

@@ -51,13 +51,13 @@ class Source : public CaptureSession {
   [[nodiscard]] std::optional<CaptureError> waitUntilRunning(std::chrono::milliseconds limit);
   /// Starts the flow of a device of "speed=max".
   void start();
+  /// Somebody wants its pictures, which decides how it is watched and how often it is tried again.
+  void useAsCamera() { as_camera_ = true; }
 
   [[nodiscard]] CaptureConsumers& consumers() { return consumers_; }
   [[nodiscard]] const CaptureClock& clock() const { return clock_; }
   /// Known once it runs.
   [[nodiscard]] CameraFormat format() const;
-  /// Whether it has sound; true as long as that isn't known.
-  [[nodiscard]] bool mayHaveSound() const { return may_have_sound_; }
   [[nodiscard]] const SourceWish& wish() const { return wish_; }
   /// For messages: its identifier, without a password.
   [[nodiscard]] std::string name() const;
@@ -78,6 +78,7 @@ class Source : public CaptureSession {
   [[nodiscard]] Result<std::unique_ptr<DevicePipeline>, CaptureError> openPipeline();
   [[nodiscard]] bool findHardwareFor(DevicePipeline::Wish& wish);
   [[nodiscard]] bool triesAgain() const;
+  [[nodiscard]] bool triesOverUdp(const CaptureError& error);
   void goAway(const CaptureError& error);
   void waitBeforeNextTry();
   void set(Phase phase);
@@ -98,11 +99,15 @@ class Source : public CaptureSession {
   std::atomic<std::int64_t> last_sample_ms_{0};  ///< steady clock; of what the source is watched by
   std::atomic<bool> delivering_{false};          ///< since it was opened last
   std::atomic<bool> may_have_sound_{true};
+  std::atomic<bool> has_format_{false};
+  std::atomic<bool> as_camera_;
   std::atomic<bool> ever_ran_{false};
   std::atomic<std::int64_t> away_since_ms_{0};  ///< steady clock; 0 when it isn't
 
   // The source's thread.
   Clock::time_point opened_at_;
+  bool over_udp_ = false;
+  int failed_tries_ = 0;  ///< since it went away
   std::shared_ptr<const HardwareDevice> found_;
 
   mutable std::mutex mutex_;

@@ -22,20 +22,6 @@ CaptureError busy(const Source& source) {
   return {CaptureError::kDomain, kDeviceBusy, source.name() + ": is still being closed"};
 }
 
-HardwareDevice copyOf(const HardwareDevice& device) {
-  HardwareDevice copy;
-  copy.uniqueID = device.uniqueID;
-  copy.name = device.name;
-  copy.parent = device.parent;
-  copy.formats = device.formats;
-  copy.modes = device.modes;
-  copy.isVideo = device.isVideo;
-  copy.isReal = device.isReal;
-  copy.isDefault = device.isDefault;
-  copy.device.reset(GST_DEVICE(gst_object_ref(device.device.get())));
-  return copy;
-}
-
 }  // namespace
 
 Sources& Sources::instance() {
@@ -67,7 +53,10 @@ Result<SourceLease, CaptureError> Sources::lease(const SourceWish& wish) {
         }
       }
     }
-    if (entry) break;
+    if (entry) {
+      if (wish.picture) entry->source->useAsCamera();
+      break;
+    }
     const auto left = std::chrono::duration_cast<std::chrono::milliseconds>(deadline - std::chrono::steady_clock::now());
     if (left <= 0ms || !closing->source->finished(left)) return busy(*closing->source);
     forget(closing);
@@ -114,8 +103,7 @@ std::vector<HardwareDevice> Sources::hardware() const {
                         });
     if (open && !listed) devices.push_back(copyOf(*open));
   }
-  std::stable_sort(devices.begin(), devices.end(),
-                   [](const auto& a, const auto& b) { return a.isVideo > b.isVideo; });
+  sortDevices(devices);
   return devices;
 }
 

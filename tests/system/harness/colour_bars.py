@@ -30,7 +30,7 @@ def shown(path):
     """The colours in the middle of the bars of a picture inside the movie, as a player shows them: its tags count."""
     probe = subprocess.run(["ffprobe", "-v", "error", "-select_streams", "v:0", "-show_entries", "stream=width,height",
                             "-of", "csv=p=0", str(path)], capture_output=True, check=True, timeout=60).stdout
-    width, height = map(int, probe.split(b","))
+    width, height = map(int, probe.split()[0].split(b","))
     raw = subprocess.run(["ffmpeg", "-v", "error", "-ss", "0.5", "-i", str(path), "-frames:v", "1", "-vf",
                           f"scale={EXACT}:in_color_matrix=auto:in_range=auto,format=rgb24", "-f", "rawvideo", "-"],
                          capture_output=True, check=True, timeout=60).stdout

@@ -33,6 +33,17 @@ TEST(MediaQueue, SoundAloneIsEnoughWhereThereIsNoPictureAndAtTheEnd) {
   EXPECT_EQ(ending.take().audio.size(), 1U);
 }
 
+/// A network camera may be away for ten seconds, and chunks may be short.
+TEST(MediaQueue, SoundWaitsForALongTime) {
+  MediaQueue queue(true, true);
+  constexpr double kChunk = 256.0 / 48000;
+  for (int i = 0; i * kChunk < 15; ++i) queue.pushAudio({nullptr, i * kChunk});
+  queue.pushVideo({nullptr, 15});
+  const auto batch = queue.take();
+  EXPECT_NEAR(batch.audio.back().time, 15, 0.01);
+  EXPECT_EQ(batch.audio.front().time, 0);
+}
+
 TEST(MediaQueue, GivesUpAtTheEarliestDeadline) {
   MediaQueue queue(true, true);
   queue.hurry(Clock::now());

@@ -59,13 +59,26 @@ TEST(PreviewController, ACameraThatWasLostIsOpenedAnewByTheNextRecording) {
   ASSERT_TRUE(preview.attachIOWithDevice(camera, &error));
   preview.startPreview();
   const auto lost = std::dynamic_pointer_cast<Source>(preview.session());
-  while (preview.isPreviewRunning()) std::this_thread::sleep_for(std::chrono::milliseconds(10));
+  while (lost->isRunning()) std::this_thread::sleep_for(std::chrono::milliseconds(10));
   const Folder folder;
   Capture capture(folder, camera, "test://audio");
   ASSERT_TRUE(capture.prepare());
   EXPECT_NE(capture.controller->session(), lost);
   capture.controller->cancelRecording();
   ASSERT_EQ(capture.reports->wait(), testing::Reports::Kind::cancel);
+}
+
+TEST(PreviewController, APreviewWhoseCameraWasLostCanBeStartedAgain) {
+  PreviewController preview(nullptr);
+  CaptureError error;
+  ASSERT_TRUE(preview.attachIOWithDevice("test://video?size=320x180&lost-after=0.3", &error));
+  preview.startPreview();
+  const auto lost = std::dynamic_pointer_cast<Source>(preview.session());
+  while (lost->isRunning()) std::this_thread::sleep_for(std::chrono::milliseconds(10));
+  EXPECT_TRUE(preview.isPreviewRunning()) << "somebody has to stop it";
+  preview.startPreview();
+  EXPECT_NE(preview.session(), lost);
+  EXPECT_TRUE(preview.session()->isRunning());
 }
 
 }  // namespace

@@ -4,6 +4,7 @@
 #include <gtest/gtest.h>
 
 #include "capture/gst/picture_converter.h"
+#include "capture/gst/stream_colours.h"
 #include "tests/unit/capture/gst/colour_bars.h"
 
 namespace lmx {
@@ -23,6 +24,10 @@ SampleHandle sentThrough(const RawPicture& picture, const std::string& elements)
   }
   const GstHandle<GstElement> in = elementNamed(pipeline->get(), "in");
   const GstHandle<GstElement> out = elementNamed(pipeline->get(), "out");
+  if (const GstHandle<GstElement> camera = elementNamed(pipeline->get(), "camera")) {
+    const GstHandle<GstPad> pad(gst_element_get_static_pad(camera.get(), "src"));
+    correctColours(pad.get());
+  }
   gst_app_src_set_caps(GST_APP_SRC(in.get()), picture.caps.get());
   gst_element_set_state(pipeline->get(), GST_STATE_PLAYING);
   for (int i = 0; i < 3; ++i) {
@@ -68,23 +73,31 @@ TEST_P(DecodedColours, AreThoseOfTheCamera) {
 
 INSTANTIATE_TEST_SUITE_P(
     Table, DecodedColours,
-    ::testing::Values(Way{"JPEG420", "format=I420,colorimetry=(string)1:4:0:0", 0.299, 0.114, true,
-                          JPEG_ENCODER " ! jpegdec"},
-                      Way{"JPEG422", "format=Y42B,colorimetry=(string)1:4:0:0", 0.299, 0.114, true,
-                          JPEG_ENCODER " ! jpegdec"},
-                      // As Video4Linux describes the JPEG of a webcam.
-                      Way{"JPEGOfAWebcam", "format=I420,colorimetry=(string)1:4:0:0", 0.299, 0.114, true,
-                          JPEG_ENCODER " ! capssetter caps=image/jpeg,colorimetry=(string)2:4:7:1 ! jpegdec"},
-                      Way{"H264Of709", "format=I420,colorimetry=(string)bt709", 0.2126, 0.0722, false,
-                          H264_ENCODER " ! h264parse ! avdec_h264"},
-                      Way{"H264Of601", "format=I420,colorimetry=(string)bt601", 0.299, 0.114, false,
-                          H264_ENCODER " ! h264parse ! avdec_h264"},
-                      Way{"H264Of709Full", "format=I420,colorimetry=(string)1:3:5:1", 0.2126, 0.0722, true,
-                          H264_ENCODER " ! h264parse ! avdec_h264"},
-                      Way{"H264Of601Full", "format=I420,colorimetry=(string)1:4:0:0", 0.299, 0.114, true,
-                          H264_ENCODER " ! h264parse ! avdec_h264"},
-                      Way{"H264Of444", "format=Y444,colorimetry=(string)bt709", 0.2126, 0.0722, false,
-                          H264_ENCODER " ! h264parse ! avdec_h264"}),
+    ::testing::Values(
+        Way{"JPEG420", "format=I420,colorimetry=(string)1:4:0:0", 0.299, 0.114, true,
+            JPEG_ENCODER " ! jpegdec"},
+        Way{"JPEG422", "format=Y42B,colorimetry=(string)1:4:0:0", 0.299, 0.114, true,
+            JPEG_ENCODER " ! jpegdec"},
+        // As Video4Linux describes the JPEG of a webcam.
+        Way{"JPEGOfAWebcam", "format=I420,colorimetry=(string)1:4:0:0", 0.299, 0.114, true,
+            JPEG_ENCODER " ! capssetter caps=image/jpeg,colorimetry=(string)2:4:7:1 ! jpegdec"},
+        Way{"JPEGOfAWebcamInAnotherDecoder", "format=I420,colorimetry=(string)1:4:0:0", 0.299, 0.114, true,
+            JPEG_ENCODER " ! capssetter name=camera caps=image/jpeg,parsed=true,colorimetry=(string)2:4:7:1 "
+                         "! avdec_mjpeg"},
+        Way{"H264InAContainerWithoutRange", "format=I420,colorimetry=(string)1:3:5:1", 0.2126, 0.0722, true,
+            H264_ENCODER
+            " ! capssetter name=camera caps=video/x-h264,colorimetry=(string)bt709 ! h264parse ! "
+            "avdec_h264"},
+        Way{"H264Of709", "format=I420,colorimetry=(string)bt709", 0.2126, 0.0722, false,
+            H264_ENCODER " ! h264parse ! avdec_h264"},
+        Way{"H264Of601", "format=I420,colorimetry=(string)bt601", 0.299, 0.114, false,
+            H264_ENCODER " ! h264parse ! avdec_h264"},
+        Way{"H264Of709Full", "format=I420,colorimetry=(string)1:3:5:1", 0.2126, 0.0722, true,
+            H264_ENCODER " ! h264parse ! avdec_h264"},
+        Way{"H264Of601Full", "format=I420,colorimetry=(string)1:4:0:0", 0.299, 0.114, true,
+            H264_ENCODER " ! h264parse ! avdec_h264"},
+        Way{"H264Of444", "format=Y444,colorimetry=(string)bt709", 0.2126, 0.0722, false,
+            H264_ENCODER " ! h264parse ! avdec_h264"}),
     [](const auto& way) { return std::string(way.param.name); });
 
 }  // namespace

@@ -124,6 +124,16 @@ TEST(PictureConverter, SquaresPixels) {
   EXPECT_LE(distanceFromBars(recordedBars(result.get(), {1024, 576})), kNear);
 }
 
+TEST(PictureConverter, TakesPixelsOfAnImpossibleShapeForSquareOnes) {
+  for (const char* shape : {",pixel-aspect-ratio=-1/1", ",pixel-aspect-ratio=0/1"}) {
+    const RawPicture picture = barsPicture(capsText("BGR", 640, 360, shape), 0, 0, true);
+    EXPECT_EQ(recordedSize(picture.caps.get()), (PictureSize{640, 360}));
+    PictureConverter converter({640, 360});
+    const BufferHandle result = converter.convert(picture.buffer.get(), picture.caps.get());
+    EXPECT_LE(distanceFromBars(recordedBars(result.get(), {640, 360})), kNear) << shape;
+  }
+}
+
 TEST(PictureConverter, TellsAChangeOfFormatOnce) {
   const RawPicture first = barsPicture(capsText("I420", 640, 360), 0.299, 0.114, false);
   const RawPicture second = barsPicture(capsText("YUY2", 320, 240), 0.299, 0.114, false);

@@ -3,6 +3,10 @@
 
 #include <gtest/gtest.h>
 
+#include <chrono>
+#include <future>
+#include <thread>
+
 namespace lmx {
 namespace {
 
@@ -75,6 +79,47 @@ TEST(CaptureConsumers, AbsenceAndReturnAlternate) {
   EXPECT_EQ(consumer->back, std::vector<double>{3});
   EXPECT_EQ(late->away, std::vector<int>{kAudioSilent}) << "who comes meanwhile is told";
   EXPECT_EQ(late->back, std::vector<double>{3});
+}
+
+/// Is told of the absence while it is being added, and takes its time: the return must come behind.
+class SlowConsumer : public Consumer {
+ public:
+  void onSourceAway(SourceUse use, const CaptureError& error) override {
+    entered.set_value();
+    std::this_thread::sleep_for(std::chrono::milliseconds(50));
+    Consumer::onSourceAway(use, error);
+    order += "away ";
+  }
+  void onSourceBack(SourceUse, double) override { order += "back "; }
+  std::promise<void> entered;
+  std::string order;
+};
+
+TEST(CaptureConsumers, NobodyHearsOfTheReturnBeforeTheAbsence) {
+  CaptureConsumers consumers;
+  consumers.away(error(kAudioSilent));
+  const auto slow = std::make_shared<SlowConsumer>();
+  auto entered = slow->entered.get_future();
+  std::thread adds([&] { consumers.add(slow, kBoth); });
+  entered.wait();
+  consumers.back(1);
+  adds.join();
+  EXPECT_EQ(slow->order, "away back ");
+}
+
+TEST(CaptureConsumers, WhoWantsNoSoundIsNotToldThatThereIsNone) {
+  CaptureConsumers consumers;
+  const auto both = std::make_shared<Consumer>();
+  const auto viewer = std::make_shared<Consumer>();
+  consumers.add(both, kBoth);
+  consumers.add(viewer, {.picture = true, .sound = false});
+  consumers.noSound(error(kAudioSilent));
+  consumers.noSound(error(kAudioSilent));
+  const auto late = std::make_shared<Consumer>();
+  consumers.add(late, kBoth);
+  EXPECT_EQ(both->away, std::vector<int>{kAudioSilent});
+  EXPECT_EQ(late->away, std::vector<int>{kAudioSilent});
+  EXPECT_TRUE(viewer->away.empty());
 }
 
 }  // namespace
