@@ -60,6 +60,7 @@ CaptureRecorder::CaptureRecorder(const RecordingPlan& plan, RecordingSources sou
                .convert = [this](const RawMedium& frame) { return convert(frame); },
                .heard = [this](const RawMedium& chunk) { account_.sound(chunk); },
                .silenced = [this](double t, double seconds) { account_.silence(t, seconds); },
+               .soundComes = [this] { return !sound_away_; },
                .live = clock_.realTime()}) {
   if (encoding_.video) converter_.emplace(encoding_.video->size);
   journal_->capture(plan_.type, frame_seconds_, wall_offset_);
@@ -212,8 +213,6 @@ void CaptureRecorder::soundLost(const CaptureError& error) {
   if (report) report(&error);
 }
 
-bool CaptureRecorder::soundComes() const { return !sound_away_; }
-
 void CaptureRecorder::fail(const CaptureError& error) {
   double now = 0;
   {
@@ -283,7 +282,7 @@ void CaptureRecorder::feed(MediaQueue::Batch batch) {
 bool CaptureRecorder::reachedEnd() const {
   const auto end = marks_.endTime();
   if (!end) return false;
-  return marks_.worthless() || queue_.expired() || cutter_.reaches(*end, soundComes());
+  return marks_.worthless() || queue_.expired() || cutter_.reaches(*end);
 }
 
 void CaptureRecorder::checkLimits() {

@@ -89,7 +89,6 @@ class CaptureRecorder : public CaptureConsumer, public std::enable_shared_from_t
   void publish(std::uint32_t totalFrames);
   [[nodiscard]] double endOfMedia() const;
   [[nodiscard]] BufferHandle convert(const RawMedium& frame);
-  [[nodiscard]] bool soundComes() const;
 
   // Any thread.
   void fail(const CaptureError& error);

@@ -79,7 +79,7 @@ void MediaCutter::feedSound(RawMedia chunks) {
     cutChunk(pending_sound_.front());
     pending_sound_.pop_front();
   }
-  if (around_.live) fillSilence(frames_.horizon() - kSoundPatience);
+  if (around_.live) fillSilence(frames_.horizon() - (around_.soundComes() ? kSoundPatience : 0));
 }
 
 void MediaCutter::feedNothing(double now) {
@@ -130,9 +130,9 @@ void MediaCutter::pushPieces(const RawMedium& chunk, const std::vector<SoundPiec
 
 // ---- the end
 
-bool MediaCutter::reaches(double end, bool soundComes) const {
+bool MediaCutter::reaches(double end) const {
   if (last_frame_time_ < end) return false;
-  if (!sound_ || !soundComes || frames_.runs().empty()) return true;
+  if (!sound_ || !around_.soundComes() || frames_.runs().empty()) return true;
   const MovieRun& last = frames_.runs().back();
   const double needed = last.sessionTime + last.frames * frames_.frameSeconds();
   if (!pending_sound_.empty() && endOf(pending_sound_.back()) >= needed) return true;

@@ -27,6 +27,7 @@ class MediaCutter {
     std::function<BufferHandle(const RawMedium& frame)> convert;
     std::function<void(const RawMedium& chunk)> heard;           ///< sound that is recorded
     std::function<void(double t, double seconds)> silenced;      ///< silence that is recorded instead
+    std::function<bool()> soundComes;  ///< false while the microphone is away: nobody waits for it then
     bool live = true;  ///< sound that is not there in time is silence
   };
   /// @param begin  running time at which the capture begins, seconds
@@ -39,8 +40,7 @@ class MediaCutter {
   /// Nothing has come for a while; `now` is the running time. Where there is only sound, silence goes on.
   void feedNothing(double now);
   /// Whether all frames before `end`, and the sound of those that were taken, have been fed.
-  /// @param soundComes  false while the microphone is away: nobody waits for it then
-  [[nodiscard]] bool reaches(double end, bool soundComes) const;
+  [[nodiscard]] bool reaches(double end) const;
   /// Gives the movie the sound that is left, and silence for what is missing. Nothing may be fed afterwards.
   void close();
 

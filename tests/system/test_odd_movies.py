@@ -74,15 +74,16 @@ def test_is_recorded_somehow(agent, odd_movie, name):
     check_times(agent.movie("ODD"), stop.sent - start.received)
 
 
-@pytest.mark.parametrize("name, sound", [("short-sound.mp4", [440] * 2 + [None] * 2), ("long-sound.mp4", [440] * 4)])
-def test_sound_that_is_shorter_or_longer_than_the_picture(agent, odd_movie, name, sound):
+@pytest.mark.parametrize("name, silence", [("short-sound.mp4", 3), ("long-sound.mp4", 0)])
+def test_sound_that_is_shorter_or_longer_than_the_picture(agent, odd_movie, name, silence):
+    """Sound of two seconds under a picture of four, and the other way round. What lacks is silence, or a still picture."""
     show(agent, odd_movie(name))
     agent.start()
-    start, stop = agent.record("UNEVEN", 6)
+    start, stop = agent.record("UNEVEN", 5)
     check_times(agent.movie("UNEVEN"), stop.sent - start.received)
     heard = sounds.heard(agent.movie("UNEVEN"))
-    assert heard.count(440) >= len(heard) * sound.count(440) // len(sound) - 2, heard
-    assert heard.count(None) >= len(heard) * sound.count(None) // len(sound) - 2, heard
+    assert heard.count(440) >= 5 and heard.count(None) >= silence, heard
+    assert silence or None not in heard, heard
 
 
 @pytest.mark.parametrize("name", ["size-changes.ts", "rate-changes.ts", "format-changes.ts"])
@@ -99,7 +100,7 @@ def test_what_changes_midway(agent, odd_movie, name):
     if name == "size-changes.ts":
         assert len(told) == 1, "one notice for the change to that size"
         left = movie.brightness(path, "crop=16:180:0:0")
-        assert left[15] > 60 and min(left) < 24, "bars beside the narrower pictures"
+        assert left[15] > 40 and min(left) < 24, "bars beside the narrower pictures"
     else:
         assert not told
 

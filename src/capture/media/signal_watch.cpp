@@ -130,7 +130,8 @@ SignalEvents SignalWatch::sound(std::span<const float> samples, int channels, in
   second_->peak = std::max(second_->peak, peak);
   const auto width = static_cast<std::size_t>(channels);
   if (peak >= clipping_ && !second_->clipped) second_->clipped = clips(samples, width);
-  const double end = t + static_cast<double>(samples.size() / width) / sampleRate;
+  const std::size_t frames = samples.size() / width;
+  const double end = t + static_cast<double>(frames) / sampleRate;
   return end - second_->begin < kInterval ? SignalEvents{} : judgeSecond(end);
 }
 

@@ -38,7 +38,7 @@ Result<SourceLease, CaptureError> Sources::lease(const SourceWish& wish) {
     {
       const std::lock_guard lock(mutex_);
       for (const auto& other : entries_) {
-        if (other->key == key && other->users == 0) closing = other;
+        if (other->key == key && other->users == 0 && other->source->clock().realTime()) closing = other;
       }
       entry = closing ? nullptr : findLocked(key);
       if (entry) {
@@ -64,10 +64,12 @@ Result<SourceLease, CaptureError> Sources::lease(const SourceWish& wish) {
   return SourceLease(entry->source.get(), [this, entry](Source*) { giveBack(entry); });
 }
 
-/// One that is lost is of no use to anybody new: its device is closed, and may be opened again.
+/// One that is lost is of no use to anybody new: its device is closed, and may be opened again. Nor is one of
+/// "speed=max", whose time began with its first user.
 std::shared_ptr<Sources::Entry> Sources::findLocked(const std::string& key) const {
   const auto found = std::find_if(entries_.begin(), entries_.end(), [&](const auto& entry) {
-    return entry->key == key && entry->users > 0 && !entry->source->consumers().failure();
+    return entry->key == key && entry->users > 0 && entry->source->clock().realTime() &&
+           !entry->source->consumers().failure();
   });
   return found == entries_.end() ? nullptr : *found;
 }

@@ -1,5 +1,6 @@
 // A camera in PipeWire: a node with YUY2 pictures of one size and rate, each with its number in the top row
-// of cells (see movie.counters) and the time when it was taken. Arguments: NAME WIDTH HEIGHT RATE.
+// of cells (see movie.counters) and the time when it was taken. Arguments: NAME WIDTH HEIGHT RATE API, the
+// last being what drives the hardware, or empty.
 #include <pipewire/pipewire.h>
 #include <spa/param/video/format-utils.h>
 #include <stdio.h>
@@ -95,7 +96,7 @@ static const struct pw_stream_events kEvents = {PW_VERSION_STREAM_EVENTS, .proce
                                                 .state_changed = on_state, .param_changed = on_param};
 
 int main(int argc, char** argv) {
-  if (argc != 5) return 64;
+  if (argc != 6) return 64;
   struct camera camera = {.width = atoi(argv[2]), .height = atoi(argv[3]), .rate = atoi(argv[4])};
   pw_init(NULL, NULL);
   camera.loop = pw_main_loop_new(NULL);
@@ -103,6 +104,7 @@ int main(int argc, char** argv) {
   struct pw_properties* properties =
       pw_properties_new(PW_KEY_MEDIA_CLASS, "Video/Source", PW_KEY_NODE_NAME, argv[1],
                         PW_KEY_NODE_DESCRIPTION, argv[1], PW_KEY_MEDIA_ROLE, "Camera", NULL);
+  if (argv[5][0]) pw_properties_set(properties, PW_KEY_DEVICE_API, argv[5]);
   camera.stream =
       pw_stream_new_simple(pw_main_loop_get_loop(camera.loop), argv[1], properties, &kEvents, &camera);
   uint8_t space[1024];

@@ -84,13 +84,14 @@ class PipeWireHall:
         self._guests.append(one)
         return one
 
-    def camera(self, name, size=(320, 180), rate=30):
-        """A virtual camera, to be started: numbered pictures (movie.counters) of one size and rate."""
-        return VirtualCamera(self, name, size, rate)
+    def camera(self, name, size=(320, 180), rate=30, api="v4l2"):
+        """A virtual camera, to be started: numbered pictures (movie.counters) of one size and rate. It claims to be
+        hardware, which "Automatic" asks for; without `api` it does not."""
+        return VirtualCamera(self, name, size, rate, api)
 
-    def microphone(self, name, frequency=440):
-        """A virtual microphone, to be started: two minutes of a sine of so many hertz."""
-        return VirtualMicrophone(self, name, sine(self.place / f"{frequency}.wav", frequency))
+    def microphone(self, name, frequency=440, api="alsa"):
+        """A virtual microphone, to be started: two minutes of a sine of so many hertz. `api` as for the camera."""
+        return VirtualMicrophone(self, name, sine(self.place / f"{frequency}.wav", frequency), api)
 
     def objects(self, kind):
         """The properties of all objects of a kind, such as "Node" or "Client"."""
@@ -152,19 +153,20 @@ class VirtualDevice(Guest):
 class VirtualCamera(VirtualDevice):
     """See pipewire_camera.c. (pipewiresink stops delivering after a few viewers.)"""
 
-    def __init__(self, hall, name, size, rate):
+    def __init__(self, hall, name, size, rate, api):
         program = hall.place / "camera"
         if not program.exists():
             flags = subprocess.run(["pkg-config", "--cflags", "--libs", "libpipewire-0.3"], check=True, timeout=20,
                                    capture_output=True, text=True).stdout.split()
             subprocess.run(["cc", "-O1", "-Wall", "-o", program, HARNESS / "pipewire_camera.c", *flags], check=True,
                            timeout=60)
-        super().__init__(hall, name, [str(program), name, *map(str, size), str(rate)])
+        super().__init__(hall, name, [str(program), name, *map(str, size), str(rate), api or ""])
 
 
 class VirtualMicrophone(VirtualDevice):
     """Played by pw-cat: the graph's own clock drives it. (pipewiresink does not deliver sound reliably.)"""
 
-    def __init__(self, hall, name, sound):
-        node = f"{{ media.class=Audio/Source node.name={name} node.description={name} }}"
+    def __init__(self, hall, name, sound, api):
+        claim = f"device.api={api}" if api else ""
+        node = f"{{ media.class=Audio/Source node.name={name} node.description={name} {claim} }}"
         super().__init__(hall, name, ["pw-cat", "--playback", "--properties", node, str(sound)])

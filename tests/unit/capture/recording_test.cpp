@@ -4,6 +4,7 @@
 
 #include <algorithm>
 #include <cmath>
+#include <cstdlib>
 #include <filesystem>
 #include <fstream>
 #include <thread>
@@ -141,6 +142,34 @@ TEST(Recording, SoundStaysWithThePictureInCopies) {
     EXPECT_NEAR(static_cast<double>(movie.sound.size()) / movie.sampleRate,
                 movie.frameTimes.back() + 1.0 / 30.0, 0.022);
   }
+}
+
+/// Two minutes, or LMX_HOURS of media (12 take some minutes).
+double longRecording() {
+  const char* hours = std::getenv("LMX_HOURS");
+  return hours == nullptr ? 120 : std::round(std::strtod(hours, nullptr) * 3600);
+}
+
+TEST(Recording, TheTailOfALongRecordingIsInStep) {
+  const Folder folder;
+  Capture capture(folder, "test://video?size=64x64&speed=max", kFastAudio);
+  ASSERT_TRUE(capture.prepare());
+  const double zero = capture.zero();
+  const double end = longRecording();
+  capture.controller->setStartWithUUID("all", zero, parametersFor("all"));
+  capture.controller->setStartWithUUID("tail", zero + end - 30, parametersFor("tail"));
+  for (const char* request : {"all", "tail"}) capture.controller->setStopWithUUID(request, zero + end);
+  ASSERT_TRUE(capture.controller->startRecording());
+  capture.controller->stopRecording();
+  ASSERT_EQ(capture.reports->wait(3600s), Kind::complete);
+  ASSERT_FALSE(capture.controller->processRequestWithUUID("tail", folder.file("tail.mov")));
+  const auto movie = decodeMovie(folder.file("tail.mov"));
+  ASSERT_EQ(movie.frameNumbers.size(), 900U);
+  EXPECT_EQ(movie.frameNumbers.front(), static_cast<std::uint32_t>(end - 30) * 30);
+  const auto ticks = testing::tickTimes(movie);
+  ASSERT_EQ(ticks.size(), 30U);
+  for (std::size_t i = 0; i < ticks.size(); ++i)
+    EXPECT_NEAR(ticks[i], static_cast<double>(i + 1) - kTickLead, 0.005) << "sound against picture, second " << i;
 }
 
 TEST(Recording, SoundOnly) {
