@@ -185,9 +185,10 @@ void CaptureRecorder::onSourceLost(SourceUse use, const CaptureError& error) {
 }
 
 void CaptureRecorder::onSourceAway(SourceUse use, const CaptureError& error) {
-  if (use.picture) return account_.cameraLost(CaptureClock::now());  // the frame before stays until it is back
+  if (use.picture)
+    return account_.cameraLost(CaptureClock::now());  // the frame before stays until it is back
   // Where there is only sound its loss is the end; but a microphone that has never been there is waited for.
-  !encoding_.video && heard_ ? fail(error) : soundLost(error);
+  !encoding_.video&& heard_ ? fail(error) : soundLost(error);
 }
 
 void CaptureRecorder::onSourceBack(SourceUse use, double /*seconds*/) {
@@ -301,6 +302,7 @@ std::uint32_t CaptureRecorder::closeMovie() {
   }
   cutter_.close();
   movie_->close(cutter_.frames().frames(), cutter_.samples());
+  if (queue_.dropped() > 0) movie_->fellBehind();
   return movie_->framesWritten(cutter_.frames().frames());
 }
 
@@ -308,8 +310,8 @@ std::uint32_t CaptureRecorder::closeMovie() {
 BufferHandle CaptureRecorder::convert(const RawMedium& frame) {
   BufferHandle picture = converter_->convert(frame.buffer.get(), frame.caps.get());
   if (const auto change = converter_->formatChange()) {
-    LMPLogMessage(nullptr, kLogNotice, "The camera's picture has changed: %s; it is fitted into the recording's",
-                  change->c_str());
+    LMPLogMessage(nullptr, kLogNotice,
+                  "The camera's picture has changed: %s; it is fitted into the recording's", change->c_str());
     account_.sizeChanged(frame.time, recordedSize(frame.caps.get()));
   }
   if (picture) account_.picture(picture.get(), encoding_.video->size, frame.time);

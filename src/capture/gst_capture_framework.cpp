@@ -8,6 +8,7 @@
 
 #include "capture/capture_controller.h"
 #include "capture/gst/plugin_packages.h"
+#include "capture/gst/video_encoders.h"
 #include "capture/preview_controller.h"
 #include "capture/source/device_id.h"
 #include "capture/source/device_list.h"
@@ -83,7 +84,9 @@ std::optional<LMRCompressionOptions> GstCaptureFramework::compressionOptions(Med
   return LMRCompressionOptions{.media = media, .quality = quality};
 }
 
-std::string GstCaptureFramework::deviceInformation() { return deviceListText(listHardware(), demandHere()); }
+std::string GstCaptureFramework::deviceInformation(const PictureLimits& limits) {
+  return deviceListText(listHardware(), demandHere(limits.size, limits.rate));
+}
 
 // ---- controllers
 
@@ -98,7 +101,10 @@ std::unique_ptr<LMRPreviewController> GstCaptureFramework::newPreviewController(
 
 // ---- start of the agent
 
-void GstCaptureFramework::warmUp() { loadPlugins(); }
+void GstCaptureFramework::warmUp() {
+  loadPlugins();
+  VideoEncoderChoice::instance().tryOut(knownVideoEncoders());
+}
 
 std::vector<RecoveredRecording> GstCaptureFramework::recoverUnfinished(
     const std::string& repository, const std::function<bool(const std::string& request)>& known) {

@@ -6,6 +6,7 @@
 #include <chrono>
 #include <cstring>
 
+#include "capture/gst/video_encoders.h"
 #include "platform/log.h"
 
 namespace lmx {
@@ -42,7 +43,7 @@ bool MovieOutput::start() {
   const std::size_t tracks = (encoding_.video ? 1 : 0) + (encoding_.audio ? 1 : 0);
   writer_ = std::make_unique<MovieWriter>(std::move(movie_), tracks, journal_, patience_,
                                           [this](int error) { on_error_(writeError(error)); });
-  auto encoder = Encoder::create(encoding_, patience_, encoderOutput());
+  auto encoder = newEncoder();
   if (encoder) {
     encoder_ = *std::move(encoder);
   } else {
@@ -70,6 +71,25 @@ void MovieOutput::pushFrame(GstBuffer* buffer, std::uint32_t place, bool forceKe
 
 void MovieOutput::pushSound(const float* samples, std::uint32_t count) {
   encoder_->pushAudio(samples, count);
+}
+
+/// Hardware may be taken, or away.
+Result<std::unique_ptr<Encoder>> MovieOutput::newEncoder() {
+  if (!encoding_.video) return Encoder::create(encoding_, patience_, encoderOutput());
+  VideoEncoding& video = *encoding_.video;
+  VideoEncoderChoice::instance().apply(video);
+  auto encoder = Encoder::create(encoding_, patience_, encoderOutput());
+  const VideoEncoderKind software = softwareEncoder();
+  if (encoder || video.kind.name == software.name) return encoder;
+  LMPLogMessage(nullptr, kLogWarning, "%s could not be started (%s): this recording is encoded with %s",
+                video.kind.name.c_str(), encoder.error().message.c_str(), software.name.c_str());
+  video.kind = software;
+  return Encoder::create(encoding_, patience_, encoderOutput());
+}
+
+void MovieOutput::fellBehind() const {
+  const bool diskWasSlow = writer_ && writer_->wasFull();
+  if (encoding_.video && !diskWasSlow) VideoEncoderChoice::instance().fellBehind(*encoding_.video);
 }
 
 void MovieOutput::setFormat(std::uint32_t track, TrackFormat format) {

@@ -43,12 +43,16 @@ class MovieOutput {
   /// @param totalFrames  length of the movie on its clock: the last frame lasts until then
   /// @param totalSamples  of each channel; what the encoder adds is dropped
   void close(std::uint32_t totalFrames, std::int64_t totalSamples);
+  /// Frames had to be dropped because this output was too slow. If that was the encoder's fault, the next
+  /// recording's gets less to do.
+  void fellBehind() const;
   /// How many of the `frames` of the movie's clock that were recorded the closed movie holds.
   [[nodiscard]] std::uint32_t framesWritten(std::uint32_t frames) const;
   [[nodiscard]] bool started() const { return encoder_ != nullptr; }
 
  private:
   [[nodiscard]] EncoderOutput encoderOutput();
+  [[nodiscard]] Result<std::unique_ptr<Encoder>> newEncoder();
   void setFormat(std::uint32_t track, TrackFormat format);
   void addFrame(std::optional<EncodedSample> frame);
   void endStreams(std::uint32_t totalFrames, std::int64_t totalSamples);

@@ -61,8 +61,8 @@ def file_sources(movie):
 def launch_words(picture, sources, target, first=""):
     """A pipeline with the daemon's encoders into a growing, crash-proof file. `first` goes in front of the encoder."""
     video, audio = sources
-    line = (f"{video} {first} ! x264enc tune=zerolatency speed-preset={picture.effort} bitrate={picture.kilobits} "
-            "key-int-max=30 byte-stream=false aud=false option-string=scenecut=0 ! "
+    line = (f"{video} {first} ! x264enc tune=zerolatency speed-preset={picture.effort} pass=qual quantizer=22 "
+            f"bitrate={picture.kilobits} vbv-buf-capacity=2000 key-int-max=60 byte-stream=false aud=false option-string=scenecut=0 ! "
             "video/x-h264,stream-format=avc,alignment=au ! "
             "qtmux name=mux fragment-duration=500 fragment-mode=first-moov-then-finalise ! "
             f"filesink location={target} buffer-mode=unbuffered {audio} ! avenc_aac bitrate=128000 ! mux.")
@@ -72,8 +72,8 @@ def launch_words(picture, sources, target, first=""):
 def ffmpeg_words(picture, movie, target):
     rate = f"{picture.kilobits}k"
     return ["ffmpeg", "-v", "error", "-nostdin", "-re", "-i", str(movie), "-c:v", "libx264", "-preset", picture.effort,
-            "-tune", "zerolatency", "-b:v", rate, "-maxrate", rate, "-bufsize", f"{picture.kilobits * 6 // 10}k",
-            "-g", "30", "-keyint_min", "3", "-sc_threshold", "0", "-x264-params", "scenecut=0", "-pix_fmt", "yuv420p",
+            "-tune", "zerolatency", "-crf", "22", "-maxrate", rate, "-bufsize", f"{picture.kilobits * 2}k",
+            "-g", "60", "-keyint_min", "6", "-sc_threshold", "0", "-x264-params", "scenecut=0", "-pix_fmt", "yuv420p",
             "-c:a", "aac", "-b:a", "128k", "-ar", "48000", "-ac", "2",
             "-movflags", "empty_moov+default_base_moof", "-frag_duration", "500000", "-f", "mov", "-y", str(target)]
 

@@ -84,4 +84,9 @@ def test_what_players_say_of_the_tracks(running):
     packet = json.loads(subprocess.run(
         ["ffprobe", "-v", "error", "-select_streams", "a", "-show_packets", "-read_intervals", "%+#1", "-of", "json",
          path], check=True, capture_output=True, timeout=60).stdout)["packets"][0]
+    boxes = subprocess.run(["ffprobe", "-v", "trace", path], check=True, capture_output=True, timeout=60).stderr.decode()
+    assert "nclc: pri 1 trc 1 matrix 1" in boxes
+    assert "edit list 0 - media time: 1024" in boxes
+    for box in ("sgpd", "sbgp"):
+        assert f"type:'{box}' parent:'stbl'" in boxes
     assert packet["pts"] == -1024 and packet["side_data_list"][0]["skip_samples"] == 1024

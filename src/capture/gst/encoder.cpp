@@ -17,8 +17,6 @@ namespace {
 // AAC
 constexpr int kSamplesPerPacket = 1024;
 constexpr int kEncoderDelay = 1024;  // samples
-/// The encoder counts frames, not time: a slow camera's key frames would be far apart.
-constexpr double kKeyFrameSeconds = 2.0;
 /// How far the encoder may be behind its feeder.
 constexpr std::size_t kFramesInside = 10;
 constexpr std::int64_t kSamplesInside = 48000;
@@ -128,8 +126,9 @@ void Encoder::pushVideo(GstBuffer* buffer, std::uint32_t place, bool forceKey) {
   gst_app_src_push_buffer(GST_APP_SRC(video_source_.get()), frame);
 }
 
+/// The encoder counts frames, not time: a slow camera's key frames would be far apart.
 bool Encoder::keyFrameIsDue(std::uint32_t place) const {
-  return (place - last_key_) * video_->frameRate.frameSeconds() >= kKeyFrameSeconds;
+  return place - last_key_ >= static_cast<std::uint32_t>(keyInterval(video_->frameRate));
 }
 
 /// @return false when the frame or sound is to be dropped

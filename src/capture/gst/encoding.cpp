@@ -2,7 +2,9 @@
 #include "capture/gst/encoding.h"
 
 #include <algorithm>
+#include <array>
 #include <cmath>
+#include <thread>
 
 #include "support/format.h"
 
@@ -11,18 +13,27 @@ namespace {
 
 constexpr double kSoundGrainSeconds = 0.01;
 
-std::string videoDescription(const VideoEncoding& video) {
-  const FrameRate rate = video.frameRate;
-  const int keyInterval = std::max(1, static_cast<int>(std::lround(1.0 / rate.frameSeconds())));
+/// The ceiling is an average over this time.
+constexpr int kCeilingMilliseconds = 2000;
+constexpr double kKeyFrameSeconds = 2.0;
+
+std::string softwareElements(const VideoEncoding& video) {
   return string_with_format(
-      "appsrc name=vsrc format=time max-buffers=0 max-bytes=0 max-time=0 stream-type=stream "
-      "caps=video/x-raw,format=I420,width=%d,height=%d,framerate=%d/%d,pixel-aspect-ratio=1/1,"
-      "colorimetry=bt709 ! "
-      "x264enc tune=zerolatency speed-preset=%s bitrate=%d key-int-max=%d byte-stream=false aud=false "
-      "option-string=scenecut=0 ! video/x-h264,stream-format=avc,alignment=au ! "
-      "appsink name=vout sync=false async=false max-buffers=0 enable-last-sample=false ",
-      video.size.width, video.size.height, rate.numerator, rate.denominator, speedPreset(video),
-      videoBitRate(video), keyInterval);
+      "x264enc tune=zerolatency speed-preset=%s pass=qual quantizer=%d bitrate=%d vbv-buf-capacity=%d "
+      "key-int-max=%d byte-stream=false aud=false option-string=scenecut=0",
+      speedPreset(video, std::thread::hardware_concurrency()), videoRateFactor(video), videoBitRate(video),
+      kCeilingMilliseconds, keyInterval(video.frameRate));
+}
+
+std::string videoDescription(const VideoEncoding& video) {
+  return string_with_format(
+             "appsrc name=vsrc format=time max-buffers=0 max-bytes=0 max-time=0 stream-type=stream "
+             "caps=video/x-raw,format=I420,width=%d,height=%d,framerate=%d/%d,pixel-aspect-ratio=1/1,"
+             "colorimetry=bt709 ! ",
+             video.size.width, video.size.height, video.frameRate.numerator, video.frameRate.denominator) +
+         video.kind.elements(video) +
+         " ! video/x-h264,stream-format=avc,alignment=au ! "
+         "appsink name=vout sync=false async=false max-buffers=0 enable-last-sample=false ";
 }
 
 std::string audioDescription(const AudioEncoding& audio) {
@@ -37,6 +48,8 @@ std::string audioDescription(const AudioEncoding& audio) {
 
 }  // namespace
 
+VideoEncoderKind softwareEncoder() { return {"x264enc", &softwareElements}; }
+
 double MovieEncoding::frameSeconds() const {
   return video ? video->frameRate.frameSeconds() : kSoundGrainSeconds;
 }
@@ -49,10 +62,27 @@ int videoBitRate(const VideoEncoding& video) {
   return std::max(150, static_cast<int>(kilobits * kFactor[static_cast<int>(video.quality)]));
 }
 
-const char* speedPreset(const VideoEncoding& video) {
+int videoRateFactor(const VideoEncoding& video) {
+  static constexpr std::array kFactor{24, 22, 19};
+  return kFactor[static_cast<std::size_t>(video.quality)];
+}
+
+const char* speedPreset(const VideoEncoding& video, unsigned cores) {
+  static constexpr std::array kEfforts{"veryfast", "superfast", "ultrafast"};
+  constexpr unsigned kCoresForLargePictures = 4;  // "veryfast" takes most of one at 1080p
   const bool upTo720p = video.size.width * video.size.height <= 1280 * 720;
-  if (video.quality == RecordingQuality::good || !upTo720p) return "superfast";
-  return "veryfast";
+  const bool strong = video.quality == RecordingQuality::best && cores >= kCoresForLargePictures;
+  const int wanted = video.quality == RecordingQuality::good || !(upTo720p || strong) ? 1 : 0;
+  return kEfforts[std::min(kEfforts.size() - 1, static_cast<std::size_t>(wanted + video.effortSaved))];
+}
+
+std::string describeEncoder(const VideoEncoding& video) {
+  if (video.kind.name != softwareEncoder().name) return video.kind.name;
+  return video.kind.name + " " + speedPreset(video, std::thread::hardware_concurrency());
+}
+
+int keyInterval(FrameRate rate) {
+  return std::max(1, static_cast<int>(std::lround(kKeyFrameSeconds / rate.frameSeconds())));
 }
 
 std::uint32_t videoTimescale(FrameRate rate) {

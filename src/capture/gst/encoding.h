@@ -1,6 +1,7 @@
 // How a movie's picture and sound are encoded. Pure.
 #pragma once
 #include <cstdint>
+#include <functional>
 #include <optional>
 #include <string>
 
@@ -9,10 +10,23 @@
 
 namespace lmx {
 
+struct VideoEncoding;
+
+/// An encoder of pictures.
+struct VideoEncoderKind {
+  std::string name;
+  /// Its elements in GStreamer's launch notation: I420 goes in, H.264 without reordered frames comes out.
+  std::function<std::string(const VideoEncoding&)> elements;
+};
+/// x264.
+VideoEncoderKind softwareEncoder();
+
 struct VideoEncoding {
   PictureSize size;
   FrameRate frameRate;
   RecordingQuality quality = RecordingQuality::better;
+  VideoEncoderKind kind = softwareEncoder();
+  int effortSaved = 0;  ///< steps below the effort that the quality asks for
 };
 struct AudioEncoding {
   int sampleRate = 48000;  ///< Hz
@@ -27,10 +41,18 @@ struct MovieEncoding {
   [[nodiscard]] double frameSeconds() const;
 };
 
-/// Kilobits a second for a picture. Grows with its pixels, less than in proportion.
+/// Kilobits a second that a picture takes at most, averaged over two seconds. Grows with its pixels, less
+/// than in proportion.
 int videoBitRate(const VideoEncoding& video);
-/// The encoder's effort: what a small machine sustains live.
-const char* speedPreset(const VideoEncoding& video);
+/// The constant quality that is aimed at below that rate: x264's rate factor, lower is better.
+int videoRateFactor(const VideoEncoding& video);
+/// The encoder's effort: what the machine sustains live.
+/// @param cores  of the machine
+const char* speedPreset(const VideoEncoding& video, unsigned cores);
+/// The encoder and its effort in words, for the log.
+std::string describeEncoder(const VideoEncoding& video);
+/// Frames from one key frame to the next at most.
+int keyInterval(FrameRate rate);
 /// Timescale units a second of a video track; at least 10,000, and a multiple of the rate's numerator.
 std::uint32_t videoTimescale(FrameRate rate);
 /// Length of a frame in those units, without a remainder.

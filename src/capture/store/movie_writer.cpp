@@ -45,6 +45,7 @@ void MovieWriter::add(EncodedSample sample) {
   const auto hasRoom = [this] {
     return queued_bytes_ < kQueueLimit || ending_ || error_ != 0 || overflowed_;
   };
+  if (!hasRoom()) was_full_ = true;
   while (!hasRoom() && !patience_.passed()) changed_.wait_for(lock, kDeadlineCheck);
   if (error_ != 0 || overflowed_) return;
   int problem = 0;

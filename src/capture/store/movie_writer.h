@@ -41,6 +41,8 @@ class MovieWriter {
   /// The errno of the first sync that failed; 0 when none has. Part of the data is lost then, although later
   /// syncs succeed: the kernel reports such a loss only once. Thread-safe.
   [[nodiscard]] int syncError() const { return sync_error_; }
+  /// Whether the disk was so slow that samples had to wait. Thread-safe.
+  [[nodiscard]] bool wasFull() const { return was_full_; }
   /// Valid after finish().
   [[nodiscard]] const MovieIndex& index() const { return movie_.index(); }
 
@@ -77,6 +79,7 @@ class MovieWriter {
   bool overflowed_ = false;                          // guarded by mutex_: takes no more, writes what it has
   std::atomic<int> error_{0};
   std::atomic<int> sync_error_{0};
+  std::atomic<bool> was_full_{false};
   std::thread thread_;
 };
 

@@ -3,6 +3,10 @@
 
 #include <gtest/gtest.h>
 
+#include <algorithm>
+#include <filesystem>
+#include <random>
+
 #include "capture/movie/movie_copy.h"
 #include "capture/movie/movie_reader.h"
 #include "capture/source/test_picture.h"
@@ -130,6 +134,29 @@ TEST(MovieOutput, APictureDoesNotWaitForItsSound) {
     EXPECT_EQ(movie.frameNumbers, places);
     EXPECT_NEAR(movie.duration, 2.0, 0.03);
   }
+}
+
+/// A still picture costs next to nothing, noise no more than the ceiling.
+TEST(MovieOutput, TakesTheBitsThatThePictureNeeds) {
+  const auto kilobits = [](bool noise) {
+    Output output(pictureOnly());
+    std::mt19937 random(5);  // NOLINT: the same numbers every time
+    const BufferHandle still = pictureOf(7);
+    for (std::uint32_t place = 0; place < 300; ++place) {
+      BufferHandle picture(gst_buffer_copy_deep(still.get()));
+      GstMapInfo map;
+      gst_buffer_map(picture.get(), &map, GST_MAP_WRITE);
+      if (noise) std::generate_n(map.data, map.size, [&] { return static_cast<guint8>(random()); });
+      gst_buffer_unmap(picture.get(), &map);
+      (*output).pushFrame(picture.get(), place, place == 0);
+    }
+    output.close(300);
+    return static_cast<double>(std::filesystem::file_size(output.path())) * 8 / 10 / 1000;
+  };
+  const int ceiling = videoBitRate({kSize, {30, 1}});
+  EXPECT_LT(kilobits(false), ceiling * 0.1);
+  EXPECT_GT(kilobits(true), ceiling * 0.5) << "the test's noise needs all it can get";
+  EXPECT_LT(kilobits(true), ceiling * 1.5) << "ten seconds may hold twelve seconds' bits";
 }
 
 TEST(MovieOutput, ASlowCamerasKeyFramesAreTwoSecondsApartAtMost) {

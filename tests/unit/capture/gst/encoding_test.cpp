@@ -32,6 +32,18 @@ TEST(Encoding, BitRateGrowsLessThanThePicture) {
   EXPECT_GT(bitRate(1280, 720, RecordingQuality::best), bitRate(1280, 720));
 }
 
+TEST(Encoding, EffortFollowsQualitySizeAndMachine) {
+  const auto effort = [](int width, int height, RecordingQuality quality, unsigned cores) {
+    return std::string(speedPreset({{width, height}, {30, 1}, quality}, cores));
+  };
+  using Q = RecordingQuality;
+  EXPECT_EQ(effort(1280, 720, Q::good, 8), "superfast");
+  EXPECT_EQ(effort(1280, 720, Q::better, 2), "veryfast");
+  EXPECT_EQ(effort(1920, 1080, Q::better, 8), "superfast");
+  EXPECT_EQ(effort(1920, 1080, Q::best, 2), "superfast");
+  EXPECT_EQ(effort(1920, 1080, Q::best, 4), "veryfast");
+}
+
 TEST(Encoding, SoundAloneIsCutInHundredthsOfASecond) {
   EXPECT_DOUBLE_EQ((MovieEncoding{.video = {}, .audio = AudioEncoding{}}.frameSeconds()), 0.01);
 }
