@@ -52,8 +52,7 @@ std::string PreviewController::videoDeviceLocalizedDisplayName() const {
 
 std::shared_ptr<CaptureSession> PreviewController::session() const {
   const std::lock_guard lock(mutex_);
-  if (lease_) return lease_;
-  return session_;
+  return lease_;
 }
 
 void PreviewController::startPreview() {

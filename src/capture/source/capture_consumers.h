@@ -49,8 +49,10 @@ class CaptureConsumers {
   void lost(const CaptureError& error);
   void away(const CaptureError& error);
   void back(double seconds);
-  /// The device has no sound, whatever somebody wants of it: for users of its sound that is away for good.
+  /// The device gives pictures but no sound: for users of its sound that is away.
   void noSound(const CaptureError& error);
+  /// It gives sound again, after `seconds`.
+  void soundBack(double seconds);
   [[nodiscard]] std::optional<CaptureError> failure() const;
 
  private:
