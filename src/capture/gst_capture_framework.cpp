@@ -84,7 +84,9 @@ std::optional<LMRCompressionOptions> GstCaptureFramework::compressionOptions(Med
   return LMRCompressionOptions{.media = media, .quality = quality};
 }
 
-std::string GstCaptureFramework::deviceInformation() { return deviceListText(listHardware(), demandHere()); }
+std::string GstCaptureFramework::deviceInformation(const PictureLimits& limits) {
+  return deviceListText(listHardware(), demandHere(limits.size, limits.rate));
+}
 
 // ---- controllers
 

@@ -28,7 +28,7 @@ class GstCaptureFramework : public CaptureFramework {
       std::shared_ptr<CaptureSession> session) override;
 
   void warmUp() override;
-  std::string deviceInformation() override;
+  std::string deviceInformation(const PictureLimits& limits) override;
   std::vector<RecoveredRecording> recoverUnfinished(
       const std::string& repository, const std::function<bool(const std::string& request)>& known) override;
 };

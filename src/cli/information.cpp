@@ -33,7 +33,7 @@ ProcessEnd printInformation(const std::string& kind, CaptureFramework& framework
       printContext("daemon-prefs", newRecordingContextForDaemon(framework));
       dumpDaemon();
     } else if (kind == "zq-device-list") {
-      std::fputs(redacted(framework.deviceInformation()).c_str(), stdout);
+      std::fputs(redacted(framework.deviceInformation(pictureLimitsInPrefs())).c_str(), stdout);
     }
   } catch (const std::exception& error) {
     LMPLogMessage(nullptr, kLogCritical, "Exception caught: %s", error.what());

@@ -124,6 +124,18 @@ void RecordingContextBuilder::chooseAudio(LMRRecordingContext& context, const Te
   if (!context.audioCompressionOptions) failInvalidCompression("RecordingCapturePreset", textOrNull(preset));
 }
 
+double maximumFrameRateFrom(const std::optional<std::string>& text) {
+  const double rate = text ? std::strtod(text->c_str(), nullptr) : 0;
+  return rate >= 1 && rate <= 240 ? rate : 30.0;
+}
+
+PictureLimits pictureLimitsInPrefs() {
+  AgentPreferences prefs;
+  const auto read = [&prefs](const char* key) { return textOf(prefs.getFromPrefsFile(key)); };
+  return {.size = maximumSizeFrom(read("RecordingVideoMaximumSize")),
+          .rate = maximumFrameRateFrom(read("RecordingVideoMaximumFrameRate"))};
+}
+
 std::shared_ptr<LMRRecordingContext> newRecordingContextForAdHoc(CaptureCatalog& catalog) {
   AgentPreferences prefs;
   RecordingContextBuilder builder(prefs, &AgentPreferences::get, catalog);

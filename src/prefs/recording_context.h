@@ -56,4 +56,9 @@ std::shared_ptr<LMRRecordingContext> newRecordingContextForDaemon(CaptureCatalog
 std::shared_ptr<LMRRecordingContext> newRecordingContextForDaemonWithRecordingType(CaptureCatalog& catalog,
                                                                                    CaptureType type);
 
+/// Frames a second at most, from "RecordingVideoMaximumFrameRate": 1 to 240; 30 for anything else.
+double maximumFrameRateFrom(const std::optional<std::string>& text);
+/// What the preferences file allows a camera, whether or not the rest of it can be used.
+PictureLimits pictureLimitsInPrefs();
+
 }  // namespace lmx

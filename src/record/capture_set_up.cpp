@@ -1,8 +1,6 @@
 // Builds a ready capture from the preferences.
 #include "record/capture_set_up.h"
 
-#include <cstdlib>
-
 #include "model/codes.h"
 #include "model/metadata_keys.h"
 #include "platform/log.h"
@@ -31,12 +29,6 @@ std::shared_ptr<LMRRecordingContext> captureSettings(const AgentContext& context
   }
 }
 
-double frameRateSetting(const AgentContext& context) {
-  const auto text = context.recording.recording_video_maximum_frame_rate.get();
-  const double rate = text ? std::strtod(text->c_str(), nullptr) : 0;
-  return rate >= 1 && rate <= 240 ? rate : 30.0;
-}
-
 /// A conference day that was asked for must not end after the usual four hours. An ad-hoc recording ends when
 /// its operator said.
 std::uint32_t lengthLimit(const AgentContext& context, const LMRRecordingContext& settings,
@@ -57,7 +49,8 @@ int LXAgentRecordPrepareCaptureController(AgentContext& context, const SharedDic
   const auto settings = captureSettings(context, *session, *framework);
   if (!settings) return kRecordNotRunning;
   settings->outputPath = session->filename.get().value_or("");
-  settings->maximumFrameRate = frameRateSetting(context);
+  settings->maximumFrameRate =
+      maximumFrameRateFrom(context.recording.recording_video_maximum_frame_rate.get());
   settings->maxDurationMinutes = lengthLimit(context, *settings, metadata);
   const auto controller = framework->newCaptureController();
   const auto delegate = std::make_shared<LMRCaptureDelegate>(controller.get());

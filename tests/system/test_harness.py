@@ -1,13 +1,19 @@
 """The harness's readers against known material: a reader that finds nothing would prove nothing."""
+import subprocess
+import time
+
 import numpy
 import pytest
-from harness import movie
+from harness import movie, sounds
 from harness.agent import REPOSITORY
 from harness.numbered import make_movie
 from harness.one_thread import main_thread_held
+from harness.pipewire_hall import PipeWireHall
 from harness.power_cut import PowerCut
+from harness.rtsp_camera import RtspCamera, mode
+from harness.slow_calls import slow_directories
 from harness.unread import all_read, wait_read
-from harness.waiting import let_pass
+from harness.waiting import let_pass, wait_until
 
 
 def test_counters_are_read_back(tmp_path):
@@ -118,3 +124,61 @@ def test_the_main_thread_is_held_and_no_other(agent, server):
         assert not agent.log.lines("Process pauseCapture", after=mark)
     assert server.reply() == "cmdStatus=0"
     assert agent.log.lines("Process pauseCapture", after=mark)
+
+
+def test_sounds_are_told_apart(tmp_path):
+    subprocess.run(["ffmpeg", "-v", "error", "-f", "lavfi", "-i", "sine=frequency=440:duration=1", "-f", "lavfi", "-i",
+                    "sine=frequency=720:duration=1", "-filter_complex", "[0]apad=pad_dur=1[a];[a][1]concat=v=0:a=1",
+                    "-c:a", "aac", str(tmp_path / "a.mov")], check=True, timeout=60)
+    assert sounds.heard(tmp_path / "a.mov") == [440, 440, None, None, 720, 720]
+
+
+def test_brightness_is_that_of_the_part(tmp_path):
+    make_movie(tmp_path / "a.mov", [0, 2**32 - 1])
+    top, rest = (movie.brightness(tmp_path / "a.mov", f"crop=320:{height}:0:{y}") for height, y in ((8, 0), (160, 20)))
+    assert top == pytest.approx([0, 255], abs=3) and rest == pytest.approx([90, 90], abs=3)
+
+
+def packets_seen(agent, camera, seconds):
+    """What a viewer gets: (time since the first packet, whether it is a key frame) for each picture."""
+    seen = subprocess.run([*agent.sandbox.entering("net"), "timeout", str(seconds), "ffprobe", "-v", "quiet",
+                           "-rtsp_transport", "tcp", "-select_streams", "v", "-show_entries", "packet=pts_time,flags",
+                           "-of", "csv=p=0", camera.uri], capture_output=True, timeout=60, check=False).stdout.decode()
+    pairs = [line.split(",")[:2] for line in seen.splitlines() if "," in line]
+    times = [(float(time), "K" in flags) for time, flags in pairs if time != "N/A"]
+    return [(time - times[0][0], key) for time, key in times]
+
+
+def test_a_network_camera_withholds_its_key_frames(agent):
+    with RtspCamera(agent.prepare(), key_frame_after=2, user="hall", password="secret") as camera:
+        seen = packets_seen(agent, camera, 6)
+        wait_until(lambda: camera.viewers() == [1, 0], what="the viewer's end")
+    assert len(seen) > 60
+    assert min(time for time, key in seen if key) == pytest.approx(2, abs=1.1), seen
+
+
+def test_a_network_camera_changes_its_mode(agent):
+    with RtspCamera(agent.prepare()) as camera:
+        with subprocess.Popen([*agent.sandbox.entering("net"), "ffmpeg", "-v", "error", "-rtsp_transport", "tcp", "-t", "3",
+                               "-i", camera.uri, "-c", "copy", agent.path("/tmp/seen.ts")]):
+            wait_until(lambda: camera.viewers() == [1], what="a viewer")
+            camera.change("mode", "caps", mode((640, 480)))
+        sizes = subprocess.run(["ffprobe", "-v", "quiet", "-select_streams", "v", "-show_entries", "frame=width,height",
+                                "-of", "csv=p=0", agent.path("/tmp/seen.ts")], capture_output=True, check=True, timeout=60)
+    assert {b"320,180", b"640,480"} <= {line[:7] for line in sizes.stdout.splitlines()}
+
+
+def test_virtual_devices_deliver_again_and_again(agent):
+    with PipeWireHall(agent) as hall, hall.microphone("lectern", frequency=440), hall.camera("podium") as camera:
+        for _ in range(3):
+            hall.watch("podium", "video/x-raw", "15 ! fakesink")
+        hall.watch("lectern", "audio/x-raw", "30 ! fakesink")
+        camera.unplug()
+        assert not hall.has("podium") and hall.has("lectern")
+
+
+def test_a_slow_disk_is_slow(agent, tmp_path):
+    prefix = [word.replace("/var/slow", str(agent.path("/var/slow"))) for word in slow_directories(agent, 300)]
+    before = time.monotonic()
+    subprocess.run([*prefix, "mkdir", str(tmp_path / "a")], check=True, timeout=20)
+    assert time.monotonic() - before > 0.3 and (tmp_path / "a").is_dir()

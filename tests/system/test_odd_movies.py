@@ -1,4 +1,6 @@
 """Movies as cameras, with every oddity that people's files have: recorded, or refused with a reason."""
+import fractions
+
 import pytest
 from harness import movie, sounds
 from harness.log_reader import Level
@@ -115,7 +117,35 @@ def test_a_silent_movie_is_recovered_after_a_kill(agent, odd_movie):
     agent.log.wait("CRASH.mov", timeout=20)
     agent.stop()
     movie.decodes(agent.movie("CRASH"))
-    assert all(stream.duration >= 4 for stream in movie.streams(agent.movie("CRASH")).values())
+    streams = movie.streams(agent.movie("CRASH"))
+    assert streams["video"].duration >= 4 and streams["audio"].duration >= 3, streams  # silence follows a second later
+
+
+@pytest.mark.parametrize("rate", ["25", "30000/1001", "12"])
+def test_a_movie_keeps_its_own_rate(agent, tmp_path, rate):
+    show(agent, make_movie(tmp_path / "numbered.mp4", range(200), rate=rate), RecordingType="Video")
+    agent.start()
+    agent.record("RATE", 3)
+    path = agent.movie("RATE")
+    assert len(movie.runs(movie.counters(path))) == 1, "no frame doubled, none lost"
+    length = 1 / float(fractions.Fraction(rate))
+    times = movie.frame_times(path)
+    assert all(abs(b - a - length) < 0.001 for a, b in zip(times, times[1:]))
+
+
+def test_a_camera_that_halves_its_rate(agent, tmp_path):
+    """As webcams do in the dark: each picture lasts twice as long, nothing is encoded twice."""
+    numbers = [*range(60), *range(60, 120, 2)]
+    path = make_movie(tmp_path / "dark.mkv", numbers, filters="setpts='if(lt(N,60),N,2*N-60)/30/TB'", keep_times=True)
+    show(agent, path, RecordingType="Video", RecordingVideoMaximumFrameRate="30")
+    agent.start()
+    agent.record("DARK", 3)
+    shown = movie.counters(agent.movie("DARK"))
+    assert len(set(shown)) == len(shown), "no picture is there twice"
+    times = movie.frame_times(agent.movie("DARK"))
+    steps = {after - before: later - earlier
+             for before, after, earlier, later in zip(shown, shown[1:], times, times[1:])}
+    assert abs(steps[1] - 1 / 30) < 0.002 and abs(steps[2] - 2 / 30) < 0.002, steps
 
 
 def test_a_movie_with_another_microphone_loops_on(agent, tmp_path):

@@ -192,7 +192,8 @@ class CaptureFramework : public CaptureCatalog {
   /// Loads what the first recording would otherwise wait for. Any thread, blocks.
   virtual void warmUp() = 0;
   /// The capture devices in words, for the command line.
-  virtual std::string deviceInformation() = 0;
+  /// @param limits  what cameras would be asked for
+  virtual std::string deviceInformation(const PictureLimits& limits) = 0;
   /// Makes movies of the recordings that an earlier process left unfinished in `repository`. Blocks.
   /// @param known  whether a job of that request has been stored: it is only marked as done
   virtual std::vector<RecoveredRecording> recoverUnfinished(

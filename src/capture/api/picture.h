@@ -12,6 +12,11 @@ struct PictureSize {
 };
 /// The largest picture that is recorded.
 inline constexpr PictureSize kFullHD{1920, 1080};
+/// What a camera is asked for at most.
+struct PictureLimits {
+  PictureSize size = kFullHD;
+  double rate = 30;  ///< frames a second
+};
 /// Reads a size such as "1280x720"; nothing when it is none, or not within 64x64 and full HD.
 std::optional<PictureSize> pictureSizeFrom(const std::string& text);
 

@@ -6,6 +6,8 @@
 #include <cstring>
 #include <thread>
 
+#include "platform/log.h"
+
 namespace lmx {
 
 /// A picture's memory, mapped.
@@ -126,7 +128,14 @@ PictureConverter::PictureConverter(PictureSize size) : size_(size) {
 PictureConverter::~PictureConverter() { gst_buffer_pool_set_active(pool_.get(), FALSE); }
 
 BufferHandle PictureConverter::convert(GstBuffer* buffer, GstCaps* caps) {
-  if (!accept(caps)) return nullptr;
+  BufferHandle picture = accept(caps) ? converted(buffer) : nullptr;
+  if (!picture && !std::exchange(complained_, true)) {
+    LMPLogMessage(nullptr, kLogError, "The camera's pictures can't be read: %s", formatText(caps).c_str());
+  }
+  return picture;
+}
+
+BufferHandle PictureConverter::converted(GstBuffer* buffer) {
   if (!shape_ && !colours_ && !rgb_) return BufferHandle(gst_buffer_ref(buffer));
   VideoFrame in(in_, buffer, GST_MAP_READ);
   BufferHandle picture = newPicture();
@@ -170,6 +179,7 @@ bool PictureConverter::accept(GstCaps* caps) {
   if (caps_ && gst_caps_is_equal(caps_.get(), caps) != FALSE) return usable_;
   if (caps_) change_ = formatText(caps_.get()) + " has become " + formatText(caps);
   caps_.reset(gst_caps_ref(caps));
+  complained_ = false;
   usable_ = prepare();
   return usable_;
 }

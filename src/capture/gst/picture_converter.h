@@ -28,7 +28,7 @@ class PictureConverter {
 
   /// @param caps  raw video, the same object as long as the format stays
   /// @return the picture with the times of `buffer`; a reference to `buffer` itself where nothing is to be
-  ///         converted; null when it can't be read
+  ///         converted; null when it can't be read, with a log line for each format
   BufferHandle convert(GstBuffer* buffer, GstCaps* caps);
 
   /// What has changed in the input's format since the last call, in words: once for each change.
@@ -38,6 +38,7 @@ class PictureConverter {
   bool accept(GstCaps* caps);
   bool prepare();
   bool prepareShape(GstVideoFormat format, PictureSize size, const GstVideoRectangle& place);
+  BufferHandle converted(GstBuffer* buffer);
   BufferHandle newPicture();
   bool paint(VideoFrame& in, GstBuffer* picture);
   bool paintRGB(VideoFrame& in, const PlanesOut& target);
@@ -53,6 +54,7 @@ class PictureConverter {
   // For the caps of the input:
   CapsHandle caps_;      ///< null before the first picture
   bool usable_ = false;  ///< whether pictures of those caps can be converted
+  bool complained_ = false;
   GstVideoInfo in_{};
   GstVideoRectangle place_{};                                ///< where the input goes in the picture
   std::unique_ptr<GstVideoConverter, FreeConverter> shape_;  ///< null where format and size fit

@@ -65,7 +65,7 @@ def counters(path):
 
 
 def brightness(path, part="null"):
-    """The mean luminance (16 … 235) of a part of each picture; `part` is an FFmpeg filter such as crop=W:H:X:Y."""
+    """The mean brightness (0 … 255) of a part of each picture; `part` is an FFmpeg filter such as crop=W:H:X:Y."""
     result = _run(["ffmpeg", "-v", "error", "-i", path, "-map", "0:v:0", "-fps_mode", "passthrough", "-vf",
                    f"{part},format=yuv420p,extractplanes=y,scale=1:1:flags=area", "-f", "rawvideo", "-"])
     return list(result.stdout)

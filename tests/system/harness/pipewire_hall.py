@@ -93,6 +93,12 @@ class PipeWireHall:
         """A virtual microphone, to be started: two minutes of a sine of so many hertz. `api` as for the camera."""
         return VirtualMicrophone(self, name, sine(self.place / f"{frequency}.wav", frequency), api)
 
+    def watch(self, name, caps, rest):
+        """Takes so many pieces from a node as any other program would; `rest` ends the launch line: "15 ! fakesink"."""
+        subprocess.run(["gst-launch-1.0", "-q", "pipewiresrc", f"target-object={name}",
+                        *f"num-buffers={rest}".replace(" ! ", f" ! {caps} ! ", 1).split()], check=True, timeout=20,
+                       env={**os.environ, **self.host_env}, stdout=subprocess.DEVNULL)
+
     def objects(self, kind):
         """The properties of all objects of a kind, such as "Node" or "Client"."""
         dump = subprocess.run(["pw-dump"], env={**os.environ, **self.host_env}, capture_output=True, timeout=20,

@@ -235,7 +235,7 @@ TEST_F(CommandLineTest, DeviceListComesFromTheFramework) {
   const Outcome outcome = parse({"-i", "zq-device-list"});
   EXPECT_FALSE(outcome.goes_on);
   EXPECT_EQ(outcome.exit_code, 0);
-  EXPECT_EQ(outcome.output, "camera, microphone\n");
+  EXPECT_EQ(outcome.output, "camera up to 1920 at 30, microphone\n");
 }
 
 TEST_F(CommandLineTest, DaemonPreferencesAreDumped) {

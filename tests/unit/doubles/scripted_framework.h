@@ -1,5 +1,6 @@
 // A capture framework that hands out scripted controllers.
 #pragma once
+#include <cmath>
 #include <functional>
 #include <memory>
 #include <mutex>
@@ -54,7 +55,10 @@ class ScriptedFramework : public CaptureFramework {
     return made;
   }
   void warmUp() override { journal_.add("warmUp"); }
-  std::string deviceInformation() override { return "camera, microphone\n"; }
+  std::string deviceInformation(const PictureLimits& limits) override {
+    return "camera up to " + std::to_string(limits.size.width) + " at " +
+           std::to_string(std::lround(limits.rate)) + ", microphone\n";
+  }
   std::vector<RecoveredRecording> unfinished;
   std::vector<RecoveredRecording> recoverUnfinished(
       const std::string&, const std::function<bool(const std::string&)>& known) override {

@@ -156,6 +156,16 @@ TEST_F(RecordingContext, TheLargestPictureIsFullHDOrTheSizeAskedFor) {
                             "1920x1080: 1920x1080 is taken"));
 }
 
+TEST_F(RecordingContext, TheLimitsOfThePictureNeedNothingElse) {
+  EXPECT_EQ(pictureLimitsInPrefs().size, kFullHD);
+  EXPECT_EQ(pictureLimitsInPrefs().rate, 30);
+  replace({{"RecordingVideoMaximumSize", "1280x720"}, {"RecordingVideoMaximumFrameRate", "25"}});
+  EXPECT_EQ(pictureLimitsInPrefs().size, (PictureSize{1280, 720}));
+  EXPECT_EQ(pictureLimitsInPrefs().rate, 25);
+  for (const char* nonsense : {"", "many", "0", "-1", "241"})
+    EXPECT_EQ(maximumFrameRateFrom(nonsense), 30) << nonsense;
+}
+
 TEST_F(RecordingContext, WithoutACameraAutomaticTakesTheMuxedDevice) {
   replace(complete());
   catalog_->camera.reset();

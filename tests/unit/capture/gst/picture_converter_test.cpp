@@ -3,7 +3,9 @@
 
 #include <gtest/gtest.h>
 
+#include "platform/log.h"
 #include "tests/unit/capture/gst/colour_bars.h"
+#include "tests/unit/doubles/log_capture.h"
 
 namespace lmx {
 namespace {
@@ -148,13 +150,16 @@ TEST(PictureConverter, TellsAChangeOfFormatOnce) {
   EXPECT_EQ(converter.formatChange(), std::nullopt);
 }
 
-TEST(PictureConverter, RefusesWhatItCantRead) {
+TEST(PictureConverter, RefusesWhatItCantReadWithALineForEachFormat) {
+  const testing::LogCapture log;
   PictureConverter converter({640, 360});
   const RawPicture picture = barsPicture(capsText("I420", 640, 360), 0.299, 0.114, false);
   const CapsHandle encoded(gst_caps_from_string("image/jpeg,width=640,height=360"));
-  EXPECT_FALSE(converter.convert(picture.buffer.get(), encoded.get()));
+  for (int i = 0; i < 3; ++i) EXPECT_FALSE(converter.convert(picture.buffer.get(), encoded.get()));
+  EXPECT_EQ(log.count(kLogError, "The camera's pictures can't be read: 640x360"), 1);
   const CapsHandle larger(gst_caps_from_string(capsText("I420", 1280, 720).c_str()));
   EXPECT_FALSE(converter.convert(picture.buffer.get(), larger.get())) << "the buffer is too short";
+  EXPECT_EQ(log.count(kLogError, "The camera's pictures can't be read: 1280x720 I420 at 30 fps"), 1);
   EXPECT_TRUE(converter.convert(picture.buffer.get(), picture.caps.get()));
 }
 
