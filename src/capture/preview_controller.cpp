@@ -25,8 +25,9 @@ bool PreviewController::attachIOWithDevice(const std::string& device, CaptureErr
   const SourceWish wish{.device = device, .picture = true, .demand = demandHere()};
   std::optional<CaptureError> problem;
   if (parseDeviceID(device).kind == DeviceKind::unknown) {
-    problem = CaptureError{CaptureError::kDomain, kDeviceNotFound,
-                           "\"" + device + "\" is no camera identifier; list them with lmxagentd -i zq-device-list"};
+    problem = CaptureError{
+        CaptureError::kDomain, kDeviceNotFound,
+        "\"" + device + "\" is no camera identifier; list them with lmxagentd -i zq-device-list"};
   } else if (const auto lease = Sources::instance().lease(wish)) {
     problem = (*lease)->waitUntilRunning(kPatience);  // a picture is the only proof
   } else {

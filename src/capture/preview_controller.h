@@ -24,9 +24,9 @@ class PreviewController : public LMRPreviewController {
 
  private:
   mutable std::mutex mutex_;
-  SourceWish wish_;     // guarded by mutex_
-  std::string name_;    // guarded by mutex_
-  SourceLease lease_;   // guarded by mutex_: null unless it runs
+  SourceWish wish_;    // guarded by mutex_
+  std::string name_;   // guarded by mutex_
+  SourceLease lease_;  // guarded by mutex_: null unless it runs
 };
 
 }  // namespace lmx

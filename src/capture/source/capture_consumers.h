@@ -33,8 +33,9 @@ class CaptureConsumer {
   virtual void onSourceBack(SourceUse use, double seconds) = 0;
 };
 
-/// The users of a source, and what they have to know of it. Media are delivered without any lock held. News come one
-/// after the other, so that nobody hears of a return before the loss: no user may add one from inside a call. Thread-safe.
+/// The users of a source, and what they have to know of it. Media are delivered without any lock held. News
+/// come one after the other, so that nobody hears of a return before the loss: no user may add one from
+/// inside a call. Thread-safe.
 class CaptureConsumers {
  public:
   /// One that is added while the source is away, or after it was lost, is told at once.

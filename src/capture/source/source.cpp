@@ -188,7 +188,8 @@ CaptureError Source::openAndWatch() {
       const std::lock_guard lock(mutex_);
       hardware_ = nullptr;
     }
-    const bool again = problem && problem->code == kStreamEnded && device_.kind == DeviceKind::file && pacer_.played();
+    const bool again =
+        problem && problem->code == kStreamEnded && device_.kind == DeviceKind::file && pacer_.played();
     if (!again) return problem.value_or(CaptureError{});
     pacer_.nextRound();
   }
@@ -203,13 +204,18 @@ bool Source::predecessorHasGone() {
 }
 
 Result<std::unique_ptr<DevicePipeline>, CaptureError> Source::openPipeline() {
-  DevicePipeline::Wish wish{
-      .device = device_, .picture = wish_.picture, .overUdp = over_udp_, .demand = wish_.demand,   .hardware = nullptr};
+  DevicePipeline::Wish wish{.device = device_,
+                            .picture = wish_.picture,
+                            .overUdp = over_udp_,
+                            .demand = wish_.demand,
+                            .hardware = nullptr};
   if (!findHardwareFor(wish)) {
-    return CaptureError{CaptureError::kDomain, kDeviceNotFound,
-                        name() + (wish_.picture ? ": the camera is not there" : ": the microphone is not there")};
+    return CaptureError{
+        CaptureError::kDomain, kDeviceNotFound,
+        name() + (wish_.picture ? ": the camera is not there" : ": the microphone is not there")};
   }
-  const auto steady = hasOwnClock(wish.device) ? std::make_shared<SteadySound>(kSoundRate, kSoundChannels) : nullptr;
+  const auto steady =
+      hasOwnClock(wish.device) ? std::make_shared<SteadySound>(kSoundRate, kSoundChannels) : nullptr;
   DeviceOutput output;
   output.onPicture = [this](GstSample* picture, double time) { takePicture(picture, time); };
   output.onSound = [this, steady](GstBuffer* sound, double time, double arrival) {
@@ -309,9 +315,11 @@ void Source::waitBeforeNextTry() {
   std::chrono::milliseconds pause = kRetryInterval;
   if (wish_.picture) {
     const auto left = kNetworkLimit - kLastTry - since(away_since_ms_);
-    pause = since(away_since_ms_) < 1s ? 500ms : std::clamp<std::chrono::milliseconds>(left, 100ms, kRetryInterval);
+    pause = since(away_since_ms_) < 1s ? 500ms
+                                       : std::clamp<std::chrono::milliseconds>(left, 100ms, kRetryInterval);
   }
-  if (failed_tries_ > kOftenTries) pause = kSeldomInterval;  // looking for it wakes the drivers of all devices
+  if (failed_tries_ > kOftenTries)
+    pause = kSeldomInterval;  // looking for it wakes the drivers of all devices
   std::unique_lock lock(mutex_);
   changed_.wait_for(lock, pause, [this] { return closing_; });
 }
@@ -320,7 +328,8 @@ void Source::waitBeforeNextTry() {
 
 void Source::takePicture(GstSample* picture, double time) {
   // What a decoder makes up before the first key frame is no picture.
-  if (!delivering_ && GST_BUFFER_FLAG_IS_SET(gst_sample_get_buffer(picture), GST_BUFFER_FLAG_CORRUPTED)) return;
+  if (!delivering_ && GST_BUFFER_FLAG_IS_SET(gst_sample_get_buffer(picture), GST_BUFFER_FLAG_CORRUPTED))
+    return;
   last_sample_ms_ = steadyMilliseconds();
   if (!has_format_.exchange(true)) {
     const GstCaps* caps = gst_sample_get_caps(picture);
@@ -352,7 +361,8 @@ void Source::takeSound(SteadySound* steady, GstBuffer* sound, double time, doubl
 
 /// One that offers nothing else.
 bool Source::triesOverUdp(const CaptureError& error) {
-  const bool refused = error.code != kDeviceNotPermitted && !delivering_ && Clock::now() - opened_at_ < kUdpLimit;
+  const bool refused =
+      error.code != kDeviceNotPermitted && !delivering_ && Clock::now() - opened_at_ < kUdpLimit;
   if (device_.kind != DeviceKind::network || ever_ran_ || over_udp_ || !refused) return false;
   over_udp_ = true;
   return true;
@@ -366,8 +376,8 @@ void Source::firstSample() {
   const std::int64_t away = away_since_ms_.exchange(0);
   if (away == 0) return;
   const double seconds = std::chrono::duration<double>(since(away)).count();
-  LMPLogMessage(nullptr, kLogNotice, "The %s is back after %.1f s: %s", wish_.picture ? "camera" : "microphone",
-                seconds, name().c_str());
+  LMPLogMessage(nullptr, kLogNotice, "The %s is back after %.1f s: %s",
+                wish_.picture ? "camera" : "microphone", seconds, name().c_str());
   consumers_.back(seconds);
 }
 

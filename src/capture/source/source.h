@@ -21,7 +21,7 @@ inline constexpr const char* kAnyMicrophone = "microphone:any";
 
 /// What a source is opened for. The first user's wish counts: the others share what is open.
 struct SourceWish {
-  std::string device;  ///< its unique identifier
+  std::string device;   ///< its unique identifier
   bool picture = true;  ///< opened as a camera; else as a microphone
   CameraDemand demand;
 };
@@ -32,13 +32,14 @@ struct CameraFormat {
   std::optional<FrameRate> rate;  ///< nominal; nothing when it varies or isn't known
 };
 
-/// Lives on a thread of its own: opens the device, watches it, opens it again and closes it, whatever time the driver
-/// takes. A camera that is plugged in is lost when it fails; a network camera is tried again three times in ten seconds
-/// first; a microphone is tried again as long as anybody wants it. Thread-safe.
+/// Lives on a thread of its own: opens the device, watches it, opens it again and closes it, whatever time
+/// the driver takes. A camera that is plugged in is lost when it fails; a network camera is tried again three
+/// times in ten seconds first; a microphone is tried again as long as anybody wants it. Thread-safe.
 class Source : public CaptureSession {
  public:
   explicit Source(SourceWish wish);
-  /// The same device as somebody had it before and is closing: the thread waits for that. Call it before open().
+  /// The same device as somebody had it before and is closing: the thread waits for that. Call it before
+  /// open().
   void comeAfter(std::shared_ptr<Source> predecessor) { predecessor_ = std::move(predecessor); }
   /// Starts the thread. @return false when there is none to be had
   [[nodiscard]] static bool open(const std::shared_ptr<Source>& source);
@@ -115,13 +116,13 @@ class Source : public CaptureSession {
 
   mutable std::mutex mutex_;
   std::condition_variable changed_;
-  Phase phase_ = Phase::opening;                // guarded by mutex_
-  bool closing_ = false;                        // guarded by mutex_
-  bool finished_ = false;                       // guarded by mutex_
-  bool start_wanted_ = false;                   // guarded by mutex_
-  DevicePipeline* pipeline_ = nullptr;          // guarded by mutex_: null unless it is open
-  std::optional<CaptureError> problem_;         // guarded by mutex_: the last one
-  std::optional<CameraFormat> format_;          // guarded by mutex_
+  Phase phase_ = Phase::opening;                    // guarded by mutex_
+  bool closing_ = false;                            // guarded by mutex_
+  bool finished_ = false;                           // guarded by mutex_
+  bool start_wanted_ = false;                       // guarded by mutex_
+  DevicePipeline* pipeline_ = nullptr;              // guarded by mutex_: null unless it is open
+  std::optional<CaptureError> problem_;             // guarded by mutex_: the last one
+  std::optional<CameraFormat> format_;              // guarded by mutex_
   std::shared_ptr<const HardwareDevice> hardware_;  // guarded by mutex_
 };
 

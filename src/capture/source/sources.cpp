@@ -113,9 +113,9 @@ std::vector<HardwareDevice> Sources::hardware() const {
   const std::lock_guard lock(mutex_);
   for (const auto& entry : entries_) {
     const auto open = entry->source->hardware();
-    const bool listed = open && std::any_of(devices.begin(), devices.end(), [&](const HardwareDevice& device) {
-                          return device.uniqueID == open->uniqueID;
-                        });
+    const bool listed =
+        open && std::any_of(devices.begin(), devices.end(),
+                            [&](const HardwareDevice& device) { return device.uniqueID == open->uniqueID; });
     if (open && !listed) devices.push_back(copyOf(*open));
   }
   sortDevices(devices);

@@ -10,13 +10,13 @@
 
 namespace lmx {
 
-/// Keeps a source open. When the last lease of it goes the device is closed; whoever drops it waits for that, two seconds
-/// at most. Never drop it on a streaming thread.
+/// Keeps a source open. When the last lease of it goes the device is closed; whoever drops it waits for that,
+/// two seconds at most. Never drop it on a streaming thread.
 using SourceLease = std::shared_ptr<Source>;
 
-/// Leases go by device: preview, recording and probe share what is open, whatever else they want of it. A device is not
-/// opened while it is still being closed; nobody waits for another device. "Any microphone" is the one that is open, if
-/// there is one. Thread-safe.
+/// Leases go by device: preview, recording and probe share what is open, whatever else they want of it. A
+/// device is not opened while it is still being closed; nobody waits for another device. "Any microphone" is
+/// the one that is open, if there is one. Thread-safe.
 class Sources {
  public:
   /// Those of this process. Never destroyed: threads that outlive main may still return leases.

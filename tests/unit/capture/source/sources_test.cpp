@@ -15,7 +15,9 @@ using namespace std::chrono_literals;
 constexpr auto kPatience = 20s;
 
 SourceWish camera(const std::string& device) { return {.device = device, .picture = true, .demand = {}}; }
-SourceWish microphone(const std::string& device) { return {.device = device, .picture = false, .demand = {}}; }
+SourceWish microphone(const std::string& device) {
+  return {.device = device, .picture = false, .demand = {}};
+}
 
 /// Counts what comes and lets a test wait for it.
 class Counter : public CaptureConsumer {
