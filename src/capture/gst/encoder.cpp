@@ -69,10 +69,10 @@ Result<std::unique_ptr<Encoder>> Encoder::create(const MovieEncoding& movie, con
   if (!pipeline) return std::move(pipeline).error();
   std::unique_ptr<Encoder> encoder(new Encoder(movie, patience, std::move(output)));
   encoder->attach(*std::move(pipeline));
-  if (movie.audio)
-    encoder->output_.onFormat(encoder->soundTrack(), encoder->soundFormat(encoder->sound_config_));
   if (gst_element_set_state(encoder->pipeline_.get(), GST_STATE_PLAYING) == GST_STATE_CHANGE_FAILURE)
     return Error{"the encoder could not be started"};
+  if (movie.audio)
+    encoder->output_.onFormat(encoder->soundTrack(), encoder->soundFormat(encoder->sound_config_));
   return encoder;
 }
 
