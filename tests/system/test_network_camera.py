@@ -99,7 +99,7 @@ def test_start_is_refused_while_nothing_comes(agent, trouble):
         mark = agent.log.mark()
         refused = agent.start_recording("NOTHING", timeout=40)
         assert refused.text == "cmdStatus=3" and refused.received - refused.sent < 15
-        assert agent.log.lines(after=mark, level=Level.ERROR)
+        agent.log.wait("The capture could not be prepared", after=mark)
         assert agent.command("STATUS").fields["recordStatus"] == "0"
         assert agent.alive() and agent.repository() == []
 
