@@ -98,14 +98,20 @@ void MediaCutter::fillSilence(double until) {
 
 /// In pieces: an hour of it must not be an hour of memory.
 void MediaCutter::pushSilence(std::uint32_t samples) {
-  const double seconds = static_cast<double>(samples) / audio_->sampleRate;
-  around_.silenced(frames_.horizon() - seconds, seconds);
-  const auto most = static_cast<std::uint32_t>(kSilencePiece * audio_->sampleRate);
+  if (samples == 0) return;
+  const double rate = audio_->sampleRate;
+  around_.silenced(frames_.timeAt(static_cast<double>(pushed_samples_) / rate), samples / rate);
+  const auto most = static_cast<std::uint32_t>(kSilencePiece * rate);
   while (samples > 0) {
     const std::uint32_t piece = std::min(samples, most);
-    around_.movie.pushSound(nullptr, piece);
+    pushSound(nullptr, piece);
     samples -= piece;
   }
+}
+
+void MediaCutter::pushSound(const float* samples, std::uint32_t count) {
+  around_.movie.pushSound(samples, count);
+  pushed_samples_ += count;
 }
 
 void MediaCutter::cutChunk(const RawMedium& chunk) {
@@ -123,7 +129,7 @@ void MediaCutter::pushPieces(const RawMedium& chunk, const std::vector<SoundPiec
   const auto channels = static_cast<std::size_t>(audio_->channels);
   for (const SoundPiece& piece : pieces) {
     pushSilence(piece.silence);
-    if (piece.count > 0) around_.movie.pushSound(samples + piece.offset * channels, piece.count);
+    if (piece.count > 0) pushSound(samples + piece.offset * channels, piece.count);
   }
   gst_buffer_unmap(chunk.buffer.get(), &map);
 }

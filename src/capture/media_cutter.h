@@ -60,6 +60,7 @@ class MediaCutter {
   bool startMovie();
   void fillSilence(double until);
   void pushSilence(std::uint32_t samples);
+  void pushSound(const float* samples, std::uint32_t count);
   [[nodiscard]] double chunkSeconds(const RawMedium& chunk) const;
   [[nodiscard]] double endOf(const RawMedium& chunk) const { return chunk.time + chunkSeconds(chunk); }
 
@@ -73,6 +74,7 @@ class MediaCutter {
   double last_frame_time_ = -1e300;
   std::optional<double> next_virtual_;
   std::uint32_t recorded_frames_ = 0;
+  std::int64_t pushed_samples_ = 0;
   bool key_owed_ = false;  ///< the frame that should have been a key frame could not be read
 };
 

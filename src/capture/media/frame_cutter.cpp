@@ -3,6 +3,7 @@
 
 #include <algorithm>
 #include <cmath>
+#include <iterator>
 
 namespace lmx {
 
@@ -30,6 +31,17 @@ FrameDecision FrameCutter::decide(double t, bool wanted, bool keyWanted) {
 
 void FrameCutter::close() {
   if (!runs_.empty()) runs_.back().closed = true;
+}
+
+double FrameCutter::timeAt(double movieSeconds) const {
+  const double place = movieSeconds / frame_seconds_;
+  constexpr double kRounding = 1e-3;  // frames: samples begin beside frames
+  const auto next = std::upper_bound(
+      runs_.begin(), runs_.end(), place + kRounding,
+      [](double wanted, const MovieRun& run) { return wanted < static_cast<double>(run.firstFrame); });
+  if (next == runs_.begin()) return movieSeconds;
+  const MovieRun& run = *std::prev(next);
+  return run.sessionTime + (place - run.firstFrame) * frame_seconds_;
 }
 
 }  // namespace lmx

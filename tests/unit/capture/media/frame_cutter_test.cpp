@@ -36,5 +36,15 @@ TEST(FrameCutter, SpanThatBeginsInsideARunGetsAKeyFrame) {
   EXPECT_TRUE(cutter.decide(kFrame, true, true).forceKey);
 }
 
+TEST(FrameCutter, APlaceInTheMovieHasATime) {
+  FrameCutter cutter(kFrame);
+  EXPECT_EQ(cutter.timeAt(3), 3) << "nothing has been recorded";
+  for (int n = 0; n < 120; ++n) cutter.decide(5 + n * kFrame, n < 30 || n >= 90, false);
+  EXPECT_NEAR(cutter.timeAt(0), 5, 1e-6);
+  EXPECT_NEAR(cutter.timeAt(0.99), 5.99, 1e-6);
+  EXPECT_NEAR(cutter.timeAt(1.0 - 1e-5), 8, 1e-4) << "the run behind the cut";
+  EXPECT_NEAR(cutter.timeAt(1.5), 8.5, 1e-6);
+}
+
 }  // namespace
 }  // namespace lmx
