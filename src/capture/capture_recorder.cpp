@@ -300,7 +300,8 @@ std::uint32_t CaptureRecorder::closeMovie() {
     movie_.reset();
     return 0;
   }
-  cutter_.close();
+  cutter_.close(endOfMedia());
+  recorded_frames_ = cutter_.recordedFrames();
   movie_->close(cutter_.frames().frames(), cutter_.samples());
   if (queue_.dropped() > 0) movie_->fellBehind();
   return movie_->framesWritten(cutter_.frames().frames());

@@ -30,12 +30,22 @@ MediaCutter::MediaCutter(const MovieEncoding& encoding, double begin, Surroundin
 FrameDecision MediaCutter::decide(double t) {
   const CaptureMarks::Wish wish = around_.marks.wishAt(last_frame_time_, t, frames_.frames() == 0);
   last_frame_time_ = t;
+  if (!wish.wanted) prolong(t);
   const FrameDecision decision = frames_.decide(t, wish.wanted, wish.keyFrame);
   if (decision.beginsRun) {
     around_.journal.run(frames_.runs().back());
     (void)around_.journal.sync();  // the writer's next sync reports a disk that loses data
   }
   return decision;
+}
+
+/// The frame before a mark lasts until the mark, however long the camera takes for the next one.
+void MediaCutter::prolong(double t) {
+  if (frames_.runs().empty() || frames_.runs().back().closed) return;
+  const auto until = around_.marks.wantedUntil(t);
+  if (!until) return;
+  frames_.prolong(*until);
+  if (around_.movie.started()) recorded_frames_ = frames_.frames();
 }
 
 void MediaCutter::feedFrame(const RawMedium& frame) {
@@ -145,7 +155,8 @@ bool MediaCutter::reaches(double end) const {
   return sound_->position() >= std::llround(frames_.frames() * frames_.frameSeconds() * audio_->sampleRate);
 }
 
-void MediaCutter::close() {
+void MediaCutter::close(double end) {
+  if (around_.live) prolong(end);
   frames_.close();
   if (!sound_) return;
   for (const RawMedium& chunk : pending_sound_) cutChunk(chunk);

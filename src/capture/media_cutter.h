@@ -41,8 +41,10 @@ class MediaCutter {
   void feedNothing(double now);
   /// Whether all frames before `end`, and the sound of those that were taken, have been fed.
   [[nodiscard]] bool reaches(double end) const;
-  /// Gives the movie the sound that is left, and silence for what is missing. Nothing may be fed afterwards.
-  void close();
+  /// Gives the movie the sound that is left, and silence for what is missing. Live, the last frame lasts until
+  /// `end` where so much is wanted: the sound beside a camera that is away is not lost. Nothing may be fed
+  /// afterwards.
+  void close(double end);
 
   [[nodiscard]] const FrameCutter& frames() const { return frames_; }
   /// Frames of the movie's clock that have been given to the movie.
@@ -54,6 +56,7 @@ class MediaCutter {
 
  private:
   FrameDecision decide(double t);
+  void prolong(double t);
   void feedVirtualFrames(double until);
   void cutChunk(const RawMedium& chunk);
   void pushPieces(const RawMedium& chunk, const std::vector<SoundPiece>& pieces);

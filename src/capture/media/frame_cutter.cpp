@@ -29,6 +29,16 @@ FrameDecision FrameCutter::decide(double t, bool wanted, bool keyWanted) {
   return decision;
 }
 
+void FrameCutter::prolong(double until) {
+  if (runs_.empty() || runs_.back().closed) return;
+  MovieRun& run = runs_.back();
+  // Frames that come in time already reach the nearest place: nothing happens to them.
+  const auto frames = std::llround((until - run.sessionTime) / frame_seconds_);
+  if (frames <= run.frames) return;
+  run.frames = static_cast<std::uint32_t>(frames);
+  frames_ = run.firstFrame + run.frames;
+}
+
 void FrameCutter::close() {
   if (!runs_.empty()) runs_.back().closed = true;
 }

@@ -30,6 +30,8 @@ class FrameCutter {
   /// @param wanted  whether it is to be recorded
   /// @param keyWanted  whether a request's span begins with it, inside a run
   FrameDecision decide(double t, bool wanted, bool keyWanted);
+  /// Lets the newest frame of the open run, if there is one, last until `until` at least.
+  void prolong(double until);
   /// Ends the open run. Call it when no more frames will come.
   void close();
 

@@ -79,12 +79,16 @@ class Cut {
     for (double t = from; t < to - 1e-9; t += kChunk) chunks.push_back({quietChunk(), t});
     cutter_->feedSound(std::move(chunks));
   }
-  void close() {
-    cutter_->close();
+  /// @return length of picture and sound in the movie, seconds
+  std::pair<double, double> close(double end) {
+    cutter_->close(end);
     movie_->close(cutter_->frames().frames(), cutter_->samples());
-    EXPECT_EQ(decodeMovie(path()).problem, "");
+    const auto movie = decodeMovie(path());
+    EXPECT_EQ(movie.problem, "");
+    return {movie.duration, static_cast<double>(movie.sound.size()) / movie.sampleRate};
   }
   CaptureMarks& marks() { return marks_; }
+  [[nodiscard]] std::uint32_t frames() const { return cutter_->recordedFrames(); }
   [[nodiscard]] const std::vector<Silence>& silences() const { return silences_; }
   [[nodiscard]] std::string path() const { return folder_.file("media.mov"); }
 
@@ -103,7 +107,7 @@ TEST(MediaCutter, SoundThatIsThereIsNoSilence) {
   Cut cut;
   cut.marks().start("R", 0, nullptr);
   cut.media(0, 2);
-  cut.close();
+  cut.close(2);
   EXPECT_TRUE(cut.silences().empty()) << cut.silences().size();
 }
 
@@ -111,7 +115,7 @@ TEST(MediaCutter, SilenceIsToldWithItsTime) {
   Cut cut;
   cut.marks().start("R", 1, nullptr);  // the movie's times are others than the capture's
   cut.media(1, 7, {4, 5.2});
-  cut.close();
+  cut.close(7);
   double seconds = 0;
   ASSERT_FALSE(cut.silences().empty());
   EXPECT_NEAR(cut.silences().front().from, 4.0, 0.001);
@@ -130,10 +134,61 @@ TEST(MediaCutter, SilenceBehindACutIsToldWithTheTimeOfTheCapture) {
   cut.marks().resume(11);
   cut.media(0, 11);
   cut.media(11, 13, {11, 11.5});
-  cut.close();
+  cut.close(13);
   ASSERT_EQ(cut.silences().size(), 1U);
   EXPECT_NEAR(cut.silences().front().from, 11.0, 0.001);
   EXPECT_NEAR(cut.silences().front().seconds, 0.5, 0.001);
+}
+
+TEST(MediaCutter, SoundBesideACameraThatIsAwayIsKeptToTheStop) {
+  Cut cut;
+  cut.marks().start("R", 0, nullptr);
+  cut.media(0, 3);
+  cut.sound(3, 7.2);
+  cut.marks().end(CaptureMarks::Ending::stop, 7);
+  const auto [picture, sound] = cut.close(7);
+  EXPECT_NEAR(picture, 7, 0.03);
+  EXPECT_NEAR(sound, 7, 0.03);
+  EXPECT_TRUE(cut.silences().empty());
+  EXPECT_EQ(cut.frames(), 210U);
+}
+
+TEST(MediaCutter, APauseWhileTheCameraIsAwayKeepsWhatWasSaidBeforeIt) {
+  Cut cut;
+  cut.marks().start("R", 0, nullptr);
+  cut.media(0, 2);
+  cut.marks().pause(5);
+  cut.sound(2, 9);
+  cut.picture(9);  // it is back
+  EXPECT_EQ(cut.frames(), 150U) << "five seconds";
+  cut.marks().resume(9.5);
+  cut.media(9.5, 10.5);
+  const auto [picture, sound] = cut.close(10.5);
+  EXPECT_NEAR(picture, 6, 0.05);
+  EXPECT_NEAR(sound, 6, 0.05);
+  EXPECT_TRUE(cut.silences().empty());
+}
+
+TEST(MediaCutter, ASlowCamerasLastPictureLastsUntilTheStop) {
+  Cut cut;
+  cut.marks().start("R", 0, nullptr);
+  for (double t = 0; t < 3.3; t += 0.43) cut.picture(t);  // up to 3.01
+  cut.sound(0, 4);
+  cut.marks().stop("R", 3.4);
+  cut.picture(3.44);
+  const auto [picture, sound] = cut.close(3.4);
+  EXPECT_NEAR(picture, 3.4, 0.03);
+  EXPECT_NEAR(sound, 3.4, 0.03);
+}
+
+TEST(MediaCutter, NothingIsProlongedBehindWhatIsWanted) {
+  Cut cut;
+  cut.marks().start("R", 0, nullptr);
+  cut.marks().stop("R", 2);
+  cut.media(0, 2.5);
+  const auto [picture, sound] = cut.close(8);
+  EXPECT_NEAR(picture, 2, 0.03);
+  EXPECT_NEAR(sound, 2, 0.03);
 }
 
 }  // namespace
