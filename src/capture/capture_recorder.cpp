@@ -239,6 +239,7 @@ void CaptureRecorder::record(const Reporter& reporter) {
   // Whoever is to be told is held from before anybody can see that the capture has ended.
   const Report report = reporter();
   const std::optional<CaptureError> problem = error();
+  tickAccount();  // what was lost since the last time
   account_.finish(endOfMedia(), sources.soundCorrection());
   publish(frames);
   movie_.reset();
@@ -262,11 +263,15 @@ void CaptureRecorder::recordUntilTheEnd() {
     const bool inTime = batch.inTime;
     const bool nothing = batch.audio.empty() && batch.video.empty();
     feed(std::move(batch));
-    account_.tick(cutter_.frames().horizon(), queue_.dropped(), clock_.wallOffset());
+    tickAccount();
     if (nothing) cutter_.feedNothing(CaptureClock::now());
     checkLimits();
     more = inTime && !reachedEnd();
   }
+}
+
+void CaptureRecorder::tickAccount() {
+  account_.tick(cutter_.frames().horizon(), queue_.dropped(), clock_.wallOffset());
 }
 
 void CaptureRecorder::feed(MediaQueue::Batch batch) {

@@ -83,6 +83,7 @@ class CaptureRecorder : public CaptureConsumer, public std::enable_shared_from_t
   void guarded(const std::function<void()>& step);
   void recordUntilTheEnd();
   void feed(MediaQueue::Batch batch);
+  void tickAccount();
   [[nodiscard]] bool reachedEnd() const;
   void checkLimits();
   std::uint32_t closeMovie();

@@ -99,6 +99,10 @@ void RecordingAccount::journalDue(double t) {
 }
 
 void RecordingAccount::finish(double t, double soundCorrection) {
+  if (dropped_ > 0) {
+    LMPLogMessage(nullptr, kLogWarning, "%llu pictures of the recording were lost: the machine could not keep up",
+                  static_cast<unsigned long long>(dropped_));
+  }
   std::vector<GapLedger::Words> lines;
   std::string summary;
   {

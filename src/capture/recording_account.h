@@ -33,7 +33,7 @@ class RecordingAccount {
   /// @param dropped  frames that were lost so far because the machine could not keep up
   /// @param wallOffset  wall clock at running time 0, as the clock is set now
   void tick(double t, std::uint64_t dropped, double wallOffset);
-  /// The end of the recording: tells what was not real.
+  /// The end of the recording: tells what was not real. Recording thread, after the last tick().
   void finish(double t, double soundCorrection);
 
  private:
