@@ -92,6 +92,7 @@ class CaptureRecorder : public CaptureConsumer, public std::enable_shared_from_t
   [[nodiscard]] BufferHandle convert(const RawMedium& frame);
 
   // Any thread.
+  [[nodiscard]] double timeNow() const;
   void fail(const CaptureError& error);
   void soundLost(const CaptureError& error);
 
@@ -111,11 +112,13 @@ class CaptureRecorder : public CaptureConsumer, public std::enable_shared_from_t
   std::atomic<bool> heard_{false};             ///< some sound has come
   std::atomic<bool> sound_away_{false};
   std::atomic<std::uint32_t> recorded_frames_{0};
+  std::atomic<double> media_time_{0};          ///< running time that the leading device has reached
 
   mutable std::mutex mutex_;
   mutable std::condition_variable finished_set_;
   std::optional<RecordingSources> sources_;    // guarded by mutex_: nothing once the capture is closed
   SoundReport sound_report_;                   // guarded by mutex_: null once the capture is closed
+  bool flowing_ = false;                       // guarded by mutex_: devices of "speed=max" have been started
   double closed_at_ = 0;                       // guarded by mutex_: running time when the capture ended
   std::optional<CaptureError> error_;          // guarded by mutex_: the first one
   std::shared_ptr<FinishedCapture> finished_;  // guarded by mutex_
