@@ -202,8 +202,7 @@ void CaptureRecorder::onSourceLost(SourceUse use, const CaptureError& error) {
 }
 
 void CaptureRecorder::onSourceAway(SourceUse use, const CaptureError& error) {
-  if (use.picture)
-    return account_.cameraLost(timeNow());  // the frame before stays until it is back
+  if (use.picture) return account_.cameraLost(timeNow());  // the frame before stays until it is back
   // Where there is only sound its loss is the end; but a microphone that has never been there is waited for.
   !encoding_.video&& heard_ ? fail(error) : soundLost(error);
 }
@@ -334,13 +333,27 @@ std::uint32_t CaptureRecorder::closeMovie() {
 /// The frame as it is encoded.
 BufferHandle CaptureRecorder::convert(const RawMedium& frame) {
   BufferHandle picture = converter_->convert(frame.buffer.get(), frame.caps.get());
-  if (const auto change = converter_->formatChange()) {
+  const auto change = converter_->formatChange();
+  if (change && picture) {
     LMPLogMessage(nullptr, kLogNotice,
                   "The camera's picture has changed: %s; it is fitted into the recording's", change->c_str());
     account_.sizeChanged(frame.time, recordedSize(frame.caps.get()));
   }
   if (picture) account_.picture(picture.get(), encoding_.video->size, frame.time);
+  noteReadable(frame.time, picture != nullptr);
   return picture;
+}
+
+/// The converter has told why a picture can't be read.
+void CaptureRecorder::noteReadable(double t, bool readable) {
+  if (!readable) account_.pictureLost(t);
+  const auto news = unreadable_.note(t, readable);
+  if (news == UnreadablePictures::News::again) {
+    LMPLogMessage(nullptr, kLogNotice, "The camera's pictures can be read again after %.0f s",
+                  unreadable_.lasted());
+  } else if (news == UnreadablePictures::News::hopeless) {
+    fail({CaptureError::kDomain, kDeviceFailed, "the camera's pictures can't be read"});
+  }
 }
 
 void CaptureRecorder::publish(std::uint32_t totalFrames) {
@@ -361,8 +374,6 @@ void CaptureRecorder::publish(std::uint32_t totalFrames) {
   finished_set_.notify_all();
 }
 
-double CaptureRecorder::endOfMedia() const {
-  return std::min(marks_.endTime().value_or(0), timeNow());
-}
+double CaptureRecorder::endOfMedia() const { return std::min(marks_.endTime().value_or(0), timeNow()); }
 
 }  // namespace lmx

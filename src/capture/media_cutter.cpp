@@ -54,8 +54,11 @@ void MediaCutter::feedFrame(const RawMedium& frame) {
   recorded_frames_ = frames_.frames();
   const BufferHandle picture = around_.convert(frame);
   // One that can't be read is a hole: the frame before it stays.
-  if (picture) around_.movie.pushFrame(picture.get(), decision.place, decision.forceKey || std::exchange(key_owed_, false));
-  else key_owed_ = key_owed_ || decision.forceKey;
+  if (picture)
+    around_.movie.pushFrame(picture.get(), decision.place,
+                            decision.forceKey || std::exchange(key_owed_, false));
+  else
+    key_owed_ = key_owed_ || decision.forceKey;
 }
 
 void MediaCutter::feedVirtualFrames(double until) {
@@ -65,9 +68,7 @@ void MediaCutter::feedVirtualFrames(double until) {
   }
 }
 
-bool MediaCutter::startMovie() {
-  return around_.movie.started() || around_.movie.start();
-}
+bool MediaCutter::startMovie() { return around_.movie.started() || around_.movie.start(); }
 
 // ---- sound
 

@@ -25,10 +25,10 @@ class MediaCutter {
     MovieOutput& movie;
     /// A frame in the movie's size and colours; null when it can't be read.
     std::function<BufferHandle(const RawMedium& frame)> convert;
-    std::function<void(const RawMedium& chunk)> heard;           ///< sound that is recorded
-    std::function<void(double t, double seconds)> silenced;      ///< silence that is recorded instead
+    std::function<void(const RawMedium& chunk)> heard;       ///< sound that is recorded
+    std::function<void(double t, double seconds)> silenced;  ///< silence that is recorded instead
     std::function<bool()> soundComes;  ///< false while the microphone is away: nobody waits for it then
-    bool live = true;  ///< sound that is not there in time is silence
+    bool live = true;                  ///< sound that is not there in time is silence
   };
   /// @param begin  running time at which the capture begins, seconds
   MediaCutter(const MovieEncoding& encoding, double begin, Surroundings surroundings);
@@ -41,9 +41,9 @@ class MediaCutter {
   void feedNothing(double now);
   /// Whether all frames before `end`, and the sound of those that were taken, have been fed.
   [[nodiscard]] bool reaches(double end) const;
-  /// Gives the movie the sound that is left, and silence for what is missing. Live, the last frame lasts until
-  /// `end` where so much is wanted: the sound beside a camera that is away is not lost. Nothing may be fed
-  /// afterwards.
+  /// Gives the movie the sound that is left, and silence for what is missing. Live, the last frame lasts
+  /// until `end` where so much is wanted: the sound beside a camera that is away is not lost. Nothing may be
+  /// fed afterwards.
   void close(double end);
 
   [[nodiscard]] const FrameCutter& frames() const { return frames_; }

@@ -73,7 +73,8 @@ Result<std::unique_ptr<Encoder>> Encoder::create(const MovieEncoding& movie, con
   return encoder;
 }
 
-/// One that can't be started is replaced with another, which tells the same output: this one says nothing then.
+/// One that can't be started is replaced with another, which tells the same output: this one says nothing
+/// then.
 std::optional<Error> Encoder::start() {
   const bool refused = gst_element_set_state(pipeline_.get(), GST_STATE_PLAYING) == GST_STATE_CHANGE_FAILURE;
   {

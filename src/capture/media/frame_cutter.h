@@ -37,7 +37,8 @@ class FrameCutter {
 
   /// Running time up to which every frame has been decided; -1e300 before the first one.
   [[nodiscard]] double horizon() const { return horizon_; }
-  /// Running time of a place in the movie, in seconds of the movie. Behind a cut's frames the next run begins.
+  /// Running time of a place in the movie, in seconds of the movie. Behind a cut's frames the next run
+  /// begins.
   [[nodiscard]] double timeAt(double movieSeconds) const;
   /// Length of the movie so far, in frames.
   [[nodiscard]] std::uint32_t frames() const { return frames_; }

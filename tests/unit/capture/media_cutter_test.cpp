@@ -50,14 +50,16 @@ class Cut {
                                            [](const CaptureError& error) { ADD_FAILURE() << error.message; });
     cutter_ = std::make_unique<MediaCutter>(
         encoding_, 0.0,
-        MediaCutter::Surroundings{
-            .marks = marks_,
-            .journal = *journal_,
-            .movie = *movie_,
-            .convert = [](const RawMedium& /*frame*/) { return greyPicture(); },
-            .heard = [](const RawMedium& /*chunk*/) {},
-            .silenced = [this](double t, double seconds) { silences_.push_back({t, seconds}); },
-            .soundComes = [] { return true; }});
+        MediaCutter::Surroundings{.marks = marks_,
+                                  .journal = *journal_,
+                                  .movie = *movie_,
+                                  .convert = [](const RawMedium& /*frame*/) { return greyPicture(); },
+                                  .heard = [](const RawMedium& /*chunk*/) {},
+                                  .silenced =
+                                      [this](double t, double seconds) {
+                                        silences_.push_back({t, seconds});
+                                      },
+                                  .soundComes = [] { return true; }});
   }
   /// Feeds what the camera and the microphone give from `from` to `to`, seconds of running time, as it comes.
   /// @param hole  when the microphone gives nothing

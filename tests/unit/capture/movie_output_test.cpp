@@ -206,7 +206,8 @@ TEST(MovieOutput, HardwareThatIsTakenIsReplacedWithoutHarm) {
   const VideoEncoderKind hardware{"hardware", [uses](const VideoEncoding& video) {
                                     const std::string working = softwareEncoder().elements(video);
                                     if ((*uses)++ == 0) return working;
-                                    return working + " ! tee name=t t. ! filesink location=/nowhere/device t.";
+                                    return working +
+                                           " ! tee name=t t. ! filesink location=/nowhere/device t.";
                                   }};
   VideoEncoderChoice::instance().tryOut({hardware});
   ASSERT_TRUE(log.mentions("Pictures are encoded with hardware"));

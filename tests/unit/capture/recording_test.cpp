@@ -169,7 +169,8 @@ TEST(Recording, TheTailOfALongRecordingIsInStep) {
   const auto ticks = testing::tickTimes(movie);
   ASSERT_EQ(ticks.size(), 30U);
   for (std::size_t i = 0; i < ticks.size(); ++i)
-    EXPECT_NEAR(ticks[i], static_cast<double>(i + 1) - kTickLead, 0.005) << "sound against picture, second " << i;
+    EXPECT_NEAR(ticks[i], static_cast<double>(i + 1) - kTickLead, 0.005)
+        << "sound against picture, second " << i;
 }
 
 TEST(Recording, SoundOnly) {
@@ -456,9 +457,8 @@ TEST_P(LostDevice, EndsTheRecordingWithWhatThereIs) {
   EXPECT_EQ(capture.reports->error()->code, GetParam().code);
   EXPECT_TRUE(capture.controller->hasShutDown());
   ASSERT_FALSE(capture.controller->processRequestWithUUID("R", folder.file("R.mov")));
-  const auto movie = decodeMovie(folder.file("R.mov"), capture.settings.videoEnabled
-                                                           ? testing::Streams::both
-                                                           : testing::Streams::sound);
+  const auto movie = decodeMovie(
+      folder.file("R.mov"), capture.settings.videoEnabled ? testing::Streams::both : testing::Streams::sound);
   EXPECT_EQ(movie.problem, "");
   if (!capture.settings.videoEnabled) return;
   EXPECT_GE(movie.frameNumbers.size(), 27U);
@@ -500,7 +500,8 @@ TEST(LostMicrophone, ThePictureGoesOnWithSilenceUntilItIsBack) {
     if (frame == movie.frameNumbers.size()) continue;
     EXPECT_EQ(movie.frameNumbers[frame] % 30, 0U) << tick;
   }
-  EXPECT_GT(*std::max_element(ticks.begin(), ticks.end()) - *std::min_element(ticks.begin(), ticks.end()), 2.5);
+  EXPECT_GT(*std::max_element(ticks.begin(), ticks.end()) - *std::min_element(ticks.begin(), ticks.end()),
+            2.5);
 }
 
 TEST(LostMicrophone, OneThatIsNotThereLeavesSilence) {
