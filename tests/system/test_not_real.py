@@ -2,8 +2,10 @@
 import re
 
 import pytest
+from harness import movie
 from harness.agent import REPOSITORY
 from harness.log_reader import Level
+from harness.one_thread import held, threads_named
 from harness.pipewire_hall import PipeWireHall
 from harness.waiting import let_pass, wait_until
 
@@ -58,3 +60,28 @@ def test_a_microphone_that_was_away(agent):
     assert spell, told.text
     assert abs(seconds(spell[1]) - away) <= 2 and abs(seconds(spell[2]) - back) <= 2, (told.text, away, back)
     assert "frames lost" not in told.text and "camera" not in told.text
+
+
+@pytest.mark.slow
+def test_pictures_that_the_encoder_had_no_time_for(agent):
+    """It stands still until seconds of pictures wait for it; the movie keeps its length, and what lacks is counted."""
+    agent.start()
+    begun = agent.start_recording("SLOW")
+    agent.let_record(2)
+    with held(*threads_named(agent, "vsrc:src")):
+        agent.log.wait("^The encoder can't keep up: 1 frames dropped", 30, level=Level.ERROR)
+        let_pass(1, "more are dropped")
+    agent.let_record(int(agent.command("STATUS").fields["elapsedTime"]) + 3)
+    stop = agent.command("STOP")
+    assert stop.text == "cmdStatus=0"
+    agent.wait_tool_call("SLOW")
+    (told,) = agent.log.lines(TOLD, level=Level.NOTICE)
+    lost = int(re.search(r"(\d+) frames lost, from 0:00:\d\d on", told.text)[1])
+    assert lost >= 20, told.text
+    path = agent.movie("SLOW")
+    movie.decodes(path)
+    shown = movie.counters(path)
+    (before, after) = movie.runs(shown)
+    assert after[0] - before[1] - 1 == lost
+    for stream in movie.streams(path).values():
+        assert abs(stream.duration - (stop.sent - begun.received)) < 0.4
