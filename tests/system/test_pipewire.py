@@ -79,6 +79,24 @@ def test_stop_then_start_at_once(agent, hall, camera, microphone):
         assert 440 in sounds.heard(agent.movie(uuid))
 
 
+@pytest.mark.parametrize("first, second", [(None, "pipewire:lectern"), ("pipewire:lectern", None),
+                                           ("Automatic", "pipewire:lectern")])
+def test_one_microphone_by_two_names(agent, hall, camera, microphone, first, second):
+    """STOP and START at once, with another name for the same microphone: the second recording hears it, too."""
+    agent.preferences(RecordingVideoInput=camera.id, RecordingAudioInput=first)
+    agent.start(env=hall.env)
+    for uuid, name in (("A", first), ("B", second), ("C", first)):
+        agent.preferences(RecordingVideoInput=camera.id, RecordingAudioInput=name)
+        assert agent.start_recording(uuid).text == "cmdStatus=0"
+        agent.let_record(2)
+        assert agent.command("STATUS").fields["lastError"] == "0"
+        assert agent.command("STOP").text == "cmdStatus=0"
+    for uuid in ("A", "B", "C"):
+        agent.wait_tool_call(uuid)
+        heard = sounds.heard(agent.movie(uuid))
+        assert heard.count(440) >= len(heard) / 2, (uuid, heard)
+
+
 @pytest.mark.parametrize("end", ["unplugged", "stalled"])
 def test_a_camera_lost_in_the_middle(agent, hall, camera, end):
     agent.preferences(RecordingVideoInput=camera.id)
