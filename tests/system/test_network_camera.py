@@ -1,4 +1,5 @@
 """Network cameras: with and without sound, slow to begin, absent, lost and back."""
+import contextlib
 import re
 import time
 from pathlib import Path
@@ -88,7 +89,7 @@ def test_the_first_key_frame_after_four_seconds(agent):
 @pytest.mark.parametrize("trouble", ["no key frame", "no answer", "nobody listens"])
 def test_start_is_refused_while_nothing_comes(agent, trouble):
     """The camera is there at the start of the daemon, so that it is not offline."""
-    with RtspCamera(agent.prepare()) as camera:
+    with RtspCamera(agent.prepare()) as camera, contextlib.ExitStack() as instead:
         watch(agent, camera)
         agent.start()
         if trouble == "no answer":
@@ -96,11 +97,11 @@ def test_start_is_refused_while_nothing_comes(agent, trouble):
         else:
             camera.kill()
         if trouble == "no key frame":
-            RtspCamera(agent, key_frame_after=3600).start()  # ends with the harness
+            instead.enter_context(RtspCamera(agent, key_frame_after=3600))
         mark = agent.log.mark()
         refused = agent.start_recording("NOTHING", timeout=40)
         assert refused.text == "cmdStatus=3" and refused.received - refused.sent < 15
-        assert agent.log.lines(after=mark, level=Level.ERROR)
+        agent.log.wait("The capture could not be prepared", after=mark)
         assert agent.command("STATUS").fields["recordStatus"] == "0"
         assert agent.alive() and agent.repository() == []
 

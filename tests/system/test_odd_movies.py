@@ -78,7 +78,7 @@ def test_is_recorded_somehow(agent, odd_movie, name):
 
 @pytest.mark.parametrize("name, silence", [("short-sound.mp4", 3), ("long-sound.mp4", 0)])
 def test_sound_that_is_shorter_or_longer_than_the_picture(agent, odd_movie, name, silence):
-    """Sound of two seconds under a picture of four, and the other way round. What lacks is silence, or a still picture."""
+    """Sound of two seconds under a picture of four, and the other way round: silence, or a still picture."""
     show(agent, odd_movie(name))
     agent.start()
     start, stop = agent.record("UNEVEN", 5)
