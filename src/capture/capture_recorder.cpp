@@ -12,6 +12,7 @@
 #include <system_error>
 #include <thread>
 
+#include "capture/source/device_pipeline.h"
 #include "platform/directories.h"
 #include "platform/log.h"
 #include "platform/paths.h"
@@ -26,6 +27,10 @@ constexpr auto kIdle = 250ms;  // where there is only sound, silence goes on whe
 constexpr auto kForEver = 24h;
 /// How long a recording that ends waits for a disk that takes nothing.
 constexpr auto kDiskPatience = 10s;
+
+double soundSeconds(GstBuffer* sound) {
+  return static_cast<double>(gst_buffer_get_size(sound)) / sizeof(float) / kSoundChannels / kSoundRate;
+}
 
 }  // namespace
 
@@ -96,21 +101,26 @@ std::optional<CaptureError> CaptureRecorder::run(Reporter reporter, SoundReport 
 
 void CaptureRecorder::startFlow() {
   const std::lock_guard lock(mutex_);
-  if (sources_) sources_->start();
+  if (!sources_) return;
+  flowing_ = true;
+  sources_->start();
 }
 
 void CaptureRecorder::end(Ending how) {
   std::optional<double> now;  // absent for devices of "speed=max": their capture ends with the last mark
   const bool realTime = clock_.realTime();
+  bool nothingComes = false;
   {
     const std::lock_guard lock(mutex_);
     if (!sources_) return;
     if (realTime) now = CaptureClock::now();
+    nothingComes = !realTime && !flowing_;
   }
   if (!marks_.end(how, now)) return;
   // The recording ends with the first frame behind the end, which is due within a frame's time. A camera that
   // has not delivered any picture yet gets longer: a recording that is stopped at once still holds one.
   const auto patience = recorded_frames_ > 0 ? 1s : 3s;
+  if (nothingComes) return queue_.hurry(MediaQueue::Clock::now());
   queue_.hurry(realTime ? MediaQueue::Clock::now() + patience : MediaQueue::Clock::time_point::max());
   if (realTime) patience_.set(Deadline::Clock::now() + kDiskPatience);
 }
@@ -133,7 +143,12 @@ void CaptureRecorder::syncMarks() const {
 
 double CaptureRecorder::runningTime() const {
   const std::lock_guard lock(mutex_);
-  return sources_ ? CaptureClock::now() : closed_at_;
+  return sources_ ? timeNow() : closed_at_;
+}
+
+/// Running time now. Where the time is the devices' own it is as late as they have delivered.
+double CaptureRecorder::timeNow() const {
+  return clock_.realTime() ? CaptureClock::now() : media_time_.load();
 }
 
 double CaptureRecorder::runningTimeAt(double wallTime) const {
@@ -172,11 +187,13 @@ void CaptureRecorder::onPicture(SampleHandle picture, double time) {
   GstBuffer* buffer = gst_sample_get_buffer(picture.get());
   GstCaps* caps = gst_sample_get_caps(picture.get());
   if (buffer == nullptr || caps == nullptr) return;
+  media_time_ = time + frame_seconds_;
   queue_.pushVideo({BufferHandle(gst_buffer_ref(buffer)), time, CapsHandle(gst_caps_ref(caps))});
 }
 
 void CaptureRecorder::onSound(BufferHandle sound, double time) {
   heard_ = true;
+  if (!encoding_.video) media_time_ = time + soundSeconds(sound.get());
   queue_.pushAudio({std::move(sound), time});
 }
 
@@ -185,15 +202,14 @@ void CaptureRecorder::onSourceLost(SourceUse use, const CaptureError& error) {
 }
 
 void CaptureRecorder::onSourceAway(SourceUse use, const CaptureError& error) {
-  if (use.picture)
-    return account_.cameraLost(CaptureClock::now());  // the frame before stays until it is back
+  if (use.picture) return account_.cameraLost(timeNow());  // the frame before stays until it is back
   // Where there is only sound its loss is the end; but a microphone that has never been there is waited for.
   !encoding_.video&& heard_ ? fail(error) : soundLost(error);
 }
 
 void CaptureRecorder::onSourceBack(SourceUse use, double /*seconds*/) {
-  if (use.picture) return account_.cameraBack(CaptureClock::now());
-  account_.microphoneBack(CaptureClock::now());
+  if (use.picture) return account_.cameraBack(timeNow());
+  account_.microphoneBack(timeNow());
   sound_away_ = false;
   SoundReport report;
   {
@@ -205,7 +221,7 @@ void CaptureRecorder::onSourceBack(SourceUse use, double /*seconds*/) {
 
 void CaptureRecorder::soundLost(const CaptureError& error) {
   if (sound_away_.exchange(true)) return;
-  account_.microphoneLost(CaptureClock::now());
+  account_.microphoneLost(timeNow());
   SoundReport report;
   {
     const std::lock_guard lock(mutex_);
@@ -220,7 +236,7 @@ void CaptureRecorder::fail(const CaptureError& error) {
     const std::lock_guard lock(mutex_);
     if (!error_) error_ = error;
     if (!sources_) return;
-    now = CaptureClock::now();
+    now = timeNow();
   }
   marks_.end(Ending::stop, now);
   queue_.hurry(MediaQueue::Clock::now());  // nothing more will come
@@ -239,6 +255,7 @@ void CaptureRecorder::record(const Reporter& reporter) {
   // Whoever is to be told is held from before anybody can see that the capture has ended.
   const Report report = reporter();
   const std::optional<CaptureError> problem = error();
+  tickAccount();  // what was lost since the last time
   account_.finish(endOfMedia(), sources.soundCorrection());
   publish(frames);
   movie_.reset();
@@ -262,11 +279,17 @@ void CaptureRecorder::recordUntilTheEnd() {
     const bool inTime = batch.inTime;
     const bool nothing = batch.audio.empty() && batch.video.empty();
     feed(std::move(batch));
-    account_.tick(cutter_.frames().horizon(), queue_.dropped(), clock_.wallOffset());
+    tickAccount();
     if (nothing) cutter_.feedNothing(CaptureClock::now());
     checkLimits();
     more = inTime && !reachedEnd();
   }
+  // What came while the last batch was being fed, before its device was lost.
+  if (!marks_.worthless()) feed(queue_.take(0s));
+}
+
+void CaptureRecorder::tickAccount() {
+  account_.tick(cutter_.frames().horizon(), queue_.dropped(), clock_.wallOffset());
 }
 
 void CaptureRecorder::feed(MediaQueue::Batch batch) {
@@ -300,7 +323,8 @@ std::uint32_t CaptureRecorder::closeMovie() {
     movie_.reset();
     return 0;
   }
-  cutter_.close();
+  cutter_.close(endOfMedia());
+  recorded_frames_ = cutter_.recordedFrames();
   movie_->close(cutter_.frames().frames(), cutter_.samples());
   if (queue_.dropped() > 0) movie_->fellBehind();
   return movie_->framesWritten(cutter_.frames().frames());
@@ -309,13 +333,27 @@ std::uint32_t CaptureRecorder::closeMovie() {
 /// The frame as it is encoded.
 BufferHandle CaptureRecorder::convert(const RawMedium& frame) {
   BufferHandle picture = converter_->convert(frame.buffer.get(), frame.caps.get());
-  if (const auto change = converter_->formatChange()) {
+  const auto change = converter_->formatChange();
+  if (change && picture) {
     LMPLogMessage(nullptr, kLogNotice,
                   "The camera's picture has changed: %s; it is fitted into the recording's", change->c_str());
     account_.sizeChanged(frame.time, recordedSize(frame.caps.get()));
   }
   if (picture) account_.picture(picture.get(), encoding_.video->size, frame.time);
+  noteReadable(frame.time, picture != nullptr);
   return picture;
+}
+
+/// The converter has told why a picture can't be read.
+void CaptureRecorder::noteReadable(double t, bool readable) {
+  if (!readable) account_.pictureLost(t);
+  const auto news = unreadable_.note(t, readable);
+  if (news == UnreadablePictures::News::again) {
+    LMPLogMessage(nullptr, kLogNotice, "The camera's pictures can be read again after %.0f s",
+                  unreadable_.lasted());
+  } else if (news == UnreadablePictures::News::hopeless) {
+    fail({CaptureError::kDomain, kDeviceFailed, "the camera's pictures can't be read"});
+  }
 }
 
 void CaptureRecorder::publish(std::uint32_t totalFrames) {
@@ -336,9 +374,6 @@ void CaptureRecorder::publish(std::uint32_t totalFrames) {
   finished_set_.notify_all();
 }
 
-double CaptureRecorder::endOfMedia() const {
-  const double end = marks_.endTime().value_or(0);
-  return clock_.realTime() ? std::min(end, CaptureClock::now()) : end;
-}
+double CaptureRecorder::endOfMedia() const { return std::min(marks_.endTime().value_or(0), timeNow()); }
 
 }  // namespace lmx

@@ -10,12 +10,13 @@
 #include <string>
 
 #include "capture/api/capture_framework.h"
+#include "capture/gst/picture_converter.h"
+#include "capture/media/unreadable_pictures.h"
 #include "capture/media_cutter.h"
 #include "capture/media_queue.h"
 #include "capture/movie_output.h"
-#include "capture/recording_plan.h"
-#include "capture/gst/picture_converter.h"
 #include "capture/recording_account.h"
+#include "capture/recording_plan.h"
 #include "capture/recording_sources.h"
 #include "capture/store/capture_files.h"
 #include "capture/store/capture_marks.h"
@@ -35,7 +36,8 @@ class CaptureRecorder : public CaptureConsumer, public std::enable_shared_from_t
   };
   /// Told on the recording thread when the file is closed; the devices are about to be given back.
   using Report = std::function<void(const Outcome&)>;
-  /// Told on a source's thread when the microphone is lost while the recording goes on, and when it is back (null).
+  /// Told on a source's thread when the microphone is lost while the recording goes on, and when it is back
+  /// (null).
   using SoundReport = std::function<void(const CaptureError* error)>;
   /// Asked for the report on the recording thread, just before the end of the capture can be seen.
   using Reporter = std::function<Report()>;
@@ -83,14 +85,17 @@ class CaptureRecorder : public CaptureConsumer, public std::enable_shared_from_t
   void guarded(const std::function<void()>& step);
   void recordUntilTheEnd();
   void feed(MediaQueue::Batch batch);
+  void tickAccount();
   [[nodiscard]] bool reachedEnd() const;
   void checkLimits();
   std::uint32_t closeMovie();
   void publish(std::uint32_t totalFrames);
   [[nodiscard]] double endOfMedia() const;
   [[nodiscard]] BufferHandle convert(const RawMedium& frame);
+  void noteReadable(double t, bool readable);
 
   // Any thread.
+  [[nodiscard]] double timeNow() const;
   void fail(const CaptureError& error);
   void soundLost(const CaptureError& error);
 
@@ -103,18 +108,21 @@ class CaptureRecorder : public CaptureConsumer, public std::enable_shared_from_t
   const std::shared_ptr<Journal> journal_;
   CaptureMarks marks_;
   MediaQueue queue_;
-  Deadline patience_;                          // of all that the movie's threads wait for
+  Deadline patience_;  // of all that the movie's threads wait for
   RecordingAccount account_;
   std::optional<PictureConverter> converter_;  // recording thread
+  UnreadablePictures unreadable_;              // recording thread
   bool limit_reached_ = false;                 // recording thread
   std::atomic<bool> heard_{false};             ///< some sound has come
   std::atomic<bool> sound_away_{false};
   std::atomic<std::uint32_t> recorded_frames_{0};
+  std::atomic<double> media_time_{0};  ///< running time that the leading device has reached
 
   mutable std::mutex mutex_;
   mutable std::condition_variable finished_set_;
   std::optional<RecordingSources> sources_;    // guarded by mutex_: nothing once the capture is closed
   SoundReport sound_report_;                   // guarded by mutex_: null once the capture is closed
+  bool flowing_ = false;                       // guarded by mutex_: devices of "speed=max" have been started
   double closed_at_ = 0;                       // guarded by mutex_: running time when the capture ended
   std::optional<CaptureError> error_;          // guarded by mutex_: the first one
   std::shared_ptr<FinishedCapture> finished_;  // guarded by mutex_

@@ -30,6 +30,7 @@ MediaCutter::MediaCutter(const MovieEncoding& encoding, double begin, Surroundin
 FrameDecision MediaCutter::decide(double t) {
   const CaptureMarks::Wish wish = around_.marks.wishAt(last_frame_time_, t, frames_.frames() == 0);
   last_frame_time_ = t;
+  if (!wish.wanted) prolong(t);
   const FrameDecision decision = frames_.decide(t, wish.wanted, wish.keyFrame);
   if (decision.beginsRun) {
     around_.journal.run(frames_.runs().back());
@@ -38,14 +39,26 @@ FrameDecision MediaCutter::decide(double t) {
   return decision;
 }
 
+/// The frame before a mark lasts until the mark, however long the camera takes for the next one.
+void MediaCutter::prolong(double t) {
+  if (frames_.runs().empty() || frames_.runs().back().closed) return;
+  const auto until = around_.marks.wantedUntil(t);
+  if (!until) return;
+  frames_.prolong(*until);
+  if (around_.movie.started()) recorded_frames_ = frames_.frames();
+}
+
 void MediaCutter::feedFrame(const RawMedium& frame) {
   const FrameDecision decision = decide(frame.time);
   if (!decision.take || !startMovie()) return;
   recorded_frames_ = frames_.frames();
   const BufferHandle picture = around_.convert(frame);
   // One that can't be read is a hole: the frame before it stays.
-  if (picture) around_.movie.pushFrame(picture.get(), decision.place, decision.forceKey || std::exchange(key_owed_, false));
-  else key_owed_ = key_owed_ || decision.forceKey;
+  if (picture)
+    around_.movie.pushFrame(picture.get(), decision.place,
+                            decision.forceKey || std::exchange(key_owed_, false));
+  else
+    key_owed_ = key_owed_ || decision.forceKey;
 }
 
 void MediaCutter::feedVirtualFrames(double until) {
@@ -55,9 +68,7 @@ void MediaCutter::feedVirtualFrames(double until) {
   }
 }
 
-bool MediaCutter::startMovie() {
-  return around_.movie.started() || around_.movie.start();
-}
+bool MediaCutter::startMovie() { return around_.movie.started() || around_.movie.start(); }
 
 // ---- sound
 
@@ -98,14 +109,20 @@ void MediaCutter::fillSilence(double until) {
 
 /// In pieces: an hour of it must not be an hour of memory.
 void MediaCutter::pushSilence(std::uint32_t samples) {
-  const double seconds = static_cast<double>(samples) / audio_->sampleRate;
-  around_.silenced(frames_.horizon() - seconds, seconds);
-  const auto most = static_cast<std::uint32_t>(kSilencePiece * audio_->sampleRate);
+  if (samples == 0) return;
+  const double rate = audio_->sampleRate;
+  around_.silenced(frames_.timeAt(static_cast<double>(pushed_samples_) / rate), samples / rate);
+  const auto most = static_cast<std::uint32_t>(kSilencePiece * rate);
   while (samples > 0) {
     const std::uint32_t piece = std::min(samples, most);
-    around_.movie.pushSound(nullptr, piece);
+    pushSound(nullptr, piece);
     samples -= piece;
   }
+}
+
+void MediaCutter::pushSound(const float* samples, std::uint32_t count) {
+  around_.movie.pushSound(samples, count);
+  pushed_samples_ += count;
 }
 
 void MediaCutter::cutChunk(const RawMedium& chunk) {
@@ -123,7 +140,7 @@ void MediaCutter::pushPieces(const RawMedium& chunk, const std::vector<SoundPiec
   const auto channels = static_cast<std::size_t>(audio_->channels);
   for (const SoundPiece& piece : pieces) {
     pushSilence(piece.silence);
-    if (piece.count > 0) around_.movie.pushSound(samples + piece.offset * channels, piece.count);
+    if (piece.count > 0) pushSound(samples + piece.offset * channels, piece.count);
   }
   gst_buffer_unmap(chunk.buffer.get(), &map);
 }
@@ -139,7 +156,8 @@ bool MediaCutter::reaches(double end) const {
   return sound_->position() >= std::llround(frames_.frames() * frames_.frameSeconds() * audio_->sampleRate);
 }
 
-void MediaCutter::close() {
+void MediaCutter::close(double end) {
+  if (around_.live) prolong(end);
   frames_.close();
   if (!sound_) return;
   for (const RawMedium& chunk : pending_sound_) cutChunk(chunk);

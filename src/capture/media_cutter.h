@@ -25,10 +25,10 @@ class MediaCutter {
     MovieOutput& movie;
     /// A frame in the movie's size and colours; null when it can't be read.
     std::function<BufferHandle(const RawMedium& frame)> convert;
-    std::function<void(const RawMedium& chunk)> heard;           ///< sound that is recorded
-    std::function<void(double t, double seconds)> silenced;      ///< silence that is recorded instead
+    std::function<void(const RawMedium& chunk)> heard;       ///< sound that is recorded
+    std::function<void(double t, double seconds)> silenced;  ///< silence that is recorded instead
     std::function<bool()> soundComes;  ///< false while the microphone is away: nobody waits for it then
-    bool live = true;  ///< sound that is not there in time is silence
+    bool live = true;                  ///< sound that is not there in time is silence
   };
   /// @param begin  running time at which the capture begins, seconds
   MediaCutter(const MovieEncoding& encoding, double begin, Surroundings surroundings);
@@ -41,8 +41,10 @@ class MediaCutter {
   void feedNothing(double now);
   /// Whether all frames before `end`, and the sound of those that were taken, have been fed.
   [[nodiscard]] bool reaches(double end) const;
-  /// Gives the movie the sound that is left, and silence for what is missing. Nothing may be fed afterwards.
-  void close();
+  /// Gives the movie the sound that is left, and silence for what is missing. Live, the last frame lasts
+  /// until `end` where so much is wanted: the sound beside a camera that is away is not lost. Nothing may be
+  /// fed afterwards.
+  void close(double end);
 
   [[nodiscard]] const FrameCutter& frames() const { return frames_; }
   /// Frames of the movie's clock that have been given to the movie.
@@ -54,12 +56,14 @@ class MediaCutter {
 
  private:
   FrameDecision decide(double t);
+  void prolong(double t);
   void feedVirtualFrames(double until);
   void cutChunk(const RawMedium& chunk);
   void pushPieces(const RawMedium& chunk, const std::vector<SoundPiece>& pieces);
   bool startMovie();
   void fillSilence(double until);
   void pushSilence(std::uint32_t samples);
+  void pushSound(const float* samples, std::uint32_t count);
   [[nodiscard]] double chunkSeconds(const RawMedium& chunk) const;
   [[nodiscard]] double endOf(const RawMedium& chunk) const { return chunk.time + chunkSeconds(chunk); }
 
@@ -73,6 +77,7 @@ class MediaCutter {
   double last_frame_time_ = -1e300;
   std::optional<double> next_virtual_;
   std::uint32_t recorded_frames_ = 0;
+  std::int64_t pushed_samples_ = 0;
   bool key_owed_ = false;  ///< the frame that should have been a key frame could not be read
 };
 

@@ -41,8 +41,8 @@ void RecordingAccount::picture(GstBuffer* frame, PictureSize size, double t) {
 void RecordingAccount::sound(const RawMedium& chunk) {
   GstMapInfo map;
   if (gst_buffer_map(chunk.buffer.get(), &map, GST_MAP_READ) == FALSE) return;
-  tell(watch_.sound({reinterpret_cast<const float*>(map.data), map.size / sizeof(float)}, kSoundChannels, kSoundRate,
-                    chunk.time));
+  tell(watch_.sound({reinterpret_cast<const float*>(map.data), map.size / sizeof(float)}, kSoundChannels,
+                    kSoundRate, chunk.time));
   gst_buffer_unmap(chunk.buffer.get(), &map);
 }
 
@@ -76,6 +76,11 @@ void RecordingAccount::sizeChanged(double t, PictureSize size) {
   ledger_.pictureSizeChanged(t, size.width, size.height);
 }
 
+void RecordingAccount::pictureLost(double t) {
+  const std::lock_guard lock(mutex_);
+  ledger_.framesDropped(t, 1);
+}
+
 void RecordingAccount::tick(double t, std::uint64_t dropped, double wallOffset) {
   const double step = wall_known_ ? wallOffset - wall_offset_ : 0;
   wall_known_ = true;
@@ -99,6 +104,11 @@ void RecordingAccount::journalDue(double t) {
 }
 
 void RecordingAccount::finish(double t, double soundCorrection) {
+  if (dropped_ > 0) {
+    LMPLogMessage(nullptr, kLogWarning,
+                  "%llu pictures of the recording were lost: the machine could not keep up",
+                  static_cast<unsigned long long>(dropped_));
+  }
   std::vector<GapLedger::Words> lines;
   std::string summary;
   {

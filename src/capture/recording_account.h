@@ -11,8 +11,8 @@
 
 namespace lmx {
 
-/// Logs trouble with the signal while it lasts, writes gaps to the journal as they come and tells all of them in one line
-/// at the end. Times are running time in seconds. Thread-safe.
+/// Logs trouble with the signal while it lasts, writes gaps to the journal as they come and tells all of them
+/// in one line at the end. Times are running time in seconds. Thread-safe.
 class RecordingAccount {
  public:
   /// @param journal  must outlive the account
@@ -30,10 +30,12 @@ class RecordingAccount {
   void cameraLost(double t);
   void cameraBack(double t);
   void sizeChanged(double t, PictureSize size);
+  /// A picture could not be read: the one before it stays.
+  void pictureLost(double t);
   /// @param dropped  frames that were lost so far because the machine could not keep up
   /// @param wallOffset  wall clock at running time 0, as the clock is set now
   void tick(double t, std::uint64_t dropped, double wallOffset);
-  /// The end of the recording: tells what was not real.
+  /// The end of the recording: tells what was not real. Recording thread, after the last tick().
   void finish(double t, double soundCorrection);
 
  private:
@@ -43,10 +45,10 @@ class RecordingAccount {
   Journal& journal_;
   SignalWatch watch_;  // recording thread
   std::mutex mutex_;
-  GapLedger ledger_;             // guarded by mutex_
-  std::uint64_t dropped_ = 0;    // recording thread
-  double wall_offset_ = 0;       // recording thread
-  bool wall_known_ = false;      // recording thread
+  GapLedger ledger_;           // guarded by mutex_
+  std::uint64_t dropped_ = 0;  // recording thread
+  double wall_offset_ = 0;     // recording thread
+  bool wall_known_ = false;    // recording thread
 };
 
 }  // namespace lmx

@@ -27,7 +27,7 @@ def test_a_microphone_by_name(agent, alsa, desk):
     movie.decodes(path)
     assert abs(movie.streams(path)["audio"].duration - (stop.sent - start.received)) < 0.2
     heard = sounds.heard(path)
-    assert heard[1:] == [440] * (len(heard) - 1), heard
+    assert sounds.is_tone(heard[1:], 440), heard
 
 
 def test_stop_then_start_at_once(agent, alsa, desk):
@@ -64,7 +64,7 @@ def test_sound_alone(agent, alsa, desk):
     agent.record("ALONE", 3)
     heard = sounds.heard(agent.movie("ALONE"))
     assert set(movie.streams(agent.movie("ALONE"))) == {"audio"}
-    assert heard[1:-1] == [440] * (len(heard) - 2), heard
+    assert sounds.is_tone(heard[1:-1], 440), heard
 
 
 @pytest.mark.parametrize("kind", ["silent", "playing"])

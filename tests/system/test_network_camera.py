@@ -189,6 +189,29 @@ def test_a_camera_that_comes_back(agent, trouble):
     assert len(agent.log.lines(re.escape(camera.uri), after=mark, level=Level.ERROR)) <= 1
 
 
+@pytest.mark.slow
+def test_what_is_said_while_the_camera_is_away_is_kept_to_the_stop(agent):
+    with RtspCamera(agent.prepare()) as camera:
+        watch(agent, camera, RecordingAudioInput="test://audio")
+        agent.start()
+        start = agent.start_recording("SAID")
+        agent.let_record(3)
+        camera.kill()
+        let_pass(4, "the camera is away")
+        wanted = time.time() - start.received
+        took, told = stop(agent, "SAID")
+        assert took < 3
+    path = agent.movie("SAID")
+    movie.decodes(path)
+    assert abs(told - wanted) < 0.5
+    streams = movie.streams(path)
+    assert all(abs(stream.duration - wanted) < 0.5 for stream in streams.values()), (streams, wanted)
+    sound = abs(movie.sound(path))
+    ticks = sum(sound[at: at + 8000].max() > 0.1 for at in range(0, len(sound) - 8000, 8000))
+    assert ticks >= int(wanted) - 1, "the synthetic microphone ticks each second"
+
+
+@pytest.mark.slow
 def test_sound_that_ends_while_the_picture_goes_on(agent):
     """The rest is silence; the camera counts as there."""
     launch = picture() + " " + SOUND.replace("rtpmp4gpay", "valve name=cable ! rtpmp4gpay")

@@ -42,7 +42,7 @@ def test_picture_and_sound(agent, hall, camera, microphone):
     for stream in movie.streams(path).values():
         assert abs(stream.duration - (stop.sent - start.received)) < 0.4
     heard = sounds.heard(path)
-    assert heard[1:] == [440] * (len(heard) - 1), heard
+    assert sounds.is_tone(heard[1:], 440), heard
     shown = movie.counters(path)
     assert shown == sorted(set(shown)), "no picture twice, none out of order"
     assert len(shown) > 0.9 * (shown[-1] - shown[0] + 1), shown

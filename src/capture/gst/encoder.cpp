@@ -69,11 +69,21 @@ Result<std::unique_ptr<Encoder>> Encoder::create(const MovieEncoding& movie, con
   if (!pipeline) return std::move(pipeline).error();
   std::unique_ptr<Encoder> encoder(new Encoder(movie, patience, std::move(output)));
   encoder->attach(*std::move(pipeline));
-  if (gst_element_set_state(encoder->pipeline_.get(), GST_STATE_PLAYING) == GST_STATE_CHANGE_FAILURE)
-    return Error{"the encoder could not be started"};
-  if (movie.audio)
-    encoder->output_.onFormat(encoder->soundTrack(), encoder->soundFormat(encoder->sound_config_));
+  if (auto problem = encoder->start()) return *std::move(problem);
   return encoder;
+}
+
+/// One that can't be started is replaced with another, which tells the same output: this one says nothing
+/// then.
+std::optional<Error> Encoder::start() {
+  const bool refused = gst_element_set_state(pipeline_.get(), GST_STATE_PLAYING) == GST_STATE_CHANGE_FAILURE;
+  {
+    const std::lock_guard lock(mutex_);
+    if (refused || failed_) return Error{problem_.empty() ? "the encoder could not be started" : problem_};
+    started_ = true;
+  }
+  if (audio_) output_.onFormat(soundTrack(), soundFormat(sound_config_));
+  return std::nullopt;
 }
 
 void Encoder::attach(GstHandle<GstElement> pipeline) {
@@ -204,7 +214,9 @@ void Encoder::fail(const std::string& problem) {
   {
     const std::lock_guard lock(mutex_);
     if (std::exchange(failed_, true)) return;
+    problem_ = problem;
     changed_.notify_all();
+    if (!started_) return;
   }
   output_.onError(problem);
 }

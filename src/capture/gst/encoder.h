@@ -20,7 +20,7 @@ namespace lmx {
 
 /// Takes what is encoded. Called on the encoder's threads, one per track.
 struct EncoderOutput {
-  /// Before the track's samples: sound's as soon as there is an encoder, the picture's with its first frame.
+  /// Before the track's samples: sound's as soon as the encoder runs, the picture's with its first frame.
   /// Again if the sound's encoder describes itself otherwise than was foreseen.
   std::function<void(std::uint32_t track, TrackFormat format)> onFormat;
   /// A frame with the place it was pushed with. It has no duration yet: that depends on the next one.
@@ -33,7 +33,7 @@ struct EncoderOutput {
 /// Fed by one thread. Track 0 is the picture, if there is one; the sound follows.
 class Encoder {
  public:
-  /// Starts an encoder. The error says in words why there is none.
+  /// Starts an encoder. The error says in words why there is none; the output has heard nothing then.
   /// @param patience  when its feeder is no longer made to wait; must outlive the encoder
   static Result<std::unique_ptr<Encoder>> create(const MovieEncoding& movie, const Deadline& patience,
                                                  EncoderOutput output);
@@ -57,6 +57,7 @@ class Encoder {
   Encoder(const MovieEncoding& movie, const Deadline& patience, EncoderOutput output);
   void attach(GstHandle<GstElement> pipeline);
   void takeFrom(const char* sink, NewSample* onSample);
+  [[nodiscard]] std::optional<Error> start();
   static GstFlowReturn onVideoSample(GstElement* sink, gpointer self) noexcept;
   static GstFlowReturn onAudioSample(GstElement* sink, gpointer self) noexcept;
   static void onEos(GstElement* sink, gpointer self) noexcept;
@@ -88,7 +89,9 @@ class Encoder {
   std::mutex mutex_;
   std::condition_variable changed_;
   int open_streams_ = 0;                     // guarded by mutex_
+  bool started_ = false;                     // guarded by mutex_: failures are told to the output from now on
   bool failed_ = false;                      // guarded by mutex_
+  std::string problem_;                      // guarded by mutex_: why it has failed
   std::deque<std::uint32_t> places_inside_;  // guarded by mutex_: of the frames that are not out yet
   std::int64_t audio_out_ = 0;               // guarded by mutex_: samples
 };

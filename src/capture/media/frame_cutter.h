@@ -30,11 +30,16 @@ class FrameCutter {
   /// @param wanted  whether it is to be recorded
   /// @param keyWanted  whether a request's span begins with it, inside a run
   FrameDecision decide(double t, bool wanted, bool keyWanted);
+  /// Lets the newest frame of the open run, if there is one, last until `until` at least.
+  void prolong(double until);
   /// Ends the open run. Call it when no more frames will come.
   void close();
 
   /// Running time up to which every frame has been decided; -1e300 before the first one.
   [[nodiscard]] double horizon() const { return horizon_; }
+  /// Running time of a place in the movie, in seconds of the movie. Behind a cut's frames the next run
+  /// begins.
+  [[nodiscard]] double timeAt(double movieSeconds) const;
   /// Length of the movie so far, in frames.
   [[nodiscard]] std::uint32_t frames() const { return frames_; }
   [[nodiscard]] double frameSeconds() const { return frame_seconds_; }

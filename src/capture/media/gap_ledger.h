@@ -21,7 +21,9 @@ class GapLedger {
   /// That many frames from `t` on were lost; the one before is shown in their place.
   void framesDropped(double t, std::uint32_t count) { add(Kind::frames, t, t, count); }
   /// So many seconds of silence were put in from `t` on.
-  void silencePutIn(double t, double seconds) { add(Kind::silence, t, t + seconds, seconds); }
+  void silencePutIn(double t, double seconds) {
+    if (seconds > 0) add(Kind::silence, t, t + seconds, seconds);
+  }
   void microphoneLost(double t) { microphone_lost_ = microphone_lost_.value_or(t); }
   void microphoneBack(double t) { back(Kind::microphone, microphone_lost_, t); }
   /// A network camera is being called again: a still picture and silence meanwhile.

@@ -81,6 +81,21 @@ bool RequestMarks::wanted(double t) const {
                      [t](const Request& request) { return !request.cancelled && request.wanted(t); });
 }
 
+std::optional<double> RequestMarks::wantedUntil(double t) const {
+  std::optional<double> latest;
+  for (const Request& request : requests_) {
+    if (request.cancelled) continue;
+    for (const Span& span : request.spans) {
+      double end = std::min(span.stop, t);
+      for (auto pause = pauses_.rbegin(); pause != pauses_.rend(); ++pause) {
+        if (pause->start < end && end <= pause->stop) end = pause->start;
+      }
+      if (end > span.start) latest = std::max(latest.value_or(end), end);
+    }
+  }
+  return latest;
+}
+
 bool RequestMarks::startsBetween(double previous, double t) const {
   for (const Request& request : requests_) {
     for (const Span& span : request.spans) {

@@ -1,6 +1,7 @@
 // The marks of a capture's requests: what is to be recorded when, and for whom. Pure.
 #pragma once
 #include <limits>
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -55,6 +56,8 @@ class RequestMarks {
 
   /// Whether a frame of time `t` is to be recorded.
   [[nodiscard]] bool wanted(double t) const;
+  /// The end, `t` at the latest, of what is to be recorded before `t`; nothing if there is nothing.
+  [[nodiscard]] std::optional<double> wantedUntil(double t) const;
   /// Whether a span begins after `previous` and not after `t`. The frame at `t` must then be a key frame, so
   /// that the request's movie can begin with it.
   [[nodiscard]] bool startsBetween(double previous, double t) const;

@@ -124,4 +124,9 @@ CaptureMarks::Wish CaptureMarks::wishAt(double previous, double t, bool firstFra
           .keyFrame = marks_.startsBetween(previous, t)};
 }
 
+std::optional<double> CaptureMarks::wantedUntil(double t) const {
+  const std::lock_guard lock(mutex_);
+  return marks_.wantedUntil(ending_ == Ending::no ? t : std::min(t, end_time_));
+}
+
 }  // namespace lmx

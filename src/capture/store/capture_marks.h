@@ -54,6 +54,8 @@ class CaptureMarks {
   /// Whether the frame at `t` is to be recorded. @param previous  time of the one before it
   /// @param firstFrame  the movie has no frame yet: a request that has ended already takes this one
   [[nodiscard]] Wish wishAt(double previous, double t, bool firstFrame) const;
+  /// The end, `t` at the latest, of what is to be recorded before `t`; nothing if there is nothing.
+  [[nodiscard]] std::optional<double> wantedUntil(double t) const;
 
   /// Accepts no more marks. @return the final marks
   RequestMarks close();

@@ -5,13 +5,16 @@
 
 #include <algorithm>
 #include <filesystem>
+#include <numeric>
 #include <random>
 
+#include "capture/gst/video_encoders.h"
 #include "capture/movie/movie_copy.h"
 #include "capture/movie/movie_reader.h"
 #include "capture/source/test_picture.h"
 #include "tests/unit/capture/capture_harness.h"
 #include "tests/unit/capture/movie/movie_check.h"
+#include "tests/unit/doubles/log_capture.h"
 #include "tests/unit/doubles/wait_until.h"
 
 namespace lmx {
@@ -193,6 +196,39 @@ TEST(MovieOutput, ACopyMayBeginAndEndInsideALongFrame) {
     EXPECT_EQ(shown.times, c.times) << c.ranges.front().first;
     EXPECT_EQ(shown.end, c.end) << c.ranges.front().first;
   }
+}
+
+/// Hardware that worked when it was tried out and is taken when the recording begins.
+TEST(MovieOutput, HardwareThatIsTakenIsReplacedWithoutHarm) {
+  ensureGStreamer();
+  testing::LogCapture log;
+  const auto uses = std::make_shared<int>(0);
+  const VideoEncoderKind hardware{"hardware", [uses](const VideoEncoding& video) {
+                                    const std::string working = softwareEncoder().elements(video);
+                                    if ((*uses)++ == 0) return working;
+                                    return working +
+                                           " ! tee name=t t. ! filesink location=/nowhere/device t.";
+                                  }};
+  VideoEncoderChoice::instance().tryOut({hardware});
+  ASSERT_TRUE(log.mentions("Pictures are encoded with hardware"));
+  MovieEncoding encoding = pictureOnly();
+  encoding.audio = AudioEncoding{};
+  {
+    Output output(encoding);  // an error that it tells is a failure
+    Numbers places(60);
+    std::iota(places.begin(), places.end(), 0);
+    output.frames(places);
+    (*output).pushSound(nullptr, 96000);
+    output.close(60, 96000);
+    const auto movie = decodeMovie(output.path());
+    EXPECT_EQ(movie.problem, "");
+    EXPECT_EQ(movie.frameNumbers, places);
+  }
+  EXPECT_EQ(*uses, 2);
+  EXPECT_TRUE(log.mentions("hardware could not be started ("));
+  EXPECT_TRUE(log.mentions("/nowhere/device")) << "the reason";
+  EXPECT_FALSE(log.mentions("describes its sound otherwise"));
+  VideoEncoderChoice::instance().tryOut({softwareEncoder()});
 }
 
 }  // namespace

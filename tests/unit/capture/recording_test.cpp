@@ -230,6 +230,34 @@ TEST(Recording, ElapsedTimesCountMarkedSpansOnly) {
   EXPECT_EQ(capture.controller->elapsedTimeForRequestWithUUID("unknown"), 0);
 }
 
+/// Its time is its own: it has nothing to do with how long this process has been running.
+TEST(Recording, AFastDeviceThatIsLostLeavesAllThatItGave) {
+  const std::string lost = "&lost-after=20";
+  for (const std::string& video : {kFastVideo + lost, std::string()}) {
+    const Folder folder;
+    Capture capture(folder, video, video.empty() ? kFastAudio + lost : kFastAudio);
+    ASSERT_TRUE(capture.prepare());
+    capture.controller->setStartWithUUID("R", capture.zero(), parametersFor("R"));
+    ASSERT_TRUE(capture.controller->startRecording());
+    ASSERT_EQ(capture.reports->wait(), Kind::complete);
+    EXPECT_TRUE(capture.reports->error());
+    EXPECT_NEAR(capture.controller->elapsedTimeForRequestWithUUID("R"), 20, 0.1);
+    EXPECT_NEAR(static_cast<double>(capture.controller->elapsedTimeInMilliseconds()), 20000, 100);
+    capture.controller->cancelRequestWithUUID("R");
+  }
+}
+
+TEST(Recording, AFastDeviceThatWasNeverStartedEndsAtOnce) {
+  for (const bool cancel : {true, false}) {
+    const Folder folder;
+    Capture capture(folder, kFastVideo, kFastAudio);
+    ASSERT_TRUE(capture.prepare());
+    capture.controller->setStartWithUUID("R", capture.zero(), parametersFor("R"));
+    cancel ? capture.controller->cancelRecording() : capture.controller->stopRecording();
+    EXPECT_EQ(capture.reports->wait(20s), cancel ? Kind::cancel : Kind::complete);
+  }
+}
+
 TEST(Recording, AFileThatBearsTheNameIsSetAside) {
   const Folder folder;
   for (int i = 0; i < 2; ++i) {

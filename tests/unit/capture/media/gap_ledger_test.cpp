@@ -100,6 +100,14 @@ TEST(GapLedger, ATouchOfSilenceIsNotWorthALine) {
   EXPECT_EQ(ledger.summary(), "");
 }
 
+TEST(GapLedger, NoSilenceIsNoEntry) {
+  GapLedger ledger;
+  for (int i = 0; i < 100; ++i) ledger.silencePutIn(i, 0);
+  ledger.silencePutIn(50, 1);
+  for (int i = 52; i < 100; ++i) ledger.silencePutIn(i, 0);
+  EXPECT_EQ(joined(ledger.journalWords(61)), "gap silence 50.000 51.000 1.000\n");
+}
+
 TEST(GapLedger, SeveralAreOneSentence) {
   GapLedger ledger;
   ledger.silencePutIn(10, 1);

@@ -91,6 +91,30 @@ TEST(RequestMarks, CancelledRequestWantsNothing) {
   EXPECT_FALSE(marks.othersPending("B"));
 }
 
+TEST(RequestMarks, WhatIsWantedHasAnEnd) {
+  RequestMarks marks;
+  EXPECT_FALSE(marks.wantedUntil(10));
+  marks.start("A", 1, nullptr);
+  EXPECT_FALSE(marks.wantedUntil(1));
+  EXPECT_EQ(marks.wantedUntil(3), 3);
+  marks.pause(4);
+  EXPECT_EQ(marks.wantedUntil(5), 4);
+  marks.resume(6);
+  marks.pause(6.5);
+  marks.resume(8);
+  EXPECT_EQ(marks.wantedUntil(6), 4);
+  EXPECT_EQ(marks.wantedUntil(6.2), 6.2);
+  EXPECT_EQ(marks.wantedUntil(7), 6.5);
+  EXPECT_EQ(marks.wantedUntil(9), 9);
+  marks.stop("A", 10);
+  EXPECT_EQ(marks.wantedUntil(20), 10);
+  marks.start("B", 3, nullptr);
+  marks.stop("B", 15);
+  EXPECT_EQ(marks.wantedUntil(20), 15);
+  marks.cancel("B");
+  EXPECT_EQ(marks.wantedUntil(20), 10);
+}
+
 TEST(RequestMarks, StartsBetweenTellsWhereAKeyFrameMustBe) {
   RequestMarks marks;
   marks.start("A", 1.0, nullptr);
