@@ -1,4 +1,5 @@
 """Commands while a network camera is away: answered in time, and the sound goes on."""
+import signal
 import time
 
 import pytest
@@ -42,6 +43,11 @@ def finish(agent, begun):
     check(agent.movie("AWAY"), stop.sent - begun.received)
 
 
+def test_stop(agent, camera):
+    finish(agent, camera.begun)
+    agent.wait_idle()
+
+
 def test_cancel(agent, camera):
     reply = agent.command("CANCEL")
     assert reply.text == "cmdStatus=0" and reply.received - reply.sent < 2
@@ -51,13 +57,23 @@ def test_cancel(agent, camera):
     agent.record("NEXT", 1)
 
 
+def test_sigterm(agent, camera):
+    ended = time.time()
+    assert agent.stop(signal.SIGTERM, timeout=8) == 0
+    agent.preferences()
+    agent.start()
+    agent.log.wait("AWAY.mov", timeout=20)
+    agent.wait_idle()
+    check(agent.movie("AWAY"), ended - camera.begun.received)
+
+
 @pytest.mark.slow
 def test_a_camera_that_is_back_after_eight_seconds(agent, camera):
     let_pass(camera.begun.received + 11 - time.time(), "the camera is away")
     camera.start()
     agent.log.wait("^The camera is back after ", 10)
-    agent.let_record(int(agent.command("STATUS").fields["elapsedTime"]) + 3)
+    agent.let_record(int(time.time() - camera.begun.received) + 3)
     finish(agent, camera.begun)
     assert len(agent.log.lines("^Not real in this recording: .*camera away from 0:00:0")) == 1
     times = movie.frame_times(agent.movie("AWAY"))
-    assert times[-1] - times[-16] < 2.5, "pictures to the end"
+    assert times[-1] - times[-31] < 2.5, "pictures to the end"
