@@ -158,6 +158,7 @@ void AgentMain::shutdown() {
   cluster_.stop(loop_);
   const auto controller = capture_.captureController();
   while (controller && !controller->hasShutDown()) loop_.run(250ms);
+  if (environment_.framework) environment_.framework->waitUntilClosed(1s);
   channels_.tunnel().tellServerOfTheEnd();
   scheduler_.cancel();
   loop_.stop();

@@ -96,7 +96,7 @@ std::shared_ptr<LMRCaptureController> GstCaptureFramework::newCaptureController(
 
 std::unique_ptr<LMRPreviewController> GstCaptureFramework::newPreviewController(
     std::shared_ptr<CaptureSession> session) {
-  return std::make_unique<PreviewController>(std::move(session));
+  return std::make_unique<PreviewController>(session);
 }
 
 // ---- start of the agent
@@ -104,6 +104,10 @@ std::unique_ptr<LMRPreviewController> GstCaptureFramework::newPreviewController(
 void GstCaptureFramework::warmUp() {
   loadPlugins();
   VideoEncoderChoice::instance().tryOut(knownVideoEncoders());
+}
+
+void GstCaptureFramework::waitUntilClosed(std::chrono::milliseconds limit) {
+  Sources::instance().waitUntilClosed(limit);
 }
 
 std::vector<RecoveredRecording> GstCaptureFramework::recoverUnfinished(

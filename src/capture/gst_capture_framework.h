@@ -28,6 +28,7 @@ class GstCaptureFramework : public CaptureFramework {
       std::shared_ptr<CaptureSession> session) override;
 
   void warmUp() override;
+  void waitUntilClosed(std::chrono::milliseconds limit) override;
   std::string deviceInformation(const PictureLimits& limits) override;
   std::vector<RecoveredRecording> recoverUnfinished(
       const std::string& repository, const std::function<bool(const std::string& request)>& known) override;

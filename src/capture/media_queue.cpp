@@ -8,11 +8,11 @@
 namespace lmx {
 namespace {
 
-constexpr std::size_t kMaxFrames = 90;    // three seconds: an encoder this far behind will not catch up
+constexpr std::size_t kMaxFrames = 90;  // three seconds: an encoder this far behind will not catch up
 constexpr std::size_t kMaxFrameBytes = 256U << 20;
-constexpr double kMostSound = 20;         // seconds: a network camera may be away for ten
-constexpr std::size_t kFastQueue = 16;    // not live: the source waits
-constexpr double kFastLead = 1.0;         // seconds that sound may be ahead of the picture then
+constexpr double kMostSound = 20;       // seconds: a network camera may be away for ten
+constexpr std::size_t kFastQueue = 16;  // not live: the source waits
+constexpr double kFastLead = 1.0;       // seconds that sound may be ahead of the picture then
 constexpr std::uint64_t kDropsPerLogLine = 300;
 
 void reportDrop(std::uint64_t dropped) {

@@ -60,6 +60,7 @@ EncoderOutput MovieOutput::encoderOutput() {
   };
   output.onSound = [this](EncodedSample packet) { writer_->add(std::move(packet)); };
   output.onError = [this](const std::string& problem) {
+    if (encoding_.video) VideoEncoderChoice::instance().failed(*encoding_.video);
     on_error_({CaptureError::kDomain, kEncoderFailed, problem});
   };
   return output;

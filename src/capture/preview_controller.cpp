@@ -25,8 +25,9 @@ bool PreviewController::attachIOWithDevice(const std::string& device, CaptureErr
   const SourceWish wish{.device = device, .picture = true, .demand = demandHere()};
   std::optional<CaptureError> problem;
   if (parseDeviceID(device).kind == DeviceKind::unknown) {
-    problem = CaptureError{CaptureError::kDomain, kDeviceNotFound,
-                           "\"" + device + "\" is no camera identifier; list them with lmxagentd -i zq-device-list"};
+    problem = CaptureError{
+        CaptureError::kDomain, kDeviceNotFound,
+        "\"" + device + "\" is no camera identifier; list them with lmxagentd -i zq-device-list"};
   } else if (const auto lease = Sources::instance().lease(wish)) {
     problem = (*lease)->waitUntilRunning(kPatience);  // a picture is the only proof
   } else {
@@ -52,8 +53,7 @@ std::string PreviewController::videoDeviceLocalizedDisplayName() const {
 
 std::shared_ptr<CaptureSession> PreviewController::session() const {
   const std::lock_guard lock(mutex_);
-  if (lease_) return lease_;
-  return session_;
+  return lease_;
 }
 
 void PreviewController::startPreview() {

@@ -11,7 +11,8 @@ namespace lmx {
 /// taken of a preview, so its delegate is never called. Thread-safe.
 class PreviewController : public LMRPreviewController {
  public:
-  explicit PreviewController(std::shared_ptr<CaptureSession> session) : session_(std::move(session)) {}
+  /// Needs no session: devices that are open are found and shared.
+  explicit PreviewController(const std::shared_ptr<CaptureSession>& /*session*/) {}
   bool attachIOWithDevice(const std::string& device, CaptureError* error) override;
   void addAudioDeviceWithID(const std::optional<std::string>& device) override;
   [[nodiscard]] std::string videoDeviceLocalizedDisplayName() const override;
@@ -23,10 +24,9 @@ class PreviewController : public LMRPreviewController {
 
  private:
   mutable std::mutex mutex_;
-  const std::shared_ptr<CaptureSession> session_;
-  SourceWish wish_;     // guarded by mutex_
-  std::string name_;    // guarded by mutex_
-  SourceLease lease_;   // guarded by mutex_: null unless it runs
+  SourceWish wish_;    // guarded by mutex_
+  std::string name_;   // guarded by mutex_
+  SourceLease lease_;  // guarded by mutex_: null unless it runs
 };
 
 }  // namespace lmx

@@ -23,7 +23,8 @@ constexpr double kLowestRate = 5;  // frames a second: below, cuts would be coar
 CaptureError missing(const std::string& problem) { return {CaptureError::kDomain, kDeviceNotFound, problem}; }
 
 CaptureError noIdentifier(const std::string& device, const char* what) {
-  return missing("\"" + device + "\" is no " + what + " identifier; list them with lmxagentd -i zq-device-list");
+  return missing("\"" + device + "\" is no " + what +
+                 " identifier; list them with lmxagentd -i zq-device-list");
 }
 
 MovieEncoding encodingOf(const LMRRecordingContext& settings) {
@@ -70,7 +71,8 @@ MovieEncoding completeEncoding(const RecordingPlan& plan, const CameraFormat& ca
   const FrameRate wanted = encoding.video->frameRate;
   if (!camera.rate) return encoding;
   const double seconds = camera.rate->frameSeconds();
-  if (seconds <= 1 / kLowestRate && seconds >= wanted.frameSeconds() - 1e-6) encoding.video->frameRate = *camera.rate;
+  if (seconds <= 1 / kLowestRate && seconds >= wanted.frameSeconds() - 1e-6)
+    encoding.video->frameRate = *camera.rate;
   return encoding;
 }
 

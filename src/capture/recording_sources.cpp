@@ -29,7 +29,9 @@ Result<RecordingSources, CaptureError> RecordingSources::open(const RecordingPla
   SourceLease camera;
   SourceLease microphone;
   if (plan.camera) {
-    auto lease = Sources::instance().lease({.device = *plan.camera, .picture = true, .demand = demandHere(plan.demand.size, plan.demand.maximumRate)});
+    auto lease = Sources::instance().lease({.device = *plan.camera,
+                                            .picture = true,
+                                            .demand = demandHere(plan.demand.size, plan.demand.maximumRate)});
     if (!lease) return std::move(lease).error();
     camera = *std::move(lease);
   }

@@ -7,10 +7,12 @@
 
 namespace lmx {
 
-/// Holds the leases of a recording's devices. They are one and the same where a file or a network camera gives both.
+/// Holds the leases of a recording's devices. They are one and the same where a file or a network camera
+/// gives both.
 class RecordingSources {
  public:
-  /// Opens the devices and waits for the camera's first picture. A microphone that is not there is no reason to fail.
+  /// Opens the devices and waits for the camera's first picture. A microphone that is not there is no reason
+  /// to fail.
   /// @return why there is no picture
   static Result<RecordingSources, CaptureError> open(const RecordingPlan& plan);
 

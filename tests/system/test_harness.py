@@ -159,12 +159,13 @@ def test_a_network_camera_withholds_its_key_frames(agent):
 
 def test_a_network_camera_changes_its_mode(agent):
     with RtspCamera(agent.prepare()) as camera:
-        with subprocess.Popen([*agent.sandbox.entering("net"), "ffmpeg", "-v", "error", "-rtsp_transport", "tcp", "-t", "3",
-                               "-i", camera.uri, "-c", "copy", agent.path("/tmp/seen.ts")]):
+        command = ["ffmpeg", "-v", "error", "-rtsp_transport", "tcp", "-t", "3", "-i", camera.uri, "-c", "copy"]
+        with subprocess.Popen([*agent.sandbox.entering("net"), *command, agent.path("/tmp/seen.ts")]):
             wait_until(lambda: camera.viewers() == [1], what="a viewer")
             camera.change("mode", "caps", mode((640, 480)))
-        sizes = subprocess.run(["ffprobe", "-v", "quiet", "-select_streams", "v", "-show_entries", "frame=width,height",
-                                "-of", "csv=p=0", agent.path("/tmp/seen.ts")], capture_output=True, check=True, timeout=60)
+        sizes = subprocess.run(["ffprobe", "-v", "quiet", "-select_streams", "v", "-show_entries",
+                                "frame=width,height", "-of", "csv=p=0", agent.path("/tmp/seen.ts")],
+                               capture_output=True, check=True, timeout=60)
     assert {b"320,180", b"640,480"} <= {line[:7] for line in sizes.stdout.splitlines()}
 
 

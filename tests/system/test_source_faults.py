@@ -44,6 +44,11 @@ def test_sighup_and_a_start_within_ten_seconds(agent):
         assert agent.command("STOP").text == "cmdStatus=0"
         assert agent.wait_recorded("LIVES") >= 12
         assert agent.alive() and max(camera.viewers()) == 1
+        agent.sandbox.signal(signal.SIGHUP)
+        mark = agent.log.mark()
+        agent.log.wait("^Connecting to lmxserverd tunnel", timeout=20, after=mark)  # the look has found the camera
+        agent.record("SHARED", 1)
+        assert agent.alive() and max(camera.viewers()) == 1, "with the preview that it has left open"
     movie.decodes(agent.movie("LIVES"))
 
 

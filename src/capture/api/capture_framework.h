@@ -191,6 +191,9 @@ class CaptureFramework : public CaptureCatalog {
       std::shared_ptr<CaptureSession> session) = 0;
   /// Loads what the first recording would otherwise wait for. Any thread, blocks.
   virtual void warmUp() = 0;
+  /// Waits until the devices are closed that nobody uses any more, at most `limit`: a network camera keeps a
+  /// viewer that does not say goodbye for a minute. Any thread.
+  virtual void waitUntilClosed(std::chrono::milliseconds /*limit*/) {}
   /// The capture devices in words, for the command line.
   /// @param limits  what cameras would be asked for
   virtual std::string deviceInformation(const PictureLimits& limits) = 0;

@@ -138,6 +138,17 @@ void VideoEncoderChoice::apply(VideoEncoding& video) const {
   video.effortSaved = effort_saved_;
 }
 
+void VideoEncoderChoice::failed(const VideoEncoding& video) {
+  const VideoEncoderKind software = softwareEncoder();
+  if (video.kind.name == software.name) return;
+  {
+    const std::lock_guard lock(mutex_);
+    kind_ = software;
+  }
+  LMPLogMessage(nullptr, kLogWarning, "%s has failed: the next recordings are encoded with %s",
+                video.kind.name.c_str(), software.name.c_str());
+}
+
 void VideoEncoderChoice::fellBehind(const VideoEncoding& video) {
   VideoEncoding cheaper = video;
   if (video.kind.name == softwareEncoder().name) {

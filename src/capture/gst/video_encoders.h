@@ -32,6 +32,10 @@ class VideoEncoderChoice {
   /// next cheaper setting, until the process ends. Says so in the log, if there is one.
   void fellBehind(const VideoEncoding& video);
 
+  /// An encoder has failed in a recording. Hardware is not taken again until the process ends; says so in the
+  /// log.
+  void failed(const VideoEncoding& video);
+
  private:
   mutable std::mutex mutex_;
   std::optional<VideoEncoderKind> kind_;  // guarded by mutex_: absent for x264

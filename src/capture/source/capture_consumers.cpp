@@ -91,6 +91,20 @@ void CaptureConsumers::noSound(const CaptureError& error) {
   }
 }
 
+void CaptureConsumers::soundBack(double seconds) {
+  const std::lock_guard news(news_mutex_);
+  std::vector<Held> users;
+  {
+    const std::lock_guard lock(mutex_);
+    if (!mute_) return;
+    mute_ = std::nullopt;
+    users = heldLocked();
+  }
+  for (const Held& user : users) {
+    if (user.use.sound) user.consumer->onSourceBack({.picture = false, .sound = true}, seconds);
+  }
+}
+
 void CaptureConsumers::back(double seconds) {
   const std::lock_guard news(news_mutex_);
   std::vector<Held> users;

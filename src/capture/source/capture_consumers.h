@@ -33,8 +33,9 @@ class CaptureConsumer {
   virtual void onSourceBack(SourceUse use, double seconds) = 0;
 };
 
-/// The users of a source, and what they have to know of it. Media are delivered without any lock held. News come one
-/// after the other, so that nobody hears of a return before the loss: no user may add one from inside a call. Thread-safe.
+/// The users of a source, and what they have to know of it. Media are delivered without any lock held. News
+/// come one after the other, so that nobody hears of a return before the loss: no user may add one from
+/// inside a call. Thread-safe.
 class CaptureConsumers {
  public:
   /// One that is added while the source is away, or after it was lost, is told at once.
@@ -49,8 +50,10 @@ class CaptureConsumers {
   void lost(const CaptureError& error);
   void away(const CaptureError& error);
   void back(double seconds);
-  /// The device has no sound, whatever somebody wants of it: for users of its sound that is away for good.
+  /// The device gives pictures but no sound: for users of its sound that is away.
   void noSound(const CaptureError& error);
+  /// It gives sound again, after `seconds`.
+  void soundBack(double seconds);
   [[nodiscard]] std::optional<CaptureError> failure() const;
 
  private:

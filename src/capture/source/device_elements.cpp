@@ -11,7 +11,7 @@ namespace lmx {
 namespace {
 
 constexpr const char* kSink = "sync=false async=false enable-last-sample=false qos=false max-buffers=4 ";
-constexpr unsigned kNetworkLatencyMs = 300;         // packets that come later than that are lost
+constexpr unsigned kNetworkLatencyMs = 300;           // packets that come later than that are lost
 constexpr std::uint64_t kNetworkTimeoutUs = 5000000;  // of a connection
 
 std::string rateText(FrameRate rate) { return string_with_format("%d/%d", rate.numerator, rate.denominator); }
@@ -28,11 +28,12 @@ bool has(GstElement* element, const char* property) {
 }  // namespace
 
 GstHandle<GstElement> branchFor(bool picture) {
-  // The queue lets the next picture be decoded while this one is being taken. Of an interlaced picture one field is
-  // taken: as many pictures a second as the device has frames.
+  // The queue lets the next picture be decoded while this one is being taken. Of an interlaced picture one
+  // field is taken: as many pictures a second as the device has frames.
   const std::string description =
-      picture ? std::string("queue max-size-buffers=4 max-size-bytes=0 max-size-time=0 ! "
-                            "deinterlace mode=auto fields=top ! appsink name=vsink caps=video/x-raw ") +
+      picture ? std::string(
+                    "queue max-size-buffers=4 max-size-bytes=0 max-size-time=0 ! "
+                    "deinterlace mode=auto fields=top ! appsink name=vsink caps=video/x-raw ") +
                     kSink
               : "audioconvert ! audioresample ! " + soundCaps() + " ! appsink name=asink " + kSink;
   GError* raw = nullptr;
@@ -50,14 +51,15 @@ GstHandle<GstElement> branchFor(bool picture) {
 std::string syntheticDevice(const DeviceID& device, bool picture, FrameRate rate) {
   const char* live = device.asFastAsPossible() ? "false" : "true";
   if (!picture) {
-    return string_with_format("audiotestsrc name=asource is-live=%s wave=silence samplesperbuffer=%d ! %s ! ", live,
-                              kSoundRate / 100, soundCaps().c_str()) +
+    return string_with_format("audiotestsrc name=asource is-live=%s wave=silence samplesperbuffer=%d ! %s ! ",
+                              live, kSoundRate / 100, soundCaps().c_str()) +
            "appsink name=asink " + kSink;
   }
   const PictureSize size = pictureSize(device);
   return string_with_format(
              "videotestsrc name=vsource is-live=%s pattern=smpte horizontal-speed=4 ! "
-             "video/x-raw,format=I420,width=%d,height=%d,framerate=%s,pixel-aspect-ratio=1/1,colorimetry=bt709 ! ",
+             "video/x-raw,format=I420,width=%d,height=%d,framerate=%s,pixel-aspect-ratio=1/"
+             "1,colorimetry=bt709 ! ",
              live, size.width, size.height, rateText(syntheticRate(device).value_or(rate)).c_str()) +
          "appsink name=vsink " + kSink;
 }

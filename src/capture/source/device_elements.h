@@ -7,8 +7,9 @@
 
 namespace lmx {
 
-/// What follows a decoded picture or sound: an appsink named "vsink" or "asink". A bin with one sink pad; null, with a
-/// log line, when an element is missing. Pictures pass as they were decoded, but for interlaced ones.
+/// What follows a decoded picture or sound: an appsink named "vsink" or "asink". A bin with one sink pad;
+/// null, with a log line, when an element is missing. Pictures pass as they were decoded, but for interlaced
+/// ones.
 GstHandle<GstElement> branchFor(bool picture);
 
 /// The launch line of a synthetic camera or microphone, with its appsink.
@@ -23,8 +24,8 @@ void decodeInSoftware(GstElement* decoder);
 /// A microphone of ALSA's own configuration, which no list shows. Null when the element is missing.
 GstHandle<GstElement> alsaSource(const std::string& pcm);
 
-/// Sets what the device's source element offers for low latency and true times: no clock of its own, no correction of
-/// times by leaping, no buffers that the device waits for.
+/// Sets what the device's source element offers for low latency and true times: no clock of its own, no
+/// correction of times by leaping, no buffers that the device waits for.
 /// @param overUdp  what an RTSP camera is asked for; else its own connection, in which nothing gets lost
 void tuneSource(GstElement* source, bool overUdp);
 

@@ -83,7 +83,8 @@ DevicePipeline::~DevicePipeline() {
 
 std::optional<CaptureError> DevicePipeline::build(const Wish& wish) {
   if (device_.kind == DeviceKind::test) {
-    auto synthetic = newPipeline(syntheticDevice(device_, wish.picture, frameRateFrom(wish.demand.maximumRate)));
+    auto synthetic =
+        newPipeline(syntheticDevice(device_, wish.picture, frameRateFrom(wish.demand.maximumRate)));
     if (!synthetic) return error(kDeviceFailed, synthetic.error().message);
     pipeline_ = *std::move(synthetic);
     wish.picture ? attachTestPicture(pipeline_.get(), device_) : attachTestSound(pipeline_.get(), device_);
@@ -140,8 +141,7 @@ std::optional<CaptureError> DevicePipeline::addDecoder(GstElement* source, const
   correctColours(filtered.get());
   decodeInSoftware(decoder.get());
   g_signal_connect(decoder.get(), "pad-added", G_CALLBACK(&onPad), this);
-  for (const auto& element : {&filter, &decoder})
-    gst_bin_add(GST_BIN(pipeline_.get()), element->get());
+  for (const auto& element : {&filter, &decoder}) gst_bin_add(GST_BIN(pipeline_.get()), element->get());
   if (gst_element_link_many(source, filter.get(), decoder.get(), nullptr) == FALSE)
     return error(kDeviceFailed, "gives no format that can be recorded");
   return std::nullopt;
@@ -163,7 +163,8 @@ void DevicePipeline::onNoMorePads(GstElement* decoder, gpointer self) noexcept {
   pipeline.wake();
   if (pipeline.picture_wanted_ ? pipeline.has_picture_ : pipeline.has_sound_) return;
   GST_ELEMENT_ERROR(decoder, STREAM, WRONG_TYPE,
-                    ("it has no %s that can be decoded", pipeline.picture_wanted_ ? "picture" : "sound"), (nullptr));
+                    ("it has no %s that can be decoded", pipeline.picture_wanted_ ? "picture" : "sound"),
+                    (nullptr));
 }
 
 /// The first picture and the first sound are taken.
@@ -179,8 +180,10 @@ void DevicePipeline::linkPad(GstPad* pad) {
   const GstHandle<GstPad> sink(branch == nullptr ? nullptr : gst_element_get_static_pad(branch, "sink"));
   if (branch != nullptr) gst_element_sync_state_with_parent(branch);
   if (sink && gst_pad_link(pad, sink.get()) == GST_PAD_LINK_OK) return;
-  GST_ELEMENT_ERROR(pipeline_.get(), STREAM, FORMAT, ("it gives a %s that can't be taken: %s",
-                    picture ? "picture" : "sound", GText(gst_caps_to_string(caps.get())).get()), (nullptr));
+  GST_ELEMENT_ERROR(pipeline_.get(), STREAM, FORMAT,
+                    ("it gives a %s that can't be taken: %s", picture ? "picture" : "sound",
+                     GText(gst_caps_to_string(caps.get())).get()),
+                    (nullptr));
 }
 
 /// @return the branch, which the pipeline owns; null when it can't be made
@@ -230,14 +233,16 @@ void DevicePipeline::deliver(GstSample* sample, bool picture) {
   }
 }
 
-/// Running time of a sample that lasts `length` seconds; of a file's once it is due. Nothing for one without a time, and
-/// when the pipeline is being closed.
+/// Running time of a sample that lasts `length` seconds; of a file's once it is due. Nothing for one without
+/// a time, and when the pipeline is being closed.
 std::optional<double> DevicePipeline::timeOf(GstSample* sample, double length) {
   const GstClockTime stamp = GST_BUFFER_PTS(gst_sample_get_buffer(sample));
-  const GstClockTime time = gst_segment_to_running_time(gst_sample_get_segment(sample), GST_FORMAT_TIME, stamp);
+  const GstClockTime time =
+      gst_segment_to_running_time(gst_sample_get_segment(sample), GST_FORMAT_TIME, stamp);
   if (!GST_CLOCK_TIME_IS_VALID(time)) {
     // A driver that stamps nothing: what has just come is of now.
-    if (device_.kind == DeviceKind::hardware && !GST_CLOCK_TIME_IS_VALID(stamp)) return CaptureClock::now() - length;
+    if (device_.kind == DeviceKind::hardware && !GST_CLOCK_TIME_IS_VALID(stamp))
+      return CaptureClock::now() - length;
     return std::nullopt;
   }
   if (device_.kind == DeviceKind::file) return pacer_.wait(seconds(time), length);

@@ -29,15 +29,15 @@ struct DeviceOutput {
   std::function<void(GstBuffer* sound, double time, double arrival)> onSound;
 };
 
-/// Opens a device and closes it with its destruction, which waits for the streaming threads: a driver may take its time
-/// for either, so both are done on the source's own thread.
+/// Opens a device and closes it with its destruction, which waits for the streaming threads: a driver may
+/// take its time for either, so both are done on the source's own thread.
 class DevicePipeline {
  public:
   struct Wish {
     DeviceID device;
-    bool picture = false;               ///< of hardware and synthetic devices, which give one of both
-    bool overUdp = false;               ///< how a network camera sends
-    CameraDemand demand;                ///< the greatest picture and rate that are any use
+    bool picture = false;  ///< of hardware and synthetic devices, which give one of both
+    bool overUdp = false;  ///< how a network camera sends
+    CameraDemand demand;   ///< the greatest picture and rate that are any use
     std::shared_ptr<const HardwareDevice> hardware;  ///< the device, if it is hardware from the list
   };
 

@@ -6,8 +6,9 @@
 
 namespace lmx {
 
-/// Maps times in the file to running time. A round begins where the longest track of the round before ended. A machine
-/// that is too slow for the file loses the time it is behind: what comes is always of now, like a camera's. Thread-safe.
+/// Maps times in the file to running time. A round begins where the longest track of the round before ended.
+/// A machine that is too slow for the file loses the time it is behind: what comes is always of now, like a
+/// camera's. Thread-safe.
 class FilePacer {
  public:
   /// Waits until what stands at `seconds` in the file, and lasts `duration` seconds, is due.

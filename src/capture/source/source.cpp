@@ -1,6 +1,7 @@
 // The life of an open device.
 #include "capture/source/source.h"
 
+#include <algorithm>
 #include <system_error>
 #include <thread>
 
@@ -19,11 +20,13 @@ namespace {
 constexpr auto kFirstSampleLimit = 10s;
 constexpr auto kSilenceLimit = 2s;
 constexpr auto kWatchInterval = 500ms;
+constexpr std::chrono::milliseconds kClosingPatience = 5s;
 constexpr auto kRetryInterval = 3s;
 constexpr int kOftenTries = 20;
 constexpr auto kSeldomInterval = 10s;
 constexpr auto kUdpLimit = 5s;       // a refusal comes at once
-constexpr auto kNetworkLimit = 10s;  // for its three tries
+constexpr auto kNetworkLimit = 10s;  // for its tries
+constexpr auto kLastTry = 1s;        // before that limit
 
 std::int64_t steadyMilliseconds() {
   const auto time = std::chrono::steady_clock::now().time_since_epoch();
@@ -51,7 +54,7 @@ CameraFormat syntheticFormat(const DeviceID& device, const CameraDemand& demand)
 }  // namespace
 
 Source::Source(SourceWish wish)
-    : wish_(std::move(wish)), device_(parseDeviceID(wish_.device)), clock_(!device_.asFastAsPossible()), as_camera_(wish_.picture) {}
+    : wish_(std::move(wish)), device_(parseDeviceID(wish_.device)), clock_(!device_.asFastAsPossible()) {}
 
 bool Source::open(const std::shared_ptr<Source>& source) {
   try {
@@ -88,7 +91,7 @@ bool Source::closing() const {
 
 bool Source::isRunning() const {
   const std::lock_guard lock(mutex_);
-  return phase_ == Phase::running;
+  return phase_ == Phase::running || phase_ == Phase::away;  // it is being opened again
 }
 
 std::optional<CaptureError> Source::waitUntilRunning(std::chrono::milliseconds limit) {
@@ -96,8 +99,8 @@ std::optional<CaptureError> Source::waitUntilRunning(std::chrono::milliseconds l
   changed_.wait_for(lock, limit, [this] { return phase_ != Phase::opening; });
   if (phase_ == Phase::running) return std::nullopt;
   if (problem_) return problem_;
-  return CaptureError{CaptureError::kDomain, as_camera_ ? kDeviceSilent : kAudioSilent,
-                      name() + (as_camera_ ? ": gave no picture in time" : ": gave no sound in time")};
+  return CaptureError{CaptureError::kDomain, wish_.picture ? kDeviceSilent : kAudioSilent,
+                      name() + (wish_.picture ? ": gave no picture in time" : ": gave no sound in time")};
 }
 
 void Source::start() {
@@ -120,7 +123,7 @@ std::shared_ptr<const HardwareDevice> Source::hardware() const {
 
 void Source::live() {
   while (!closing()) {
-    const CaptureError error = openAndWatch();
+    const CaptureError error = guardedOpenAndWatch();
     if (closing()) break;
     if (triesOverUdp(error)) continue;
     if (triesAgain()) {
@@ -150,12 +153,21 @@ void Source::set(Phase phase) {
   changed_.notify_all();
 }
 
+/// No memory, no thread: the device is lost, not the daemon.
+CaptureError Source::guardedOpenAndWatch() {
+  try {
+    return openAndWatch();
+  } catch (const std::exception& problem) {
+    return {CaptureError::kDomain, kDeviceFailed, name() + ": " + problem.what()};
+  }
+}
+
 /// @return why the device delivers no more; meaningless when the source is being closed
 CaptureError Source::openAndWatch() {
+  if (!predecessorHasGone()) return {CaptureError::kDomain, kDeviceBusy, name() + ": is still being closed"};
   for (;;) {
     opened_at_ = Clock::now();
     delivering_ = false;
-    steady_sound_.reset();
     auto opened = openPipeline();
     if (!opened) return opened.error();
     std::unique_ptr<DevicePipeline> pipeline = *std::move(opened);
@@ -176,23 +188,39 @@ CaptureError Source::openAndWatch() {
       const std::lock_guard lock(mutex_);
       hardware_ = nullptr;
     }
-    const bool again = problem && problem->code == kStreamEnded && device_.kind == DeviceKind::file && pacer_.played();
+    const bool again =
+        problem && problem->code == kStreamEnded && device_.kind == DeviceKind::file && pacer_.played();
     if (!again) return problem.value_or(CaptureError{});
     pacer_.nextRound();
   }
 }
 
-Result<std::unique_ptr<DevicePipeline>, CaptureError> Source::openPipeline() {
-  DevicePipeline::Wish wish{
-      .device = device_, .picture = as_camera_, .overUdp = over_udp_, .demand = wish_.demand,   .hardware = nullptr};
-  if (!findHardwareFor(wish)) {
-    return CaptureError{CaptureError::kDomain, kDeviceNotFound,
-                        name() + (as_camera_ ? ": the camera is not there" : ": the microphone is not there")};
+/// A device is never opened while it is still being closed.
+bool Source::predecessorHasGone() {
+  for (auto waited = 0ms; predecessor_ && waited < kClosingPatience && !closing(); waited += kWatchInterval) {
+    if (predecessor_->finished(kWatchInterval)) predecessor_ = nullptr;
   }
-  if (hasOwnClock(wish.device)) steady_sound_.emplace(kSoundRate, kSoundChannels);
+  return predecessor_ == nullptr;
+}
+
+Result<std::unique_ptr<DevicePipeline>, CaptureError> Source::openPipeline() {
+  DevicePipeline::Wish wish{.device = device_,
+                            .picture = wish_.picture,
+                            .overUdp = over_udp_,
+                            .demand = wish_.demand,
+                            .hardware = nullptr};
+  if (!findHardwareFor(wish)) {
+    return CaptureError{
+        CaptureError::kDomain, kDeviceNotFound,
+        name() + (wish_.picture ? ": the camera is not there" : ": the microphone is not there")};
+  }
+  const auto steady =
+      hasOwnClock(wish.device) ? std::make_shared<SteadySound>(kSoundRate, kSoundChannels) : nullptr;
   DeviceOutput output;
   output.onPicture = [this](GstSample* picture, double time) { takePicture(picture, time); };
-  output.onSound = [this](GstBuffer* sound, double time, double arrival) { takeSound(sound, time, arrival); };
+  output.onSound = [this, steady](GstBuffer* sound, double time, double arrival) {
+    takeSound(steady.get(), sound, time, arrival);
+  };
   auto pipeline = DevicePipeline::open(wish, pacer_, std::move(output));
   if (!pipeline) return pipeline;
   if (!(*pipeline)->mode().empty() && !ever_ran_)
@@ -227,21 +255,30 @@ bool Source::findHardwareFor(DevicePipeline::Wish& wish) {
 
 std::optional<CaptureError> Source::watch(DevicePipeline& pipeline) {
   if (auto problem = pipeline.watch(kWatchInterval)) return problem;
-  const bool sound = pipeline.mayHaveSound();
-  if (!sound && may_have_sound_.exchange(sound)) {
-    LMPLogMessage(nullptr, kLogError, "%s has no sound: what is recorded of it is silent", name().c_str());
-    consumers_.noSound({CaptureError::kDomain, kAudioSilent, name() + ": has no sound"});
-  }
+  checkForSound(pipeline);
   return clock_.realTime() ? silence() : std::nullopt;
 }
 
+/// The sound of a device that gives both may be missing while the picture goes on.
+void Source::checkForSound(const DevicePipeline& pipeline) {
+  if (mute_since_ms_ != 0) return;
+  const bool none = !pipeline.mayHaveSound();
+  const bool stopped = device_.kind == DeviceKind::network && delivering_ && last_sound_ms_ != 0 &&
+                       since(last_sound_ms_) > kSilenceLimit;
+  if (!none && !stopped) return;
+  mute_since_ms_ = steadyMilliseconds();
+  const char* problem = none ? ": has no sound" : ": no sound for 2 s";
+  LMPLogMessage(nullptr, kLogNotice, "%s%s, the picture goes on", name().c_str(), problem);
+  consumers_.noSound({CaptureError::kDomain, kAudioSilent, name() + problem});
+}
+
 std::optional<CaptureError> Source::silence() const {
-  const CaptureErrorCode code = as_camera_ ? kDeviceSilent : kAudioSilent;
-  const char* what = as_camera_ ? "picture" : "sound";
+  const CaptureErrorCode code = wish_.picture ? kDeviceSilent : kAudioSilent;
+  const char* what = wish_.picture ? "picture" : "sound";
   if (!delivering_) {
     const std::int64_t away = away_since_ms_;
     const bool late = Clock::now() - opened_at_ > kFirstSampleLimit ||
-                      (as_camera_ && away != 0 && since(away) > kNetworkLimit);
+                      (wish_.picture && away != 0 && since(away) > kNetworkLimit);
     if (!late) return std::nullopt;
     return CaptureError{CaptureError::kDomain, code, name() + ": gave no " + what + " within 10 s"};
   }
@@ -253,15 +290,16 @@ std::optional<CaptureError> Source::silence() const {
 // ---- away and back
 
 bool Source::triesAgain() const {
-  if (!as_camera_) return true;
+  if (!wish_.picture) return true;
   if (device_.kind != DeviceKind::network || !ever_ran_) return false;
-  return away_since_ms_ == 0 || since(away_since_ms_) + kRetryInterval < kNetworkLimit;
+  return away_since_ms_ == 0 || since(away_since_ms_) + kLastTry < kNetworkLimit;
 }
 
 void Source::goAway(const CaptureError& error) {
   const bool first = away_since_ms_ == 0;
   if (first) away_since_ms_ = steadyMilliseconds();
   failed_tries_ = first ? 0 : failed_tries_ + 1;
+  if (!ever_ran_) over_udp_ = false;  // nothing is known of it: the next try begins as the first one
   {
     const std::lock_guard lock(mutex_);
     problem_ = error;
@@ -269,14 +307,19 @@ void Source::goAway(const CaptureError& error) {
   set(Phase::away);
   if (!first) return;
   LMPLogMessage(nullptr, kLogError, "The %s is away: %s (code %d); it is tried again every 3 s",
-                as_camera_ ? "camera" : "microphone", error.message.c_str(), error.code);
+                wish_.picture ? "camera" : "microphone", error.message.c_str(), error.code);
   consumers_.away(error);
 }
 
 void Source::waitBeforeNextTry() {
   std::chrono::milliseconds pause = kRetryInterval;
-  if (as_camera_ && since(away_since_ms_) < 1s) pause = 500ms;
-  if (failed_tries_ > kOftenTries) pause = kSeldomInterval;  // looking for it wakes the drivers of all devices
+  if (wish_.picture) {
+    const auto left = kNetworkLimit - kLastTry - since(away_since_ms_);
+    pause = since(away_since_ms_) < 1s ? 500ms
+                                       : std::clamp<std::chrono::milliseconds>(left, 100ms, kRetryInterval);
+  }
+  if (failed_tries_ > kOftenTries)
+    pause = kSeldomInterval;  // looking for it wakes the drivers of all devices
   std::unique_lock lock(mutex_);
   changed_.wait_for(lock, pause, [this] { return closing_; });
 }
@@ -284,6 +327,9 @@ void Source::waitBeforeNextTry() {
 // ---- streaming threads
 
 void Source::takePicture(GstSample* picture, double time) {
+  // What a decoder makes up before the first key frame is no picture.
+  if (!delivering_ && GST_BUFFER_FLAG_IS_SET(gst_sample_get_buffer(picture), GST_BUFFER_FLAG_CORRUPTED))
+    return;
   last_sample_ms_ = steadyMilliseconds();
   if (!has_format_.exchange(true)) {
     const GstCaps* caps = gst_sample_get_caps(picture);
@@ -294,23 +340,29 @@ void Source::takePicture(GstSample* picture, double time) {
   consumers_.deliverPicture(picture, time);
 }
 
-void Source::takeSound(GstBuffer* sound, double time, double arrival) {
-  if (!as_camera_) {
+void Source::takeSound(SteadySound* steady, GstBuffer* sound, double time, double arrival) {
+  last_sound_ms_ = steadyMilliseconds();
+  if (const std::int64_t mute = mute_since_ms_.exchange(0); mute != 0) {
+    LMPLogMessage(nullptr, kLogNotice, "%s: its sound is back", name().c_str());
+    consumers_.soundBack(std::chrono::duration<double>(since(mute)).count());
+  }
+  if (!wish_.picture) {
     last_sample_ms_ = steadyMilliseconds();
     firstSample();
   }
-  if (!steady_sound_) {
+  if (steady == nullptr) {
     consumers_.deliverSound(sound, time);
     return;
   }
-  for (const SteadySound::Chunk& chunk : steady_sound_->feed(BufferHandle(gst_buffer_ref(sound)), arrival))
+  for (const SteadySound::Chunk& chunk : steady->feed(BufferHandle(gst_buffer_ref(sound)), arrival))
     consumers_.deliverSound(chunk.buffer.get(), chunk.time);
-  sound_correction_ = steady_sound_->partsPerMillion();
+  sound_correction_ = steady->partsPerMillion();
 }
 
 /// One that offers nothing else.
 bool Source::triesOverUdp(const CaptureError& error) {
-  const bool refused = error.code != kDeviceNotPermitted && !delivering_ && Clock::now() - opened_at_ < kUdpLimit;
+  const bool refused =
+      error.code != kDeviceNotPermitted && !delivering_ && Clock::now() - opened_at_ < kUdpLimit;
   if (device_.kind != DeviceKind::network || ever_ran_ || over_udp_ || !refused) return false;
   over_udp_ = true;
   return true;
@@ -324,8 +376,8 @@ void Source::firstSample() {
   const std::int64_t away = away_since_ms_.exchange(0);
   if (away == 0) return;
   const double seconds = std::chrono::duration<double>(since(away)).count();
-  LMPLogMessage(nullptr, kLogNotice, "The %s is back after %.1f s: %s", as_camera_ ? "camera" : "microphone",
-                seconds, name().c_str());
+  LMPLogMessage(nullptr, kLogNotice, "The %s is back after %.1f s: %s",
+                wish_.picture ? "camera" : "microphone", seconds, name().c_str());
   consumers_.back(seconds);
 }
 

@@ -21,7 +21,7 @@ inline constexpr const char* kAnyMicrophone = "microphone:any";
 
 /// What a source is opened for. The first user's wish counts: the others share what is open.
 struct SourceWish {
-  std::string device;  ///< its unique identifier
+  std::string device;   ///< its unique identifier
   bool picture = true;  ///< opened as a camera; else as a microphone
   CameraDemand demand;
 };
@@ -32,12 +32,15 @@ struct CameraFormat {
   std::optional<FrameRate> rate;  ///< nominal; nothing when it varies or isn't known
 };
 
-/// Lives on a thread of its own: opens the device, watches it, opens it again and closes it, whatever time the driver
-/// takes. A camera that is plugged in is lost when it fails; a network camera is tried again three times in ten seconds
-/// first; a microphone is tried again as long as anybody wants it. Thread-safe.
+/// Lives on a thread of its own: opens the device, watches it, opens it again and closes it, whatever time
+/// the driver takes. A camera that is plugged in is lost when it fails; a network camera is tried again three
+/// times in ten seconds first; a microphone is tried again as long as anybody wants it. Thread-safe.
 class Source : public CaptureSession {
  public:
   explicit Source(SourceWish wish);
+  /// The same device as somebody had it before and is closing: the thread waits for that. Call it before
+  /// open().
+  void comeAfter(std::shared_ptr<Source> predecessor) { predecessor_ = std::move(predecessor); }
   /// Starts the thread. @return false when there is none to be had
   [[nodiscard]] static bool open(const std::shared_ptr<Source>& source);
   /// Ends the thread, soon: finished() tells. Called once nobody uses the source any more.
@@ -51,8 +54,6 @@ class Source : public CaptureSession {
   [[nodiscard]] std::optional<CaptureError> waitUntilRunning(std::chrono::milliseconds limit);
   /// Starts the flow of a device of "speed=max".
   void start();
-  /// Somebody wants its pictures, which decides how it is watched and how often it is tried again.
-  void useAsCamera() { as_camera_ = true; }
 
   [[nodiscard]] CaptureConsumers& consumers() { return consumers_; }
   [[nodiscard]] const CaptureClock& clock() const { return clock_; }
@@ -73,11 +74,14 @@ class Source : public CaptureSession {
   // The source's thread.
   void live();
   [[nodiscard]] CaptureError openAndWatch();
+  [[nodiscard]] CaptureError guardedOpenAndWatch();
   [[nodiscard]] std::optional<CaptureError> watch(DevicePipeline& pipeline);
   [[nodiscard]] std::optional<CaptureError> silence() const;
   [[nodiscard]] Result<std::unique_ptr<DevicePipeline>, CaptureError> openPipeline();
   [[nodiscard]] bool findHardwareFor(DevicePipeline::Wish& wish);
   [[nodiscard]] bool triesAgain() const;
+  [[nodiscard]] bool predecessorHasGone();
+  void checkForSound(const DevicePipeline& pipeline);
   [[nodiscard]] bool triesOverUdp(const CaptureError& error);
   void goAway(const CaptureError& error);
   void waitBeforeNextTry();
@@ -85,7 +89,7 @@ class Source : public CaptureSession {
 
   // Streaming threads.
   void takePicture(GstSample* picture, double time);
-  void takeSound(GstBuffer* sound, double time, double arrival);
+  void takeSound(SteadySound* steady, GstBuffer* sound, double time, double arrival);
   void firstSample();
   [[nodiscard]] bool closing() const;
 
@@ -94,17 +98,17 @@ class Source : public CaptureSession {
   const CaptureClock clock_;
   CaptureConsumers consumers_;
   FilePacer pacer_;
-  std::optional<SteadySound> steady_sound_;  // the streaming thread of the sound
   std::atomic<double> sound_correction_{0};
   std::atomic<std::int64_t> last_sample_ms_{0};  ///< steady clock; of what the source is watched by
   std::atomic<bool> delivering_{false};          ///< since it was opened last
-  std::atomic<bool> may_have_sound_{true};
+  std::atomic<std::int64_t> last_sound_ms_{0};   ///< steady clock; 0 before there was any
+  std::atomic<std::int64_t> mute_since_ms_{0};   ///< steady clock; 0 while its sound comes
   std::atomic<bool> has_format_{false};
-  std::atomic<bool> as_camera_;
   std::atomic<bool> ever_ran_{false};
   std::atomic<std::int64_t> away_since_ms_{0};  ///< steady clock; 0 when it isn't
 
   // The source's thread.
+  std::shared_ptr<Source> predecessor_;  ///< null once it has closed the device
   Clock::time_point opened_at_;
   bool over_udp_ = false;
   int failed_tries_ = 0;  ///< since it went away
@@ -112,13 +116,13 @@ class Source : public CaptureSession {
 
   mutable std::mutex mutex_;
   std::condition_variable changed_;
-  Phase phase_ = Phase::opening;                // guarded by mutex_
-  bool closing_ = false;                        // guarded by mutex_
-  bool finished_ = false;                       // guarded by mutex_
-  bool start_wanted_ = false;                   // guarded by mutex_
-  DevicePipeline* pipeline_ = nullptr;          // guarded by mutex_: null unless it is open
-  std::optional<CaptureError> problem_;         // guarded by mutex_: the last one
-  std::optional<CameraFormat> format_;          // guarded by mutex_
+  Phase phase_ = Phase::opening;                    // guarded by mutex_
+  bool closing_ = false;                            // guarded by mutex_
+  bool finished_ = false;                           // guarded by mutex_
+  bool start_wanted_ = false;                       // guarded by mutex_
+  DevicePipeline* pipeline_ = nullptr;              // guarded by mutex_: null unless it is open
+  std::optional<CaptureError> problem_;             // guarded by mutex_: the last one
+  std::optional<CameraFormat> format_;              // guarded by mutex_
   std::shared_ptr<const HardwareDevice> hardware_;  // guarded by mutex_
 };
 

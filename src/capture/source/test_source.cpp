@@ -82,8 +82,9 @@ double runningTimeOf(GstPad* pad, GstBuffer* buffer, const Probe& probe) {
   return CaptureClock::at(gst_element_get_base_time(source.get())) + sinceOpening;
 }
 
-/// The number of the grain, of those that last 1/`rate` each, that has begun last at `time`. A live buffer's time is moved
-/// back to its beginning; nothing comes from the future. @return nothing for a buffer that would be older than the device
+/// The number of the grain, of those that last 1/`rate` each, that has begun last at `time`. A live buffer's
+/// time is moved back to its beginning; nothing comes from the future. @return nothing for a buffer that
+/// would be older than the device
 std::optional<std::uint64_t> alignToGrain(GstBuffer* buffer, double time, FrameRate rate, bool live) {
   const double number = std::floor(time / rate.frameSeconds() + 1e-3);
   const double earlier = std::max(0.0, (time - number * rate.frameSeconds()) * 1e9);

@@ -108,8 +108,7 @@ struct Capture {
 
   LMRRecordingContext settings;
   std::shared_ptr<Reports> reports = std::make_shared<Reports>();
-  std::shared_ptr<CaptureController> controller =
-      std::make_shared<CaptureController>();
+  std::shared_ptr<CaptureController> controller = std::make_shared<CaptureController>();
 };
 
 inline SharedDictionary parametersFor(const std::string& uuid) {

@@ -173,6 +173,21 @@ TEST(Recording, TheTailOfALongRecordingIsInStep) {
         << "sound against picture, second " << i;
 }
 
+TEST(Recording, CopiesOfSoundAloneAreExactToo) {
+  const Folder folder;
+  Capture capture(folder, "", kFastAudio);
+  const std::string path = recordFast(folder, capture, {{0.0, 6.005}});
+  const auto index = readMovieIndex(path);
+  ASSERT_TRUE(index);
+  ASSERT_EQ(copyMovieRanges(path, *index, {{37, 437}}, 0.01, folder.file("copy.mov")), 0);
+  const auto movie = decodeMovie(folder.file("copy.mov"), testing::Streams::sound);
+  const auto ticks = testing::tickTimes(movie);
+  ASSERT_EQ(ticks.size(), 4U);
+  for (std::size_t i = 0; i < ticks.size(); ++i)
+    EXPECT_NEAR(ticks[i], static_cast<double>(i + 1) - 0.37 - kTickLead, 0.0005) << i;
+  EXPECT_NEAR(static_cast<double>(movie.sound.size()) / movie.sampleRate, 4.0, 0.022);
+}
+
 TEST(Recording, SoundOnly) {
   const Folder folder;
   Capture capture(folder, "", kFastAudio);

@@ -78,5 +78,16 @@ TEST(VideoEncoders, HardwareThatFallsBehindIsNotTakenAgain) {
   EXPECT_EQ(describeEncoder(chosen(choice)), "x264enc veryfast");
 }
 
+TEST(VideoEncoders, HardwareThatFailsInARecordingIsNotTakenAgain) {
+  ensureGStreamer();
+  LogCapture log;
+  VideoEncoderChoice choice;
+  choice.tryOut({kind("hardware", "x264enc tune=zerolatency")});
+  choice.failed(chosen(choice));
+  choice.failed(chosen(choice));
+  EXPECT_EQ(chosen(choice).kind.name, "x264enc");
+  EXPECT_EQ(log.count(kLogWarning, "hardware has failed: the next recordings are encoded with x264enc"), 1);
+}
+
 }  // namespace
 }  // namespace lmx

@@ -15,7 +15,9 @@ using namespace std::chrono_literals;
 constexpr auto kPatience = 20s;
 
 SourceWish camera(const std::string& device) { return {.device = device, .picture = true, .demand = {}}; }
-SourceWish microphone(const std::string& device) { return {.device = device, .picture = false, .demand = {}}; }
+SourceWish microphone(const std::string& device) {
+  return {.device = device, .picture = false, .demand = {}};
+}
 
 /// Counts what comes and lets a test wait for it.
 class Counter : public CaptureConsumer {
@@ -153,6 +155,38 @@ TEST(Source, AMicrophoneThatIsNotThereIsWaitedFor) {
   ASSERT_TRUE(problem);
   EXPECT_EQ(problem->code, kDeviceNotFound);
   EXPECT_FALSE(lease->consumers().failure()) << "it may still come";
+}
+
+TEST(Source, ADeviceIsOpenedOnlyOnceItIsClosed) {
+  const auto before = std::make_shared<Source>(camera("test://video?size=160x90"));
+  ASSERT_TRUE(Source::open(before));
+  ASSERT_FALSE(before->waitUntilRunning(kPatience));
+  const auto next = std::make_shared<Source>(camera("test://video?size=160x90"));
+  next->comeAfter(before);
+  ASSERT_TRUE(Source::open(next));
+  EXPECT_TRUE(next->waitUntilRunning(300ms)) << "it waits";
+  before->close();
+  EXPECT_FALSE(next->waitUntilRunning(kPatience));
+  next->close();
+  EXPECT_TRUE(next->finished(kPatience));
+}
+
+/// A driver that hangs in closing.
+TEST(Source, ACameraThatIsNeverClosedIsBusyAndHoldsUpNobodyElse) {
+  const auto hung = std::make_shared<Source>(camera("test://video?size=160x90"));
+  ASSERT_TRUE(Source::open(hung));
+  const auto next = std::make_shared<Source>(camera("test://video?size=160x90"));
+  next->comeAfter(hung);
+  ASSERT_TRUE(Source::open(next));
+  const auto other = *Sources::instance().lease(camera("test://video?size=160x94"));
+  EXPECT_FALSE(other->waitUntilRunning(kPatience));
+  const auto problem = next->waitUntilRunning(kPatience);
+  ASSERT_TRUE(problem);
+  EXPECT_EQ(problem->code, kDeviceBusy);
+  for (const auto& source : {hung, next}) {
+    source->close();
+    EXPECT_TRUE(source->finished(kPatience));
+  }
 }
 
 TEST(Source, AllDevicesShareOneClock) {
