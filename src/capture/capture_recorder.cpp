@@ -23,7 +23,8 @@ using namespace std::chrono_literals;
 
 namespace {
 
-constexpr auto kIdle = 250ms;  // where there is only sound, silence goes on when none comes
+constexpr double kChangeNotices = 60;  // seconds between them: a looped file changes back and forth
+constexpr auto kIdle = 250ms;          // where there is only sound, silence goes on when none comes
 constexpr auto kForEver = 24h;
 /// How long a recording that ends waits for a disk that takes nothing.
 constexpr auto kDiskPatience = 10s;
@@ -203,6 +204,10 @@ void CaptureRecorder::onSourceLost(SourceUse use, const CaptureError& error) {
 
 void CaptureRecorder::onSourceAway(SourceUse use, const CaptureError& error) {
   if (use.picture) return account_.cameraLost(timeNow());  // the frame before stays until it is back
+  // A camera that goes on without its sound is no matter for the log where nobody wants that sound; here it
+  // is wanted.
+  if (plan_.camera == plan_.microphone)
+    LMPLogMessage(nullptr, kLogError, "The recording is silent: %s", error.message.c_str());
   // Where there is only sound its loss is the end; but a microphone that has never been there is waited for.
   !encoding_.video&& heard_ ? fail(error) : soundLost(error);
 }
@@ -334,7 +339,8 @@ std::uint32_t CaptureRecorder::closeMovie() {
 BufferHandle CaptureRecorder::convert(const RawMedium& frame) {
   BufferHandle picture = converter_->convert(frame.buffer.get(), frame.caps.get());
   const auto change = converter_->formatChange();
-  if (change && picture) {
+  if (change && picture && frame.time - last_change_ > kChangeNotices) {
+    last_change_ = frame.time;
     LMPLogMessage(nullptr, kLogNotice,
                   "The camera's picture has changed: %s; it is fitted into the recording's", change->c_str());
     account_.sizeChanged(frame.time, recordedSize(frame.caps.get()));

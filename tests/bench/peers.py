@@ -10,6 +10,12 @@ HERE = Path(__file__).resolve().parent
 TOP = HERE.parents[1]
 BUILT = TOP / "build/release/tests/bench"
 X264 = re.compile(rb"x264 - core [^\0]*?options: ([^\0]+)\0")
+# What cameras of two kinds deliver and a movie does not hold: GStreamer's name, and FFmpeg's conversion to the movie's.
+FULL_RANGE_601 = "1:4:0:0"
+FROM_FULL_RANGE_601 = ("colorspace=ispace=smpte170m:iprimaries=bt709:itrc=bt709:irange=pc:all=bt709:range=tv:"
+                       "format=yuv420p")
+RECORDED = "video/x-raw,format=I420,pixel-aspect-ratio=1/1,framerate=30/1,colorimetry=bt709"
+SOUND = "audioconvert ! audioresample ! audio/x-raw,format=F32LE,layout=interleaved,rate=48000,channels=2"
 
 
 @dataclass(frozen=True)
@@ -53,9 +59,22 @@ def file_sources(movie):
     """The launch lines of the daemon's file camera."""
     video = (f"uridecodebin name=file uri={Path(movie).as_uri()} file. ! queue ! videoconvert ! videoscale ! "
              "videorate ! video/x-raw,format=I420,pixel-aspect-ratio=1/1,framerate=30/1 ! identity sync=true")
-    audio = ("file. ! queue ! audioconvert ! audioresample ! audio/x-raw,format=F32LE,layout=interleaved,rate=48000,"
-             "channels=2 ! identity sync=true")
-    return video, audio
+    return video, f"file. ! queue ! {SOUND} ! identity sync=true"
+
+
+def mjpeg_sources(movie):
+    """The launch lines of a file camera whose pictures' colours are converted: as webcams deliver them."""
+    video = (f"uridecodebin name=file uri={Path(movie).as_uri()} file. ! queue ! "
+             f"capssetter caps=video/x-raw,colorimetry={FULL_RANGE_601} ! videoconvert dither=none ! videorate ! "
+             f"{RECORDED} ! identity sync=true")
+    return video, f"file. ! queue ! {SOUND} ! identity sync=true"
+
+
+def rtsp_sources(uri):
+    """The launch lines of the daemon's network camera. The stream tells its colours itself."""
+    video = (f"rtspsrc name=camera location={uri} protocols=tcp latency=300 camera. ! application/x-rtp,media=video ! "
+             f"decodebin ! queue ! videoconvert dither=none ! videorate ! {RECORDED}")
+    return video, f"camera. ! application/x-rtp,media=audio ! decodebin ! queue ! {SOUND}"
 
 
 def launch_words(picture, sources, target, first=""):
@@ -69,9 +88,20 @@ def launch_words(picture, sources, target, first=""):
     return line.split()
 
 
-def ffmpeg_words(picture, movie, target):
+def ffmpeg_file(movie):
+    """What ffmpeg reads: a file at its own pace."""
+    return ["-re", "-i", str(movie)]
+
+
+def ffmpeg_rtsp(uri):
+    return ["-rtsp_transport", "tcp", "-analyzeduration", "500000", "-i", uri]
+
+
+def ffmpeg_words(picture, source, target, conversion="null"):
+    """A command of ffmpeg with the daemon's settings; `source` of ffmpeg_file() or ffmpeg_rtsp(), `conversion` a filter
+    of the pictures."""
     rate = f"{picture.kilobits}k"
-    return ["ffmpeg", "-v", "error", "-nostdin", "-re", "-i", str(movie), "-c:v", "libx264", "-preset", picture.effort,
+    return ["ffmpeg", "-v", "error", "-nostdin", *source, "-vf", conversion, "-r", "30", "-c:v", "libx264", "-preset", picture.effort,
             "-tune", "zerolatency", "-crf", "22", "-maxrate", rate, "-bufsize", f"{picture.kilobits * 2}k",
             "-g", "60", "-keyint_min", "6", "-sc_threshold", "0", "-x264-params", "scenecut=0", "-pix_fmt", "yuv420p",
             "-c:a", "aac", "-b:a", "128k", "-ar", "48000", "-ac", "2",
@@ -90,6 +120,9 @@ class Process:
     def pid(self):
         return self.process.pid
 
+    def ended(self):
+        return self.process.poll() is not None
+
     def stop(self, timeout=15):
         self.process.send_signal(signal.SIGINT)
         try:
@@ -101,8 +134,8 @@ class Process:
         return errors.decode(errors="replace")
 
 
-def gst_launch(picture, sources, target, environment):
-    return Process(["gst-launch-1.0", "-q", "-e", *launch_words(picture, sources, target)], environment)
+def gst_words(picture, sources, target):
+    return ["gst-launch-1.0", "-q", "-e", *launch_words(picture, sources, target)]
 
 
 def seconds_to_first_buffer(picture, target, environment):
@@ -126,6 +159,16 @@ def make_camera_file(picture, seconds, folder, environment):
     line = (f"{video} ! x264enc speed-preset=veryfast bitrate={2 * picture.kilobits} key-int-max=60 ! qtmux name=mux ! "
             f"filesink location={path} {audio} ! avenc_aac ! mux.")
     subprocess.run(["gst-launch-1.0", "-q", *line.split()], env=environment, check=True, timeout=120)
+    return path
+
+
+def make_mjpeg_camera_file(picture, seconds, folder):
+    """A movie of JPEG pictures to play as a camera: 4:2:2, full range, BT.601, as webcams deliver them."""
+    path = Path(folder) / f"mjpeg-{picture}.mov"
+    subprocess.run(["ffmpeg", "-v", "error", "-nostdin", "-f", "lavfi", "-i", f"testsrc2=size={picture}:rate=30",
+                    "-f", "lavfi", "-i", "sine=frequency=440:sample_rate=48000", "-t", str(seconds),
+                    "-vf", "scale=out_color_matrix=bt601:out_range=full", "-pix_fmt", "yuvj422p", "-c:v", "mjpeg",
+                    "-q:v", "5", "-c:a", "aac", "-ac", "2", "-y", str(path)], check=True, timeout=300)
     return path
 
 

@@ -1,10 +1,12 @@
 """Network cameras: with and without sound, slow to begin, absent, lost and back."""
+import contextlib
 import re
 import time
 from pathlib import Path
 
 import pytest
 from harness import movie, sounds
+from harness.agent import REPOSITORY
 from harness.log_reader import Level
 from harness.numbered import make_movie
 from harness.rtsp_camera import SOUND, RtspCamera, mode, picture, showing
@@ -87,7 +89,7 @@ def test_the_first_key_frame_after_four_seconds(agent):
 @pytest.mark.parametrize("trouble", ["no key frame", "no answer", "nobody listens"])
 def test_start_is_refused_while_nothing_comes(agent, trouble):
     """The camera is there at the start of the daemon, so that it is not offline."""
-    with RtspCamera(agent.prepare()) as camera:
+    with RtspCamera(agent.prepare()) as camera, contextlib.ExitStack() as instead:
         watch(agent, camera)
         agent.start()
         if trouble == "no answer":
@@ -95,7 +97,7 @@ def test_start_is_refused_while_nothing_comes(agent, trouble):
         else:
             camera.kill()
         if trouble == "no key frame":
-            RtspCamera(agent, key_frame_after=3600).start()  # ends with the harness
+            instead.enter_context(RtspCamera(agent, key_frame_after=3600))
         mark = agent.log.mark()
         refused = agent.start_recording("NOTHING", timeout=40)
         assert refused.text == "cmdStatus=3" and refused.received - refused.sent < 15
@@ -209,6 +211,29 @@ def test_what_is_said_while_the_camera_is_away_is_kept_to_the_stop(agent):
     assert ticks >= int(wanted) - 1, "the synthetic microphone ticks each second"
 
 
+@pytest.mark.slow
+def test_sound_that_ends_while_the_picture_goes_on(agent):
+    """The rest is silence; the camera counts as there."""
+    launch = picture() + " " + SOUND.replace("rtpmp4gpay", "valve name=cable ! rtpmp4gpay")
+    with RtspCamera(agent.prepare(), launch) as camera:
+        watch(agent, camera)
+        agent.start()
+        start = agent.start_recording("HALF")
+        agent.let_record(3)
+        camera.change("cable", "drop", "true")
+        agent.let_record(9)
+        _, told = stop(agent, "HALF")
+        wanted = time.time() - start.received
+        assert agent.alive() and not agent.log.lines("^The camera is away")
+    path = agent.movie("HALF")
+    movie.decodes(path)
+    streams = movie.streams(path)
+    assert abs(told - wanted) < 2 and all(abs(stream.duration - wanted) < 1 for stream in streams.values())
+    heard = sounds.heard(path)
+    assert heard[1:5] == [440] * 4 and heard[-8:] == [None] * 8, heard
+    assert max(b - a for a, b in zip(movie.frame_times(path), movie.frame_times(path)[1:])) < 0.5
+
+
 def test_a_stream_that_ends(agent, tmp_path):
     """The camera ends its stream after five seconds and shows it again to who asks again."""
     path = make_movie(tmp_path / "five.mp4", range(150))
@@ -279,12 +304,19 @@ def test_a_password_is_nowhere_to_be_read(agent, password):
         agent.start()
         replies = [agent.start_recording("SECRET", timeout=40)]
         assert replies[0].text == ("cmdStatus=0" if password == "geheim42" else "cmdStatus=3")
+        left = ""
         if password == "geheim42":
             agent.let_record(1)
+            (journal,) = agent.path(f"{REPOSITORY}/.lmxagentd").glob("*/journal")
+            left = journal.read_text()
             camera.kill()
             let_pass(3, "the camera is away, and that is told")
         replies += [agent.command("STATUS"), agent.command("STOP")]
+        if password == "geheim42":
+            agent.wait_tool_call("SECRET")
+            left += agent.movie("SECRET").with_suffix(".xml").read_text()
+            left += agent.movie("SECRET").read_bytes().decode("latin-1")
         title = Path(f"/proc/{agent.sandbox.daemon_pid}/cmdline").read_text()
         listed = agent.run("-i", "zq-device-list")
     told = [line.raw for line in agent.log.lines()] + [reply.text for reply in replies]
-    assert "geheim42" not in "\n".join([*told, title, listed.stdout, listed.stderr, agent.errors()])
+    assert "geheim42" not in "\n".join([*told, left, title, listed.stdout, listed.stderr, agent.errors()])

@@ -42,7 +42,7 @@ def test_picture_and_sound(agent, hall, camera, microphone):
     for stream in movie.streams(path).values():
         assert abs(stream.duration - (stop.sent - start.received)) < 0.4
     heard = sounds.heard(path)
-    assert heard[1:] == [440] * (len(heard) - 1), heard
+    assert sounds.is_tone(heard[1:], 440), heard
     shown = movie.counters(path)
     assert shown == sorted(set(shown)), "no picture twice, none out of order"
     assert len(shown) > 0.9 * (shown[-1] - shown[0] + 1), shown
@@ -77,6 +77,24 @@ def test_stop_then_start_at_once(agent, hall, camera, microphone):
         agent.wait_tool_call(uuid)
         assert movie.streams(agent.movie(uuid))["video"].duration > 0.5
         assert 440 in sounds.heard(agent.movie(uuid))
+
+
+@pytest.mark.parametrize("first, second", [(None, "pipewire:lectern"), ("pipewire:lectern", None),
+                                           ("Automatic", "pipewire:lectern")])
+def test_one_microphone_by_two_names(agent, hall, camera, microphone, first, second):
+    """STOP and START at once, with another name for the same microphone: the second recording hears it, too."""
+    agent.preferences(RecordingVideoInput=camera.id, RecordingAudioInput=first)
+    agent.start(env=hall.env)
+    for uuid, name in (("A", first), ("B", second), ("C", first)):
+        agent.preferences(RecordingVideoInput=camera.id, RecordingAudioInput=name)
+        assert agent.start_recording(uuid).text == "cmdStatus=0"
+        agent.let_record(2)
+        assert agent.command("STATUS").fields["lastError"] == "0"
+        assert agent.command("STOP").text == "cmdStatus=0"
+    for uuid in ("A", "B", "C"):
+        agent.wait_tool_call(uuid)
+        heard = sounds.heard(agent.movie(uuid))
+        assert heard.count(440) >= len(heard) / 2, (uuid, heard)
 
 
 @pytest.mark.parametrize("end", ["unplugged", "stalled"])

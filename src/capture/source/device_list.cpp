@@ -45,7 +45,7 @@ double largest(const Numbers& numbers) { return numbers.empty() ? 0 : *numbers.b
 std::string joined(const Numbers& numbers) {
   std::string text;
   for (const double number : numbers) {
-    if (number > 0) text += (text.empty() ? "" : "/") + string_with_format("%.5g", number);
+    if (number > 0) text += string_with_format(text.empty() ? "%.5g" : "/%.5g", number);
   }
   return text;
 }

@@ -42,8 +42,12 @@ std::string unescaped(const std::string& word) {
 
 std::string journalLine(const JournalWords& words) {
   std::string line;
-  for (const std::string& word : words) line += (line.empty() ? "" : " ") + escaped(word);
-  return line + '\n';
+  for (const std::string& word : words) {
+    if (!line.empty()) line += ' ';
+    line += escaped(word);
+  }
+  line += '\n';
+  return line;
 }
 
 JournalWords journalWords(const std::string& line) {

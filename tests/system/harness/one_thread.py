@@ -1,7 +1,8 @@
-"""Holds a single thread of the daemon, so that its other threads run on without it."""
+"""Holds single threads of the daemon, so that its other threads run on without them."""
 import contextlib
 import ctypes
 import os
+from pathlib import Path
 
 SEIZE, INTERRUPT, DETACH = 0x4206, 0x4207, 17
 ANY_THREAD = 0x40000000  # waitpid reports threads too
@@ -18,13 +19,27 @@ def _trace(request, thread):
 
 
 @contextlib.contextmanager
-def main_thread_held(agent):
-    """The main thread stands still inside the block. To be left by the thread that has entered it."""
-    thread = agent.sandbox.daemon_pid
-    _trace(SEIZE, thread)
+def held(*threads):
+    """These threads stand still inside the block. To be left by the thread that has entered it."""
+    seized = []
     try:
-        _trace(INTERRUPT, thread)
-        os.waitpid(thread, ANY_THREAD)
+        for thread in threads:
+            _trace(SEIZE, thread)
+            seized.append(thread)
+            _trace(INTERRUPT, thread)
+            os.waitpid(thread, ANY_THREAD)
         yield
     finally:
-        _trace(DETACH, thread)
+        for thread in seized:
+            _trace(DETACH, thread)
+
+
+def main_thread_held(agent):
+    """The main thread stands still inside the block."""
+    return held(agent.sandbox.daemon_pid)
+
+
+def threads_named(agent, name):
+    """The threads of this name, oldest first."""
+    tasks = Path(f"/proc/{agent.sandbox.daemon_pid}/task").iterdir()
+    return sorted(int(task.name) for task in tasks if (task / "comm").read_text().strip() == name)
