@@ -72,10 +72,10 @@ TEST(CaptureRecorder, PicturesThatCanNotBeReadEndTheRecordingAfterTenSeconds) {
 TEST(CaptureRecorder, PicturesThatCanBeReadAgainAreTold) {
   LogCapture log;
   Hall hall;
+  (*hall).marks().stop("R", 4.5);
   hall.pictures(0, 1, true);
   hall.pictures(1, 4, false);
   hall.pictures(4, 5, true);
-  (*hall).marks().stop("R", 4.5);
   (*hall).end(CaptureRecorder::Ending::stop);
   EXPECT_FALSE(hall.outcome().error);
   EXPECT_EQ(log.count(kLogNotice, "The camera's pictures can be read again after 3 s"), 1);
