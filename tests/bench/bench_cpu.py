@@ -96,14 +96,26 @@ def check_length(movie, turns):
     assert shortest >= turns.seconds + turns.warm_up - turns.late, f"only {shortest} s of {movie.name} were recorded"
 
 
-def peer_side(turns, words, target, environment):
-    @contextlib.contextmanager
-    def side():
+def flowing_peer(words, target, environment, tries=3):
+    """A peer whose movie grows. gst-launch-1.0 now and then never begins with a network camera: it is begun again."""
+    for left in reversed(range(tries)):
         target.unlink(missing_ok=True)
         peer = Process(words, environment)
         try:
-            wait_until(lambda: peer.ended() or (target.exists() and target.stat().st_size > FLOWING), 20,
+            wait_until(lambda peer=peer: peer.ended() or (target.exists() and target.stat().st_size > FLOWING), 10,
                        f"media in {target.name}")
+            return peer
+        except BaseException as problem:
+            peer.kill()
+            if not left or not isinstance(problem, AssertionError):
+                raise
+
+
+def peer_side(turns, words, target, environment):
+    @contextlib.contextmanager
+    def side():
+        peer = flowing_peer(words, target, environment)
+        try:
             yield peer.pid
         finally:
             problem = peer.stop()

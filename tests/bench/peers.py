@@ -123,6 +123,10 @@ class Process:
     def ended(self):
         return self.process.poll() is not None
 
+    def kill(self):
+        self.process.kill()
+        self.process.communicate()
+
     def stop(self, timeout=15):
         self.process.send_signal(signal.SIGINT)
         try:
