@@ -4,6 +4,7 @@
 #include <algorithm>
 #include <filesystem>
 #include <fstream>
+#include <mutex>
 #include <tuple>
 #include <utility>
 
@@ -101,6 +102,9 @@ HardwareDevice described(GstHandle<GstDevice> device, const ListedDevice& entry,
 /// The devices of some classes. @param classes  all devices when there are none
 std::vector<GstHandle<GstDevice>> devicesOf(std::initializer_list<const char*> classes) {
   ensureGStreamer();
+  // A plug-in's provider is one object for the whole process, and not made to be asked by two at once.
+  static std::mutex mutex;
+  const std::lock_guard lock(mutex);
   const GstHandle<GstDeviceMonitor> monitor(gst_device_monitor_new());
   for (const char* name : classes) gst_device_monitor_add_filter(monitor.get(), name, nullptr);
   std::vector<GstHandle<GstDevice>> devices;

@@ -153,12 +153,21 @@ void Source::set(Phase phase) {
   changed_.notify_all();
 }
 
-/// No memory, no thread: the device is lost, not the daemon.
+// No memory, no thread: the device is lost, not the daemon.
+
 CaptureError Source::guardedOpenAndWatch() {
   try {
     return openAndWatch();
   } catch (const std::exception& problem) {
     return {CaptureError::kDomain, kDeviceFailed, name() + ": " + problem.what()};
+  }
+}
+
+std::optional<CaptureError> Source::guardedWatch(DevicePipeline& pipeline) {
+  try {
+    return watch(pipeline);
+  } catch (const std::exception& problem) {
+    return CaptureError{CaptureError::kDomain, kDeviceFailed, name() + ": " + problem.what()};
   }
 }
 
@@ -178,7 +187,7 @@ CaptureError Source::openAndWatch() {
       if (start_wanted_ && !clock_.realTime()) pipeline_->start();
     }
     std::optional<CaptureError> problem;
-    while (!problem && !closing()) problem = watch(*pipeline);
+    while (!problem && !closing()) problem = guardedWatch(*pipeline);
     {
       const std::lock_guard lock(mutex_);
       pipeline_ = nullptr;

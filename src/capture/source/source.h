@@ -76,6 +76,7 @@ class Source : public CaptureSession {
   [[nodiscard]] CaptureError openAndWatch();
   [[nodiscard]] CaptureError guardedOpenAndWatch();
   [[nodiscard]] std::optional<CaptureError> watch(DevicePipeline& pipeline);
+  [[nodiscard]] std::optional<CaptureError> guardedWatch(DevicePipeline& pipeline);
   [[nodiscard]] std::optional<CaptureError> silence() const;
   [[nodiscard]] Result<std::unique_ptr<DevicePipeline>, CaptureError> openPipeline();
   [[nodiscard]] bool findHardwareFor(DevicePipeline::Wish& wish);
