@@ -27,7 +27,7 @@ def camera(agent):
 
 def check(path, wanted):
     """Picture and sound last so long, and the sound's ticks, one a second, are there to its end."""
-    movie.decodes(path)
+    movie.decodes(path, "-fps_mode", "vfr")  # pictures that are there to be decoded only come in one moment
     for stream in movie.streams(path).values():
         assert abs(stream.duration - wanted) < 1.5, (stream, wanted)
     sound = movie.sound(path)
@@ -35,17 +35,28 @@ def check(path, wanted):
     assert all(ticks[1:]), ticks
 
 
-def finish(agent, begun):
-    """STOP, in time; then the movie."""
+def finish(agent, begun, pause=0):
+    """STOP, in time; then the movie. `pause`: seconds that are left out."""
     stop = agent.command("STOP")
     assert stop.text == "cmdStatus=0" and stop.received - stop.sent < 2
     agent.wait_recorded("AWAY", timeout=5)
-    check(agent.movie("AWAY"), stop.sent - begun.received)
+    check(agent.movie("AWAY"), stop.sent - begun.received - pause)
 
 
 def test_stop(agent, camera):
     finish(agent, camera.begun)
     agent.wait_idle()
+
+
+def test_pause_and_resume(agent, camera):
+    """No picture comes behind the pause: what was said in it is not in the movie all the same."""
+    paused = agent.command("PAUSE")
+    let_pass(2, "the pause")
+    resumed = agent.command("RESUME")
+    for reply in (paused, resumed):
+        assert reply.text == "cmdStatus=0" and reply.received - reply.sent < 1
+    let_pass(2, "the lecture goes on")
+    finish(agent, camera.begun, resumed.sent - paused.sent)
 
 
 def test_cancel(agent, camera):

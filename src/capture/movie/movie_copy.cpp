@@ -23,6 +23,7 @@ constexpr std::size_t kSamplesPerChunk = 48;
 struct Piece {
   std::size_t first = 0;
   std::size_t end = 0;
+  std::size_t shown = 0;    ///< the samples before it are there to be decoded only
   std::uint64_t start = 0;  ///< timescale units
   std::uint64_t stop = 0;
   [[nodiscard]] bool empty() const { return first >= end || start >= stop; }
@@ -99,7 +100,8 @@ std::uint64_t SourceTrack::clamped(std::int64_t units) const {
   return static_cast<std::uint64_t>(std::clamp<std::int64_t>(units, 0, static_cast<std::int64_t>(total())));
 }
 
-/// The frames that are shown from `start` to `stop`. A picture can only be decoded from a key frame on.
+/// The frames that are shown from `start` to `stop`. A picture can only be decoded from a key frame on: those between it
+/// and the first one that is shown come along, too short to be seen. Nothing from before `start` is shown or heard.
 Piece framesBetween(const SourceTrack& track, std::uint64_t start, std::uint64_t stop) {
   Piece piece{.start = start, .stop = stop};
   const auto end = std::lower_bound(track.starts.begin(), std::prev(track.starts.end()), stop);
@@ -112,8 +114,8 @@ Piece framesBetween(const SourceTrack& track, std::uint64_t start, std::uint64_t
     piece.first = next;
     return piece;
   }
+  piece.shown = piece.first;
   while (piece.first > 0 && !track.isKey(piece.first)) --piece.first;
-  piece.start = track.starts[piece.first];
   return piece;
 }
 
@@ -194,7 +196,7 @@ int RangeCopier::copySamples(std::size_t track, const Piece& piece) {
     std::uint64_t bytes = 0;
     to.chunks.push_back({out_.mediaEnd, 0});
     while (i < piece.end && i - start < kSamplesPerChunk && from.offsets[i] == from.offsets[start] + bytes) {
-      const std::uint64_t until = std::min(from.starts[i + 1], piece.stop);
+      const std::uint64_t until = i < piece.shown ? at + 1 : std::min(from.starts[i + 1], piece.stop);
       to.addSample(from.index.sizes[i], static_cast<std::uint32_t>(until - at), from.isKey(i));
       bytes += from.index.sizes[i++];
       at = until;

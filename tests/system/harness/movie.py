@@ -46,9 +46,9 @@ def discover(path):
     return text
 
 
-def decodes(path):
-    """Decodes all of the movie; a complaint of the decoder is a failure."""
-    result = _run(["ffmpeg", "-v", "warning", "-i", path, "-f", "null", "-"])
+def decodes(path, *options):
+    """Decodes all of the movie, with FFmpeg's `options` for its output; a complaint of the decoder is a failure."""
+    result = _run(["ffmpeg", "-v", "warning", "-i", path, *options, "-f", "null", "-"])
     assert result.stderr == b"", result.stderr.decode()
 
 

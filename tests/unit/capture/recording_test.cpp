@@ -131,6 +131,8 @@ TEST(Recording, SoundStaysWithThePictureInCopies) {
     EXPECT_NEAR(movie.soundStart, 0.0, 1e-6);
     std::vector<double> expected;
     for (std::size_t i = 0; i < movie.frameNumbers.size(); ++i) {
+      const bool last = i + 1 == movie.frameNumbers.size();
+      if (!last && movie.frameTimes[i + 1] - movie.frameTimes[i] < 0.005) continue;  // only decoded
       if (movie.frameNumbers[i] % 30 == 29) expected.push_back(movie.frameTimes[i] + 1.0 / 30.0);
     }
     const auto ticks = testing::tickTimes(movie);
