@@ -102,6 +102,9 @@ std::optional<CaptureError> DevicePipeline::build(const Wish& wish) {
 }
 
 std::optional<CaptureError> DevicePipeline::addUri() {
+  // Raw pictures in this container make the demuxer write beside its memory.
+  if (device_.kind == DeviceKind::file && device_.name.ends_with(".nut"))
+    return error(kDeviceFailed, "NUT files can't be played; convert it to .mkv");
   const auto decoder = uriDecoder(device_);
   if (!decoder) return error(kDeviceFailed, "can't be opened: a GStreamer plug-in is missing");
   g_signal_connect(decoder.get(), "source-setup", G_CALLBACK(&onUriSource), this);

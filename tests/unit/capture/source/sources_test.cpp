@@ -189,6 +189,13 @@ TEST(Source, ACameraThatIsNeverClosedIsBusyAndHoldsUpNobodyElse) {
   }
 }
 
+TEST(Source, AFileThatWouldEndTheProcessIsRefused) {
+  const auto lease = *Sources::instance().lease(camera("file:///movies/raw.nut"));
+  const auto problem = lease->waitUntilRunning(kPatience);
+  ASSERT_TRUE(problem);
+  EXPECT_EQ(problem->message, "file:///movies/raw.nut: NUT files can't be played; convert it to .mkv");
+}
+
 TEST(Source, AllDevicesShareOneClock) {
   const auto eye = *Sources::instance().lease(camera("test://video?size=160x90"));
   const auto ear = *Sources::instance().lease(microphone("test://audio"));
