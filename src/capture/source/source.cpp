@@ -272,7 +272,9 @@ std::optional<CaptureError> Source::watch(DevicePipeline& pipeline) {
 void Source::checkForSound(const DevicePipeline& pipeline) {
   if (mute_since_ms_ != 0) return;
   const bool none = !pipeline.mayHaveSound();
-  const bool stopped = device_.kind == DeviceKind::network && delivering_ && last_sound_ms_ != 0 &&
+  // Where the picture has stopped as well the device is about to be away, with both.
+  const bool pictureGoesOn = delivering_ && since(last_sample_ms_) < kSilenceLimit / 2;
+  const bool stopped = device_.kind == DeviceKind::network && pictureGoesOn && last_sound_ms_ != 0 &&
                        since(last_sound_ms_) > kSilenceLimit;
   if (!none && !stopped) return;
   mute_since_ms_ = steadyMilliseconds();
