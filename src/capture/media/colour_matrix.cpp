@@ -95,6 +95,7 @@ LMX_INLINE void ColourMatrix::convertChroma(const PlanesIn& in, const PlanesOut&
   for (int i = 0; i < count; ++i) {
     const std::int16_t cb = centred(cbIn[i]);
     const std::int16_t cr = centred(crIn[i]);
+    // NOLINTNEXTLINE(bugprone-implicit-widening-of-multiplication-result): a strip is short
     shift[2 * i] = shift[2 * i + 1] =
         narrow(times(cb, luma_from_cb_) + times(cr, luma_from_cr_) + luma_offset_);
     cbOut[i] = byteFrom(narrow(times(cb, cb_) + times(cr, cb_from_cr_) + kChromaOffset));
@@ -170,7 +171,7 @@ LMX_INLINE void RGBMatrix::convertChroma(const Strip& upper, const Strip& lower,
                   lower.colours[colour][at + 1]);
   };
   for (int i = 0; i < count; ++i) {
-    const auto at = static_cast<std::size_t>(2 * i);
+    const auto at = 2 * static_cast<std::size_t>(i);
     const std::int16_t blue = sum(0, at);
     const std::int16_t green = sum(1, at);
     const std::int16_t red = sum(2, at);
@@ -189,7 +190,7 @@ LMX_INLINE void RGBMatrix::convertRows(const std::uint8_t* pixels, std::ptrdiff_
     const bool pair = y + 1 < height;
     for (int x = 0; x < width; x += kStrip) {
       const int count = std::min(kStrip, width - x);
-      const std::uint8_t* from = pixels + y * stride + 4 * x;
+      const std::uint8_t* from = pixels + y * stride + std::ptrdiff_t{4} * x;
       std::uint8_t* luma = out.data[0] + y * out.stride[0] + x;
       upper.read(from, count);
       matrix.convertLuma(upper, luma, count);

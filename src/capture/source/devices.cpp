@@ -117,6 +117,7 @@ std::vector<GstHandle<GstDevice>> devicesOf(std::initializer_list<const char*> c
 std::vector<Found> everything() {
   auto devices = devicesOf({"Video/Source", "Audio/Source"});
   std::vector<ListedDevice> entries;
+  entries.reserve(devices.size());
   for (const auto& device : devices) entries.push_back(listed(device.get()));
   const auto identities = identitiesOf(entries);
   std::vector<Found> all;
