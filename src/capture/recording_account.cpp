@@ -51,24 +51,9 @@ void RecordingAccount::silence(double t, double seconds) {
   ledger_.silencePutIn(t, seconds);
 }
 
-void RecordingAccount::microphoneLost(double t) {
+void RecordingAccount::note(void (GapLedger::*news)(double), double t) {
   const std::lock_guard lock(mutex_);
-  ledger_.microphoneLost(t);
-}
-
-void RecordingAccount::microphoneBack(double t) {
-  const std::lock_guard lock(mutex_);
-  ledger_.microphoneBack(t);
-}
-
-void RecordingAccount::cameraLost(double t) {
-  const std::lock_guard lock(mutex_);
-  ledger_.cameraLost(t);
-}
-
-void RecordingAccount::cameraBack(double t) {
-  const std::lock_guard lock(mutex_);
-  ledger_.cameraBack(t);
+  (ledger_.*news)(t);
 }
 
 void RecordingAccount::sizeChanged(double t, PictureSize size) {

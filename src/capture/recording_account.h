@@ -25,10 +25,10 @@ class RecordingAccount {
   void sound(const RawMedium& chunk);
   /// Silence was put in the place of missing sound.
   void silence(double t, double seconds);
-  void microphoneLost(double t);
-  void microphoneBack(double t);
-  void cameraLost(double t);
-  void cameraBack(double t);
+  void microphoneLost(double t) { note(&GapLedger::microphoneLost, t); }
+  void microphoneBack(double t) { note(&GapLedger::microphoneBack, t); }
+  void cameraLost(double t) { note(&GapLedger::cameraLost, t); }
+  void cameraBack(double t) { note(&GapLedger::cameraBack, t); }
   void sizeChanged(double t, PictureSize size);
   /// A picture could not be read: the one before it stays.
   void pictureLost(double t);
@@ -39,6 +39,7 @@ class RecordingAccount {
   void finish(double t, double soundCorrection);
 
  private:
+  void note(void (GapLedger::*news)(double), double t);
   void journalDue(double t);
   static void tell(const SignalEvents& events);
 

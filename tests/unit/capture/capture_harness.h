@@ -16,6 +16,10 @@
 
 namespace lmx::testing {
 
+/// Devices that deliver as fast as the machine can.
+inline constexpr const char* kFastVideo = "test://video?size=160x90&speed=max";
+inline constexpr const char* kFastAudio = "test://audio?speed=max";
+
 /// A fresh directory that goes with the object.
 class Folder {
  public:

@@ -23,6 +23,9 @@ enum class Streams { both, picture, sound };
 /// Decodes all of `path`, which has those streams.
 DecodedMovie decodeMovie(const std::string& path, Streams streams = Streams::both);
 
+/// Seconds: the microphone's tick fills the last 479 samples before each full second.
+inline constexpr double kTickLead = 479.0 / 48000.0;
+
 /// Times (seconds) at which a tick of the synthetic microphone begins.
 std::vector<double> tickTimes(const DecodedMovie& movie);
 
