@@ -100,8 +100,9 @@ std::uint64_t SourceTrack::clamped(std::int64_t units) const {
   return static_cast<std::uint64_t>(std::clamp<std::int64_t>(units, 0, static_cast<std::int64_t>(total())));
 }
 
-/// The frames that are shown from `start` to `stop`. A picture can only be decoded from a key frame on: those between it
-/// and the first one that is shown come along, too short to be seen. Nothing from before `start` is shown or heard.
+/// The frames that are shown from `start` to `stop`. A picture can only be decoded from a key frame on: those
+/// between it and the first one that is shown come along, too short to be seen. Nothing from before `start`
+/// is shown or heard.
 Piece framesBetween(const SourceTrack& track, std::uint64_t start, std::uint64_t stop) {
   Piece piece{.start = start, .stop = stop};
   const auto end = std::lower_bound(track.starts.begin(), std::prev(track.starts.end()), stop);

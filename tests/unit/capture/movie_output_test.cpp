@@ -188,8 +188,8 @@ TEST(MovieOutput, ACopyMayBeginAndEndInsideALongFrame) {
     std::uint32_t end;
   };
   for (const Case& c : {
-           Case{{{13, 22}}, {10, 20}, {0, 7}, 9},            // begins inside a key frame, which is shortened
-           Case{{{26, 35}}, {30}, {0}, 9},                   // inside another one: a key frame follows
+           Case{{{13, 22}}, {10, 20}, {0, 7}, 9},  // begins inside a key frame, which is shortened
+           Case{{{26, 35}}, {30}, {0}, 9},         // inside another one: a key frame follows
            Case{{{22, 26}}, {20, 24}, {0, 2}, 4},  // none follows: the key frame before is decoded, not shown
            Case{{{0, 5}, {35, 50}}, {0, 30, 40, 41}, {0, 5, 10, 11}, 20},
            Case{{{45, 60}}, {41}, {0}, 15},  // all of it within one frame
