@@ -293,11 +293,10 @@ void CaptureRecorder::recordUntilTheEnd() {
   if (!marks_.worthless()) feed(queue_.take(0s));
 }
 
-void CaptureRecorder::tickAccount() {
-  account_.tick(cutter_.frames().horizon(), queue_.dropped(), clock_.wallOffset());
-}
+void CaptureRecorder::tickAccount() { account_.tick(cutter_.frames().horizon(), clock_.wallOffset()); }
 
 void CaptureRecorder::feed(MediaQueue::Batch batch) {
+  account_.picturesDropped(batch.lostFrom, batch.lost);
   for (const RawMedium& frame : batch.video) {
     cutter_.feedFrame(frame);
     recorded_frames_ = cutter_.recordedFrames();

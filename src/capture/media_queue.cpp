@@ -2,6 +2,7 @@
 #include "capture/media_queue.h"
 
 #include <algorithm>
+#include <utility>
 
 #include "platform/log.h"
 
@@ -28,6 +29,7 @@ void MediaQueue::pushVideo(RawMedium frame) {
   if (!real_time_) {
     changed_.wait(lock, [this] { return closed_ || video_.size() < kFastQueue; });
   } else if (!closed_ && (video_.size() >= kMaxFrames || video_bytes_ >= kMaxFrameBytes)) {
+    if (lost_++ == 0) lost_from_ = frame.time;
     const std::uint64_t dropped = ++dropped_;
     lock.unlock();
     reportDrop(dropped);
@@ -70,6 +72,8 @@ MediaQueue::Batch MediaQueue::take(Clock::duration idle) {
   video_bytes_ = 0;
   batch.video.swap(video_);
   batch.audio.swap(audio_);
+  batch.lost = std::exchange(lost_, 0U);
+  batch.lostFrom = lost_from_;
   changed_.notify_all();
   return batch;
 }

@@ -38,6 +38,8 @@ class MediaQueue {
     RawMedia video;
     RawMedia audio;
     bool inTime = true;  ///< false: the deadline has passed
+    std::uint32_t lost = 0;  ///< frames that were dropped since the last batch
+    double lostFrom = 0;     ///< running time of the first of them
   };
   /// Waits until there are media to work on, `idle` at most, and takes all of them.
   [[nodiscard]] Batch take(Clock::duration idle = std::chrono::hours(24));
@@ -63,6 +65,8 @@ class MediaQueue {
   std::size_t video_bytes_ = 0;                // guarded by mutex_
   RawMedia audio_;                             // guarded by mutex_
   std::uint64_t dropped_ = 0;                  // guarded by mutex_: frames
+  std::uint32_t lost_ = 0;                     // guarded by mutex_: of these, since the last batch
+  double lost_from_ = 0;                       // guarded by mutex_
   std::optional<Clock::time_point> deadline_;  // guarded by mutex_: absent until the capture is ending
   bool closed_ = false;                        // guarded by mutex_
   std::atomic<double> picture_horizon_{-1e300};

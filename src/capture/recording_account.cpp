@@ -66,16 +66,21 @@ void RecordingAccount::pictureLost(double t) {
   ledger_.framesDropped(t, 1);
 }
 
-void RecordingAccount::tick(double t, std::uint64_t dropped, double wallOffset) {
+void RecordingAccount::picturesDropped(double t, std::uint32_t count) {
+  if (count == 0) return;
+  dropped_ += count;
+  const std::lock_guard lock(mutex_);
+  ledger_.framesDropped(t, count);
+}
+
+void RecordingAccount::tick(double t, double wallOffset) {
   const double step = wall_known_ ? wallOffset - wall_offset_ : 0;
   wall_known_ = true;
   wall_offset_ = wallOffset;
-  {
+  if (std::abs(step) > kSmallestStep) {
     const std::lock_guard lock(mutex_);
-    if (dropped > dropped_) ledger_.framesDropped(t, static_cast<std::uint32_t>(dropped - dropped_));
-    if (std::abs(step) > kSmallestStep) ledger_.clockStepped(t, step);
+    ledger_.clockStepped(t, step);
   }
-  dropped_ = dropped;
   journalDue(t);
 }
 

@@ -32,9 +32,10 @@ class RecordingAccount {
   void sizeChanged(double t, PictureSize size);
   /// A picture could not be read: the one before it stays.
   void pictureLost(double t);
-  /// @param dropped  frames that were lost so far because the machine could not keep up
+  /// The machine could not keep up: so many frames from `t` on are not in the movie. Recording thread.
+  void picturesDropped(double t, std::uint32_t count);
   /// @param wallOffset  wall clock at running time 0, as the clock is set now
-  void tick(double t, std::uint64_t dropped, double wallOffset);
+  void tick(double t, double wallOffset);
   /// The end of the recording: tells what was not real. Recording thread, after the last tick().
   void finish(double t, double soundCorrection);
 

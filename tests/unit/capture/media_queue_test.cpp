@@ -56,8 +56,13 @@ TEST(MediaQueue, LiveFramesThatFindItFullAreDroppedAndLogged) {
   testing::LogCapture log;
   MediaQueue queue(true, true);
   for (int i = 0; i < 100; ++i) queue.pushVideo({nullptr, i / 30.0});
-  EXPECT_EQ(queue.take().video.size(), 90U);
+  const auto batch = queue.take();
+  EXPECT_EQ(batch.video.size(), 90U);
+  EXPECT_EQ(batch.lost, 10U);
+  EXPECT_EQ(batch.lostFrom, 90 / 30.0);
   EXPECT_TRUE(log.waitForPart("The encoder can't keep up: 1 frames dropped so far"));
+  queue.pushVideo({nullptr, 4});
+  EXPECT_EQ(queue.take().lost, 0U);
 }
 
 TEST(MediaQueue, FramesThatAreNotLiveWaitForRoom) {

@@ -15,12 +15,14 @@ using testing::LogCapture;
 TEST(RecordingAccount, TheLossesOfASlowMachineAreToldWithTheirSum) {
   const Folder folder;
   const auto journal = *Journal::create(folder.file("journal"));
-  for (const std::uint64_t lost : {0U, 148U}) {
+  for (const std::uint32_t lost : {0U, 148U}) {
     LogCapture log;
     RecordingAccount account({}, *journal, 0);
-    account.tick(60, 0, 1000);
-    account.tick(61, lost / 2, 1000);
-    account.tick(90, lost, 1000);
+    account.tick(60, 1000);
+    account.picturesDropped(61, lost / 2);
+    account.tick(64, 1000);
+    account.picturesDropped(90, lost - lost / 2);
+    account.tick(93, 1000);
     account.finish(100, 0);
     const std::string told =
         std::to_string(lost) + " pictures of the recording were lost: the machine could not keep up";
