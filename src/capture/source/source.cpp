@@ -89,6 +89,11 @@ bool Source::closing() const {
   return closing_;
 }
 
+bool Source::startWanted() const {
+  const std::lock_guard lock(mutex_);
+  return start_wanted_;
+}
+
 bool Source::isRunning() const {
   const std::lock_guard lock(mutex_);
   return phase_ == Phase::running || phase_ == Phase::away;  // it is being opened again
@@ -106,7 +111,7 @@ std::optional<CaptureError> Source::waitUntilRunning(std::chrono::milliseconds l
 void Source::start() {
   const std::lock_guard lock(mutex_);
   start_wanted_ = true;
-  if (pipeline_ != nullptr && !clock_.realTime()) pipeline_->start();
+  if (pipeline_ != nullptr) pipeline_->wake();
 }
 
 CameraFormat Source::format() const {
@@ -184,10 +189,16 @@ CaptureError Source::openAndWatch() {
       const std::lock_guard lock(mutex_);
       pipeline_ = pipeline.get();
       hardware_ = found_;
-      if (start_wanted_ && !clock_.realTime()) pipeline_->start();
     }
     std::optional<CaptureError> problem;
-    while (!problem && !closing()) problem = guardedWatch(*pipeline);
+    bool started = clock_.realTime();
+    while (!problem && !closing()) {
+      if (!started && startWanted()) {
+        pipeline->start();  // without the lock: its first samples take it before this returns
+        started = true;
+      }
+      problem = guardedWatch(*pipeline);
+    }
     {
       const std::lock_guard lock(mutex_);
       pipeline_ = nullptr;

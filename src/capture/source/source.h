@@ -93,6 +93,7 @@ class Source : public CaptureSession {
   void takeSound(SteadySound* steady, GstBuffer* sound, double time, double arrival);
   void firstSample();
   [[nodiscard]] bool closing() const;
+  [[nodiscard]] bool startWanted() const;
 
   const SourceWish wish_;
   const DeviceID device_;

@@ -4,6 +4,8 @@
 #include <gtest/gtest.h>
 
 #include <condition_variable>
+#include <future>
+#include <thread>
 
 #include "tests/unit/doubles/log_capture.h"
 
@@ -100,6 +102,19 @@ TEST(Source, TellsWhatItGives) {
   EXPECT_EQ(lease->format().size.width, 320);
   EXPECT_EQ(lease->format().size.height, 180);
   EXPECT_EQ(lease->format().rate, (FrameRate{25, 1}));
+}
+
+/// The change to "playing" waits for a sample that is on its way, and that sample for the source.
+TEST(Source, AFastDeviceMayBeStartedWhileItsFirstSampleIsMade) {
+  for (int i = 0; i < 200; ++i) {
+    const auto lease = *Sources::instance().lease(camera("test://video?size=64x64&speed=max"));
+    const auto counter = std::make_shared<Counter>();
+    lease->consumers().add(counter, {.picture = true, .sound = false});
+    ASSERT_FALSE(lease->waitUntilRunning(kPatience));
+    auto started = std::async(std::launch::async, [&] { lease->start(); });
+    ASSERT_EQ(started.wait_for(kPatience), std::future_status::ready) << "try " << i;
+    ASSERT_TRUE(counter->wait([](const auto& c) { return c.pictures > 0; })) << "try " << i;
+  }
 }
 
 TEST(Source, ACameraThatFailsIsLostForGood) {
