@@ -96,10 +96,11 @@ AgentMain::Start AgentMain::loadSettings() {
 AgentMain::Start AgentMain::prepareGround() {
   const std::string repository = context_->recording.recording_repository_path.get().value_or("");
   if (!setupRecordingRepository(*context_, repository) || createPIDFile(*context_) != 0) return Start::fatal;
+  const auto camera = devices_.openAhead(*start_settings_);  // opens while the rest of the ground is prepared
   submission_.takeUpUnfinished(environment_.framework);
   if (!cluster_.learnCluster(loop_, [this] { return context_->state.running.get(); }))
     return Start::askedToEnd;
-  devices_.probeDevice(*start_settings_);
+  devices_.probeDevice(*start_settings_, camera);
   return Start::ok;
 }
 

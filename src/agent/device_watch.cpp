@@ -8,6 +8,7 @@
 #include <ctime>
 #include <exception>
 #include <thread>
+#include <utility>
 
 #include "agent/elapsed.h"
 #include "agent/recording_in_hand.h"
@@ -56,12 +57,16 @@ void DeviceWatch::tellOfMissingMicrophone(const LMRRecordingContext& settings) c
                 "The microphone %s is not there: recordings are silent until it is", name.c_str());
 }
 
-void DeviceWatch::probeDevice(const LMRRecordingContext& settings) {
+std::shared_ptr<CaptureSession> DeviceWatch::openAhead(const LMRRecordingContext& settings) const {
+  return settings.videoDeviceID ? framework_->openAhead(*settings.videoDeviceID) : nullptr;
+}
+
+void DeviceWatch::probeDevice(const LMRRecordingContext& settings, std::shared_ptr<CaptureSession> ahead) {
   tellOfMissingMicrophone(settings);
   if (!settings.videoDeviceID) return;
   if (LXAgentRecordCreatePreviewController(settings.videoDeviceID, settings.audioDeviceID,
                                            settings.audioEnabled, settings.previewIntervalInMilliseconds,
-                                           nullptr)) {
+                                           std::move(ahead))) {
     return;
   }
   LMPLogMessage(context_->log_context(), kLogAlert, "%s", kOfflineMessage);
@@ -80,17 +85,24 @@ void DeviceWatch::deviceFound() {
 
 void DeviceWatch::retryDevice(std::int64_t now) {
   const std::int64_t last = context_->state.last_device_check.get();
-  if (last < 1 || isAhead(now, last, kDeviceRetrySeconds + 1)) return;
+  if (last < 1) retry_ = std::nullopt;
+  if (last < 1 || (!retry_ && isAhead(now, last, kDeviceRetrySeconds + 1))) return;
   // A retry that fails ends the agent, and a START may have found the camera meanwhile. A recording with a
   // picture has it open, so the server need not wait for the end of the recording either.
   if (recordingInHand(*context_)) {
+    retry_ = std::nullopt;
     if (cameraRecords(*context_->record_context())) deviceFound();
     return;
   }
-  context_->state.last_device_check.set(now);
-  const auto settings = recordingContext();
-  if (!settings) return giveUp();
-  if (openAgain(*settings)) return deviceFound();
+  if (!retry_) {
+    context_->state.last_device_check.set(now);
+    const auto settings = recordingContext();
+    if (!settings) return giveUp();
+    retry_ = Retry{settings, settings->videoEnabled ? openAhead(*settings) : nullptr};
+  }
+  if (retry_->camera && retry_->camera->isOpening()) return;
+  const Retry retry = *std::exchange(retry_, std::nullopt);
+  if (openAgain(*retry.settings, retry.camera)) return deviceFound();
   if (!shouldDisplayOfflineMessage_) return giveUp();
   LMPLogMessage(nullptr, kLogWarning, "%s", kOfflineMessage);
   shouldDisplayOfflineMessage_ = false;
@@ -102,17 +114,16 @@ void DeviceWatch::giveUp() {
 }
 
 /// @return whether nothing is missing. An agent that doesn't record video has no camera to wait for.
-bool DeviceWatch::openAgain(const LMRRecordingContext& settings) {
+bool DeviceWatch::openAgain(const LMRRecordingContext& settings, std::shared_ptr<CaptureSession> ahead) {
   const auto record = context_->record_context();
   const auto before = record->previewController.get();
   if (!settings.videoEnabled) {
     record->previewController.set(nullptr);
     return true;
   }
-  const auto controller = record->captureController.get();
   const auto preview = LXAgentRecordCreatePreviewController(
       settings.videoDeviceID, settings.audioDeviceID, settings.audioEnabled,
-      settings.previewIntervalInMilliseconds, controller ? controller->session() : nullptr);
+      settings.previewIntervalInMilliseconds, std::move(ahead));
   // A preview that somebody looks at goes on; the camera stays open from one to the other.
   if (preview && before && before->controller().isPreviewRunning()) {
     preview->mLastPreviewRequestTime.set(before->mLastPreviewRequestTime.get());

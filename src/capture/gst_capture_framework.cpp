@@ -101,6 +101,11 @@ std::unique_ptr<LMRPreviewController> GstCaptureFramework::newPreviewController(
 
 // ---- start of the agent
 
+std::shared_ptr<CaptureSession> GstCaptureFramework::openAhead(const std::string& camera) {
+  auto lease = PreviewController::lease(camera);
+  return lease ? *std::move(lease) : nullptr;
+}
+
 void GstCaptureFramework::warmUp() {
   loadPlugins();
   VideoEncoderChoice::instance().tryOut(knownVideoEncoders());

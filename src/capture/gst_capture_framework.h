@@ -27,6 +27,7 @@ class GstCaptureFramework : public CaptureFramework {
   std::unique_ptr<LMRPreviewController> newPreviewController(
       std::shared_ptr<CaptureSession> session) override;
 
+  std::shared_ptr<CaptureSession> openAhead(const std::string& camera) override;
   void warmUp() override;
   void waitUntilClosed(std::chrono::milliseconds limit) override;
   std::string deviceInformation(const PictureLimits& limits) override;

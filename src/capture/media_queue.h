@@ -37,7 +37,7 @@ class MediaQueue {
   struct Batch {
     RawMedia video;
     RawMedia audio;
-    bool inTime = true;  ///< false: the deadline has passed
+    bool inTime = true;      ///< false: the deadline has passed
     std::uint32_t lost = 0;  ///< frames that were dropped since the last batch
     double lostFrom = 0;     ///< running time of the first of them
   };

@@ -21,24 +21,26 @@ std::string nameOf(const std::string& device) {
 
 }  // namespace
 
-bool PreviewController::attachIOWithDevice(const std::string& device, CaptureError* error) {
-  const SourceWish wish{.device = device, .picture = true, .demand = demandHere()};
-  std::optional<CaptureError> problem;
-  if (parseDeviceID(device).kind == DeviceKind::unknown) {
-    problem = CaptureError{
+Result<SourceLease, CaptureError> PreviewController::lease(const std::string& camera) {
+  if (parseDeviceID(camera).kind == DeviceKind::unknown) {
+    return CaptureError{
         CaptureError::kDomain, kDeviceNotFound,
-        "\"" + device + "\" is no camera identifier; list them with lmxagentd -i zq-device-list"};
-  } else if (const auto lease = Sources::instance().lease(wish)) {
-    problem = (*lease)->waitUntilRunning(kPatience);  // a picture is the only proof
-  } else {
-    problem = lease.error();
+        "\"" + camera + "\" is no camera identifier; list them with lmxagentd -i zq-device-list"};
   }
+  return Sources::instance().lease({.device = camera, .picture = true, .demand = demandHere()});
+}
+
+bool PreviewController::attachIOWithDevice(const std::string& device, CaptureError* error) {
+  const SourceLease ahead = std::move(ahead_);
+  const auto camera = ahead && ahead->wish().device == device ? ahead : lease(device);
+  // A picture is the only proof.
+  const auto problem = camera ? (*camera)->waitUntilRunning(kPatience) : std::optional(camera.error());
   if (problem) {
     *error = *problem;
     return false;
   }
   const std::lock_guard lock(mutex_);
-  wish_ = wish;
+  camera_ = device;
   name_ = nameOf(device);
   return true;
 }
@@ -57,14 +59,14 @@ std::shared_ptr<CaptureSession> PreviewController::session() const {
 }
 
 void PreviewController::startPreview() {
-  SourceWish wish;
+  std::string camera;
   {
     const std::lock_guard lock(mutex_);
     if (lease_ && !lease_->consumers().failure()) return;
-    wish = wish_;
+    camera = camera_;
   }
-  auto lease = Sources::instance().lease(wish);
-  auto problem = lease ? (*lease)->waitUntilRunning(kPatience) : std::optional(lease.error());
+  auto opened = lease(camera);
+  auto problem = opened ? (*opened)->waitUntilRunning(kPatience) : std::optional(opened.error());
   if (problem) {
     LMPLogMessage(nullptr, kLogError, "The preview could not be started: %s", problem->message.c_str());
     return;
@@ -72,7 +74,7 @@ void PreviewController::startPreview() {
   SourceLease before;  // one that was lost; given back without the lock
   const std::lock_guard lock(mutex_);
   before.swap(lease_);
-  lease_ = *std::move(lease);
+  lease_ = *std::move(opened);
 }
 
 void PreviewController::stopPreview() {

@@ -11,8 +11,11 @@ namespace lmx {
 /// taken of a preview, so its delegate is never called. Thread-safe.
 class PreviewController : public LMRPreviewController {
  public:
-  /// Needs no session: devices that are open are found and shared.
-  explicit PreviewController(const std::shared_ptr<CaptureSession>& /*session*/) {}
+  /// @param session  one that is open, or being opened: used if it is of the camera that is chosen
+  explicit PreviewController(const std::shared_ptr<CaptureSession>& session)
+      : ahead_(std::dynamic_pointer_cast<Source>(session)) {}
+  /// The camera as a preview opens it.
+  static Result<SourceLease, CaptureError> lease(const std::string& camera);
   bool attachIOWithDevice(const std::string& device, CaptureError* error) override;
   void addAudioDeviceWithID(const std::optional<std::string>& device) override;
   [[nodiscard]] std::string videoDeviceLocalizedDisplayName() const override;
@@ -23,10 +26,11 @@ class PreviewController : public LMRPreviewController {
   [[nodiscard]] bool isPreviewRunning() const override;
 
  private:
+  SourceLease ahead_;  ///< until a camera is chosen
   mutable std::mutex mutex_;
-  SourceWish wish_;    // guarded by mutex_
-  std::string name_;   // guarded by mutex_
-  SourceLease lease_;  // guarded by mutex_: null unless it runs
+  std::string camera_;  // guarded by mutex_
+  std::string name_;    // guarded by mutex_
+  SourceLease lease_;   // guarded by mutex_: null unless it runs
 };
 
 }  // namespace lmx

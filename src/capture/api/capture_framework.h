@@ -57,6 +57,8 @@ class CaptureSession {
  public:
   virtual ~CaptureSession() = default;
   [[nodiscard]] virtual bool isRunning() const = 0;
+  /// Whether it is not decided yet if the devices can be had.
+  [[nodiscard]] virtual bool isOpening() const = 0;
 };
 
 /// A movie that was not submitted in the ordinary way and has been put into the repository.
@@ -189,6 +191,9 @@ class CaptureFramework : public CaptureCatalog {
   virtual std::shared_ptr<LMRCaptureController> newCaptureController() = 0;
   virtual std::unique_ptr<LMRPreviewController> newPreviewController(
       std::shared_ptr<CaptureSession> session) = 0;
+  /// Begins to open a camera, which may take seconds, and holds it open. Any thread, does not block.
+  /// @return null where nothing can be opened ahead
+  virtual std::shared_ptr<CaptureSession> openAhead(const std::string& /*camera*/) { return nullptr; }
   /// Loads what the first recording would otherwise wait for. Any thread, blocks.
   virtual void warmUp() = 0;
   /// Waits until the devices are closed that nobody uses any more, at most `limit`: a network camera keeps a

@@ -99,6 +99,11 @@ bool Source::isRunning() const {
   return phase_ == Phase::running || phase_ == Phase::away;  // it is being opened again
 }
 
+bool Source::isOpening() const {
+  const std::lock_guard lock(mutex_);
+  return phase_ == Phase::opening;
+}
+
 std::optional<CaptureError> Source::waitUntilRunning(std::chrono::milliseconds limit) {
   std::unique_lock lock(mutex_);
   changed_.wait_for(lock, limit, [this] { return phase_ != Phase::opening; });

@@ -49,6 +49,7 @@ class Source : public CaptureSession {
   [[nodiscard]] bool finished(std::chrono::milliseconds limit);
 
   [[nodiscard]] bool isRunning() const override;
+  [[nodiscard]] bool isOpening() const override;
   /// Waits until the source delivers, or has failed to, at most `limit`.
   /// @return why it doesn't deliver
   [[nodiscard]] std::optional<CaptureError> waitUntilRunning(std::chrono::milliseconds limit);

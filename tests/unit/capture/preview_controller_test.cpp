@@ -6,7 +6,9 @@
 #include <chrono>
 #include <thread>
 
+#include "capture/gst_capture_framework.h"
 #include "tests/unit/capture/capture_harness.h"
+#include "tests/unit/doubles/log_capture.h"
 
 namespace lmx {
 namespace {
@@ -27,6 +29,39 @@ TEST(PreviewController, HasTheCameraOpenOnlyWhileItRuns) {
   EXPECT_TRUE(preview.session()->isRunning());
   preview.stopPreview();
   EXPECT_EQ(preview.session(), nullptr);
+}
+
+TEST(PreviewController, ACameraThatIsBeingOpenedIsNotOpenedAgain) {
+  GstCaptureFramework framework;
+  auto ahead = framework.openAhead(kCamera);
+  ASSERT_NE(ahead, nullptr);
+  const auto preview = framework.newPreviewController(ahead);
+  CaptureError error;
+  EXPECT_TRUE(preview->attachIOWithDevice(kCamera, &error));
+  EXPECT_FALSE(ahead->isOpening());
+  EXPECT_TRUE(ahead->isRunning());
+  EXPECT_EQ(ahead.use_count(), 1) << "once it is proved nobody else holds it open";
+}
+
+TEST(PreviewController, ACameraThatFailedAheadIsNotTriedAgain) {
+  GstCaptureFramework framework;
+  auto ahead = framework.openAhead("file:///nowhere.mov");
+  ASSERT_NE(ahead, nullptr);
+  while (ahead->isOpening()) std::this_thread::sleep_for(std::chrono::milliseconds(1));
+  EXPECT_FALSE(ahead->isRunning());
+  testing::LogCapture log;
+  CaptureError error;
+  EXPECT_FALSE(framework.newPreviewController(ahead)->attachIOWithDevice("file:///nowhere.mov", &error));
+  EXPECT_EQ(error.code, kDeviceNotFound);
+  EXPECT_FALSE(log.mentions("Capture device lost"));
+  EXPECT_EQ(framework.openAhead("nonsense"), nullptr);
+}
+
+TEST(PreviewController, AnotherCameraThanTheOneThatIsOpenMayBeChosen) {
+  GstCaptureFramework framework;
+  const auto ahead = framework.openAhead("file:///nowhere.mov");
+  CaptureError error;
+  EXPECT_TRUE(framework.newPreviewController(ahead)->attachIOWithDevice(kCamera, &error));
 }
 
 TEST(PreviewController, ACameraThatIsNotThereIsRefused) {

@@ -29,6 +29,8 @@ class ScriptedCaptureController : public LMRCaptureController {
    public:
     explicit Session(bool running) : running_(running) {}
     bool isRunning() const override { return running_; }
+    bool isOpening() const override { return opening; }
+    std::atomic<bool> opening{false};
 
    private:
     bool running_;

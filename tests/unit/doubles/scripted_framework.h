@@ -49,7 +49,16 @@ class ScriptedFramework : public CaptureFramework {
     controllers_.push_back(made);
     return made;
   }
-  std::unique_ptr<LMRPreviewController> newPreviewController(std::shared_ptr<CaptureSession>) override {
+  /// What openAhead returns, and what the last preview was made with.
+  std::shared_ptr<CaptureSession> camera_ahead;
+  std::shared_ptr<CaptureSession> preview_session;
+  std::shared_ptr<CaptureSession> openAhead(const std::string& camera) override {
+    journal_.add("openAhead " + camera);
+    return camera_ahead;
+  }
+  std::unique_ptr<LMRPreviewController> newPreviewController(
+      std::shared_ptr<CaptureSession> session) override {
+    preview_session = std::move(session);
     auto made = std::make_unique<ScriptedPreviewController>();
     made->attaches = cameras_attach;
     return made;
