@@ -67,7 +67,8 @@ CaptureRecorder::CaptureRecorder(const RecordingPlan& plan, RecordingSources sou
                .heard = [this](const RawMedium& chunk) { account_.sound(chunk); },
                .silenced = [this](double t, double seconds) { account_.silence(t, seconds); },
                .soundComes = [this] { return !sound_away_; },
-               .live = clock_.realTime()}) {
+               .live = clock_.realTime(),
+               .now = &CaptureClock::now}) {
   if (encoding_.video) converter_.emplace(encoding_.video->size);
   journal_->capture(plan_.type, frame_seconds_, wall_offset_);
 }
