@@ -203,8 +203,10 @@ def test_another_camera_at_the_same_address(recording, tmp_path, kind):
     assert all(abs(at - begin - number / rate) < 0.07 for at, number in other), other
     assert len(movie.runs([number for _, number in other])) == 1, "none is left out or doubled"
     assert not [at for at, _ in beeps(recording.path) if at > 5]
-    told = recording.agent.log.lines("^The camera's picture has changed", after=recording.mark)
-    assert len(told) <= 1 and (told or "size" not in options)
+    log = recording.agent.log
+    changed = log.lines("^The camera's picture has changed: (.*) has become (?!\\1;)", after=recording.mark)
+    assert len(changed) == len(log.lines("^The camera's picture has changed")) <= 1 and (changed or "size" not in options)
+    assert len(log.lines("picture scaled from")) == (1 if "size" in options else 0)
 
 
 @pytest.mark.slow

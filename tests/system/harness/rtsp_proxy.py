@@ -16,6 +16,7 @@ import sys
 import time
 from dataclasses import dataclass, field
 
+HEADERS = 24  # bytes of a packet that are never damaged: what they say is checked by nobody who unpacks it
 REPORTS = 200  # the RTCP packet that tells which time of day a time stamp stands for
 
 
@@ -135,9 +136,9 @@ class Connection:
     def edit(self, packet):
         if self.line.ppm or self.line.jump or self.stamps.clocks or self.stamps.rates:
             self.stamps.edit(packet)
-        if self.line.chance.random() < self.line.damage:
+        if self.line.chance.random() < self.line.damage and len(packet) > HEADERS and not packet[1] % 2:
             for _ in range(3):
-                packet[self.line.chance.randrange(16, len(packet))] = self.line.chance.randrange(256)
+                packet[self.line.chance.randrange(HEADERS, len(packet))] = self.line.chance.randrange(256)
             if self.line.broken:
                 packet[0] = 0
 
