@@ -121,6 +121,16 @@ TEST(StreamClock, TheSoundKeepsItsDistanceFromThePicture) {
   for (const auto& placed : camera.run(60)) ASSERT_NEAR(placed.sound - placed.picture, 0.15, 1e-9);
 }
 
+TEST(StreamClock, ThePictureLeads) {
+  StreamClock clock;
+  for (int i = 0; i < 50 * 120; ++i) {
+    const double taken = i * kChunk;
+    const double late = taken > 20 ? 0.5 : 0.01;  // of the sound alone
+    ASSERT_NEAR(clock.place(Stream::picture, taken, taken + 0.01), taken, 1e-6);
+    ASSERT_NEAR(clock.place(Stream::sound, taken, taken + late), taken, 1e-6);
+  }
+}
+
 TEST(StreamClock, SoundAloneIsBroughtInLineToo) {
   StreamClock clock;
   for (int i = 0; i < 50 * 600; ++i) {
