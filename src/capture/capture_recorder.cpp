@@ -11,6 +11,7 @@
 #include <exception>
 #include <system_error>
 #include <thread>
+#include <utility>
 
 #include "capture/source/device_pipeline.h"
 #include "platform/directories.h"
@@ -67,8 +68,10 @@ CaptureRecorder::CaptureRecorder(const RecordingPlan& plan, RecordingSources sou
                .heard = [this](const RawMedium& chunk) { account_.sound(chunk); },
                .silenced = [this](double t, double seconds) { account_.silence(t, seconds); },
                .soundComes = [this] { return !sound_away_; },
-               .live = clock_.realTime()}) {
+               .live = clock_.realTime(),
+               .now = &CaptureClock::now}) {
   if (encoding_.video) converter_.emplace(encoding_.video->size);
+  camera_size_ = sources_->format().size;
   journal_->capture(plan_.type, frame_seconds_, wall_offset_);
 }
 
@@ -342,7 +345,8 @@ BufferHandle CaptureRecorder::convert(const RawMedium& frame) {
     last_change_ = frame.time;
     LMPLogMessage(nullptr, kLogNotice,
                   "The camera's picture has changed: %s; it is fitted into the recording's", change->c_str());
-    account_.sizeChanged(frame.time, recordedSize(frame.caps.get()));
+    const PictureSize size = recordedSize(frame.caps.get());
+    if (size != std::exchange(camera_size_, size)) account_.sizeChanged(frame.time, size);
   }
   if (picture) account_.picture(picture.get(), encoding_.video->size, frame.time);
   noteReadable(frame.time, picture != nullptr);

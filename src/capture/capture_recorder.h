@@ -112,6 +112,7 @@ class CaptureRecorder : public CaptureConsumer, public std::enable_shared_from_t
   RecordingAccount account_;
   std::optional<PictureConverter> converter_;  // recording thread
   UnreadablePictures unreadable_;              // recording thread
+  PictureSize camera_size_;                    // recording thread: as it was told
   double last_change_ = -1e300;                // recording thread: when the format changed, as it was told
   bool limit_reached_ = false;                 // recording thread
   std::atomic<bool> heard_{false};             ///< some sound has come

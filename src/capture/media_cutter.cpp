@@ -13,6 +13,7 @@ namespace {
 
 constexpr double kSoundPatience = 1.0;  // seconds that sound may lag behind the picture
 constexpr double kSilencePiece = 1.0;   // seconds
+constexpr double kNever = -1e300;
 
 }  // namespace
 
@@ -90,7 +91,19 @@ void MediaCutter::feedSound(RawMedia chunks) {
     cutChunk(pending_sound_.front());
     pending_sound_.pop_front();
   }
-  if (around_.live) fillSilence(frames_.horizon() - (around_.soundComes() ? kSoundPatience : 0));
+  if (!around_.live) return;
+  const double awaited = awaitedUntil();
+  fillSilence(around_.soundComes() ? awaited : frames_.horizon());
+}
+
+/// What lies before this has been waited for long enough. After a stall of the network seconds of pictures
+/// come at once, and the sound beside them a moment later: it must have had a second to come in as well.
+double MediaCutter::awaitedUntil() {
+  const double now = around_.now ? around_.now() : frames_.horizon();
+  progress_.push_back({now, frames_.horizon()});
+  while (progress_.size() > 1 && progress_[1].at <= now - kSoundPatience) progress_.pop_front();
+  const bool early = progress_.front().at > now - kSoundPatience;
+  return early ? kNever : std::min(progress_.front().horizon, frames_.horizon() - kSoundPatience);
 }
 
 void MediaCutter::feedNothing(double now) {

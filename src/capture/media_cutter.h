@@ -1,6 +1,7 @@
 // Cuts raw media along a capture's marks and feeds the movie with them.
 #pragma once
 #include <cstdint>
+#include <deque>
 #include <functional>
 #include <optional>
 #include <vector>
@@ -29,6 +30,7 @@ class MediaCutter {
     std::function<void(double t, double seconds)> silenced;  ///< silence that is recorded instead
     std::function<bool()> soundComes;  ///< false while the microphone is away: nobody waits for it then
     bool live = true;                  ///< sound that is not there in time is silence
+    std::function<double()> now = {};  ///< running time; without it, as far as frames have been decided
   };
   /// @param begin  running time at which the capture begins, seconds
   MediaCutter(const MovieEncoding& encoding, double begin, Surroundings surroundings);
@@ -55,6 +57,10 @@ class MediaCutter {
   [[nodiscard]] std::uint64_t silentSamples() const { return sound_ ? sound_->silence() : 0; }
 
  private:
+  struct Progress {
+    double at = 0;  ///< running time
+    double horizon = 0;
+  };
   FrameDecision decide(double t);
   void prolong(double t);
   void feedVirtualFrames(double until);
@@ -62,6 +68,7 @@ class MediaCutter {
   void pushPieces(const RawMedium& chunk, const std::vector<SoundPiece>& pieces);
   bool startMovie();
   void fillSilence(double until);
+  double awaitedUntil();
   void pushSilence(std::uint32_t samples);
   void pushSound(const float* samples, std::uint32_t count);
   [[nodiscard]] double chunkSeconds(const RawMedium& chunk) const;
@@ -74,6 +81,7 @@ class MediaCutter {
   FrameCutter frames_;
   std::optional<SoundCutter> sound_;
   RawMedia pending_sound_;
+  std::deque<Progress> progress_;  ///< of the frames in the latest second; one entry is older
   double last_frame_time_ = -1e300;
   std::optional<double> next_virtual_;
   std::uint32_t recorded_frames_ = 0;

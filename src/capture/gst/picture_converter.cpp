@@ -177,7 +177,9 @@ std::optional<std::string> PictureConverter::formatChange() { return std::exchan
 bool PictureConverter::accept(GstCaps* caps) {
   if (caps_.get() == caps) return usable_;
   if (caps_ && gst_caps_is_equal(caps_.get(), caps) != FALSE) return usable_;
-  if (caps_) change_ = formatText(caps_.get()) + " has become " + formatText(caps);
+  const std::string before = caps_ ? formatText(caps_.get()) : "";
+  const std::string now = formatText(caps);
+  if (caps_ && before != now) change_ = before + " has become " + now;  // else it is nothing that can be seen
   caps_.reset(gst_caps_ref(caps));
   complained_ = false;
   usable_ = prepare();

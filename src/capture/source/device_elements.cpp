@@ -95,6 +95,9 @@ void tuneSource(GstElement* source, bool overUdp) {
     g_object_set(source, "latency", kNetworkLatencyMs, "tcp-timeout", kNetworkTimeoutUs, "timeout",
                  kNetworkTimeoutUs, nullptr);
     gst_util_set_object_arg(G_OBJECT(source), "protocols", overUdp ? "udp" : "tcp");
+    // The camera's stamps and nothing else: a stall must not move what comes after it. StreamClock does the
+    // rest.
+    gst_util_set_object_arg(G_OBJECT(source), "buffer-mode", "synced");
   }
 }
 

@@ -227,8 +227,12 @@ void DevicePipeline::deliver(GstSample* sample, bool picture) {
   GstBuffer* buffer = gst_sample_get_buffer(sample);
   if (buffer == nullptr) return;
   const double length = picture ? durationOf(buffer) : soundSeconds(buffer);
-  const auto time = timeOf(sample, length);
+  auto time = timeOf(sample, length);
   if (!time) return;
+  if (device_.kind == DeviceKind::network) {
+    const auto stream = picture ? StreamClock::Stream::picture : StreamClock::Stream::sound;
+    time = stream_clock_.place(stream, *time, arrival);
+  }
   if (picture) {
     output_.onPicture(sample, *time);
   } else {

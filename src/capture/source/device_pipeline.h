@@ -12,6 +12,7 @@
 #include "capture/source/device_id.h"
 #include "capture/source/devices.h"
 #include "capture/source/file_pacer.h"
+#include "capture/source/stream_clock.h"
 #include "support/result.h"
 
 namespace lmx {
@@ -89,6 +90,7 @@ class DevicePipeline {
   FilePacer& pacer_;
   const DeviceOutput output_;
   std::string mode_;
+  StreamClock stream_clock_;  ///< of a network camera
   GstHandle<GstElement> pipeline_;
   GstHandle<GstBus> bus_;
   std::atomic<bool> may_have_sound_{true};

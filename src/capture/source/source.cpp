@@ -399,6 +399,8 @@ bool Source::triesOverUdp(const CaptureError& error) {
 void Source::firstSample() {
   if (delivering_.exchange(true)) return;
   ever_ran_ = true;
+  if (last_sound_ms_ != 0)
+    last_sound_ms_ = steadyMilliseconds();  // it could not come while the device was away
   set(Phase::running);
   const std::int64_t away = away_since_ms_.exchange(0);
   if (away == 0) return;

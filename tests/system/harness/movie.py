@@ -52,16 +52,17 @@ def decodes(path, *options):
     assert result.stderr == b"", result.stderr.decode()
 
 
-def counters(path):
-    """The frame counters of the movie's pictures, in order: the top row of cells, most significant bit left."""
+def counters(path, damaged=False):
+    """The frame counters of the movie's pictures, in order: the top row of cells, most significant bit left. A picture
+    that can't be read is a failure, or None where they may be `damaged`."""
     picture = f"crop=iw:ih/{ROWS}:0:0,scale={CELLS}:1:flags=area"
     result = _run(["ffmpeg", "-v", "error", "-i", path, "-map", "0:v:0", "-fps_mode", "passthrough", "-vf", picture,
                    "-pix_fmt", "gray", "-f", "rawvideo", "-"])
     cells = numpy.frombuffer(result.stdout, dtype=numpy.uint8).reshape(-1, CELLS)
     doubtful = (cells > 70) & (cells < 185)
-    assert not doubtful.any(), f"{doubtful.sum()} cells are neither black nor white"
+    assert damaged or not doubtful.any(), f"{doubtful.sum()} cells are neither black nor white"
     weights = 1 << numpy.arange(CELLS - 1, -1, -1, dtype=numpy.int64)
-    return [int(value) for value in (cells >= 128) @ weights]
+    return [None if bad else int(value) for value, bad in zip((cells >= 128) @ weights, doubtful.any(axis=1))]
 
 
 def brightness(path, part="null"):

@@ -17,13 +17,13 @@ def picture(number, width=320, height=180):
 
 
 def make_movie(path, numbers, rate="30", size=(320, 180), filters="null", group=30,
-               keep_times=False):
-    """Writes an H.264 movie with a picture for each number, without sound. `keep_times`: those that `filters` set, else
+               keep_times=False, codec=("libx264", "-preset", "superfast", "-bf", "0")):
+    """Writes a movie, H.264 or what FFmpeg's `codec` gives, with a picture for each number, without sound. `keep_times`: those that `filters` set, else
     the pictures are `rate` a second. @return its path"""
     frames = b"".join(picture(number, *size) for number in numbers)
     times = "passthrough" if keep_times else "cfr"
     subprocess.run(["ffmpeg", "-v", "error", "-f", "rawvideo", "-pix_fmt", "gray", "-s", f"{size[0]}x{size[1]}", "-r",
-                    str(rate), "-i", "-", "-vf", filters, "-c:v", "libx264", "-preset", "superfast", "-bf", "0", "-g",
+                    str(rate), "-i", "-", "-vf", filters, "-c:v", *codec, "-g",
                     str(group), "-fps_mode", times, "-pix_fmt", "yuv420p", str(path)],
                    input=frames, check=True, timeout=60)
     return path

@@ -6,6 +6,8 @@ from .guest import Guest
 from .sandbox import HARNESS
 
 H264 = "h264parse config-interval=-1 ! rtph264pay name=pay0 pt=96 config-interval=-1"
+H265 = "h265parse config-interval=-1 ! rtph265pay name=pay0 pt=96 config-interval=-1"
+JPEG = "jpegparse ! rtpjpegpay name=pay0 pt=26"
 SOUND = ("audiotestsrc is-live=true wave=sine freq=440 samplesperbuffer=960 ! audio/x-raw,rate=48000,channels=1 ! "
          "avenc_aac ! rtpmp4gpay name=pay1 pt=97")
 
@@ -22,10 +24,13 @@ def mode(size=(320, 180), rate=30):
     return f"video/x-raw,format=I420,width={size[0]},height={size[1]},framerate={rate}/1"
 
 
-def showing(path):
-    """The launch line of a camera that shows an H.264 movie from the host once, at its own pace, without sound; the
-    stream ends with it."""
-    return f"filesrc location={path} ! qtdemux ! {H264}"
+def showing(path, payloader=H264, sound=False):
+    """The launch line of a camera that shows a movie from the host once, at its own pace, with its AAC sound if so
+    wanted; the stream ends with it."""
+    if not sound:
+        return f"filesrc location={path} ! qtdemux ! {payloader}"
+    return (f"filesrc location={path} ! qtdemux name=file file.video_0 ! queue ! {payloader} "
+            f"file.audio_0 ! queue ! aacparse ! rtpmp4gpay name=pay1 pt=97")
 
 
 class RtspCamera(Guest):

@@ -59,7 +59,8 @@ class Cut {
                                       [this](double t, double seconds) {
                                         silences_.push_back({t, seconds});
                                       },
-                                  .soundComes = [] { return true; }});
+                                  .soundComes = [] { return true; },
+                                  .now = [this] { return now_.value_or(cutter_->frames().horizon()); }});
   }
   /// Feeds what the camera and the microphone give from `from` to `to`, seconds of running time, as it comes.
   /// @param hole  when the microphone gives nothing
@@ -89,6 +90,8 @@ class Cut {
     EXPECT_EQ(movie.problem, "");
     return {movie.duration, static_cast<double>(movie.sound.size()) / movie.sampleRate};
   }
+  /// The running time from now on; otherwise it is that of the pictures.
+  void setNow(double now) { now_ = now; }
   CaptureMarks& marks() { return marks_; }
   [[nodiscard]] std::uint32_t frames() const { return cutter_->recordedFrames(); }
   [[nodiscard]] const std::vector<Silence>& silences() const { return silences_; }
@@ -101,6 +104,7 @@ class Cut {
   CaptureMarks marks_{journal_};
   Deadline patience_;
   std::vector<Silence> silences_;
+  std::optional<double> now_;
   std::unique_ptr<MovieOutput> movie_;
   std::unique_ptr<MediaCutter> cutter_;
 };
@@ -111,6 +115,37 @@ TEST(MediaCutter, SoundThatIsThereIsNoSilence) {
   cut.media(0, 2);
   cut.close(2);
   EXPECT_TRUE(cut.silences().empty()) << cut.silences().size();
+}
+
+TEST(MediaCutter, SoundThatComesAMomentAfterABurstOfPicturesIsNoSilence) {
+  Cut cut;
+  cut.marks().start("R", 0, nullptr);
+  cut.media(0, 2);
+  cut.setNow(4);
+  for (double t = 2; t < 4 - 1e-9; t += kFrame) {
+    cut.picture(t);
+    cut.sound(t, t);  // a batch without sound
+  }
+  EXPECT_TRUE(cut.silences().empty());
+  cut.setNow(4.5);
+  cut.sound(2, 4);
+  cut.close(4);
+  EXPECT_TRUE(cut.silences().empty()) << cut.silences().front().seconds;
+}
+
+TEST(MediaCutter, SoundThatDoesNotComeAfterABurstIsSilenceASecondLater) {
+  Cut cut;
+  cut.marks().start("R", 0, nullptr);
+  cut.media(0, 2);
+  cut.setNow(4);
+  for (double t = 2; t < 4 - 1e-9; t += kFrame) cut.picture(t);
+  cut.sound(4, 4);
+  cut.setNow(5.1);
+  cut.picture(4);
+  cut.sound(4, 4);
+  ASSERT_FALSE(cut.silences().empty());
+  EXPECT_NEAR(cut.silences().front().from, 2, 0.001);
+  EXPECT_NEAR(cut.silences().front().seconds, 1, 0.1);
 }
 
 TEST(MediaCutter, SilenceIsToldWithItsTime) {

@@ -148,6 +148,10 @@ TEST(PictureConverter, TellsAChangeOfFormatOnce) {
   const RawPicture again = barsPicture(capsText("YUY2", 320, 240), 0.299, 0.114, false);
   EXPECT_TRUE(converter.convert(again.buffer.get(), again.caps.get()));
   EXPECT_EQ(converter.formatChange(), std::nullopt);
+  const std::string other = capsText("YUY2", 320, 240, ",colorimetry=bt601");
+  const RawPicture recoloured = barsPicture(other, 0.299, 0.114, false);
+  EXPECT_TRUE(converter.convert(recoloured.buffer.get(), recoloured.caps.get()));
+  EXPECT_EQ(converter.formatChange(), std::nullopt) << "the words would be the same";
 }
 
 TEST(PictureConverter, RefusesWhatItCantReadWithALineForEachFormat) {
