@@ -1,0 +1,139 @@
+"""A microphone as a card is one: open once at a time, with a driver that may be slow, and with a clock of its own."""
+
+import pytest
+from harness import movie, sounds
+from harness.alsa_hall import HUM, AlsaHall
+from harness.log_reader import Level
+from harness.waiting import wait_until
+
+PIECE = 0.05  # seconds
+
+
+@pytest.fixture
+def alsa(agent):
+    return AlsaHall(agent)
+
+
+def loud(path):
+    """Whether the hum is heard, for each piece of the sound."""
+    sound = movie.sound(path, channel=1)
+    size = int(PIECE * sounds.RATE)
+    return [sounds.loudness(sound[at: at + size]) > 0.1 for at in range(0, len(sound) - size + 1, size)]
+
+
+def silence_before(path):
+    """Seconds before the sound begins."""
+    return (loud(path) + [True]).index(True) * PIECE
+
+
+def troubles(agent, after=0):
+    """The error lines about the microphone."""
+    return [line.text for line in agent.log.lines("alsa:", after=after, level=Level.ERROR)]
+
+
+def record_each(agent, uuids, names=("desk",), seconds=1):
+    """One after the other, each START right behind the STOP before it, with the microphones in turn."""
+    for number, uuid in enumerate(uuids):
+        agent.preferences(RecordingAudioInput=AlsaHall.id(names[number % len(names)]))
+        assert agent.start_recording(uuid).text == "cmdStatus=0"
+        agent.let_record(seconds)
+        assert agent.command("STOP").text == "cmdStatus=0"
+    for uuid in uuids:
+        agent.wait_tool_call(uuid)
+        movie.decodes(agent.movie(uuid))
+
+
+def numbered(count):
+    return [f"R{number}" for number in range(count)]
+
+
+@pytest.mark.parametrize("close_takes", [0, 1000])
+def test_stop_then_start_at_once(agent, alsa, close_takes):
+    alsa.device("desk", close_takes=close_takes)
+    agent.start(env=alsa.env)
+    record_each(agent, numbered(10))
+    assert not troubles(agent)
+    silences = [silence_before(agent.movie(uuid)) for uuid in numbered(10)]
+    assert max(silences) <= 0.2, silences
+
+
+@pytest.mark.parametrize("close_takes", [0, 1000])
+def test_one_device_by_two_names_in_turn(agent, alsa, close_takes):
+    alsa.device("desk", close_takes=close_takes)
+    alsa.device("lectern", lock="desk", close_takes=close_takes)
+    agent.start(env=alsa.env)
+    record_each(agent, numbered(6), names=("desk", "lectern"))
+    silences = [silence_before(agent.movie(uuid)) for uuid in numbered(6)]
+    assert not troubles(agent), silences
+    assert max(silences) <= 0.2, silences
+
+
+def test_another_program_has_the_device(agent, alsa):
+    """The recording is silent and says why; the sound comes once the device is free."""
+    alsa.device("desk")
+    agent.preferences(RecordingAudioInput=alsa.id("desk"))
+    with alsa.other_program("desk") as other:
+        agent.start(env=alsa.env)
+        mark = agent.log.mark()
+        assert agent.start_recording("SHARED").text == "cmdStatus=0"
+        agent.let_record(4)
+        assert agent.command("STATUS").fields["lastError"] == "9"
+        (told,) = troubles(agent, after=mark)
+        assert "alsa:device=desk" in told and "another application" in told
+        other.kill()
+    agent.log.wait("^The microphone is back after .*: alsa:device=desk", after=mark, level=Level.NOTICE)
+    agent.let_record(10)
+    assert agent.command("STATUS").fields["lastError"] == "0"
+    assert agent.command("STOP").text == "cmdStatus=0"
+    agent.wait_tool_call("SHARED")
+    heard = loud(agent.movie("SHARED"))
+    silent = heard.index(True)
+    assert silent * PIECE > 3.5 and all(heard[silent:-1]), heard
+    assert len(movie.runs(movie.counters(agent.movie("SHARED")))) == 1
+
+
+@pytest.fixture(params=["open", "close"])
+def stuck(request, agent, alsa):
+    """A running daemon with a microphone whose driver does not return from this, and the file that holds it."""
+    file = alsa.place / "stuck"
+    file.touch()
+    alsa.device("desk", **{request.param + "_waits": file.name})
+    agent.preferences(RecordingAudioInput=alsa.id("desk"))
+    agent.start(env=alsa.env)
+    return request.param, file
+
+
+def test_a_driver_that_never_returns(agent, alsa, stuck):
+    where, _ = stuck
+    for uuid in ("A", "B"):
+        mark = agent.log.mark()
+        start, stop = agent.record(uuid, 8)
+        agent.wait_tool_call(uuid)
+        movie.decodes(agent.movie(uuid))
+        for stream in movie.streams(agent.movie(uuid)).values():
+            assert abs(stream.duration - (stop.sent - start.received)) < 0.5
+        assert len(movie.runs(movie.counters(agent.movie(uuid)))) == 1
+        silent = (where, uuid) != ("close", "A")
+        assert any(loud(agent.movie(uuid))) != silent
+        assert len(troubles(agent, after=mark)) == silent, troubles(agent)
+        print(stop, start)
+    assert agent.stop(timeout=10) == 0
+
+
+def test_a_driver_that_returns_late(agent, alsa, stuck):
+    """The sound comes in the recording that runs."""
+    where, file = stuck
+    if where == "close":
+        agent.record("BEFORE")
+    mark = agent.log.mark()
+    assert agent.start_recording("LATE").text == "cmdStatus=0"
+    agent.let_record(8)
+    assert len(troubles(agent, after=mark)) == 1, troubles(agent)
+    file.unlink()
+    agent.log.wait("^The microphone is back after", after=mark, timeout=10)
+    agent.let_record(16)
+    assert agent.command("STOP").text == "cmdStatus=0"
+    agent.wait_tool_call("LATE")
+    heard = loud(agent.movie("LATE"))
+    assert not any(heard[:int(7.5 / PIECE)]) and all(heard[-10:-1]), heard
+    assert agent.stop(timeout=10) == 0
