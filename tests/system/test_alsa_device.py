@@ -1,12 +1,16 @@
 """A microphone as a card is one: open once at a time, with a driver that may be slow, and with a clock of its own."""
 
+import re
+
+import numpy
 import pytest
 from harness import movie, sounds
-from harness.alsa_hall import HUM, AlsaHall
+from harness.alsa_hall import BURST, HUM, AlsaHall
 from harness.log_reader import Level
 from harness.waiting import wait_until
 
 PIECE = 0.05  # seconds
+RATE = 48000  # for exact times
 
 
 @pytest.fixture
@@ -116,7 +120,6 @@ def test_a_driver_that_never_returns(agent, alsa, stuck):
         silent = (where, uuid) != ("close", "A")
         assert any(loud(agent.movie(uuid))) != silent
         assert len(troubles(agent, after=mark)) == silent, troubles(agent)
-        print(stop, start)
     assert agent.stop(timeout=10) == 0
 
 
@@ -137,3 +140,48 @@ def test_a_driver_that_returns_late(agent, alsa, stuck):
     heard = loud(agent.movie("LATE"))
     assert not any(heard[:int(7.5 / PIECE)]) and all(heard[-10:-1]), heard
     assert agent.stop(timeout=10) == 0
+
+
+def picture_clock(path):
+    """The movie's time of the camera's frame 0; the frames keep their distances."""
+    zero = numpy.array(movie.frame_times(path)) - numpy.array(movie.counters(path)) / 30
+    assert numpy.ptp(zero) < 1e-4
+    return zero[0]
+
+
+def phase_steps(sound):
+    """By how much the hum's phase turns within 10 ms, radians: 0.03 is 10 us, and a change of speed of 0.1 %."""
+    hum = sounds.demodulated(sound, HUM, 0.02, RATE)[RATE // 5: -RATE // 5: RATE // 100]
+    return numpy.abs(numpy.diff(numpy.unwrap(numpy.angle(hum))))
+
+
+@pytest.fixture(params=[(-500, 8), (-200, 25), (-50, 8), (50, 25), (200, 8), (500, 25)], ids="{0[0]}ppm".format)
+def long_recording(request, agent, alsa):
+    """A movie of 42 s with a microphone whose clock is so much (parts in a million) off. @return that and the movie"""
+    ppm, jitter = request.param
+    alsa.device("desk", ppm=ppm, jitter=jitter)
+    agent.preferences(RecordingAudioInput=alsa.id("desk"), RecordingVideoInput="test://video?size=320x180&fps=30")
+    agent.start(env=alsa.env)
+    agent.record("CLOCK", 42)
+    return ppm, agent.movie("CLOCK")
+
+
+@pytest.mark.slow
+def test_a_clock_of_its_own(agent, alsa, long_recording):
+    """What it hears at each whole second stays in its place beside the picture, and unbroken."""
+    ppm, path = long_recording
+    overruns = alsa.overruns("desk")
+    assert overruns <= 2, "the machine is too busy, or the device is not read"
+    left, right = (movie.sound(path, RATE, channel) for channel in (0, 1))
+    places = numpy.array(sounds.bursts(left, BURST, RATE)) + movie.streams(path)["audio"].start - picture_clock(path)
+    assert len(places) >= 41 - overruns
+    off = places - places[len(places) // 2]
+    off -= numpy.round(off)
+    late = (off - numpy.median(off)) * 1000
+    assert numpy.abs(late).max() < 5, late
+    assert overruns or numpy.abs(late[20:]).max() < 2, late
+    assert (phase_steps(right) > 0.1).sum() <= 12 * overruns
+    assert numpy.abs(sounds.demodulated(left, HUM, 0.02, RATE)[RATE // 5: -RATE // 5]).max() < 0.01, "left is left"
+    told = agent.log.lines(r"sound made (slower|faster) by \d+ ppm", level=Level.NOTICE)
+    (way, correction), = (re.search(r"(slower|faster) by (\d+) ppm", line.text).groups() for line in told)
+    assert abs(int(correction) * (1 if way == "slower" else -1) - ppm) <= 20

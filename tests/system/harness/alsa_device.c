@@ -1,7 +1,7 @@
 // A microphone in ALSA with a clock of its own, which one program at a time may open, as with a card. Left it hears
 // a burst of 2 kHz around each whole second of CLOCK_MONOTONIC, right a sine of 440 Hz that never breaks off: what
 // the world sounds like does not depend on the clock that it is sampled by. Keys of the definition (times in ms):
-//   lock FILE                     taken while it is open
+//   lock FILE                     taken while it is open; a byte longer with each overrun
 //   ppm N                         how much faster its clock runs than the machine's, parts in a million
 //   jitter N                      periods are reported up to so much late, by chance
 //   open_takes N, close_takes N   how long the driver needs
@@ -90,8 +90,9 @@ static snd_pcm_sframes_t pointer(snd_pcm_ioplug_t* plug) {
   if (device->begun == 0) return (snd_pcm_sframes_t)device->reported;
   const double passed = now() - device->begun;
   while (report_time(device, device->reported / size + 1) <= passed) device->reported += size;
-  if (device->reported - device->taken > (int64_t)plug->buffer_size) return -EPIPE;
-  return (snd_pcm_sframes_t)device->reported;
+  if (device->reported - device->taken <= (int64_t)plug->buffer_size) return (snd_pcm_sframes_t)device->reported;
+  if (device->lock >= 0 && write(device->lock, "!", 1) < 0) SNDERR("the overrun can't be noted");
+  return -EPIPE;
 }
 
 static void wake_at_next_period(struct device* device) {
@@ -185,7 +186,7 @@ static int read_wish(const snd_config_t* conf, struct wish* wish) {
 }
 
 static int lock(const char* file) {
-  const int lock = open(file, O_RDWR | O_CREAT | O_CLOEXEC, 0666);
+  const int lock = open(file, O_WRONLY | O_APPEND | O_CREAT | O_CLOEXEC, 0666);
   if (lock < 0) return -errno;
   if (flock(lock, LOCK_EX | LOCK_NB) == 0) return lock;
   close(lock);

@@ -13,7 +13,7 @@ from .sandbox import HARNESS
 from .sounds import sine
 
 PLACE = "/var/alsa"
-HUM = 440  # Hz, of device()
+HUM, BURST = 440, 2000  # Hz, of device()
 PLUGIN = "alsa_device.so"
 # The system's own plug-ins, but none of its devices becomes the default.
 BEGIN = "</usr/share/alsa/alsa.conf>\n"
@@ -71,6 +71,10 @@ class AlsaHall:
         told = " ".join(f'{key} "{PLACE}/{value}"' if isinstance(value, str) else f"{key} {value}"
                         for key, value in keys.items())
         self.pcm(name, f"type lecture_hall {told}")
+
+    def overruns(self, lock):
+        """How often a device's buffer ran over since it was named: nobody read it in time."""
+        return (self.place / f"{lock}.lock").stat().st_size
 
     def other_program(self, name):
         """A program that records from a PCM, to be started and killed."""
