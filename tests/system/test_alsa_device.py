@@ -6,6 +6,7 @@ import pytest
 from harness import movie, sounds
 from harness.alsa_hall import BURST, HUM, AlsaHall
 from harness.log_reader import Level
+from harness.waiting import let_pass
 
 PIECE = 0.05  # seconds
 RATE = 48000  # for exact times
@@ -92,6 +93,24 @@ def test_another_program_has_the_device(agent, alsa):
     silent = heard.index(True)
     assert silent * PIECE > 3.5 and all(heard[silent:-1]), heard
     assert len(movie.runs(movie.counters(agent.movie("SHARED")))) == 1
+
+
+def test_a_machine_that_stands_still_loses_no_sound(agent, alsa):
+    """For half a second: as long the device's buffer holds what nobody reads."""
+    alsa.device("desk")
+    agent.preferences(RecordingAudioInput=alsa.id("desk"))
+    agent.start(env=alsa.env)
+    assert agent.start_recording("STILL").text == "cmdStatus=0"
+    for second in (3, 6):
+        agent.let_record(second)
+        agent.sandbox.freeze()
+        let_pass(0.5, "the device goes on meanwhile")
+        agent.sandbox.thaw()
+    agent.let_record(9)
+    assert agent.command("STOP").text == "cmdStatus=0"
+    agent.wait_tool_call("STILL")
+    assert not agent.log.lines("silence put in")
+    assert phase_steps(movie.sound(agent.movie("STILL"), RATE, channel=1)).max() < 0.1
 
 
 @pytest.fixture(params=["open", "close"])

@@ -154,8 +154,8 @@ static int offer_formats(snd_pcm_ioplug_t* plug) {
   if (!problem) problem = snd_pcm_ioplug_set_param_list(plug, SND_PCM_IOPLUG_HW_FORMAT, 1, format);
   if (!problem) problem = snd_pcm_ioplug_set_param_minmax(plug, SND_PCM_IOPLUG_HW_RATE, kRate, kRate);
   if (!problem) problem = snd_pcm_ioplug_set_param_minmax(plug, SND_PCM_IOPLUG_HW_CHANNELS, kChannels, kChannels);
-  if (!problem) problem = snd_pcm_ioplug_set_param_minmax(plug, SND_PCM_IOPLUG_HW_PERIOD_BYTES, 960, 1 << 15);
-  if (!problem) problem = snd_pcm_ioplug_set_param_minmax(plug, SND_PCM_IOPLUG_HW_PERIODS, 2, 64);
+  if (!problem) problem = snd_pcm_ioplug_set_param_minmax(plug, SND_PCM_IOPLUG_HW_PERIOD_BYTES, 960, 1 << 13);
+  if (!problem) problem = snd_pcm_ioplug_set_param_minmax(plug, SND_PCM_IOPLUG_HW_PERIODS, 2, 256);
   return problem;
 }
 
