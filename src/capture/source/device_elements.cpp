@@ -13,6 +13,7 @@ namespace {
 constexpr const char* kSink = "sync=false async=false enable-last-sample=false qos=false max-buffers=4 ";
 constexpr unsigned kNetworkLatencyMs = 300;           // packets that come later than that are lost
 constexpr std::uint64_t kNetworkTimeoutUs = 5000000;  // of a connection
+constexpr std::int64_t kSoundBufferUs = 1000000;      // what a busy machine reads later is not lost
 
 std::string rateText(FrameRate rate) { return string_with_format("%d/%d", rate.numerator, rate.denominator); }
 
@@ -90,6 +91,7 @@ void tuneSource(GstElement* source, bool overUdp) {
   connectApart(source);
   if (has(source, "provide-clock")) g_object_set(source, "provide-clock", FALSE, nullptr);
   if (has(source, "slave-method")) gst_util_set_object_arg(G_OBJECT(source), "slave-method", "none");
+  if (has(source, "buffer-time")) g_object_set(source, "buffer-time", kSoundBufferUs, nullptr);
   if (has(source, "always-copy")) g_object_set(source, "always-copy", TRUE, nullptr);
   if (has(source, "protocols") && has(source, "latency")) {  // RTSP
     g_object_set(source, "latency", kNetworkLatencyMs, "tcp-timeout", kNetworkTimeoutUs, "timeout",

@@ -7,6 +7,7 @@
 
 #include "capture/gst/picture_format.h"
 #include "capture/source/device_list.h"
+#include "capture/source/overdue.h"
 #include "platform/log.h"
 #include "support/format.h"
 #include "support/redacted.h"
@@ -21,6 +22,9 @@ constexpr auto kFirstSampleLimit = 10s;
 constexpr auto kSilenceLimit = 2s;
 constexpr auto kWatchInterval = 500ms;
 constexpr std::chrono::milliseconds kClosingPatience = 5s;
+constexpr auto kOpeningPatience = 5s;
+constexpr auto kBusyPatience = 2s;  // a driver's time for closing
+constexpr auto kBusyInterval = 100ms;
 constexpr auto kRetryInterval = 3s;
 constexpr int kOftenTries = 20;
 constexpr auto kSeldomInterval = 10s;
@@ -132,10 +136,11 @@ std::shared_ptr<const HardwareDevice> Source::hardware() const {
 // ---- its thread
 
 void Source::live() {
+  begun_at_ = Clock::now();
   while (!closing()) {
     const CaptureError error = guardedOpenAndWatch();
     if (closing()) break;
-    if (triesOverUdp(error)) continue;
+    if (triesOverUdp(error) || waitsForItsRelease(error)) continue;
     if (triesAgain()) {
       goAway(error);
       waitBeforeNextTry();
@@ -246,7 +251,7 @@ Result<std::unique_ptr<DevicePipeline>, CaptureError> Source::openPipeline() {
   output.onSound = [this, steady](GstBuffer* sound, double time, double arrival) {
     takeSound(steady.get(), sound, time, arrival);
   };
-  auto pipeline = DevicePipeline::open(wish, pacer_, std::move(output));
+  auto pipeline = openInTime(wish, std::move(output));
   if (!pipeline) return pipeline;
   if (!(*pipeline)->mode().empty() && !ever_ran_)
     LMPLogMessage(nullptr, kLogInfo, "%s: %s", name().c_str(), (*pipeline)->mode().c_str());
@@ -256,6 +261,23 @@ Result<std::unique_ptr<DevicePipeline>, CaptureError> Source::openPipeline() {
     format_ = syntheticFormat(device_, wish_.demand);
   }
   set(Phase::running);
+  return pipeline;
+}
+
+/// A camera's users wait for it themselves. Those of a microphone don't, so another thread tells them when a
+/// driver does not return: this one can't.
+Result<std::unique_ptr<DevicePipeline>, CaptureError> Source::openInTime(const DevicePipeline::Wish& wish,
+                                                                         DeviceOutput output) {
+  if (wish_.picture) return DevicePipeline::open(wish, pacer_, std::move(output));
+  auto pipeline = [&] {
+    const Overdue overdue(kOpeningPatience, [this] {
+      if (!closing())
+        tellAbsence({CaptureError::kDomain, kAudioSilent, name() + ": has not been opened within 5 s"},
+                    "its driver is waited for");
+    });
+    return DevicePipeline::open(wish, pacer_, std::move(output));
+  }();
+  if (delivering_) tellReturn();  // its first sound may have come before the absence was told
   return pipeline;
 }
 
@@ -322,19 +344,32 @@ bool Source::triesAgain() const {
   return away_since_ms_ == 0 || since(away_since_ms_) + kLastTry < kNetworkLimit;
 }
 
+/// Whoever has the microphone may be about to let go of it: another program, or this one by another name.
+bool Source::waitsForItsRelease(const CaptureError& error) {
+  if (wish_.picture || error.code != kDeviceBusy || Clock::now() - begun_at_ > kBusyPatience) return false;
+  std::unique_lock lock(mutex_);
+  changed_.wait_for(lock, kBusyInterval, [this] { return closing_; });
+  return true;
+}
+
 void Source::goAway(const CaptureError& error) {
-  const bool first = away_since_ms_ == 0;
-  if (first) away_since_ms_ = steadyMilliseconds();
-  failed_tries_ = first ? 0 : failed_tries_ + 1;
+  failed_tries_ = away_since_ms_ == 0 ? 0 : failed_tries_ + 1;
   if (!ever_ran_) over_udp_ = false;  // nothing is known of it: the next try begins as the first one
+  tellAbsence(error, "it is tried again every 3 s");
+}
+
+/// @param next  what is done about it. Only the first one is told until the source is back.
+void Source::tellAbsence(const CaptureError& error, const char* next) {
+  std::int64_t before = 0;
+  const bool first = away_since_ms_.compare_exchange_strong(before, steadyMilliseconds());
   {
     const std::lock_guard lock(mutex_);
     problem_ = error;
   }
   set(Phase::away);
   if (!first) return;
-  LMPLogMessage(nullptr, kLogError, "The %s is away: %s (code %d); it is tried again every 3 s",
-                wish_.picture ? "camera" : "microphone", error.message.c_str(), error.code);
+  LMPLogMessage(nullptr, kLogError, "The %s is away: %s (code %d); %s",
+                wish_.picture ? "camera" : "microphone", error.message.c_str(), error.code, next);
   consumers_.away(error);
 }
 
@@ -401,6 +436,10 @@ void Source::firstSample() {
   ever_ran_ = true;
   if (last_sound_ms_ != 0)
     last_sound_ms_ = steadyMilliseconds();  // it could not come while the device was away
+  tellReturn();
+}
+
+void Source::tellReturn() {
   set(Phase::running);
   const std::int64_t away = away_since_ms_.exchange(0);
   if (away == 0) return;

@@ -80,11 +80,14 @@ class Source : public CaptureSession {
   [[nodiscard]] std::optional<CaptureError> guardedWatch(DevicePipeline& pipeline);
   [[nodiscard]] std::optional<CaptureError> silence() const;
   [[nodiscard]] Result<std::unique_ptr<DevicePipeline>, CaptureError> openPipeline();
+  [[nodiscard]] Result<std::unique_ptr<DevicePipeline>, CaptureError> openInTime(
+      const DevicePipeline::Wish& wish, DeviceOutput output);
   [[nodiscard]] bool findHardwareFor(DevicePipeline::Wish& wish);
   [[nodiscard]] bool triesAgain() const;
   [[nodiscard]] bool predecessorHasGone();
   void checkForSound(const DevicePipeline& pipeline);
   [[nodiscard]] bool triesOverUdp(const CaptureError& error);
+  [[nodiscard]] bool waitsForItsRelease(const CaptureError& error);
   void goAway(const CaptureError& error);
   void waitBeforeNextTry();
   void set(Phase phase);
@@ -93,6 +96,10 @@ class Source : public CaptureSession {
   void takePicture(GstSample* picture, double time);
   void takeSound(SteadySound* steady, GstBuffer* sound, double time, double arrival);
   void firstSample();
+
+  // Both, and the thread that watches the opening.
+  void tellAbsence(const CaptureError& error, const char* next);
+  void tellReturn();
   [[nodiscard]] bool closing() const;
   [[nodiscard]] bool startWanted() const;
 
@@ -112,6 +119,7 @@ class Source : public CaptureSession {
 
   // The source's thread.
   std::shared_ptr<Source> predecessor_;  ///< null once it has closed the device
+  Clock::time_point begun_at_;
   Clock::time_point opened_at_;
   bool over_udp_ = false;
   int failed_tries_ = 0;  ///< since it went away

@@ -91,10 +91,11 @@ def frame_times(path):
     return sorted(float(packet["pts_time"]) for packet in json.loads(result.stdout)["packets"])
 
 
-def sound(path, rate=8000):
-    """The movie's sound, mono, as numbers between -1 and 1."""
-    result = _run(["ffmpeg", "-v", "error", "-i", path, "-map", "0:a:0", "-ac", "1", "-ar", str(rate), "-f", "f32le",
-                   "-"])
+def sound(path, rate=8000, channel=None):
+    """The movie's sound as numbers between -1 and 1: mono, or one channel of it."""
+    mix = "anull" if channel is None else f"pan=mono|c0=c{channel}"
+    result = _run(["ffmpeg", "-v", "error", "-i", path, "-map", "0:a:0", "-af", mix, "-ac", "1", "-ar", str(rate), "-f",
+                   "f32le", "-"])
     return numpy.frombuffer(result.stdout, dtype=numpy.float32).astype(numpy.float64)
 
 

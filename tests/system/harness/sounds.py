@@ -48,3 +48,21 @@ def is_tone(pitches, frequency):
     some sound now and then: the step shifts what is measured in its piece."""
     right = sum(one == frequency for one in pitches)
     return right * 2 >= len(pitches) and all(one and abs(one - frequency) <= 40 for one in pitches)
+
+
+def demodulated(sound, frequency, window, rate):
+    """Strength and phase of a tone around each sample, as complex numbers; `window` is a length in seconds."""
+    carrier = numpy.exp(-2j * numpy.pi * frequency * numpy.arange(len(sound)) / rate)
+    shape = numpy.hanning(round(window * rate) | 1)
+    size = len(sound) + len(shape) - 1
+    spectrum = numpy.fft.fft(sound * carrier, size) * numpy.fft.fft(2 * shape / shape.sum(), size)
+    return numpy.fft.ifft(spectrum)[len(shape) // 2:][: len(sound)]
+
+
+def bursts(sound, frequency, rate):
+    """Where bursts of a tone are, seconds: the middle of each."""
+    strength = numpy.abs(demodulated(sound, frequency, 0.01, rate))
+    there = strength > 0.1
+    edges = numpy.flatnonzero(numpy.diff(numpy.concatenate(([False], there, [False])).astype(int)))
+    return [float(numpy.average(numpy.arange(first, last), weights=strength[first:last])) / rate
+            for first, last in zip(edges[::2], edges[1::2])]
