@@ -23,14 +23,6 @@ constexpr auto kSilenceLimit = 2s;
 constexpr auto kWatchInterval = 500ms;
 constexpr std::chrono::milliseconds kClosingPatience = 5s;
 constexpr auto kOpeningPatience = 5s;
-constexpr auto kBusyPatience = 2s;  // a driver's time for closing
-constexpr auto kBusyInterval = 100ms;
-constexpr auto kRetryInterval = 3s;
-constexpr int kOftenTries = 20;
-constexpr auto kSeldomInterval = 10s;
-constexpr auto kUdpLimit = 5s;       // a refusal comes at once
-constexpr auto kNetworkLimit = 10s;  // for its tries
-constexpr auto kLastTry = 1s;        // before that limit
 
 std::int64_t steadyMilliseconds() {
   const auto time = std::chrono::steady_clock::now().time_since_epoch();
@@ -58,7 +50,10 @@ CameraFormat syntheticFormat(const DeviceID& device, const CameraDemand& demand)
 }  // namespace
 
 Source::Source(SourceWish wish)
-    : wish_(std::move(wish)), device_(parseDeviceID(wish_.device)), clock_(!device_.asFastAsPossible()) {}
+    : wish_(std::move(wish)),
+      device_(parseDeviceID(wish_.device)),
+      clock_(!device_.asFastAsPossible()),
+      retries_(device_.kind, wish_.picture) {}
 
 bool Source::open(const std::shared_ptr<Source>& source) {
   try {
@@ -140,10 +135,11 @@ void Source::live() {
   while (!closing()) {
     const CaptureError error = guardedOpenAndWatch();
     if (closing()) break;
-    if (triesOverUdp(error) || waitsForItsRelease(error)) continue;
-    if (triesAgain()) {
-      goAway(error);
-      waitBeforeNextTry();
+    const RetryPolicy::Next next = retries_.after(failure(error));
+    if (next.step != RetryPolicy::Next::Step::lost) {
+      if (next.step == RetryPolicy::Next::Step::away) tellAbsence(error, "it is tried again every 3 s");
+      std::unique_lock lock(mutex_);
+      changed_.wait_for(lock, next.pause, [this] { return closing_; });
       continue;
     }
     LMPLogMessage(nullptr, kLogError, "Capture device lost: %s (code %d)", error.message.c_str(), error.code);
@@ -236,7 +232,7 @@ bool Source::predecessorHasGone() {
 Result<std::unique_ptr<DevicePipeline>, CaptureError> Source::openPipeline() {
   DevicePipeline::Wish wish{.device = device_,
                             .picture = wish_.picture,
-                            .overUdp = over_udp_,
+                            .overUdp = retries_.overUdp(),
                             .demand = wish_.demand,
                             .hardware = nullptr};
   if (!findHardwareFor(wish)) {
@@ -327,7 +323,7 @@ std::optional<CaptureError> Source::silence() const {
   if (!delivering_) {
     const std::int64_t away = away_since_ms_;
     const bool late = Clock::now() - opened_at_ > kFirstSampleLimit ||
-                      (wish_.picture && away != 0 && since(away) > kNetworkLimit);
+                      (wish_.picture && away != 0 && since(away) > RetryPolicy::kNetworkLimit);
     if (!late) return std::nullopt;
     return CaptureError{CaptureError::kDomain, code, name() + ": gave no " + what + " within 10 s"};
   }
@@ -338,24 +334,15 @@ std::optional<CaptureError> Source::silence() const {
 
 // ---- away and back
 
-bool Source::triesAgain() const {
-  if (!wish_.picture) return true;
-  if (device_.kind != DeviceKind::network || !ever_ran_) return false;
-  return away_since_ms_ == 0 || since(away_since_ms_) + kLastTry < kNetworkLimit;
-}
-
-/// Whoever has the microphone may be about to let go of it: another program, or this one by another name.
-bool Source::waitsForItsRelease(const CaptureError& error) {
-  if (wish_.picture || error.code != kDeviceBusy || Clock::now() - begun_at_ > kBusyPatience) return false;
-  std::unique_lock lock(mutex_);
-  changed_.wait_for(lock, kBusyInterval, [this] { return closing_; });
-  return true;
-}
-
-void Source::goAway(const CaptureError& error) {
-  failed_tries_ = away_since_ms_ == 0 ? 0 : failed_tries_ + 1;
-  if (!ever_ran_) over_udp_ = false;  // nothing is known of it: the next try begins as the first one
-  tellAbsence(error, "it is tried again every 3 s");
+RetryPolicy::Failure Source::failure(const CaptureError& error) const {
+  const auto now = Clock::now();
+  const std::int64_t away = away_since_ms_;
+  return {.code = error.code,
+          .everRan = ever_ran_,
+          .delivered = delivering_,
+          .wantedFor = std::chrono::duration_cast<std::chrono::milliseconds>(now - begun_at_),
+          .triedFor = std::chrono::duration_cast<std::chrono::milliseconds>(now - opened_at_),
+          .awayFor = away == 0 ? std::nullopt : std::optional(since(away))};
 }
 
 /// @param next  what is done about it. Only the first one is told until the source is back.
@@ -371,19 +358,6 @@ void Source::tellAbsence(const CaptureError& error, const char* next) {
   LMPLogMessage(nullptr, kLogError, "The %s is away: %s (code %d); %s",
                 wish_.picture ? "camera" : "microphone", error.message.c_str(), error.code, next);
   consumers_.away(error);
-}
-
-void Source::waitBeforeNextTry() {
-  std::chrono::milliseconds pause = kRetryInterval;
-  if (wish_.picture) {
-    const auto left = kNetworkLimit - kLastTry - since(away_since_ms_);
-    pause = since(away_since_ms_) < 1s ? 500ms
-                                       : std::clamp<std::chrono::milliseconds>(left, 100ms, kRetryInterval);
-  }
-  if (failed_tries_ > kOftenTries)
-    pause = kSeldomInterval;  // looking for it wakes the drivers of all devices
-  std::unique_lock lock(mutex_);
-  changed_.wait_for(lock, pause, [this] { return closing_; });
 }
 
 // ---- streaming threads
@@ -419,15 +393,6 @@ void Source::takeSound(SteadySound* steady, GstBuffer* sound, double time, doubl
   for (const SteadySound::Chunk& chunk : steady->feed(BufferHandle(gst_buffer_ref(sound)), arrival))
     consumers_.deliverSound(chunk.buffer.get(), chunk.time);
   sound_correction_ = steady->partsPerMillion();
-}
-
-/// One that offers nothing else.
-bool Source::triesOverUdp(const CaptureError& error) {
-  const bool refused =
-      error.code != kDeviceNotPermitted && !delivering_ && Clock::now() - opened_at_ < kUdpLimit;
-  if (device_.kind != DeviceKind::network || ever_ran_ || over_udp_ || !refused) return false;
-  over_udp_ = true;
-  return true;
 }
 
 /// The first one since the device was opened, of what the source is watched by.

@@ -12,6 +12,7 @@
 #include "capture/source/capture_clock.h"
 #include "capture/source/capture_consumers.h"
 #include "capture/source/device_pipeline.h"
+#include "capture/source/retry_policy.h"
 #include "capture/source/steady_sound.h"
 
 namespace lmx {
@@ -83,13 +84,9 @@ class Source : public CaptureSession {
   [[nodiscard]] Result<std::unique_ptr<DevicePipeline>, CaptureError> openInTime(
       const DevicePipeline::Wish& wish, DeviceOutput output);
   [[nodiscard]] bool findHardwareFor(DevicePipeline::Wish& wish);
-  [[nodiscard]] bool triesAgain() const;
   [[nodiscard]] bool predecessorHasGone();
   void checkForSound(const DevicePipeline& pipeline);
-  [[nodiscard]] bool triesOverUdp(const CaptureError& error);
-  [[nodiscard]] bool waitsForItsRelease(const CaptureError& error);
-  void goAway(const CaptureError& error);
-  void waitBeforeNextTry();
+  [[nodiscard]] RetryPolicy::Failure failure(const CaptureError& error) const;
   void set(Phase phase);
 
   // Streaming threads.
@@ -119,10 +116,9 @@ class Source : public CaptureSession {
 
   // The source's thread.
   std::shared_ptr<Source> predecessor_;  ///< null once it has closed the device
+  RetryPolicy retries_;
   Clock::time_point begun_at_;
   Clock::time_point opened_at_;
-  bool over_udp_ = false;
-  int failed_tries_ = 0;  ///< since it went away
   std::shared_ptr<const HardwareDevice> found_;
 
   mutable std::mutex mutex_;
