@@ -1,5 +1,6 @@
-// What the virtual camera and the virtual microphone of PipeWire share: a stream that drives its graph by a clock of
-// the device's own, which may be fast or slow against the machine's.
+// What the virtual camera and the virtual microphone of PipeWire share: a stream that drives its graph by a
+// clock of the device's own, which may be fast or slow against the machine's.
+#pragma once
 #include <pipewire/pipewire.h>
 #include <stdio.h>
 #include <stdlib.h>
@@ -14,7 +15,8 @@ struct device {
   uint64_t taken;   // pictures or samples so far
   uint64_t period;  // of them in one cycle of the graph
   int64_t jitter;   // a cycle comes up to so many ns late
-  struct spa_io_position* position;  // the graph's clock, where its cycles decide about the period
+  // The graph's clock, where its cycles decide about the period.
+  struct spa_io_position* position;
 };
 
 static int64_t now(void) {
