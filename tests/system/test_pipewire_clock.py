@@ -1,11 +1,15 @@
-"""Microphones and cameras of PipeWire whose clocks are not the machine's: the sound stays where it belongs."""
+"""Microphones and cameras of PipeWire whose clocks are not the machine's: the sound stays where it belongs.
+
+All that takes part in PipeWire's graph has real-time priority here, as in a session: without it the graph loses cycles
+of 21 ms on a busy machine, for all its programs alike, and nothing could be said about the clocks.
+"""
 import os
 import subprocess
 
 import numpy
 import pytest
 from harness import movie, sounds
-from harness.pipewire_hall import PipeWireHall
+from harness.pipewire_hall import REAL_TIME, PipeWireHall
 from harness.waiting import let_pass
 
 RATE = 48000
@@ -14,15 +18,14 @@ RATE = 48000
 @pytest.fixture
 def hall(agent):
     """A running PipeWire whose sockets the agent finds."""
-    with PipeWireHall(agent) as one:
+    with PipeWireHall(agent, real_time=True) as one:
         yield one
 
 
 def record(agent, hall, uuid, camera, microphone, seconds):
     """Records both. @return the movie"""
     agent.preferences(RecordingVideoInput=camera.id, RecordingAudioInput=microphone.id)
-    if not agent.alive():
-        agent.start(env=hall.env)
+    agent.start(env=hall.env, prefix=REAL_TIME)
     agent.record(uuid, seconds)
     return agent.movie(uuid)
 
@@ -50,12 +53,11 @@ def test_the_clock_reaches_those_who_listen(agent, hall, ppm, tmp_path):
     could not fail."""
     path = tmp_path / "heard.wav"
     with hall.clocked_microphone("lectern", ppm) as microphone:
-        with subprocess.Popen(["pw-record", "--target", microphone.name, "--rate", str(RATE), "--channels", "1",
-                               str(path)], env={**os.environ, **hall.host_env}) as recorder:
+        with subprocess.Popen([*hall.real_time, "pw-record", "--target", microphone.name, "--rate", str(RATE),
+                               "--channels", "1", str(path)], env={**os.environ, **hall.host_env}) as recorder:
             let_pass(12, "pw-record listens")
             recorder.terminate()
     apart = numpy.diff(sounds.bursts(movie.sound(path, RATE), RATE)) * RATE
-    # The median: without real-time priority the server loses a cycle now and then.
     assert abs(numpy.median(apart) - RATE * (1 + ppm * 1e-6)) < 2, apart
 
 
@@ -68,7 +70,7 @@ def test_sound_stays_with_the_picture(agent, hall, ppm, jitter, most):
     with hall.camera("podium", numbers="ms") as camera, hall.clocked_microphone("lectern", ppm, jitter) as microphone:
         path = record(agent, hall, "BOTH", camera, microphone, 45)
     late = misplaced(burst_times(path), numpy.median(picture_offsets(path)))
-    assert len(late) > 36, "all but what the server has lost"
+    assert len(late) > 40, late
     assert numpy.abs(late).max() < most, late
 
 
@@ -81,10 +83,10 @@ def test_three_clocks(agent, hall, camera_ppm, ppm):
             hall.clocked_microphone("lectern", ppm) as microphone:
         path = record(agent, hall, "BOTH", camera, microphone, 45)
     bursts, offsets = burst_times(path), picture_offsets(path)
-    assert len(bursts) > 36, "all but what the server has lost"
+    assert len(bursts) > 40, bursts
     late = misplaced(bursts, numpy.median(offsets))
     assert numpy.ptp(late) < 0.005, late
-    assert numpy.abs(offsets - numpy.median(offsets)).max() < 0.5 / 30 + 0.005
+    assert numpy.ptp(offsets) < 1 / 30 + 0.005, offsets
     shown = numpy.interp(bursts, movie.frame_times(path), offsets)  # at each burst
     assert numpy.abs(misplaced(bursts, shown)).max() < 0.5 / 30 + 0.005
 
@@ -92,13 +94,8 @@ def test_three_clocks(agent, hall, camera_ppm, ppm):
 @pytest.mark.slow
 @pytest.mark.parametrize("ppm", [-200, 200])
 def test_a_tone_has_no_steps(agent, hall, ppm):
-    """Without real-time priority the server loses a cycle now and then, and the agent tells of the silence it has put
-    in: that recording says nothing, and is made again."""
+    """The pitch glides while the clock becomes known, but nothing is cut out or put in."""
     with hall.camera("podium") as camera, hall.clocked_microphone("lectern", ppm, hertz=1000) as microphone:
-        for uuid in ("A", "B", "C", "D"):
-            mark = agent.log.mark()
-            path = record(agent, hall, uuid, camera, microphone, 15)
-            if not agent.log.lines("silence put in|Sound was moved", after=mark):
-                break
+        path = record(agent, hall, "TONE", camera, microphone, 15)
     rough = sounds.roughness(movie.sound(path, RATE)[RATE // 2:-RATE // 10], 1000, RATE)
     assert rough < 0.05, rough

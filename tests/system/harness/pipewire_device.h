@@ -2,6 +2,7 @@
 // clock of the device's own, which may be fast or slow against the machine's.
 #pragma once
 #include <pipewire/pipewire.h>
+#include <sched.h>
 #include <stdio.h>
 #include <stdlib.h>
 #include <time.h>
@@ -64,6 +65,8 @@ static void on_state(void* data, enum pw_stream_state old, enum pw_stream_state 
 // Makes the loop and the stream. @param api  what drives the hardware, or empty
 static void set_up(struct device* device, const char* name, const char* api, struct pw_properties* properties,
                    const struct pw_stream_events* events) {
+  // Hardware does not wait for a processor. Without the right to it, it does.
+  sched_setscheduler(0, SCHED_FIFO, &(struct sched_param){.sched_priority = 20});
   pw_init(NULL, NULL);
   device->loop = pw_main_loop_new(NULL);
   struct pw_loop* loop = pw_main_loop_get_loop(device->loop);

@@ -21,6 +21,9 @@ from .waiting import wait_until
 
 PLACE = "/var/pipewire"
 NO_BUS = "unix:path=/nowhere"
+# In front of the agent's command: what it does for PipeWire's graph is done in time on a busy machine, too.
+REAL_TIME = ("/usr/bin/python3", "-c", "import os, sys; os.sched_setscheduler(0, os.SCHED_FIFO, os.sched_param(10)); "
+             "os.execv(sys.argv[1], sys.argv[1:])")
 SHARED = Path("/usr/share/wireplumber")
 # The scripts of WirePlumber that link streams to devices; none that looks for hardware.
 ENABLED = """
@@ -38,8 +41,10 @@ class PipeWireHall:
 
     env = {"PIPEWIRE_RUNTIME_DIR": PLACE, "XDG_RUNTIME_DIR": PLACE}
 
-    def __init__(self, agent):
+    def __init__(self, agent, real_time=False):
+        """Without `real_time` the server loses sound on a busy machine, as one does that has no right to priority."""
         self.agent = agent
+        self.real_time = ["chrt", "--fifo", "15"] if real_time else []
         self.place = agent.sandbox.root / PLACE.lstrip("/")  # in the host: the server is no process of the sandbox
         self.place.mkdir(parents=True, exist_ok=True)
         # No bus: nothing of the machine's own session may take part.
@@ -80,7 +85,7 @@ class PipeWireHall:
 
     def _run(self, command):
         one = Guest(self.agent)
-        one.run(command, env=self.host_env, stdin=subprocess.DEVNULL, stdout=subprocess.DEVNULL)
+        one.run([*self.real_time, *command], env=self.host_env, stdin=subprocess.DEVNULL, stdout=subprocess.DEVNULL)
         self._guests.append(one)
         return one
 
