@@ -62,7 +62,7 @@ def test_the_clock_reaches_those_who_listen(agent, hall, ppm, tmp_path):
 
 
 @pytest.mark.slow
-@pytest.mark.parametrize("ppm, jitter, most", [(-50, 0, 0.005), (-200, 3, 0.005), (200, 0, 0.005), (1000, 0, 0.010),
+@pytest.mark.parametrize("ppm, jitter, most", [(-50, 0, 0.0015), (-200, 3, 0.005), (200, 0, 0.005), (1000, 0, 0.010),
                                                (-1000, 0, 0.010)])
 def test_sound_stays_with_the_picture(agent, hall, ppm, jitter, most):
     """Uncorrected, the last burst would be misplaced by 45 s times `ppm`. For a clock that no sound card has there is a
@@ -98,4 +98,4 @@ def test_a_tone_has_no_steps(agent, hall, ppm):
     with hall.camera("podium") as camera, hall.clocked_microphone("lectern", ppm, hertz=1000) as microphone:
         path = record(agent, hall, "TONE", camera, microphone, 15)
     rough = sounds.roughness(movie.sound(path, RATE)[RATE // 2:-RATE // 10], 1000, RATE)
-    assert rough < 0.05, rough
+    assert rough < 0.03, rough
