@@ -113,7 +113,7 @@ def test_a_machine_that_stands_still_loses_no_sound(agent, alsa):
     left, right = (movie.sound(agent.movie("STILL"), RATE, channel) for channel in (0, 1))
     strength = numpy.abs(sounds.demodulated(right, HUM, 0.02, RATE)[RATE // 5: -RATE // 5])
     assert strength.min() > 0.8 * numpy.median(strength), "no hole"
-    distances = numpy.diff(sounds.bursts(left, BURST, RATE))
+    distances = numpy.diff(sounds.burst_middles(left, BURST, RATE))
     assert len(distances) >= 7 and numpy.abs(distances - 1).max() < 0.005, distances
 
 
@@ -194,7 +194,7 @@ def test_a_clock_of_its_own(agent, alsa, long_recording):
     overruns = alsa.overruns("desk")
     assert overruns <= 6, "the machine is too busy, or the device is not read"
     left, right = (movie.sound(path, RATE, channel) for channel in (0, 1))
-    places = numpy.array(sounds.bursts(left, BURST, RATE)) + movie.streams(path)["audio"].start - picture_clock(path)
+    places = numpy.array(sounds.burst_middles(left, BURST, RATE)) + movie.streams(path)["audio"].start - picture_clock(path)
     assert len(places) >= 41 - overruns
     off = places - places[len(places) // 2]
     off -= numpy.round(off)

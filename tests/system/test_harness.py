@@ -133,6 +133,17 @@ def test_sounds_are_told_apart(tmp_path):
     assert sounds.heard(tmp_path / "a.mov") == [440, 440, None, None, 720, 720]
 
 
+def test_steps_and_bursts_are_found():
+    time = numpy.arange(48000 * 3) / 48000
+    sine = 0.3 * numpy.sin(2 * numpy.pi * 1000 * time)
+    assert sounds.roughness(sine, 1000, 48000) < 1e-9
+    assert 0.04 < sounds.roughness(numpy.delete(sine, 70000), 1000, 48000) < 0.1, "one sample is missing"
+    since = time % 1.001
+    world = sine * numpy.where(since < 0.02, numpy.sin(numpy.pi * since / 0.02) ** 2, 0)
+    assert sounds.bursts(world, 48000) == pytest.approx([0, 1.001, 2.002], abs=1e-4)
+    assert not sounds.bursts(0 * world, 48000)
+
+
 def test_brightness_is_that_of_the_part(tmp_path):
     make_movie(tmp_path / "a.mov", [0, 2**32 - 1])
     top, rest = (movie.brightness(tmp_path / "a.mov", f"crop=320:{height}:0:{y}") for height, y in ((8, 0), (160, 20)))

@@ -4,8 +4,9 @@
 namespace lmx {
 namespace {
 
-/// All in seconds. Sound that is later than this is held back.
-constexpr double kLate = 0.020;
+/// All in seconds. Sound that is later than this is held back. The least that a sound server loses is a cycle
+/// of 21 ms, as a rule, and the clock may be a little late; the sound of a very slow clock is never on time.
+constexpr double kLate = 0.018;
 /// No scheduler makes sound early: the clock was wrong, or the microphone delivers nonsense.
 constexpr double kEarly = -0.050;
 /// At the start the clock is set to the earliest arrival of this time.
@@ -53,6 +54,7 @@ ArrivalJudge::Finding ArrivalJudge::keepWaiting(const SoundStamp& stamp) {
 
 ArrivalJudge::Finding ArrivalJudge::startAgain(const SoundStamp& stamp) {
   clock_.restart(stamp);
+  punctual_ = stamp;
   wait_.reset();
   running_ = true;
   return Finding::jump;

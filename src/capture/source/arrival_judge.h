@@ -15,12 +15,15 @@ class ArrivalJudge {
     undecided,  ///< hold the sound back for now; never for more than 0.8 s
     inTime,     ///< what is held back belongs to what was before
     jump,       ///< the clock begins anew with what is held back: at the start, after a gap, and when sound
-                ///< comes faster than time passes
+                ///< comes faster than time passes. More may be missing behind punctual(): the stamps that
+                ///< followed it are to be judged once more
   };
-  /// Stamps ascend in `heard`.
+  /// Stamps ascend in `heard`; those that are judged once more need not.
   Finding judge(const SoundStamp& stamp);
   /// Begins anew with what is held back; `stamp` is taken for punctual.
   Finding startAgain(const SoundStamp& stamp);
+  /// The stamp with which the clock began at the latest jump.
+  [[nodiscard]] const SoundStamp& punctual() const { return punctual_; }
   [[nodiscard]] const ClockFilter& clock() const { return clock_; }
 
  private:
@@ -35,6 +38,7 @@ class ArrivalJudge {
 
   ClockFilter clock_;
   std::optional<Wait> wait_;
+  SoundStamp punctual_;
   bool running_ = false;
 };
 

@@ -10,6 +10,7 @@
 
 #include "capture/source/device_identity.h"
 #include "capture/source/device_list.h"
+#include "capture/source/pulse_provider.h"
 
 namespace lmx {
 namespace {
@@ -105,6 +106,7 @@ std::vector<GstHandle<GstDevice>> devicesOf(std::initializer_list<const char*> c
   // A plug-in's provider is one object for the whole process, and not made to be asked by two at once.
   static std::mutex mutex;
   const std::lock_guard lock(mutex);
+  askPulseOnlyIfThere();
   const GstHandle<GstDeviceMonitor> monitor(gst_device_monitor_new());
   for (const char* name : classes) gst_device_monitor_add_filter(monitor.get(), name, nullptr);
   std::vector<GstHandle<GstDevice>> devices;

@@ -40,9 +40,16 @@ std::vector<SteadySound::Chunk> SteadySound::feed(BufferHandle buffer, double ar
   heard_ += frames;
   boundHeld();
   if (!plausible(arrival)) return chunks;
-  const ArrivalJudge::Finding finding = judge({.heard = seconds(heard_), .arrival = arrival});
-  if (finding == ArrivalJudge::Finding::jump) jump(arrival, chunks);
-  if (finding != ArrivalJudge::Finding::undecided) release(chunks);
+  undecided_.push_back({.heard = seconds(heard_), .arrival = arrival});
+  std::size_t next = undecided_.size() - 1;
+  while (next < undecided_.size()) {
+    const SoundStamp stamp = undecided_[next++];
+    const ArrivalJudge::Finding finding = judge(stamp);
+    if (finding == ArrivalJudge::Finding::undecided) continue;
+    if (finding == ArrivalJudge::Finding::jump) jump(stamp.arrival, chunks);
+    release(finding == ArrivalJudge::Finding::jump ? judge_.punctual() : stamp, chunks);
+    next = 0;  // what is behind a jump is judged by the new clock
+  }
   return chunks;
 }
 
@@ -88,16 +95,20 @@ void SteadySound::jump(double arrival, std::vector<Chunk>& chunks) {
   part_open_ = false;
 }
 
-void SteadySound::release(std::vector<Chunk>& chunks) {
+/// Gives out what is held up to `last`.
+void SteadySound::release(const SoundStamp& last, std::vector<Chunk>& chunks) {
+  std::erase_if(undecided_, [&last](const SoundStamp& stamp) { return stamp.heard <= last.heard; });
   if (!part_open_ && !beginPart()) return;
-  const std::span<const float> held(held_);
+  const std::int64_t behindIt = heard_ - std::llround(last.heard * sample_rate_);
+  const auto frames = static_cast<std::size_t>(std::max<std::int64_t>(heldFrames() - behindIt, 0));
+  const std::span<const float> held(held_.data(), frames * channels_);
   const std::size_t most = static_cast<std::size_t>(kPieceSeconds * sample_rate_ + 1) * channels_;
   for (std::size_t at = 0; at < held.size(); at += most) {
     const auto piece = held.subspan(at, std::min(most, held.size() - at));
     adjustRatio(piece.size() / channels_);
     give(resampler_.push(piece), chunks);
   }
-  held_.clear();
+  dropHeld(static_cast<std::int64_t>(frames));
 }
 
 /// Sound that follows a jump must not reach into what was given out before it.

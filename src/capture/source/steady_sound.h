@@ -17,7 +17,7 @@ namespace lmx {
 /// For live microphones only; files and synthetic devices have times of their own.
 ///
 /// Sound is given out as it comes, but for 24 samples that the filter holds (their time is accounted for in
-/// the times of the chunks), the first 0.25 s, which set the clock, and sound that is more than 20 ms late:
+/// the times of the chunks), the first 0.25 s, which set the clock, and sound that is more than 18 ms late:
 /// it waits for at most 0.8 s until it is known whether sound before it is missing. A change of place of up
 /// to 50 ms is made up for by at most 5 ms in a second.
 ///
@@ -55,7 +55,7 @@ class SteadySound {
   [[nodiscard]] double behind() const;
   void boundHeld();
   void jump(double arrival, std::vector<Chunk>& chunks);
-  void release(std::vector<Chunk>& chunks);
+  void release(const SoundStamp& last, std::vector<Chunk>& chunks);
   [[nodiscard]] bool beginPart();
   void dropHeld(std::int64_t frames);
   void adjustRatio(std::size_t frames);
@@ -66,14 +66,15 @@ class SteadySound {
   const std::size_t channels_;
   ArrivalJudge judge_;
   VaryingResampler resampler_;
-  std::vector<float> held_;       ///< what the judge has not decided about
-  std::int64_t heard_ = 0;        ///< frames that have come from the microphone
-  double last_arrival_ = -1e300;  ///< as it was said to be
-  bool part_open_ = false;        ///< the next sound follows what was given out
-  std::int64_t part_begin_ = 0;   ///< number, among those that came, of the part's first frame
-  double part_time_ = -1e300;     ///< running time of the part's first frame
-  double ratio_ = 1;              ///< frames read for one that is given out
-  std::int64_t part_frames_ = 0;  ///< given out of the part
+  std::vector<float> held_;            ///< what the judge has not decided about
+  std::vector<SoundStamp> undecided_;  ///< of what is held
+  std::int64_t heard_ = 0;             ///< frames that have come from the microphone
+  double last_arrival_ = -1e300;       ///< as it was said to be
+  bool part_open_ = false;             ///< the next sound follows what was given out
+  std::int64_t part_begin_ = 0;        ///< number, among those that came, of the part's first frame
+  double part_time_ = -1e300;          ///< running time of the part's first frame
+  double ratio_ = 1;                   ///< frames read for one that is given out
+  std::int64_t part_frames_ = 0;       ///< given out of the part
   std::uint32_t jumps_ = 0;
   std::uint32_t recent_jumps_ = 0;
   double jumps_since_ = -1e300;

@@ -21,6 +21,9 @@ from .waiting import wait_until
 
 PLACE = "/var/pipewire"
 NO_BUS = "unix:path=/nowhere"
+# In front of the agent's command: what it does for PipeWire's graph is done in time on a busy machine, too.
+REAL_TIME = ("/usr/bin/python3", "-c", "import os, sys; os.sched_setscheduler(0, os.SCHED_FIFO, os.sched_param(10)); "
+             "os.execv(sys.argv[1], sys.argv[1:])")
 SHARED = Path("/usr/share/wireplumber")
 # The scripts of WirePlumber that link streams to devices; none that looks for hardware.
 ENABLED = """
@@ -38,8 +41,10 @@ class PipeWireHall:
 
     env = {"PIPEWIRE_RUNTIME_DIR": PLACE, "XDG_RUNTIME_DIR": PLACE}
 
-    def __init__(self, agent):
+    def __init__(self, agent, real_time=False):
+        """Without `real_time` the server loses sound on a busy machine, as one does that has no right to priority."""
         self.agent = agent
+        self.real_time = ["chrt", "--fifo", "15"] if real_time else []
         self.place = agent.sandbox.root / PLACE.lstrip("/")  # in the host: the server is no process of the sandbox
         self.place.mkdir(parents=True, exist_ok=True)
         # No bus: nothing of the machine's own session may take part.
@@ -80,18 +85,37 @@ class PipeWireHall:
 
     def _run(self, command):
         one = Guest(self.agent)
-        one.run(command, env=self.host_env, stdin=subprocess.DEVNULL, stdout=subprocess.DEVNULL)
+        one.run([*self.real_time, *command], env=self.host_env, stdin=subprocess.DEVNULL, stdout=subprocess.DEVNULL)
         self._guests.append(one)
         return one
 
-    def camera(self, name, size=(320, 180), rate=30, api="v4l2"):
-        """A virtual camera, to be started: numbered pictures (movie.counters) of one size and rate. It claims to be
-        hardware, which "Automatic" asks for; without `api` it does not."""
-        return VirtualCamera(self, name, size, rate, api)
+    def program(self, name):
+        """A program of the harness, built once for this hall. @return its path"""
+        program = self.place / name
+        if not program.exists():
+            flags = subprocess.run(["pkg-config", "--cflags", "--libs", "libpipewire-0.3"], check=True, timeout=20,
+                                   capture_output=True, text=True).stdout.split()
+            subprocess.run(["cc", "-O1", "-Wall", "-o", program, HARNESS / f"{name}.c", *flags, "-lm"], check=True,
+                           timeout=60)
+        return program
+
+    def camera(self, name, size=(320, 180), rate=30, api="v4l2", ppm=0, numbers="count"):
+        """A virtual camera, to be started: pictures of one size and rate with numbers (movie.counters), or with the
+        "ms" of CLOCK_MONOTONIC when they were taken. It claims to be hardware, which "Automatic" asks for; without
+        `api` it does not. Its clock is `ppm` parts in a million fast."""
+        arguments = [name, api or "", *map(str, size), str(rate), str(ppm), numbers]
+        return VirtualDevice(self, name, [str(self.program("pipewire_camera")), *arguments])
 
     def microphone(self, name, frequency=440, api="alsa"):
         """A virtual microphone, to be started: two minutes of a sine of so many hertz. `api` as for the camera."""
         return VirtualMicrophone(self, name, sine(self.place / f"{frequency}.wav", frequency), api)
+
+    def clocked_microphone(self, name, ppm, jitter=0, hertz=0, api="alsa"):
+        """A virtual microphone, to be started, which drives its graph as a sound card does, by a clock that is `ppm`
+        parts in a million fast; each cycle comes up to `jitter` ms late. What it hears: bursts at the whole seconds of
+        CLOCK_MONOTONIC (sounds.bursts), or a sine of so many `hertz`."""
+        arguments = [name, api or "", str(ppm), str(jitter), str(hertz)]
+        return VirtualDevice(self, name, [str(self.program("pipewire_microphone")), *arguments])
 
     def watch(self, name, caps, rest):
         """Takes so many pieces from a node as any other program would; `rest` ends the launch line: "15 ! fakesink"."""
@@ -154,19 +178,6 @@ class VirtualDevice(Guest):
 
     def go_on(self):
         self.process.send_signal(signal.SIGCONT)
-
-
-class VirtualCamera(VirtualDevice):
-    """See pipewire_camera.c. (pipewiresink stops delivering after a few viewers.)"""
-
-    def __init__(self, hall, name, size, rate, api):
-        program = hall.place / "camera"
-        if not program.exists():
-            flags = subprocess.run(["pkg-config", "--cflags", "--libs", "libpipewire-0.3"], check=True, timeout=20,
-                                   capture_output=True, text=True).stdout.split()
-            subprocess.run(["cc", "-O1", "-Wall", "-o", program, HARNESS / "pipewire_camera.c", *flags], check=True,
-                           timeout=60)
-        super().__init__(hall, name, [str(program), name, *map(str, size), str(rate), api or ""])
 
 
 class VirtualMicrophone(VirtualDevice):

@@ -59,10 +59,38 @@ def demodulated(sound, frequency, window, rate):
     return numpy.fft.ifft(spectrum)[len(shape) // 2:][: len(sound)]
 
 
-def bursts(sound, frequency, rate):
+def burst_middles(sound, frequency, rate):
     """Where bursts of a tone are, seconds: the middle of each."""
     strength = numpy.abs(demodulated(sound, frequency, 0.01, rate))
     there = strength > 0.1
     edges = numpy.flatnonzero(numpy.diff(numpy.concatenate(([False], there, [False])).astype(int)))
     return [float(numpy.average(numpy.arange(first, last), weights=strength[first:last])) / rate
             for first, last in zip(edges[::2], edges[1::2])]
+
+
+BURST_SECONDS = 0.020
+BURST_HERTZ = 1000
+
+
+def bursts(sound, rate):
+    """Where the bursts of pipewire_microphone.c begin, in seconds, in order."""
+    time = numpy.arange(int(BURST_SECONDS * rate)) / rate
+    burst = numpy.sin(numpy.pi * time / BURST_SECONDS) ** 2 * numpy.exp(2j * numpy.pi * BURST_HERTZ * time)
+    size = len(sound) + len(burst)
+    match = numpy.abs(numpy.fft.ifft(numpy.fft.fft(sound, size) * numpy.conj(numpy.fft.fft(burst, size))))[:len(sound)]
+    loud = match > 0.7 * match.max(initial=0)
+    found = []
+    for at in numpy.flatnonzero(loud):
+        if not found or at > found[-1] + len(burst):
+            found.append(at + int(numpy.argmax(match[at:at + len(burst)])))
+    return [at / rate for at in found]
+
+
+def roughness(sound, hertz, rate):
+    """The greatest step in a sine, as a part of its loudness: how far each 10 ms are from the middle of the 10 ms before
+    and behind, in loudness and phase. A sample too many in a sine of 1000 Hz is 0.06 at a rate of 48000."""
+    size = rate // 100
+    turned = sound * numpy.exp(-2j * numpy.pi * hertz * numpy.arange(len(sound)) / rate)
+    pieces = turned[: len(turned) // size * size].reshape(-1, size).mean(axis=1)
+    steps = numpy.abs(pieces[1:-1] - (pieces[:-2] + pieces[2:]) / 2)
+    return float(steps.max() / numpy.abs(pieces).mean())

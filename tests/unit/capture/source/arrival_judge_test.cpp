@@ -49,13 +49,19 @@ TEST(ArrivalJudge, TheStartWaitsForTheEarliestOfAQuarterSecond) {
 }
 
 TEST(ArrivalJudge, TellsLateFromMissing) {
-  EXPECT_EQ(findings({0, 0.019, 0, 0.019}), "....");
-  EXPECT_EQ(findings({0.021, 0.03, 0.01, 0}), "??..");
-  EXPECT_EQ(findings({0.3, 0.29, 0.28, 0.02, 0.01}), "???..") << "it catches up";
+  EXPECT_EQ(findings({0, 0.017, 0, 0.017}), "....");
+  EXPECT_EQ(findings({0.019, 0.03, 0.01, 0}), "??..");
+  EXPECT_EQ(findings({0.3, 0.29, 0.28, 0.0179, 0.01}), "???..") << "it catches up";
   const std::string gap = findings(std::vector<double>(40, 1.0));
   EXPECT_NEAR(static_cast<double>(gap.find('J')), 25, 1) << "one second is missing: known after 0.5 s";
   EXPECT_EQ(gap.substr(gap.find('J') + 1), std::string(39 - gap.find('J'), '.'));
   EXPECT_EQ(findings({-0.01, -0.049, -0.12, -0.12}), "..J.") << "the clock was late";
+}
+
+// What one cycle of a sound server holds, when the clock is 3 ms late.
+TEST(ArrivalJudge, ALostCycleOfASoundServerIsMissing) {
+  const std::string gap = findings(std::vector<double>(40, 1024 / 48000.0 - 0.003));
+  EXPECT_NEAR(static_cast<double>(gap.find('J')), 25, 1) << gap;
 }
 
 TEST(ArrivalJudge, NeverWaitsForMoreThanEightTenthsOfASecond) {

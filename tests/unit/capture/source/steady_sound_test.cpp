@@ -238,6 +238,25 @@ TEST(SteadySound, MissingSoundIsOneJump) {
   }
 }
 
+// A sound server on a busy machine loses one cycle, and some more before the first loss is certain.
+TEST(SteadySound, SoundBetweenTwoGapsKeepsItsPlace) {
+  for (const double apart : {0.1, 0.3, 0.45, 0.6, 0.9}) {
+    SteadySound sound(8000, 2);
+    Microphone microphone(8000, 0, 25);
+    Delivery delivery(8000, {480, Jitter::none});
+    Listener listener(8000, 25);
+    record(sound, microphone, delivery, listener, 30);
+    for (int i = 0; i < 3; ++i) {
+      microphone.miss(200);
+      record(sound, microphone, delivery, listener, microphone.now() + apart);
+    }
+    record(sound, microphone, delivery, listener, 60);
+    EXPECT_LT(listener.worst(), 0.005) << apart;
+    EXPECT_LT(listener.overlap(), 1e-6) << apart;
+    EXPECT_NEAR(listener.end(), 60, 0.2) << apart;
+  }
+}
+
 TEST(SteadySound, AFewMissingSamplesAreMadeUpForWithoutAJump) {
   SteadySound sound(8000, 2);
   Microphone microphone(8000, 0, 25);
