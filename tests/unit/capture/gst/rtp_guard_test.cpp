@@ -7,6 +7,7 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
+#include <random>
 #include <string>
 #include <vector>
 
@@ -142,6 +143,81 @@ TEST(RtpGuard, DropsAnEmptyPacketAmidAFragmentedPicture) {
   h265.push({0x26, 1, 0xAF, 1, 2});
   EXPECT_FALSE(h265.result().empty());
 }
+
+struct Stream {
+  const char* name;
+  const char* depayloader;
+  std::string caps;
+  const char* wanted;
+  Payload sound;  ///< one payload that gives a picture, or sound
+};
+
+void PrintTo(const Stream& stream, std::ostream* out) { *out << stream.name; }
+
+class DamagedStream : public testing::TestWithParam<Stream> {};
+
+/// A payload cut or prolonged, with some bytes changed; more often those of its headers.
+Payload damaged(Payload payload, std::minstd_rand& chance) {
+  const auto below = [&](std::size_t limit) {
+    return std::uniform_int_distribution<std::size_t>(0, limit - 1)(chance);
+  };
+  if (below(3) == 0) payload.resize(below(48));
+  for (auto changes = below(4); changes > 0 && !payload.empty(); --changes) {
+    const auto place = below(below(2) == 0 ? payload.size() : std::min<std::size_t>(payload.size(), 6));
+    payload[place] = static_cast<std::uint8_t>(below(2) == 0 ? below(2) * 16 : below(256));
+  }
+  return payload;
+}
+
+TEST_P(DamagedStream, DoesNoHarm) {
+  const Stream& stream = GetParam();
+  Depayloader depayloader(stream.depayloader, stream.caps.c_str(), stream.wanted);
+  std::minstd_rand chance(1);
+  for (int i = 0; i < 20000; ++i) depayloader.push(damaged(stream.sound, chance), chance() % 2 == 0);
+  for (int i = 0; i < 2; ++i) depayloader.push(stream.sound);
+  const auto result = depayloader.result();
+  ASSERT_FALSE(result.empty());
+  const Payload last(stream.sound.end() - 2, stream.sound.end());
+  EXPECT_NE(std::search(result.back().begin(), result.back().end(), last.begin(), last.end()),
+            result.back().end());
+}
+
+const std::string kOtherAac =
+    "application/"
+    "x-rtp,media=audio,clock-rate=48000,encoding-name=MPEG4-GENERIC,mode=generic,config=(string)1190,"
+    "payload=97,sizelength=(string)";
+
+INSTANTIATE_TEST_SUITE_P(
+    RtpGuard, DamagedStream,
+    testing::Values(
+        Stream{"AAC", "rtpmp4gdepay", kAac, "ANY", {0, 32, 0, 16, 0, 24, 1, 2, 3, 4, 5}},
+        Stream{"AAC with long headers",
+               "rtpmp4gdepay",
+               kOtherAac + "13,indexlength=(string)3,indexdeltalength=(string)3,ctsdeltalength=(string)8",
+               "ANY",
+               {0, 17, 0, 16, 0, 4, 5}},
+        Stream{"AAC with further data",
+               "rtpmp4gdepay",
+               kOtherAac +
+                   "13,indexlength=(string)3,indexdeltalength=(string)3,auxiliarydatasizelength=(string)8",
+               "ANY",
+               {0, 16, 0, 24, 8, 1, 4, 5}},
+        Stream{"AAC without headers", "rtpmp4gdepay", kOtherAac + "0", "ANY", {4, 5}},
+        Stream{"H.264",
+               "rtph264depay",
+               kH264,
+               "video/x-h264,stream-format=byte-stream",
+               {0x7C, 0xC5, 0x88, 1, 2, 3, 4, 5}},
+        Stream{"H.265",
+               "rtph265depay",
+               kH265,
+               "video/x-h265,stream-format=byte-stream",
+               {0x62, 1, 0xD3, 0xAF, 1, 2, 3, 4, 5}},
+        Stream{"JPEG",
+               "rtpjpegdepay",
+               "application/x-rtp,media=video,clock-rate=90000,encoding-name=JPEG,payload=26",
+               "ANY",
+               {0, 0, 0, 0, 1, 50, 40, 22, 1, 2, 3, 4, 5}}));
 
 TEST(RtpGuard, LetsOthersTakeWhatIsNotEmpty) {
   Depayloader g711("rtppcmudepay", kG711);
