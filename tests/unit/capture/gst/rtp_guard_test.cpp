@@ -149,7 +149,7 @@ struct Stream {
   const char* depayloader;
   std::string caps;
   const char* wanted;
-  Payload sound;  ///< one payload that gives a picture, or sound
+  Payload sound;  ///< the payload of a packet that gives a picture or sound once another of the kind follows
 };
 
 void PrintTo(const Stream& stream, std::ostream* out) { *out << stream.name; }
@@ -207,12 +207,12 @@ INSTANTIATE_TEST_SUITE_P(
                "rtph264depay",
                kH264,
                "video/x-h264,stream-format=byte-stream",
-               {0x7C, 0xC5, 0x88, 1, 2, 3, 4, 5}},
+               {0x7C, 0x85, 0x88, 1, 2, 3, 4, 5}},
         Stream{"H.265",
                "rtph265depay",
                kH265,
                "video/x-h265,stream-format=byte-stream",
-               {0x62, 1, 0xD3, 0xAF, 1, 2, 3, 4, 5}},
+               {0x62, 1, 0x93, 0xAF, 1, 2, 3, 4, 5}},
         Stream{"JPEG",
                "rtpjpegdepay",
                "application/x-rtp,media=video,clock-rate=90000,encoding-name=JPEG,payload=26",
