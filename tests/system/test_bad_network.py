@@ -261,6 +261,18 @@ def test_damaged_packets(recording):
     assert len(recording.log()) <= 2 + 3, recording.log()
 
 
+def test_packets_of_sound_with_nothing_in_them(recording):
+    """They say that a unit of no bytes follows, for which a depayloader has no memory."""
+    with recording.running(until=8):
+        recording.trouble({"begin": "00100000"}, {"begin": ""}, at=3, seconds=1)
+    recording.check_length()
+    assert len(recording.parts()) == 1
+    recording.check_step(5)
+    told = [line.text for line in recording.log(Level.WARNING)]
+    assert not told, told
+    assert recording.agent.log.lines("^The camera sends damaged packets; rtpmp4gdepay is not given them$")
+
+
 def test_a_stream_that_makes_no_sense_any_more(recording):
     with recording.running(until=10):
         recording.trouble({"damage": 0.2, "broken": True}, {"damage": 0}, at=3, seconds=0.5)

@@ -1,6 +1,7 @@
 // Makes and sets up elements.
 #include "capture/source/device_elements.h"
 
+#include "capture/gst/rtp_guard.h"
 #include "capture/gst/stream_colours.h"
 #include "capture/source/device_pipeline.h"
 #include "capture/source/pipewire_connection.h"
@@ -72,6 +73,7 @@ GstHandle<GstElement> uriDecoder(const DeviceID& device) {
   g_object_set(decoder, "uri", device.text.c_str(), nullptr);
   decodeInSoftware(decoder);
   correctColoursIn(decoder);
+  guardDepayloadersIn(decoder);
   return GstHandle<GstElement>(decoder);
 }
 
