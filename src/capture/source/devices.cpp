@@ -10,6 +10,7 @@
 
 #include "capture/source/device_identity.h"
 #include "capture/source/device_list.h"
+#include "capture/source/pipewire_provider.h"
 #include "capture/source/pulse_provider.h"
 
 namespace lmx {
@@ -105,8 +106,10 @@ std::vector<GstHandle<GstDevice>> devicesOf(std::initializer_list<const char*> c
   ensureGStreamer();
   // A plug-in's provider is one object for the whole process, and not made to be asked by two at once.
   static std::mutex mutex;
+  static auto* pipewire = new PipeWireProvider;  // never destroyed: threads that outlive main may list
   const std::lock_guard lock(mutex);
   askPulseOnlyIfThere();
+  pipewire->keepUp();
   const GstHandle<GstDeviceMonitor> monitor(gst_device_monitor_new());
   for (const char* name : classes) gst_device_monitor_add_filter(monitor.get(), name, nullptr);
   std::vector<GstHandle<GstDevice>> devices;

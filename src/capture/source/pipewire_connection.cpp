@@ -11,8 +11,6 @@
 #include <string_view>
 #include <utility>
 
-#include "support/unique_fd.h"
-
 namespace lmx {
 namespace {
 
@@ -20,6 +18,8 @@ std::string environment(const char* name) {
   const char* value = std::getenv(name);
   return value == nullptr ? "" : value;
 }
+
+void closeConnection(gpointer connection) noexcept { delete static_cast<UniqueFd*>(connection); }
 
 std::string socketPath() {
   std::string remote = environment("PIPEWIRE_REMOTE");
@@ -31,7 +31,8 @@ std::string socketPath() {
   return directory + "/" + remote;
 }
 
-/// @return nothing valid without PipeWire
+}  // namespace
+
 UniqueFd connectToPipeWire() {
   const std::string path = socketPath();
   sockaddr_un address{};
@@ -43,10 +44,6 @@ UniqueFd connectToPipeWire() {
   if (connect(fd.get(), reinterpret_cast<const sockaddr*>(&address), sizeof address) != 0) return {};
   return fd;
 }
-
-void closeConnection(gpointer connection) noexcept { delete static_cast<UniqueFd*>(connection); }
-
-}  // namespace
 
 void connectApart(GstElement* source) {
   const GstElementFactory* factory = gst_element_get_factory(source);

@@ -3,7 +3,6 @@
 
 #include <gtest/gtest.h>
 
-#include <cstdlib>
 #include <filesystem>
 #include <iterator>
 
@@ -17,7 +16,6 @@ auto openFiles() {
 
 // A microphone that is away is looked for every few seconds, for days.
 TEST(Devices, ListingThemKeepsNoFilesOpen) {
-  if (getenv("PULSE_SERVER") != nullptr) GTEST_SKIP() << "it is about a machine without PulseAudio";
   listHardware();  // what a plug-in opens once and for all
   const auto before = openFiles();
   for (int i = 0; i < 5; ++i) listHardware();
