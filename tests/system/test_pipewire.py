@@ -173,3 +173,15 @@ def test_pipewire_itself_ends(agent, hall, camera, microphone):
     assert agent.wait_exit(30) == 1
     assert agent.submitted("end") == ["LOST"]
     movie.decodes(agent.movie("LOST"))
+
+
+def test_pipewire_begins_again_with_other_devices(agent, hall):
+    """The list of devices is that of the server that runs."""
+    agent.start(env=hall.env)
+    for uuid, frequency in (("BEFORE", 440), ("AFTER", 720)):
+        with hall.microphone("lectern-" + uuid, frequency=frequency) as microphone:
+            agent.preferences(RecordingAudioInput=microphone.id)
+            agent.record(uuid, 2)
+        assert sounds.heard(agent.movie(uuid))[-1] == frequency
+        hall.kill()
+        hall.start()
