@@ -5,6 +5,7 @@
 
 #include <cstring>
 
+#include "capture/gst/jpeg_guard.h"
 #include "capture/gst/stream_colours.h"
 #include "capture/source/capture_clock.h"
 #include "capture/source/device_elements.h"
@@ -91,6 +92,7 @@ std::optional<CaptureError> DevicePipeline::build(const Wish& wish) {
     take(pipeline_.get(), wish.picture ? "vsink" : "asink", wish.picture);
   } else {
     pipeline_ = owned(gst_pipeline_new(nullptr));
+    guardJpegDecodersIn(pipeline_.get());
   }
   bus_.reset(gst_element_get_bus(pipeline_.get()));
   // One monotonic clock for all: a device's own clock would distort the times of the others.
