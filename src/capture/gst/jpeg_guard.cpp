@@ -22,18 +22,18 @@ int stated(const GstCaps* caps, const char* field) {
   return value;
 }
 
-bool sound(GstPad* pad, GstBuffer* buffer) {
+bool harmless(GstPad* pad, GstBuffer* buffer) {
   const CapsHandle caps(gst_pad_get_current_caps(pad));
   GstMapInfo bytes;
   if (gst_buffer_map(buffer, &bytes, GST_MAP_READ) == FALSE) return false;
-  const bool result =
-      soundJpegPicture({bytes.data, bytes.size}, stated(caps.get(), "width"), stated(caps.get(), "height"));
+  const bool result = harmlessJpegPicture({bytes.data, bytes.size}, stated(caps.get(), "width"),
+                                          stated(caps.get(), "height"));
   gst_buffer_unmap(buffer, &bytes);
   return result;
 }
 
 GstPadProbeReturn onPicture(GstPad* pad, GstPadProbeInfo* info, gpointer user) noexcept {
-  if (sound(pad, gst_pad_probe_info_get_buffer(info))) return GST_PAD_PROBE_OK;
+  if (harmless(pad, gst_pad_probe_info_get_buffer(info))) return GST_PAD_PROBE_OK;
   auto& guard = *static_cast<Guard*>(user);
   if (!guard.told)
     LMPLogMessage(nullptr, kLogInfo, "The camera sends damaged JPEG pictures; they are left out");

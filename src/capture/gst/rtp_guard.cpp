@@ -41,22 +41,22 @@ AccessUnitLayout layoutOf(const GstStructure* format) {
           .auxiliarySize = number(format, "auxiliarydatasizelength")};
 }
 
-bool soundPayload(GstPad* pad, const std::string& depayloader, Payload payload) {
-  if (depayloader == "rtph264depay") return soundH264(payload);
-  if (depayloader == "rtph265depay") return soundH265(payload);
-  if (depayloader == "rtpjpegdepay") return soundJpeg(payload);
+bool harmlessPayload(GstPad* pad, const std::string& depayloader, Payload payload) {
+  if (depayloader == "rtph264depay") return harmlessH264(payload);
+  if (depayloader == "rtph265depay") return harmlessH265(payload);
+  if (depayloader == "rtpjpegdepay") return harmlessJpeg(payload);
   if (depayloader != "rtpmp4gdepay") return !payload.empty();
   // Those that the depayloader has been given: a new description counts from the next packet on.
   const CapsHandle caps(gst_pad_get_current_caps(pad));
-  return caps && soundAccessUnits(payload, layoutOf(gst_caps_get_structure(caps.get(), 0)));
+  return caps && harmlessAccessUnits(payload, layoutOf(gst_caps_get_structure(caps.get(), 0)));
 }
 
-bool sound(GstPad* pad, Guard& guard, GstBuffer* buffer) {
+bool harmless(GstPad* pad, Guard& guard, GstBuffer* buffer) {
   GstRTPBuffer packet = GST_RTP_BUFFER_INIT;
   if (gst_rtp_buffer_map(buffer, GST_MAP_READ, &packet) == FALSE) return false;
   const auto* begin = static_cast<const std::uint8_t*>(gst_rtp_buffer_get_payload(&packet));
   const Payload payload(begin, begin == nullptr ? 0 : gst_rtp_buffer_get_payload_len(&packet));
-  const bool result = soundPayload(pad, guard.depayloader, payload);
+  const bool result = harmlessPayload(pad, guard.depayloader, payload);
   gst_rtp_buffer_unmap(&packet);
   if (!result && !guard.told) {
     LMPLogMessage(nullptr, kLogInfo, "The camera sends damaged packets; %s is not given them",
@@ -73,7 +73,7 @@ struct Packets {
 
 gboolean keepIfSound(GstBuffer** buffer, guint /*index*/, gpointer packets) noexcept {
   const auto& all = *static_cast<Packets*>(packets);
-  if (!sound(all.pad, all.guard, *buffer)) {
+  if (!harmless(all.pad, all.guard, *buffer)) {
     gst_buffer_unref(*buffer);
     *buffer = nullptr;
   }
@@ -83,7 +83,7 @@ gboolean keepIfSound(GstBuffer** buffer, guint /*index*/, gpointer packets) noex
 GstPadProbeReturn onPackets(GstPad* pad, GstPadProbeInfo* info, gpointer user) noexcept {
   auto& guard = *static_cast<Guard*>(user);
   if ((info->type & GST_PAD_PROBE_TYPE_BUFFER) != 0)
-    return sound(pad, guard, gst_pad_probe_info_get_buffer(info)) ? GST_PAD_PROBE_OK : GST_PAD_PROBE_DROP;
+    return harmless(pad, guard, gst_pad_probe_info_get_buffer(info)) ? GST_PAD_PROBE_OK : GST_PAD_PROBE_DROP;
   GstBufferList* list = gst_buffer_list_make_writable(gst_pad_probe_info_get_buffer_list(info));
   info->data = list;
   Packets packets{pad, guard};

@@ -46,15 +46,40 @@ unsigned takeMarker(Bytes& bytes) {
   return marker;
 }
 
+struct Sampling {
+  int horizontal = 0;
+  int vertical = 0;
+};
+
+/// @param component  three bytes
+Sampling samplingOf(Bytes component) { return {component[1] >> 4, component[1] & 0xF}; }
+
+/// Over a picture that is sampled otherwise the decoder gives up the whole stream.
+bool decodable(Bytes components) {
+  constexpr int kMostHorizontal = 4;
+  constexpr int kMostVertical = 2;
+  const Sampling most = samplingOf(components);
+  if (most.horizontal > kMostHorizontal || most.vertical > kMostVertical) return false;
+  for (; !components.empty(); components = components.subspan(3)) {
+    const Sampling one = samplingOf(components);
+    if (one.horizontal < 1 || one.horizontal > most.horizontal) return false;
+    if (one.vertical < 1 || one.vertical > most.vertical) return false;
+  }
+  return true;
+}
+
 /// @param segment  from its length on
 std::optional<Frame> frameFrom(Bytes segment) {
-  constexpr std::size_t kWithOneComponent = 11;
-  if (segment.size() < kWithOneComponent) return std::nullopt;
-  const int verticalSamples = segment[9] & 0xF;
-  if (verticalSamples == 0) return std::nullopt;
+  constexpr std::size_t kBeforeComponents = 8;
+  if (segment.size() < kBeforeComponents) return std::nullopt;
+  const std::size_t components = segment[7];  // grey, or colour in three
+  if (components != 1 && components != 3) return std::nullopt;
+  if (segment.size() < kBeforeComponents + 3 * components) return std::nullopt;
+  const Bytes sampled = segment.subspan(kBeforeComponents, 3 * components);
+  if (!decodable(sampled)) return std::nullopt;
   return Frame{.width = static_cast<int>(twoBytes(segment.subspan(5))),
                .height = static_cast<int>(twoBytes(segment.subspan(3))),
-               .blockRows = 8 * verticalSamples};
+               .blockRows = 8 * samplingOf(sampled).vertical};
 }
 
 /// Takes a picture's headers from `bytes` up to and with the one that describes its frame.
@@ -99,7 +124,7 @@ bool repeats(const Frame& frame, Bytes bytes) {
 
 }  // namespace
 
-bool soundJpegPicture(Bytes picture, int width, int height) {
+bool harmlessJpegPicture(Bytes picture, int width, int height) {
   const auto frame = takeFrame(picture);
   if (!frame || std::int64_t{frame->width} * frame->height > kMostPixels) return false;
   if (!takenForField(*frame, width, height)) return true;

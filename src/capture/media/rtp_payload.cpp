@@ -60,7 +60,7 @@ std::optional<std::uint32_t> readHeader(BitReader& bits, const AccessUnitLayout&
 
 }  // namespace
 
-bool soundAccessUnits(Payload payload, const AccessUnitLayout& layout) {
+bool harmlessAccessUnits(Payload payload, const AccessUnitLayout& layout) {
   if (payload.empty() || !sensible(layout)) return false;
   if (layout.size == 0) return true;
   if (payload.size() < 2) return false;
@@ -84,7 +84,7 @@ bool soundAccessUnits(Payload payload, const AccessUnitLayout& layout) {
   return true;
 }
 
-bool soundH264(Payload payload) {
+bool harmlessH264(Payload payload) {
   if (payload.empty()) return false;
   const int type = payload[0] & 0x1F;
   if (type == 26 || type == 27) return false;  // several times in one packet: it would give up for good
@@ -92,14 +92,14 @@ bool soundH264(Payload payload) {
   return !fragment || payload.size() >= 2;
 }
 
-bool soundH265(Payload payload) {
+bool harmlessH265(Payload payload) {
   if (payload.size() < 2) return false;
   const int type = payload[0] >> 1 & 0x3F;
   if (type == 50) return false;  // further headers: it would give up for good
   return type != 49 || payload.size() >= 3;
 }
 
-bool soundJpeg(Payload payload) {
+bool harmlessJpeg(Payload payload) {
   constexpr std::size_t kMainHeader = 8;
   constexpr std::size_t kRestartHeader = 4;
   constexpr std::size_t kTableHeader = 4;

@@ -21,9 +21,9 @@ struct AccessUnitLayout {
 /// GStreamer's depayloader would read or write beyond its memory, end the process or give up the stream, so
 /// that the packet must not reach it. Whether the picture or the sound within is any good is the decoder's
 /// business. Pure.
-bool soundAccessUnits(std::span<const std::uint8_t> payload, const AccessUnitLayout& layout);
-bool soundH264(std::span<const std::uint8_t> payload);
-bool soundH265(std::span<const std::uint8_t> payload);
-bool soundJpeg(std::span<const std::uint8_t> payload);
+bool harmlessAccessUnits(std::span<const std::uint8_t> payload, const AccessUnitLayout& layout);
+bool harmlessH264(std::span<const std::uint8_t> payload);
+bool harmlessH265(std::span<const std::uint8_t> payload);
+bool harmlessJpeg(std::span<const std::uint8_t> payload);
 
 }  // namespace lmx

@@ -39,10 +39,10 @@ Bytes jpeg(int height) {
 class Decoder {
  public:
   Decoder() {
-    ensureGStreamer();
     guardJpegDecodersIn(pipeline_.get());
     source_ = add("appsrc");
     GstElement* decoder = add("jpegdec");
+    g_object_set(decoder, "max-errors", -1, nullptr);  // pictures that can't be read are passed over
     sink_ = add("appsink");
     const CapsHandle format(gst_caps_new_simple("image/jpeg", "width", G_TYPE_INT, kWidth, "height",
                                                 G_TYPE_INT, kHeight, "framerate", GST_TYPE_FRACTION, 25, 1,
@@ -81,7 +81,12 @@ class Decoder {
     return element;
   }
 
-  GstHandle<GstElement> pipeline_{GST_ELEMENT(gst_object_ref_sink(gst_pipeline_new(nullptr)))};
+  static GstHandle<GstElement> emptyPipeline() {
+    ensureGStreamer();
+    return GstHandle<GstElement>(GST_ELEMENT(gst_object_ref_sink(gst_pipeline_new(nullptr))));
+  }
+
+  GstHandle<GstElement> pipeline_ = emptyPipeline();
   GstElement* source_ = nullptr;
   GstElement* sink_ = nullptr;
   GstClockTime number_ = 0;

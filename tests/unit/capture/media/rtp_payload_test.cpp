@@ -16,7 +16,7 @@ constexpr AccessUnitLayout kUsual{.size = 13, .index = 3, .indexDelta = 3};
 struct Units {
   const char* name;
   Payload payload;
-  bool sound;
+  bool harmless;
   AccessUnitLayout layout = kUsual;
 };
 
@@ -25,7 +25,7 @@ void PrintTo(const Units& units, std::ostream* out) { *out << units.name; }
 class AccessUnits : public testing::TestWithParam<Units> {};
 
 TEST_P(AccessUnits, AreTakenOrNot) {
-  EXPECT_EQ(soundAccessUnits(GetParam().payload, GetParam().layout), GetParam().sound);
+  EXPECT_EQ(harmlessAccessUnits(GetParam().payload, GetParam().layout), GetParam().harmless);
 }
 
 // A header of 13 + 3 bits says eight times the size.
@@ -95,14 +95,14 @@ struct Other {
   const char* name;
   bool (*check)(std::span<const std::uint8_t>);
   Payload payload;
-  bool sound;
+  bool harmless;
 };
 
 void PrintTo(const Other& other, std::ostream* out) { *out << other.name; }
 
 class Pictures : public testing::TestWithParam<Other> {};
 
-TEST_P(Pictures, AreTakenOrNot) { EXPECT_EQ(GetParam().check(GetParam().payload), GetParam().sound); }
+TEST_P(Pictures, AreTakenOrNot) { EXPECT_EQ(GetParam().check(GetParam().payload), GetParam().harmless); }
 
 /// The beginning of a JPEG picture with so many bytes behind its headers.
 Payload jpeg(std::uint8_t type, std::uint8_t quality, const Payload& more, std::size_t bytes) {
@@ -115,35 +115,36 @@ Payload jpeg(std::uint8_t type, std::uint8_t quality, const Payload& more, std::
 INSTANTIATE_TEST_SUITE_P(
     RtpPayload, Pictures,
     testing::Values(
-        Other{"H.264, empty", soundH264, {}, false}, Other{"H.264, one byte", soundH264, {0x65}, true},
-        Other{"H.264, fragment without its header", soundH264, {0x7C}, false},
-        Other{"H.264, fragment with a number, without its header", soundH264, {0x7D}, false},
-        Other{"H.264, fragment", soundH264, {0x7C, 0x85}, true},
-        Other{"H.264, several", soundH264, {0x78, 0, 1, 0x65}, true},
-        Other{"H.264, several times", soundH264, {0x7A, 0, 0, 0, 1, 0x65}, false},
-        Other{"H.264, several distant times", soundH264, {0x7B, 0, 0, 0, 1, 0x65}, false},
-        Other{"H.265, empty", soundH265, {}, false}, Other{"H.265, half a header", soundH265, {0x26}, false},
-        Other{"H.265, header", soundH265, {0x26, 1}, true},
-        Other{"H.265, fragment without its header", soundH265, {0x62, 1}, false},
-        Other{"H.265, fragment", soundH265, {0x62, 1, 0x93}, true},
-        Other{"H.265, further headers", soundH265, {0x64, 1, 0, 0, 0}, false},
-        Other{"JPEG, half a header", soundJpeg, {0, 0, 0, 0, 1, 50, 40}, false},
-        Other{"JPEG, a header and nothing else", soundJpeg, jpeg(1, 50, {}, 0), false},
-        Other{"JPEG", soundJpeg, jpeg(1, 50, {}, 1), true},
-        Other{"JPEG, restart header cut", soundJpeg, jpeg(65, 50, {}, 4), false},
-        Other{"JPEG, restart header", soundJpeg, jpeg(65, 50, {}, 5), true},
-        Other{"JPEG, table header cut", soundJpeg, jpeg(1, 200, {0, 0, 0}, 0), false},
-        Other{"JPEG, tables as before", soundJpeg, jpeg(1, 200, {0, 0, 0, 0}, 1), true},
-        Other{"JPEG, tables", soundJpeg, jpeg(1, 200, {0, 0, 0, 128}, 129), true},
-        Other{"JPEG, tables and nothing else", soundJpeg, jpeg(1, 200, {0, 0, 0, 128}, 128), false},
-        Other{"JPEG, tables said to be short", soundJpeg, jpeg(1, 200, {0, 0, 0, 1}, 127), false},
-        Other{"JPEG, tables said to be short, in a long packet", soundJpeg, jpeg(1, 200, {0, 0, 0, 1}, 128),
-              true},
-        Other{"JPEG, wide tables", soundJpeg, jpeg(1, 200, {0, 3, 1, 0}, 257), true},
-        Other{"JPEG, wide tables in a short packet", soundJpeg, jpeg(1, 200, {0, 3, 0, 128}, 255), false},
-        Other{"JPEG, tables behind a restart header", soundJpeg,
+        Other{"H.264, empty", harmlessH264, {}, false}, Other{"H.264, one byte", harmlessH264, {0x65}, true},
+        Other{"H.264, fragment without its header", harmlessH264, {0x7C}, false},
+        Other{"H.264, fragment with a number, without its header", harmlessH264, {0x7D}, false},
+        Other{"H.264, fragment", harmlessH264, {0x7C, 0x85}, true},
+        Other{"H.264, several", harmlessH264, {0x78, 0, 1, 0x65}, true},
+        Other{"H.264, several times", harmlessH264, {0x7A, 0, 0, 0, 1, 0x65}, false},
+        Other{"H.264, several distant times", harmlessH264, {0x7B, 0, 0, 0, 1, 0x65}, false},
+        Other{"H.265, empty", harmlessH265, {}, false},
+        Other{"H.265, half a header", harmlessH265, {0x26}, false},
+        Other{"H.265, header", harmlessH265, {0x26, 1}, true},
+        Other{"H.265, fragment without its header", harmlessH265, {0x62, 1}, false},
+        Other{"H.265, fragment", harmlessH265, {0x62, 1, 0x93}, true},
+        Other{"H.265, further headers", harmlessH265, {0x64, 1, 0, 0, 0}, false},
+        Other{"JPEG, half a header", harmlessJpeg, {0, 0, 0, 0, 1, 50, 40}, false},
+        Other{"JPEG, a header and nothing else", harmlessJpeg, jpeg(1, 50, {}, 0), false},
+        Other{"JPEG", harmlessJpeg, jpeg(1, 50, {}, 1), true},
+        Other{"JPEG, restart header cut", harmlessJpeg, jpeg(65, 50, {}, 4), false},
+        Other{"JPEG, restart header", harmlessJpeg, jpeg(65, 50, {}, 5), true},
+        Other{"JPEG, table header cut", harmlessJpeg, jpeg(1, 200, {0, 0, 0}, 0), false},
+        Other{"JPEG, tables as before", harmlessJpeg, jpeg(1, 200, {0, 0, 0, 0}, 1), true},
+        Other{"JPEG, tables", harmlessJpeg, jpeg(1, 200, {0, 0, 0, 128}, 129), true},
+        Other{"JPEG, tables and nothing else", harmlessJpeg, jpeg(1, 200, {0, 0, 0, 128}, 128), false},
+        Other{"JPEG, tables said to be short", harmlessJpeg, jpeg(1, 200, {0, 0, 0, 1}, 127), false},
+        Other{"JPEG, tables said to be short, in a long packet", harmlessJpeg,
+              jpeg(1, 200, {0, 0, 0, 1}, 128), true},
+        Other{"JPEG, wide tables", harmlessJpeg, jpeg(1, 200, {0, 3, 1, 0}, 257), true},
+        Other{"JPEG, wide tables in a short packet", harmlessJpeg, jpeg(1, 200, {0, 3, 0, 128}, 255), false},
+        Other{"JPEG, tables behind a restart header", harmlessJpeg,
               jpeg(65, 200, {0, 0, 0, 0, 0, 0, 0, 128}, 129), true},
-        Other{"JPEG, going on, without tables", soundJpeg, {0, 0, 4, 0, 1, 200, 40, 22, 1}, true}));
+        Other{"JPEG, going on, without tables", harmlessJpeg, {0, 0, 4, 0, 1, 200, 40, 22, 1}, true}));
 
 }  // namespace
 }  // namespace lmx
