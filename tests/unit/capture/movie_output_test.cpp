@@ -4,7 +4,10 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
+#include <cmath>
+#include <complex>
 #include <filesystem>
+#include <numbers>
 #include <numeric>
 #include <random>
 
@@ -199,6 +202,43 @@ TEST(MovieOutput, ACopyMayBeginAndEndInsideALongFrame) {
     EXPECT_EQ(shown.numbers, c.numbers) << c.ranges.front().first;
     EXPECT_EQ(shown.times, c.times) << c.ranges.front().first;
     EXPECT_EQ(shown.end, c.end) << c.ranges.front().first;
+  }
+}
+
+/// The loudest that is left of a sound when the sine in it is taken away, piece by piece of 10 ms.
+double besidesSine(const std::vector<float>& sound, double hertz) {
+  constexpr std::size_t kPiece = 480;
+  double most = 0;
+  for (std::size_t begin = 24000; begin + kPiece <= sound.size() - 24000; begin += kPiece) {
+    std::complex<double> sine = 0;  // its strength and phase: the piece holds whole periods
+    for (std::size_t i = begin; i < begin + kPiece; ++i)
+      sine += 2.0 / kPiece * sound[i] * std::polar(1.0, -2 * std::numbers::pi * hertz * double(i) / 48000);
+    double power = 0;
+    for (std::size_t i = begin; i < begin + kPiece; ++i) {
+      const auto turned = sine * std::polar(1.0, 2 * std::numbers::pi * hertz * double(i) / 48000);
+      power += std::pow(sound[i] - turned.real(), 2);
+    }
+    most = std::max(most, std::sqrt(power / kPiece));
+  }
+  return most;
+}
+
+TEST(MovieOutput, ASteadyToneStaysSteady) {
+  constexpr std::size_t kSamples = 48000 * 5;
+  MovieEncoding encoding;
+  encoding.audio = AudioEncoding{};
+  for (const double right : {1.0, 0.0}) {
+    Output output(encoding);
+    std::vector<float> samples;
+    for (std::size_t i = 0; i < kSamples; ++i) {
+      const double sine = 0.3 * std::sin(2 * std::numbers::pi * double(i) * 1000 / 48000);
+      samples.insert(samples.end(), {static_cast<float>(sine), static_cast<float>(sine * right)});
+    }
+    (*output).pushSound(samples.data(), kSamples);
+    output.close(0, kSamples);
+    const auto movie = decodeMovie(output.path(), Streams::sound);
+    ASSERT_GE(movie.sound.size(), kSamples - 1024);
+    EXPECT_LT(besidesSine(movie.sound, 1000), 0.3 * 0.005) << "the right side is " << right << " of the left";
   }
 }
 
