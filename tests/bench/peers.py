@@ -84,7 +84,7 @@ def launch_words(picture, sources, target, first=""):
             f"bitrate={picture.kilobits} vbv-buf-capacity=2000 key-int-max=60 byte-stream=false aud=false option-string=scenecut=0 ! "
             "video/x-h264,stream-format=avc,alignment=au ! "
             "qtmux name=mux fragment-duration=500 fragment-mode=first-moov-then-finalise ! "
-            f"filesink location={target} buffer-mode=unbuffered {audio} ! avenc_aac bitrate=128000 ! mux.")
+            f"filesink location={target} buffer-mode=unbuffered {audio} ! avenc_aac bitrate=192000 ! mux.")
     return line.split()
 
 

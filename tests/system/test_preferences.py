@@ -228,6 +228,7 @@ def test_no_free_descriptor_leaves_the_settings_as_they_are(running):
         resource.prlimit(pid, resource.RLIMIT_NOFILE, limits)
         wait_until(lambda: ",CameraName=Hall 4," in exchange(peer, "STATUS include_profile=true").text,
                    what="the new name")
+    running.log.wait("can be read again", level=Level.NOTICE)
     assert len(running.log.lines("can be read again", level=Level.NOTICE)) == 1
     assert not running.log.lines("Disabling")
 

@@ -37,14 +37,12 @@ std::string videoDescription(const VideoEncoding& video) {
 }
 
 /// Left and right are coded apart: of a microphone on one of them this encoder's sum and difference give a
-/// half on either side, and all of it on the right one whenever something happens on the other. Of its ways
-/// to choose the quantizers only this one keeps a steady tone steady then.
+/// half on either side, and all of it on the right one whenever something happens on the other.
 std::string audioDescription(const AudioEncoding& audio) {
   return string_with_format(
       "appsrc name=asrc format=time max-buffers=0 max-bytes=0 max-time=0 stream-type=stream "
       "caps=audio/x-raw,format=F32LE,layout=interleaved,rate=%d,channels=%d%s ! "
-      "avenc_aac bitrate=%d aac-ms=false aac-coder=fast ! appsink name=aout sync=false async=false "
-      "max-buffers=0 "
+      "avenc_aac bitrate=%d aac-ms=false ! appsink name=aout sync=false async=false max-buffers=0 "
       "enable-last-sample=false ",
       audio.sampleRate, audio.channels, audio.channels == 2 ? ",channel-mask=(bitmask)0x3" : "",
       audio.bitRate);

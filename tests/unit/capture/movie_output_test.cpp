@@ -205,40 +205,42 @@ TEST(MovieOutput, ACopyMayBeginAndEndInsideALongFrame) {
   }
 }
 
-/// The loudest that is left of a sound when the sine in it is taken away, piece by piece of 10 ms.
+/// What is left of a sound when the sine in it is taken away, as a part of that sine; the ends don't count.
 double besidesSine(const std::vector<float>& sound, double hertz) {
-  constexpr std::size_t kPiece = 480;
-  double most = 0;
+  constexpr std::size_t kPiece = 4800;  // whole periods of any multiple of 10 Hz
+  double left = 0;
+  double all = 0;
   for (std::size_t begin = 24000; begin + kPiece <= sound.size() - 24000; begin += kPiece) {
-    std::complex<double> sine = 0;  // its strength and phase: the piece holds whole periods
+    const auto turned = [&](std::size_t i) {
+      return std::polar(1.0, 2 * std::numbers::pi * hertz * static_cast<double>(i) / 48000);
+    };
+    std::complex<double> sine = 0;  // strength and phase in this piece
     for (std::size_t i = begin; i < begin + kPiece; ++i)
-      sine += 2.0 / kPiece * sound[i] * std::polar(1.0, -2 * std::numbers::pi * hertz * double(i) / 48000);
-    double power = 0;
-    for (std::size_t i = begin; i < begin + kPiece; ++i) {
-      const auto turned = sine * std::polar(1.0, 2 * std::numbers::pi * hertz * double(i) / 48000);
-      power += std::pow(sound[i] - turned.real(), 2);
-    }
-    most = std::max(most, std::sqrt(power / kPiece));
+      sine += 2.0 / kPiece * sound[i] * std::conj(turned(i));
+    for (std::size_t i = begin; i < begin + kPiece; ++i)
+      left += std::pow(sound[i] - (sine * turned(i)).real(), 2);
+    all += std::norm(sine) / 2 * kPiece;
   }
-  return most;
+  return std::sqrt(left / all);
 }
 
 TEST(MovieOutput, ASteadyToneStaysSteady) {
-  constexpr std::size_t kSamples = 48000 * 5;
+  constexpr std::size_t kSamples = std::size_t{48000} * 5;
+  constexpr double kHertz = 1010;
   MovieEncoding encoding;
   encoding.audio = AudioEncoding{};
   for (const double right : {1.0, 0.0}) {
     Output output(encoding);
     std::vector<float> samples;
     for (std::size_t i = 0; i < kSamples; ++i) {
-      const double sine = 0.3 * std::sin(2 * std::numbers::pi * double(i) * 1000 / 48000);
+      const double sine = 0.7 * std::sin(2 * std::numbers::pi * static_cast<double>(i) * kHertz / 48000);
       samples.insert(samples.end(), {static_cast<float>(sine), static_cast<float>(sine * right)});
     }
     (*output).pushSound(samples.data(), kSamples);
     output.close(0, kSamples);
     const auto movie = decodeMovie(output.path(), Streams::sound);
     ASSERT_GE(movie.sound.size(), kSamples - 1024);
-    EXPECT_LT(besidesSine(movie.sound, 1000), 0.3 * 0.005) << "the right side is " << right << " of the left";
+    EXPECT_LT(besidesSine(movie.sound, kHertz), 0.04) << "the right side is " << right << " of the left";
   }
 }
 
