@@ -136,8 +136,10 @@ def test_sounds_are_told_apart(tmp_path):
 def test_steps_and_bursts_are_found():
     time = numpy.arange(48000 * 3) / 48000
     sine = 0.3 * numpy.sin(2 * numpy.pi * 1000 * time)
-    assert sounds.roughness(sine, 1000, 48000) < 1e-9
-    assert 0.04 < sounds.roughness(numpy.delete(sine, 70000), 1000, 48000) < 0.1, "one sample is missing"
+    assert sounds.breaks(sine, 1000, 48000) == pytest.approx((0, 1), abs=1e-9)
+    leap, _ = sounds.breaks(numpy.delete(sine, 70000), 1000, 48000)
+    assert leap == pytest.approx(1 / 48000, rel=0.1), "one sample is missing"
+    assert sounds.breaks(numpy.where(abs(time - 1.5) < 0.01, 0, sine), 1000, 48000)[1] < 0.01, "a hole"
     since = time % 1.001
     world = sine * numpy.where(since < 0.02, numpy.sin(numpy.pi * since / 0.02) ** 2, 0)
     assert sounds.bursts(world, 48000) == pytest.approx([0, 1.001, 2.002], abs=1e-4)

@@ -86,11 +86,14 @@ def bursts(sound, rate):
     return [at / rate for at in found]
 
 
-def roughness(sound, hertz, rate):
-    """The greatest step in a sine, as a part of its loudness: how far each 10 ms are from the middle of the 10 ms before
-    and behind, in loudness and phase. A sample too many in a sine of 1000 Hz is 0.06 at a rate of 48000."""
+def breaks(sound, hertz, rate):
+    """What is broken in a sine. @return the most by which it leaps in time, seconds (a sample lost or put in is one
+    sample's time), and the least strength of 10 ms as a part of the usual one. Over a packet that the movie's coder has
+    spoilt the medians pass."""
     size = rate // 100
     turned = sound * numpy.exp(-2j * numpy.pi * hertz * numpy.arange(len(sound)) / rate)
     pieces = turned[: len(turned) // size * size].reshape(-1, size).mean(axis=1)
-    steps = numpy.abs(pieces[1:-1] - (pieces[:-2] + pieces[2:]) / 2)
-    return float(steps.max() / numpy.abs(pieces).mean())
+    phases = numpy.lib.stride_tricks.sliding_window_view(numpy.unwrap(numpy.angle(pieces)), 9)
+    middle = numpy.median(phases, axis=1)
+    leaps = numpy.abs(middle[20:] - 2 * middle[10:-10] + middle[:-20]) / (2 * numpy.pi * hertz)
+    return float(leaps.max()), float(numpy.abs(pieces).min() / numpy.median(numpy.abs(pieces)))
