@@ -83,10 +83,9 @@ class Depayloader {
     gst_rtp_buffer_set_seq(&packet, number_);
     gst_rtp_buffer_set_timestamp(&packet, 1024U * number_);
     gst_rtp_buffer_set_marker(&packet, static_cast<gboolean>(last));
-    if (!payload.empty())
-      std::copy(payload.begin(), payload.end(),
-                static_cast<std::uint8_t*>(gst_rtp_buffer_get_payload(&packet)));
+    const guint header = gst_rtp_buffer_get_header_len(&packet);
     gst_rtp_buffer_unmap(&packet);
+    gst_buffer_fill(buffer, header, payload.data(), payload.size());
     GST_BUFFER_PTS(buffer) = number_++ * 20 * GST_MSECOND;
     return buffer;
   }
