@@ -2,6 +2,7 @@
 #include "capture/gst_capture_framework.h"
 
 #include <dirent.h>
+#include <malloc.h>
 #include <unistd.h>
 
 #include <iterator>
@@ -109,6 +110,7 @@ std::shared_ptr<CaptureSession> GstCaptureFramework::openAhead(const std::string
 void GstCaptureFramework::warmUp() {
   loadPlugins();
   VideoEncoderChoice::instance().tryOut(knownVideoEncoders());
+  malloc_trim(0);  // what the encoders that were tried have freed
 }
 
 void GstCaptureFramework::waitUntilClosed(std::chrono::milliseconds limit) {
