@@ -1,8 +1,6 @@
 // Packets that depayloaders don't survive, given to real ones.
 #include "capture/gst/rtp_guard.h"
 
-#include <gst/app/gstappsink.h>
-#include <gst/app/gstappsrc.h>
 #include <gst/rtp/gstrtpbuffer.h>
 #include <gtest/gtest.h>
 
@@ -12,6 +10,7 @@
 #include <vector>
 
 #include "capture/gst/gst_handles.h"
+#include "tests/unit/capture/gst/guarded_element.h"
 
 namespace lmx {
 namespace {
@@ -29,53 +28,24 @@ constexpr const char* kG711 = "application/x-rtp,media=audio,clock-rate=8000,enc
 /// A depayloader behind its guard.
 class Depayloader {
  public:
-  Depayloader(const std::string& name, const char* caps, const char* wanted = "ANY") {
-    ensureGStreamer();
-    pipeline_.reset(GST_ELEMENT(gst_object_ref_sink(gst_pipeline_new(nullptr))));
-    guardDepayloadersIn(pipeline_.get());
-    source_ = add("appsrc");
-    GstElement* depayloader = add(name.c_str());
-    sink_ = add("appsink");
-    const CapsHandle format(gst_caps_from_string(caps));
-    g_object_set(source_, "caps", format.get(), "format", GST_FORMAT_TIME, nullptr);
-    const CapsHandle result(gst_caps_from_string(wanted));
-    g_object_set(sink_, "sync", FALSE, "caps", result.get(), nullptr);
-    EXPECT_TRUE(gst_element_link_many(source_, depayloader, sink_, nullptr));
-    gst_element_set_state(pipeline_.get(), GST_STATE_PLAYING);
-  }
-  ~Depayloader() { gst_element_set_state(pipeline_.get(), GST_STATE_NULL); }
-  Depayloader(const Depayloader&) = delete;
-  Depayloader& operator=(const Depayloader&) = delete;
+  Depayloader(const std::string& name, const std::string& caps, const char* wanted = "ANY")
+      : element_(guardDepayloadersIn, name, caps, wanted) {}
 
-  void push(const Payload& payload, bool last = true) {
-    gst_app_src_push_buffer(GST_APP_SRC(source_), packet(payload, last));
-  }
+  void push(const Payload& payload, bool last = true) { element_.push(packet(payload, last)); }
   /// All at once, as a list.
   void pushList(const std::vector<Payload>& payloads) {
     GstBufferList* list = gst_buffer_list_new();
     for (const Payload& payload : payloads) gst_buffer_list_add(list, packet(payload, true));
-    gst_app_src_push_buffer_list(GST_APP_SRC(source_), list);
+    element_.pushList(list);
   }
   /// Everything that has come out, once all packets are through.
   std::vector<Payload> result() {
-    gst_app_src_end_of_stream(GST_APP_SRC(source_));
     std::vector<Payload> all;
-    while (const SampleHandle sample{gst_app_sink_pull_sample(GST_APP_SINK(sink_))}) {
-      GstBuffer* buffer = gst_sample_get_buffer(sample.get());
-      Payload bytes(gst_buffer_get_size(buffer));
-      gst_buffer_extract(buffer, 0, bytes.data(), bytes.size());
-      all.push_back(bytes);
-    }
+    for (const SampleHandle& sample : element_.result()) all.push_back(testing::bytesOf(sample));
     return all;
   }
 
  private:
-  GstElement* add(const char* name) {
-    GstElement* element = gst_element_factory_make(name, nullptr);
-    gst_bin_add(GST_BIN(pipeline_.get()), element);
-    return element;
-  }
-
   GstBuffer* packet(const Payload& payload, bool last) {
     GstBuffer* buffer = gst_rtp_buffer_new_allocate(static_cast<guint>(payload.size()), 0, 0);
     GstRTPBuffer packet = GST_RTP_BUFFER_INIT;
@@ -90,9 +60,7 @@ class Depayloader {
     return buffer;
   }
 
-  GstHandle<GstElement> pipeline_;
-  GstElement* source_ = nullptr;
-  GstElement* sink_ = nullptr;
+  testing::GuardedElement element_;
   std::uint16_t number_ = 1;
 };
 
@@ -153,7 +121,7 @@ struct Stream {
 
 void PrintTo(const Stream& stream, std::ostream* out) { *out << stream.name; }
 
-class DamagedStream : public testing::TestWithParam<Stream> {};
+class DamagedStream : public ::testing::TestWithParam<Stream> {};
 
 /// A payload cut or prolonged, with some bytes changed; more often those of its headers.
 Payload damaged(Payload payload, std::minstd_rand& chance) {
@@ -170,7 +138,7 @@ Payload damaged(Payload payload, std::minstd_rand& chance) {
 
 TEST_P(DamagedStream, DoesNoHarm) {
   const Stream& stream = GetParam();
-  Depayloader depayloader(stream.depayloader, stream.caps.c_str(), stream.wanted);
+  Depayloader depayloader(stream.depayloader, stream.caps, stream.wanted);
   std::minstd_rand chance(1);
   for (int i = 0; i < 20000; ++i) depayloader.push(damaged(stream.sound, chance), chance() % 2 == 0);
   for (int i = 0; i < 2; ++i) depayloader.push(stream.sound);
@@ -188,7 +156,7 @@ const std::string kOtherAac =
 
 INSTANTIATE_TEST_SUITE_P(
     RtpGuard, DamagedStream,
-    testing::Values(
+    ::testing::Values(
         Stream{"AAC", "rtpmp4gdepay", kAac, "ANY", {0, 32, 0, 16, 0, 24, 1, 2, 3, 4, 5}},
         Stream{"AAC with long headers",
                "rtpmp4gdepay",
