@@ -117,9 +117,7 @@ std::optional<CaptureError> DevicePipeline::addUri() {
 }
 
 std::optional<CaptureError> DevicePipeline::addHardware(const Wish& wish) {
-  const auto source = device_.alsaName()
-                          ? alsaSource(*device_.alsaName())
-                          : owned(gst_device_create_element(wish.hardware->device.get(), nullptr));
+  const auto source = device_.alsaName() ? alsaSource(*device_.alsaName()) : sourceFor(*wish.hardware);
   if (!source) return error(kDeviceFailed, "can't be set up");
   tuneSource(source.get(), false);
   gst_bin_add(GST_BIN(pipeline_.get()), source.get());

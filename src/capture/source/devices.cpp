@@ -1,17 +1,19 @@
-// Lists cameras and microphones through GStreamer's device monitor.
+// Lists cameras and microphones: PipeWire's by its own library, the others through GStreamer's device
+// monitor.
 #include "capture/source/devices.h"
 
 #include <algorithm>
 #include <filesystem>
 #include <fstream>
 #include <mutex>
+#include <set>
 #include <tuple>
 #include <utility>
 
 #include "capture/source/device_identity.h"
 #include "capture/source/device_list.h"
-#include "capture/source/pipewire_provider.h"
-#include "capture/source/pulse_provider.h"
+#include "capture/source/device_providers.h"
+#include "capture/source/pipewire_devices.h"
 
 namespace lmx {
 namespace {
@@ -21,10 +23,21 @@ struct Found {
   bool hidden = false;
 };
 
+struct Everything {
+  std::vector<Found> devices;
+  std::set<std::string> others;  ///< names of PipeWire's nodes that are neither cameras nor microphones
+};
+
+/// A list's entry with what identifying it does not need.
+struct Entry {
+  ListedDevice listed;
+  CapsHandle caps;        ///< may be null
+  HardwareDevice device;  ///< how it is opened
+};
+
 DeviceInterface interfaceOf(GstDevice* device) {
   const std::string type = G_OBJECT_TYPE_NAME(device);
   if (type == "GstV4l2Device") return DeviceInterface::v4l2;
-  if (type == "GstPipeWireDevice") return DeviceInterface::pipewire;
   if (type == "GstPulseDevice") return DeviceInterface::pulse;
   if (type == "GstAlsaDevice") return DeviceInterface::alsa;
   return DeviceInterface::other;
@@ -71,64 +84,104 @@ void addPlace(ListedDevice& device) {
   std::ifstream(classes / "video4linux" / node / "index") >> all[kInputIndex];
 }
 
-ListedDevice listed(GstDevice* device) {
-  ListedDevice entry{.interface = interfaceOf(device),
-                     .isVideo = gst_device_has_classes(device, "Video/Source") != FALSE,
-                     .name = GText(gst_device_get_display_name(device)).get(),
-                     .properties = {}};
-  GstStructure* properties = gst_device_get_properties(device);
+Entry entryOf(GstHandle<GstDevice> device) {
+  Entry entry;
+  entry.listed = {.interface = interfaceOf(device.get()),
+                  .isVideo = gst_device_has_classes(device.get(), "Video/Source") != FALSE,
+                  .name = GText(gst_device_get_display_name(device.get())).get(),
+                  .properties = {}};
+  GstStructure* properties = gst_device_get_properties(device.get());
   if (properties != nullptr) {
-    gst_structure_foreach(properties, takeProperty, &entry.properties);
+    gst_structure_foreach(properties, takeProperty, &entry.listed.properties);
     gst_structure_free(properties);
   }
-  addPlace(entry);
+  addPlace(entry.listed);
+  entry.caps.reset(gst_device_get_caps(device.get()));
+  entry.device.device = std::move(device);
   return entry;
 }
 
-HardwareDevice described(GstHandle<GstDevice> device, const ListedDevice& entry,
-                         const DeviceIdentity& identity) {
-  HardwareDevice result;
-  const CapsHandle caps(gst_device_get_caps(device.get()));
+Entry entryOf(PipeWireNode node) {
+  Entry entry;
+  entry.device.pipewireNode = targetOf(node);
+  entry.listed = {.interface = DeviceInterface::pipewire,
+                  .isVideo = isCapture(node, true),
+                  .name = nameOf(node),
+                  .properties = std::move(node.properties)};
+  addPlace(entry.listed);
+  entry.caps = std::move(node.caps);
+  return entry;
+}
+
+HardwareDevice described(Entry entry, const DeviceIdentity& identity) {
+  HardwareDevice result = std::move(entry.device);
   result.uniqueID = identity.uniqueID;
-  result.name = entry.name;
+  result.name = entry.listed.name;
   result.parent = identity.parent;
-  result.isVideo = entry.isVideo;
+  result.isVideo = entry.listed.isVideo;
   result.isReal = identity.isReal;
   result.isDefault = identity.isDefault;
-  result.formats = formatsText(caps.get(), entry.isVideo);
-  if (entry.isVideo) result.modes = offeredModes(caps.get());
-  result.device = std::move(device);
+  result.formats = formatsText(entry.caps.get(), result.isVideo);
+  if (result.isVideo) result.modes = offeredModes(entry.caps.get());
   return result;
 }
 
-/// The devices of some classes. @param classes  all devices when there are none
-std::vector<GstHandle<GstDevice>> devicesOf(std::initializer_list<const char*> classes) {
+/// PipeWire's, unless nothing here could open them. What can't be recorded from is named in `others`.
+void addPipeWire(std::vector<Entry>& entries, std::set<std::string>& others,
+                 std::set<std::string>& replaced) {
+  static auto* pipewire = new PipeWireDevices;  // never destroyed: threads that outlive main may list
+  const GstHandle<GstElementFactory> opener(gst_element_factory_find("pipewiresrc"));
+  if (!opener) return;
+  for (PipeWireNode& node : pipewire->list()) {
+    replaced.insert(providerReplacedBy(node));
+    if (!goesOneWay(node) || targetOf(node).empty()) continue;
+    if (isCapture(node, true) || isCapture(node, false))
+      entries.push_back(entryOf(std::move(node)));
+    else
+      others.insert(node.properties["node.name"]);
+  }
+}
+
+void addOthers(std::vector<Entry>& entries, const std::set<std::string>& replaced) {
+  chooseProviders(replaced);
+  const GstHandle<GstDeviceMonitor> monitor(gst_device_monitor_new());
+  for (const char* name : {"Video/Source", "Audio/Source"})
+    gst_device_monitor_add_filter(monitor.get(), name, nullptr);
+  GList* found = gst_device_monitor_get_devices(monitor.get());
+  for (GList* item = found; item != nullptr; item = item->next)
+    entries.push_back(entryOf(GstHandle<GstDevice>(GST_DEVICE(item->data))));
+  g_list_free(found);
+}
+
+Everything everything() {
   ensureGStreamer();
   // A plug-in's provider is one object for the whole process, and not made to be asked by two at once.
   static std::mutex mutex;
-  static auto* pipewire = new PipeWireProvider;  // never destroyed: threads that outlive main may list
-  const std::lock_guard lock(mutex);
-  askPulseOnlyIfThere();
-  pipewire->keepUp();
-  const GstHandle<GstDeviceMonitor> monitor(gst_device_monitor_new());
-  for (const char* name : classes) gst_device_monitor_add_filter(monitor.get(), name, nullptr);
-  std::vector<GstHandle<GstDevice>> devices;
-  GList* found = gst_device_monitor_get_devices(monitor.get());
-  for (GList* item = found; item != nullptr; item = item->next) devices.emplace_back(GST_DEVICE(item->data));
-  g_list_free(found);
-  return devices;
+  Everything all;
+  std::vector<Entry> entries;
+  {
+    const std::lock_guard lock(mutex);
+    std::set<std::string> replaced;
+    addPipeWire(entries, all.others, replaced);
+    addOthers(entries, replaced);
+  }
+  std::vector<ListedDevice> listed;
+  listed.reserve(entries.size());
+  for (const Entry& entry : entries) listed.push_back(entry.listed);
+  const auto identities = identitiesOf(listed);
+  for (std::size_t i = 0; i < entries.size(); ++i)
+    all.devices.push_back({described(std::move(entries[i]), identities[i]), identities[i].hidden});
+  return all;
 }
 
-std::vector<Found> everything() {
-  auto devices = devicesOf({"Video/Source", "Audio/Source"});
-  std::vector<ListedDevice> entries;
-  entries.reserve(devices.size());
-  for (const auto& device : devices) entries.push_back(listed(device.get()));
-  const auto identities = identitiesOf(entries);
-  std::vector<Found> all;
-  for (std::size_t i = 0; i < devices.size(); ++i)
-    all.push_back({described(std::move(devices[i]), entries[i], identities[i]), identities[i].hidden});
-  return all;
+std::optional<HardwareDevice> deviceNamed(std::vector<Found> all, const std::string& uniqueID) {
+  if (uniqueID.empty()) return std::nullopt;  // so would be devices that can't be told from others
+  std::stable_sort(all.begin(), all.end(),
+                   [](const Found& one, const Found& other) { return one.hidden < other.hidden; });
+  for (Found& found : all) {
+    if (found.device.uniqueID == uniqueID) return std::move(found.device);
+  }
+  return std::nullopt;
 }
 
 bool canDecode(const char* caps) {
@@ -148,7 +201,7 @@ bool canDecode(const char* caps) {
 
 std::vector<HardwareDevice> listHardware() {
   std::vector<HardwareDevice> devices;
-  for (Found& found : everything()) {
+  for (Found& found : everything().devices) {
     if (!found.hidden) devices.push_back(std::move(found.device));
   }
   sortDevices(devices);
@@ -165,7 +218,8 @@ HardwareDevice copyOf(const HardwareDevice& device) {
   copy.isVideo = device.isVideo;
   copy.isReal = device.isReal;
   copy.isDefault = device.isDefault;
-  copy.device.reset(GST_DEVICE(gst_object_ref(device.device.get())));
+  copy.pipewireNode = device.pipewireNode;
+  if (device.device) copy.device.reset(GST_DEVICE(gst_object_ref(device.device.get())));
   return copy;
 }
 
@@ -177,24 +231,25 @@ void sortDevices(std::vector<HardwareDevice>& devices) {
 }
 
 std::optional<HardwareDevice> findHardware(const std::string& uniqueID) {
-  if (uniqueID.empty()) return std::nullopt;  // so would be devices that can't be told from others
-  std::vector<Found> all = everything();
-  std::stable_sort(all.begin(), all.end(),
-                   [](const Found& one, const Found& other) { return one.hidden < other.hidden; });
-  for (Found& found : all) {
-    if (found.device.uniqueID == uniqueID) return std::move(found.device);
-  }
-  return std::nullopt;
+  return deviceNamed(everything().devices, uniqueID);
 }
 
 bool isHardwareThere(const std::string& uniqueID) {
-  if (uniqueID.starts_with("alsa:device=") || findHardware(uniqueID)) return true;
-  for (const auto& device : devicesOf({})) {
-    const ListedDevice entry = listed(device.get());
-    const auto node = entry.properties.find("node.name");
-    if (node != entry.properties.end() && uniqueID == "pipewire:" + node->second) return true;
-  }
-  return false;
+  if (uniqueID.starts_with("alsa:device=")) return true;
+  Everything all = everything();
+  return deviceNamed(std::move(all.devices), uniqueID) ||
+         std::any_of(all.others.begin(), all.others.end(), [&](const std::string& node) {
+           return !node.empty() && uniqueID == "pipewire:" + node;
+         });
+}
+
+GstHandle<GstElement> sourceFor(const HardwareDevice& device) {
+  GstElement* source = device.device ? gst_device_create_element(device.device.get(), nullptr)
+                                     : gst_element_factory_make("pipewiresrc", nullptr);
+  if (source == nullptr) return nullptr;
+  gst_object_ref_sink(source);
+  if (!device.device) g_object_set(source, "target-object", device.pipewireNode.c_str(), nullptr);
+  return GstHandle<GstElement>(source);
 }
 
 CameraDemand demandHere(PictureSize size, double maximumRate) {

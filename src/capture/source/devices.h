@@ -18,9 +18,10 @@ struct HardwareDevice {
   std::string formats;            ///< for people
   std::vector<CameraMode> modes;  ///< of a camera; empty when it doesn't tell them
   bool isVideo = false;
-  bool isReal = true;      ///< a piece of hardware, not made up by a program
-  bool isDefault = false;  ///< the sound server's own default
-  GstHandle<GstDevice> device;
+  bool isReal = true;           ///< a piece of hardware, not made up by a program
+  bool isDefault = false;       ///< the sound server's own default
+  GstHandle<GstDevice> device;  ///< null for one of PipeWire's
+  std::string pipewireNode;     ///< the name of PipeWire's node for a pipewiresrc; else empty
 };
 
 /// What is there now, each device once: cameras first, real hardware first, the sound server's default first,
@@ -41,6 +42,9 @@ std::optional<HardwareDevice> findHardware(const std::string& uniqueID);
 /// findHardware() knows it, or it is any output of PipeWire's, or "alsa:device=NAME", a name in ALSA's own
 /// configuration. Blocks for some milliseconds. Thread-safe.
 bool isHardwareThere(const std::string& uniqueID);
+
+/// A new element that captures from the device, not yet set up; null when it can't be made. Thread-safe.
+GstHandle<GstElement> sourceFor(const HardwareDevice& device);
 
 /// What is wanted of a camera on this machine: what it can decode is asked of GStreamer. Thread-safe.
 CameraDemand demandHere(PictureSize size = kFullHD, double maximumRate = 30);

@@ -117,6 +117,10 @@ class PipeWireHall:
         arguments = [name, api or "", str(ppm), str(jitter), str(hertz)]
         return VirtualDevice(self, name, [str(self.program("pipewire_microphone")), *arguments])
 
+    def fleeting(self, slots):
+        """Cameras and microphones that come and go all the time, to be started: up to so many at once."""
+        return FleetingDevices(self, slots)
+
     def watch(self, name, caps, rest):
         """Takes so many pieces from a node as any other program would; `rest` ends the launch line: "15 ! fakesink"."""
         subprocess.run(["gst-launch-1.0", "-q", "pipewiresrc", f"target-object={name}",
@@ -136,6 +140,13 @@ class PipeWireHall:
 
     def has(self, name):
         return any(props.get("node.name") == name for props in self.objects("Node"))
+
+    def stall(self):
+        """The server stays, and takes connections, but answers nothing."""
+        self._guests[0].process.send_signal(signal.SIGSTOP)
+
+    def go_on(self):
+        self._guests[0].process.send_signal(signal.SIGCONT)
 
     def kill(self):
         """Ends server and session manager at once; start() brings them back."""
@@ -187,3 +198,18 @@ class VirtualMicrophone(VirtualDevice):
         claim = f"device.api={api}" if api else ""
         node = f"{{ media.class=Audio/Source node.name={name} node.description={name} {claim} }}"
         super().__init__(hall, name, ["pw-cat", "--playback", "--properties", node, str(sound)])
+
+
+class FleetingDevices(Guest):
+    """A program of whose nodes none lasts. Ended with the test."""
+
+    def __init__(self, hall, slots):
+        super().__init__(hall.agent)
+        self.hall = hall
+        self._slots = slots
+
+    def start(self):
+        """Returns once the first has come."""
+        self.run([str(self.hall.program("pipewire_fleeting")), "fleeting", str(self._slots)], env=self.hall.host_env,
+                 ready="coming", stdin=subprocess.DEVNULL, stdout=subprocess.PIPE)
+        return self
