@@ -267,7 +267,7 @@ def test_packets_of_sound_with_nothing_in_them(recording):
         recording.trouble({"begin": "00100000"}, {"begin": ""}, at=3, seconds=1)
     recording.check_length()
     assert len(recording.parts()) == 1
-    recording.check_step(5)
+    recording.check_step(3, after=4.5)  # the silence may end within a beep
     told = [line.text for line in recording.log(Level.WARNING)]
     assert not told, told
     assert recording.agent.log.lines("^The camera sends damaged packets; rtpmp4gdepay is not given them$")

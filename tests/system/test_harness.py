@@ -139,6 +139,11 @@ def test_steps_and_bursts_are_found():
     assert sounds.breaks(sine, 1000, 48000) == pytest.approx((0, 1), abs=1e-9)
     leap, _ = sounds.breaks(numpy.delete(sine, 70000), 1000, 48000)
     assert leap == pytest.approx(1 / 48000, rel=0.1), "one sample is missing"
+    hum = numpy.sin(2 * numpy.pi * 440 * time)
+    assert all(sounds.breaks(numpy.delete(hum, range(70000, 70000 + lost)), 440, 48000)[0] > 1.5 * sounds.UNBROKEN
+               for lost in (256, 480, 512, 1024)), "what sound servers and drivers lose at once"
+    glide = numpy.sin(2 * numpy.pi * 440 * (time + 0.005 * numpy.maximum(time - 1, 0)))
+    assert sounds.breaks(glide, 440, 48000)[0] < sounds.UNBROKEN
     assert sounds.breaks(numpy.where(abs(time - 1.5) < 0.01, 0, sine), 1000, 48000)[1] < 0.01, "a hole"
     since = time % 1.001
     world = sine * numpy.where(since < 0.02, numpy.sin(numpy.pi * since / 0.02) ** 2, 0)

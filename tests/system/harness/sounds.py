@@ -86,14 +86,17 @@ def bursts(sound, rate):
     return [at / rate for at in found]
 
 
+UNBROKEN = 0.0004  # seconds of leap; the agent's greatest correction of a clock, half a percent, makes 0.0003 of it
+
+
 def breaks(sound, hertz, rate):
-    """What is broken in a sine. @return the most by which it leaps in time, seconds (a sample lost or put in is one
-    sample's time), and the least strength of 10 ms as a part of the usual one. Over a packet that the movie's coder has
-    spoilt the medians pass."""
+    """What is broken in a sine. @return the most by which it leaps in time within 60 ms, seconds modulo its period, and
+    the least strength of 10 ms as a part of the usual one. Over a packet that the movie's coder has spoilt the medians
+    pass."""
     size = rate // 100
     turned = sound * numpy.exp(-2j * numpy.pi * hertz * numpy.arange(len(sound)) / rate)
     pieces = turned[: len(turned) // size * size].reshape(-1, size).mean(axis=1)
-    phases = numpy.lib.stride_tricks.sliding_window_view(numpy.unwrap(numpy.angle(pieces)), 9)
+    phases = numpy.lib.stride_tricks.sliding_window_view(numpy.unwrap(numpy.angle(pieces)), 5)
     middle = numpy.median(phases, axis=1)
-    leaps = numpy.abs(middle[20:] - 2 * middle[10:-10] + middle[:-20]) / (2 * numpy.pi * hertz)
+    leaps = numpy.abs(middle[12:] - 2 * middle[6:-6] + middle[:-12]) / (2 * numpy.pi * hertz)
     return float(leaps.max()), float(numpy.abs(pieces).min() / numpy.median(numpy.abs(pieces)))

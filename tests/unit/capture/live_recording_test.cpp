@@ -115,7 +115,7 @@ TEST(LiveRecording, TwoRequestsOfOneCaptureEachGetTheirSpan) {
   EXPECT_NEAR(static_cast<double>(second.size()), 21, 2);
   ASSERT_GT(first.size(), second.size());
   EXPECT_EQ(numberRuns(first).size(), 1U);
-  EXPECT_EQ(first.back(), second.back());
+  EXPECT_LE(first.back() - second.back(), 1U) << "a frame may come between the end of B and that of A";
   EXPECT_FALSE(std::filesystem::exists(folder.file(".lmxagentd")));
 }
 
