@@ -189,8 +189,9 @@ class Agent:
         return self.command(start_line(uuid, minutes, unattended, **parameters), timeout)
 
     def let_record(self, seconds):
-        """Waits until the running recording holds so many whole seconds of media; pauses don't count."""
-        wait_until(lambda: int(self.command("STATUS").fields["elapsedTime"]) >= seconds, seconds + 20,
+        """Waits until the running recording holds so many whole seconds of media; pauses don't count. A timed command that
+        is due answers whoever is connected just then: such an answer has no time."""
+        wait_until(lambda: int(self.command("STATUS").fields.get("elapsedTime", 0)) >= seconds, seconds + 20,
                    f"{seconds} s of media", interval=0.1)
 
     def wait_idle(self):
