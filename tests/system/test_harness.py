@@ -1,4 +1,5 @@
 """The harness's readers against known material: a reader that finds nothing would prove nothing."""
+import socket
 import subprocess
 import time
 
@@ -113,6 +114,16 @@ def test_a_power_cut_leaves_what_was_synced(agent, names, last, left):
     power.restore()
     top = agent.path(REPOSITORY)
     assert {str(path.relative_to(top)): path.read_text() for path in top.rglob("*") if path.is_file()} == left
+
+
+def test_what_was_logged_is_read_before_it_is_asked_for(agent):
+    with socket.socket(socket.AF_UNIX, socket.SOCK_DGRAM) as sender:
+        sender.connect(str(agent.path("/dev/log")))
+        for number in range(1, 2001):
+            sender.send(b"<31>lmxagentd[1]: line %d" % number)
+            if number % 100 == 0:
+                assert agent.log.mark() == number
+    assert agent.log.lines()[-1].text == "line 2000"
 
 
 def test_the_main_thread_is_held_and_no_other(agent, server):

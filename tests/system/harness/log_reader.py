@@ -10,6 +10,8 @@ from .log_socket import log_socket
 
 LINE = re.compile(r"^<(\d+)>.*?\blmxagentd\[(\d+)\]: (.*)$", re.DOTALL)
 DAEMON = 3  # syslog's facility for daemons
+END = b"end"
+MARKER = b"read so far"
 
 
 class Level(IntEnum):
@@ -43,17 +45,25 @@ class LogReader:
 
     def __init__(self, path):
         self._lines = []
+        self._sent = 0  # markers of _catch_up()
+        self._markers = 0  # of these, read again
         self._arrived = threading.Condition()
         self._socket = log_socket()
-        self._socket.bind(str(path))
+        self._address = str(path)
+        self._socket.bind(self._address)
         self._thread = threading.Thread(target=self._read, daemon=True)
         self._thread.start()
 
     def _read(self):
         while True:
             data = self._socket.recv(65536)
-            if data == b"end":
+            if data == END:
                 return
+            if data == MARKER:
+                with self._arrived:
+                    self._markers += 1
+                    self._arrived.notify_all()
+                continue
             line = self._parse(data.decode("utf-8", "replace"))
             with self._arrived:
                 self._lines.append(line)
@@ -68,19 +78,35 @@ class LogReader:
         return LogLine(Level(priority & 7), priority >> 3, int(match[2]), match[3].rstrip("\n"), time.monotonic(), raw)
 
     def close(self):
-        address = self._socket.getsockname()
-        with socket.socket(socket.AF_UNIX, socket.SOCK_DGRAM) as sender:
-            sender.sendto(b"end", address)
+        self._send(END)
         self._thread.join(5)
         self._socket.close()
 
+    def _send(self, text):
+        with socket.socket(socket.AF_UNIX, socket.SOCK_DGRAM) as sender:
+            sender.sendto(text, self._address)
+
+    def _catch_up(self):
+        """Waits until what has been sent to the socket is in the list: the thread may be behind on a busy machine."""
+        with self._arrived:
+            if not self._thread.is_alive():
+                return
+            self._sent += 1
+            expected = self._sent
+        self._send(MARKER)
+        with self._arrived:
+            if not self._arrived.wait_for(lambda: self._markers >= expected, 15):
+                raise AssertionError("the system log is not read")
+
     def mark(self):
-        """A place in the log, for `after`."""
+        """A place in the log, for `after`; what was sent before is in front of it."""
+        self._catch_up()
         with self._arrived:
             return len(self._lines)
 
     def lines(self, pattern=".", after=0, level=None):
         """The messages so far that match `pattern` (and have `level`)."""
+        self._catch_up()
         with self._arrived:
             return [l for l in self._lines[after:] if self._fits(l, pattern, level)]
 
