@@ -59,12 +59,13 @@ def ffmpeg(path):
     return Timing(frames, _tick_times(movie.sound(path, RATE), _decoded_times(path, "a:0")[0]))
 
 
-def _gstreamer_stream(path, convert):
+def _gstreamer_stream(path, convert, other):
     """Decodes one stream. @return the running times of its buffers, and its bytes"""
     with tempfile.NamedTemporaryFile() as raw:
-        text = _run(["gst-launch-1.0", "-v", "uridecodebin", f"uri={Path(path).resolve().as_uri()}", "!",
-                     *convert.split(), "!", "identity", "name=tap", "silent=false", "!", "filesink",
-                     f"location={raw.name}"])
+        # The other stream goes somewhere too: where it is left unlinked, one run in fifty never ends on a busy machine.
+        text = _run(["gst-launch-1.0", "-v", "uridecodebin", f"uri={Path(path).resolve().as_uri()}", "name=movie",
+                     "movie.", "!", *convert.split(), "!", "identity", "name=tap", "silent=false", "!", "filesink",
+                     f"location={raw.name}", "movie.", "!", other, "!", "fakesink"])
         data = Path(raw.name).read_bytes()
     (start,) = set(re.findall(r"tap:sink\) E \(type: segment.*?start=\(guint64\)(\d+)", text))
     times = [(int(h) * 60 + int(m)) * 60 + float(s) - int(start) / 1e9
@@ -74,7 +75,7 @@ def _gstreamer_stream(path, convert):
 
 def gstreamer(path):
     """GStreamer's view: running times behind its decoders."""
-    times, pixels = _gstreamer_stream(path, "videoconvert ! video/x-raw,format=GRAY8")
+    times, pixels = _gstreamer_stream(path, "videoconvert ! video/x-raw,format=GRAY8", "audio/x-raw")
     stream = movie.streams(path)["video"]
     cell, row = stream.width // movie.CELLS, stream.height // movie.ROWS // 2
     stride = (stream.width + 3) // 4 * 4
@@ -82,7 +83,8 @@ def gstreamer(path):
     cells = pictures[:, row * stride + cell // 2:row * stride + cell // 2 + movie.CELLS * cell:cell]
     weights = 1 << numpy.arange(movie.CELLS - 1, -1, -1, dtype=numpy.int64)
     numbers = [int(value) for value in (cells >= 128) @ weights]
-    starts, sound = _gstreamer_stream(path, "audioconvert ! audio/x-raw,format=F32LE,channels=1")
+    assert len(times) == len(numbers), (len(times), len(numbers))
+    starts, sound = _gstreamer_stream(path, "audioconvert ! audio/x-raw,format=F32LE,channels=1", "video/x-raw")
     return Timing(list(zip(times, numbers)), _tick_times(numpy.frombuffer(sound, dtype=numpy.float32), starts[0]))
 
 
